@@ -1,0 +1,29 @@
+// What the core asks of the process it runs in: to print a line, to report an exception that has
+// no other way out, and to describe an exception that is not the core's own.
+//
+// Without a host the lines go to stdout and stderr. The bindings install the host's own means at
+// import; they are functions, so that a thread without the interpreter lock may call them (the
+// host's versions take the lock).
+#pragma once
+
+#include <exception>
+#include <string>
+
+#include "foundations/text.h"
+
+namespace quillet {
+
+struct Console {
+  // One line, without its line end, on the host's standard output.
+  void (*print_line)(Text line);
+  // Logs the exception; with `suppress_gui` the user is not shown it.
+  void (*report_exception)(const std::exception_ptr& exception, bool suppress_gui);
+  // repr() of an exception that is not a quillet::Error; empty where it is unknown.
+  std::string (*describe_exception)(const std::exception_ptr& exception);
+};
+
+Console& TheConsole();
+
+inline void PrintLine(Text line) { TheConsole().print_line(line); }
+
+}  // namespace quillet

@@ -1,0 +1,50 @@
+// CDispatchWalker: a walk driven by a table from node class to visit.
+//
+// A visit that gives true, or a class without an entry, has the node's children walked; a class
+// marked as pruned is neither visited nor descended into. The walk is bounded as that of
+// CNodeWalker is: 10000 visits, a depth of 40, measured on the stack of nodes, which visits may read
+// to find ancestors. Reaching a limit prints a line and ends the walk normally.
+#pragma once
+
+#include <array>
+#include <functional>
+#include <vector>
+
+#include "siblings/logicalline/logical_line.h"
+#include "tree/nodes.h"
+
+namespace quillet {
+
+class CDispatchWalker {
+ public:
+  enum class Action : uint8_t { kDescend, kPrune, kVisit };
+  using Visit = bool (*)(CDispatchWalker& walker, CNode* node);
+
+  // The table by exact class. A host's callables come through `host_visit`, which then decides for
+  // every node: it returns whether the children are to be walked.
+  struct Entry {
+    Action action = Action::kDescend;
+    Visit visit = nullptr;
+  };
+  using Table = std::array<Entry, kNodeKindCount>;
+
+  explicit CDispatchWalker(const Table& table) : table_(table) {}
+  virtual ~CDispatchWalker() = default;
+
+  virtual void Walk(CNode* node, LogicalLine* logical, bool first_in_def);
+  void VisitNode(CNode* node);
+
+  std::function<bool(CNode*)> host_visit;
+
+  LogicalLine* fLogical = nullptr;
+  int32_t fVisitCount = 0;
+  int32_t fRecurseCount = 0;
+  int32_t fMaxVisits = 10000;
+  int32_t fMaxRecurseCount = 40;
+  std::vector<CNode*> fNodeStack;
+
+ private:
+  Table table_;
+};
+
+}  // namespace quillet

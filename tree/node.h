@@ -1,0 +1,115 @@
+// CNode, the node of every syntax tree, and CNodeClassInfo, the record of its parser state.
+//
+// A node is plain data: five fields to the host (fChildren, fText, fContext, fClsInfo, fNextFree)
+// and, beside the text, the token code that lets an accessor compare a byte where it asks for a
+// fixed token. Subclasses add accessors only, no field and no virtual function; the kind byte says
+// which class was constructed in the storage, and isa/cast/dyn_cast go by it.
+//
+// Memory belongs to a NodePool. A node is handed out by NewNode and given back once, by
+// FinishedWithNode, to the free list of its class record; after that neither it nor anything that
+// refers to it may be used.
+#pragma once
+
+#include <cassert>
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <type_traits>
+
+#include "foundations/errors.h"
+#include "foundations/text.h"
+#include "siblings/fastaccess/token.h"
+#include "tree/node_kind.h"
+
+namespace quillet {
+
+class NodePool;
+
+// Per state of the parser: which class serves it, and the free list of its discarded nodes.
+struct CNodeClassInfo {
+  NodeKind kind = NodeKind::kCNode;
+  int32_t fNodeType = 0;        // state number: a token type or a grammar symbol
+  Text fName = kNoText;         // symbol name, token name or "KEYWORD"; may be none
+  CNode* fFirstFree = nullptr;
+  NodePool* pool = nullptr;     // owns the nodes of this record
+};
+
+struct alignas(64) CNode {
+  CNodeClassInfo* fClsInfo = nullptr;
+  CNode* fNextFree = nullptr;
+  const char* text = nullptr;          // null: no text
+  CNode** children = nullptr;          // storage kept across reuse; see has_children
+  uint32_t text_length = 0;
+  uint32_t child_count = 0;
+  uint32_t child_capacity = 0;
+  Context fContext;
+  NodeKind kind = NodeKind::kCNode;
+  TokenCode code = tok::REMOVED;       // of the text; REMOVED where there is none
+  bool has_children = false;           // false: the host sees None in place of the list
+
+  // ---- fields as the host names them ----
+  Text fText() const { return {text, text_length}; }
+  std::span<CNode* const> fChildren() const { return {children, child_count}; }
+
+  // ---- the virtual operations of the contract ----
+  int64_t GetChildCount() const { return child_count; }
+  // Text of the child at `index`; none for an interior child and past the end. A negative index
+  // counts from the end; IndexError before the start; AttributeError for an absent child.
+  Text GetChildText(int64_t index) const;
+  // The child at `index`, null past the end; negative as above.
+  CNode* GetChild(int64_t index) const;
+  // Symbol or token name of the record; the class name without a record.
+  Text GetStateName() const;
+  bool DoesChildTextMatch(Text wanted) const;
+
+  // ---- inline forms for the core ----
+  uint32_t ChildCount() const { return child_count; }
+  // The child at `index`, or null where there is none.
+  CNode* Child(uint32_t index) const { return index < child_count ? children[index] : nullptr; }
+  // True where there is such a child and its token has this code. Codes of words and operators
+  // stand for one text each, but for NOTEQUAL ("!=", "<>") and RARROW ("->", "@=").
+  bool ChildIs(uint32_t index, TokenCode wanted) const {
+    return index < child_count && children[index] != nullptr && children[index]->code == wanted;
+  }
+  bool HasChildWithCode(TokenCode wanted) const {
+    for (uint32_t i = 0; i < child_count; ++i)
+      if (children[i] != nullptr && children[i]->code == wanted) return true;
+    return false;
+  }
+  // The child at `index`; IndexError where it is missing, TypeError where there are no children.
+  CNode* ChildAt(int64_t index) const;
+  CNode* LastChild() const { return child_count ? children[child_count - 1] : nullptr; }
+  bool IsLeaf() const { return text != nullptr; }
+};
+
+// A class and its range of kinds; null counts as "is not".
+template <class T>
+bool isa(const CNode* node) {
+  return node != nullptr && IsKind<T>(node->kind);
+}
+template <class T>
+T* cast(CNode* node) {
+  assert(isa<T>(node));
+  return static_cast<T*>(node);
+}
+template <class T>
+const T* cast(const CNode* node) {
+  assert(isa<T>(node));
+  return static_cast<const T*>(node);
+}
+template <class T>
+T* dyn_cast(CNode* node) {
+  return isa<T>(node) ? static_cast<T*>(node) : nullptr;
+}
+template <class T>
+const T* dyn_cast(const CNode* node) {
+  return isa<T>(node) ? static_cast<const T*>(node) : nullptr;
+}
+
+static_assert(sizeof(CNode) == 64, "a node is one cache line");
+static_assert(std::is_trivially_destructible_v<CNode>, "pools drop nodes without a call");
+
+// repr() of the host: "<class 'quillet.tarvex.CAtom'>: atom".
+std::string ReprOfNode(const CNode* node);
+
+}  // namespace quillet
