@@ -1,0 +1,42 @@
+// The loop over the lines of a source. Everything that costs is below: cutting, parsing, walking.
+#include "analysis/file_analyzer.h"
+
+namespace quillet {
+
+FileAnalyzer::FileAnalyzer(const CPGenAnalyzerImpl::Options& options)
+    : version_(options.version), analyzer_(options), source_(SourceText::Copy(Text("", 0))) {}
+
+void FileAnalyzer::Analyze(Text bytes) {
+  rows_.clear();
+  results_.clear();
+  errors_.clear();
+  store_.Reset();
+  scopes_.Reset();
+  source_->Assign(bytes);
+  CutLines(*source_, version_, rows_);
+  results_.reserve(rows_.size());
+
+  LogicalLine line;
+  for (const LineRow& row : rows_) {
+    LineResult result;
+    const ScopeTracker::Place place = scopes_.Enter(row);
+    result.in_async_def = place.in_async_def;
+    result.first_in_def = place.first_in_def;
+    result.record_begin = static_cast<uint32_t>(store_.rows.size());
+    result.arg_record_begin = static_cast<uint32_t>(store_.arg_rows.size());
+    if (row.token_count != 0) {
+      SetFromRow(line, source_, row);
+      line.parsed = false;
+      line.WriteTo(&store_);
+      if (auto error = analyzer_.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def)) {
+        result.error = static_cast<int32_t>(errors_.size());
+        errors_.push_back(std::move(*error));
+      }
+    }
+    result.record_end = static_cast<uint32_t>(store_.rows.size());
+    result.arg_record_end = static_cast<uint32_t>(store_.arg_rows.size());
+    results_.push_back(result);
+  }
+}
+
+}  // namespace quillet

@@ -1,0 +1,267 @@
+// What each stage costs, over a corpus held in memory (see corpus.h), on one core:
+// tokenising, cutting into logical lines, parsing with discard, walking (hints included), and all of it.
+//
+// Counters: ns per token, MB/s, physical lines/s. Before a stage is timed its result is checked: the
+// tokens cover the source in order, trees come out the same twice, recycled nodes give the records
+// that fresh ones give.
+#include <benchmark/benchmark.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "analysis/file_analyzer.h"
+#include "bench/corpus.h"
+
+namespace quillet::bench {
+namespace {
+
+constexpr Version kVersion{{3, 11, 0}, 3};
+
+CPGenAnalyzerImpl::Options AnalyzerOptions() {
+  CPGenAnalyzerImpl::Options options;
+  options.version = kVersion;
+  options.grammar_file = std::string(QUILLET_SOURCE_DIR "/resources/pgen-grammars/") + kPy3DefaultGrammar;
+  options.hint_grammar_file = options.grammar_file;
+  for (Text word : Py3Keywords()) options.keywords.emplace_back(word);
+  options.hint_keywords = options.keywords;
+  return options;
+}
+
+void Require(bool condition, const char* what) {
+  if (condition) return;
+  std::fprintf(stderr, "not timed, the result is wrong: %s\n", what);
+  std::exit(1);
+}
+
+// The corpus cut into lines, ready for the later stages.
+struct CutFile {
+  Ref<SourceText> source;
+  std::vector<LineRow> rows;
+};
+
+const std::vector<CutFile>& CutCorpus() {
+  static const std::vector<CutFile> files = [] {
+    std::vector<CutFile> result;
+    for (const std::string& bytes : TheCorpus().files) {
+      CutFile file{SourceText::Copy(bytes), {}};
+      CutLines(*file.source, kVersion, file.rows);
+      result.push_back(std::move(file));
+    }
+    return result;
+  }();
+  return files;
+}
+
+size_t TokenCount() {
+  static const size_t count = [] {
+    size_t sum = 0;
+    for (const CutFile& file : CutCorpus()) sum += file.source->tokens.size();
+    return sum;
+  }();
+  return count;
+}
+
+void Report(benchmark::State& state) {
+  const double passes = static_cast<double>(state.iterations());
+  const double tokens = static_cast<double>(TokenCount());
+  state.counters["ns/token"] =
+      benchmark::Counter(tokens * passes / 1e9, benchmark::Counter::kIsRate | benchmark::Counter::kInvert);
+  state.counters["MB/s"] =
+      benchmark::Counter(static_cast<double>(TheCorpus().bytes) * passes / 1e6, benchmark::Counter::kIsRate);
+  state.counters["lines/s"] =
+      benchmark::Counter(static_cast<double>(TheCorpus().lines) * passes, benchmark::Counter::kIsRate);
+}
+
+bool TokensInOrder(const SourceText& source) {
+  const char* at = source.begin();
+  for (const Token& token : source.tokens) {
+    if (token.text < at || token.end() > source.end() || token.length == 0) return false;
+    at = token.end();
+  }
+  return true;
+}
+
+void Tokenize(benchmark::State& state) {
+  Ref<SourceText> source = SourceText::Copy(Text("", 0));
+  for (const std::string& bytes : TheCorpus().files) {
+    source->Assign(bytes);
+    TokenizeOnly(*source, kVersion);
+    Require(TokensInOrder(*source), "tokens are not in the order of the source");
+  }
+  for (auto _ : state) {
+    for (const std::string& bytes : TheCorpus().files) {
+      source->Assign(bytes);
+      TokenizeOnly(*source, kVersion);
+      benchmark::DoNotOptimize(source->tokens.data());
+    }
+  }
+  Report(state);
+}
+BENCHMARK(Tokenize)->Unit(benchmark::kMillisecond);
+
+void Cut(benchmark::State& state) {
+  Ref<SourceText> source = SourceText::Copy(Text("", 0));
+  std::vector<LineRow> rows;
+  size_t index = 0;
+  for (const std::string& bytes : TheCorpus().files) {
+    source->Assign(bytes);
+    rows.clear();
+    CutLines(*source, kVersion, rows);
+    Require(rows.size() == CutCorpus()[index].rows.size(), "a source is not cut the same way twice");
+    ++index;
+  }
+  for (auto _ : state) {
+    for (const std::string& bytes : TheCorpus().files) {
+      source->Assign(bytes);
+      rows.clear();
+      CutLines(*source, kVersion, rows);
+      benchmark::DoNotOptimize(rows.data());
+    }
+  }
+  Report(state);
+}
+BENCHMARK(Cut)->Unit(benchmark::kMillisecond);
+
+// Calls visit(line, tree) for every line of the corpus that parses to a tree; the tree is discarded.
+template <class Visit>
+size_t ParseCorpus(CPGenParserImpl& parser, Visit&& visit) {
+  size_t errors = 0;
+  LogicalLine line;
+  for (const CutFile& file : CutCorpus()) {
+    for (const LineRow& row : file.rows) {
+      if (row.token_count == 0 || row.kind == LineKind::kComment) continue;
+      SetFromRow(line, file.source, row);
+      try {
+        CNode* node = parser.ParseToNode(line, false);
+        if (node == nullptr) continue;
+        visit(line, node);
+        parser.DiscardNode(node);
+      } catch (const ParseError&) {
+        ++errors;
+      }
+    }
+  }
+  return errors;
+}
+
+size_t CountNodes(const CNode* node) {
+  size_t count = 1;
+  for (const CNode* child : node->fChildren()) count += CountNodes(child);
+  return count;
+}
+
+void ParseWithDiscard(benchmark::State& state) {
+  CPGenAnalyzerImpl analyzer(AnalyzerOptions());
+  CPGenParserImpl& parser = analyzer.logical_parser();
+  size_t first = 0, second = 0;
+  const size_t errors = ParseCorpus(parser, [&](LogicalLine&, CNode* node) { first += CountNodes(node); });
+  ParseCorpus(parser, [&](LogicalLine&, CNode* node) { second += CountNodes(node); });
+  Require(first == second && first > 0, "recycled nodes make other trees");
+  for (auto _ : state) ParseCorpus(parser, [](LogicalLine&, CNode*) {});
+  state.counters["rejected"] = static_cast<double>(errors);
+  Report(state);
+}
+BENCHMARK(ParseWithDiscard)->Unit(benchmark::kMillisecond);
+
+// The walk alone: a file's trees are made while the clock stands still.
+void Walk(benchmark::State& state) {
+  CPGenAnalyzerImpl analyzer(AnalyzerOptions());
+  CPGenParserImpl& parser = analyzer.logical_parser();
+  RecordStore store;
+  std::vector<std::unique_ptr<LogicalLine>> lines;
+  std::vector<CNode*> trees;
+  size_t records = 0;
+  for (auto _ : state) {
+    double seconds = 0;
+    records = 0;
+    for (const CutFile& file : CutCorpus()) {
+      trees.clear();
+      size_t used = 0;
+      for (const LineRow& row : file.rows) {
+        if (row.token_count == 0 || row.kind == LineKind::kComment) continue;
+        if (used == lines.size()) lines.push_back(std::make_unique<LogicalLine>());
+        SetFromRow(*lines[used], file.source, row);
+        try {
+          if (CNode* node = parser.ParseToNode(*lines[used], false)) {
+            trees.push_back(node);
+            ++used;
+          }
+        } catch (const ParseError&) {
+        }
+      }
+      store.Reset();
+      const auto start = std::chrono::steady_clock::now();
+      for (size_t i = 0; i < trees.size(); ++i) {
+        lines[i]->WriteTo(&store);
+        try {
+          analyzer.node_walker().Walk(trees[i], lines[i].get());
+          analyzer.type_hint_walker().Walk(trees[i], lines[i].get(), false);
+        } catch (const SyntaxError&) {
+        }
+      }
+      seconds += std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+      records += store.rows.size() + store.arg_rows.size();
+      for (CNode* node : trees) parser.DiscardNode(node);
+    }
+    state.SetIterationTime(seconds);
+  }
+  Require(records > 0, "no records");
+  state.counters["records"] = static_cast<double>(records);
+  Report(state);
+}
+BENCHMARK(Walk)->Unit(benchmark::kMillisecond)->UseManualTime();
+
+uint64_t Fingerprint(const FileAnalyzer& files) {
+  uint64_t hash = 1469598103934665603u;
+  const auto add = [&hash](Text text) {
+    for (char byte : text) hash = (hash ^ static_cast<uint8_t>(byte)) * 1099511628211u;
+    hash *= 31;
+  };
+  for (const auto* rows : {&files.store().rows, &files.store().arg_rows}) {
+    for (const Record& record : *rows) {
+      add(record.name());
+      add(record.info());
+    }
+  }
+  return hash;
+}
+
+void BytesToRecords(benchmark::State& state) {
+  FileAnalyzer recycled(AnalyzerOptions());
+  for (size_t i = 0; i < TheCorpus().files.size(); ++i) {
+    recycled.Analyze(TheCorpus().files[i]);
+    if (i % 50 != 0) continue;
+    FileAnalyzer fresh(AnalyzerOptions());
+    fresh.Analyze(TheCorpus().files[i]);
+    Require(Fingerprint(fresh) == Fingerprint(recycled), "recycled nodes give other records");
+  }
+  size_t records = 0, errors = 0;
+  for (auto _ : state) {
+    records = errors = 0;
+    for (const std::string& bytes : TheCorpus().files) {
+      recycled.Analyze(bytes);
+      records += recycled.store().rows.size() + recycled.store().arg_rows.size();
+      errors += recycled.errors().size();
+    }
+  }
+  state.counters["records"] = static_cast<double>(records);
+  state.counters["rejected"] = static_cast<double>(errors);
+  Report(state);
+}
+BENCHMARK(BytesToRecords)->Unit(benchmark::kMillisecond);
+
+}  // namespace
+}  // namespace quillet::bench
+
+int main(int argc, char** argv) {
+  benchmark::Initialize(&argc, argv);
+  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 2;
+  const auto& corpus = quillet::bench::TheCorpus();
+  std::printf("corpus: %s, %zu files, %.1f MB, %zu lines, %zu tokens\n", corpus.folder.c_str(), corpus.files.size(),
+              static_cast<double>(corpus.bytes) / 1e6, corpus.lines, quillet::bench::TokenCount());
+  benchmark::RunSpecifiedBenchmarks();
+  return 0;
+}
