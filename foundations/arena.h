@@ -7,6 +7,7 @@
 #include <cstddef>
 #include <cstring>
 #include <memory>
+#include <utility>
 #include <vector>
 
 #include "foundations/text.h"
@@ -18,20 +19,29 @@ class TextArena {
   TextArena() = default;
   TextArena(const TextArena&) = delete;
   TextArena& operator=(const TextArena&) = delete;
-  TextArena(TextArena&&) = default;
-  TextArena& operator=(TextArena&&) = default;
+  TextArena(TextArena&& other) noexcept { *this = std::move(other); }
+  TextArena& operator=(TextArena&& other) noexcept {
+    next_ = std::exchange(other.next_, nullptr);
+    end_ = std::exchange(other.end_, nullptr);
+    current_ = std::exchange(other.current_, 0);
+    blocks_ = std::exchange(other.blocks_, {});
+    return *this;
+  }
 
   // Bytes without content; valid until Reset or the arena's end.
   char* Allocate(size_t size) {
-    if (size > static_cast<size_t>(end_ - next_)) [[unlikely]] AddBlock(size);
+    if (size > static_cast<size_t>(end_ - next_)) [[unlikely]]
+      AddBlock(size);
     char* result = next_;
     next_ += size;
     return result;
   }
 
+  // Empty text stays apart from none: a copy has data unless the original had none.
   Text Copy(Text text) {
+    if (text.empty()) return IsNone(text) ? kNoText : Text("");
     char* bytes = Allocate(text.size());
-    if (!text.empty()) std::memcpy(bytes, text.data(), text.size());
+    std::memcpy(bytes, text.data(), text.size());
     return {bytes, text.size()};
   }
 
@@ -39,6 +49,7 @@ class TextArena {
 
  private:
   void AddBlock(size_t at_least);
+  void Enter(size_t block);
 
   struct Block {
     std::unique_ptr<char[]> bytes;
@@ -47,7 +58,7 @@ class TextArena {
 
   char* next_ = nullptr;
   char* end_ = nullptr;
-  size_t current_ = 0;  // index of the block in use
+  size_t current_ = 0;  // index of the block in use, where there are any
   std::vector<Block> blocks_;
 };
 

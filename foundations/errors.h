@@ -22,12 +22,12 @@ enum class ErrorKind : uint8_t {
   kAssertionError,
   kOverflowError,
   kNotImplementedError,
-  kOSError,           // a file that cannot be read; the message names it
-  kRuntimeError,      // a walk limit
-  kRecursionError,    // the core's own bound on nesting; a RuntimeError to the host
-  kParseError,        // ParseError below
-  kSyntaxError,       // SyntaxError below
-  kGrammarError,      // a grammar file that is not well formed or not LL(1); a ValueError to the host
+  kOSError,         // a file that cannot be read; the message names it
+  kRuntimeError,    // a walk limit
+  kRecursionError,  // the core's own bound on nesting; a RuntimeError to the host
+  kParseError,      // ParseError below
+  kSyntaxError,     // SyntaxError below
+  kGrammarError,    // a grammar file that is not well formed or not LL(1); a ValueError to the host
 };
 
 class Error : public std::exception {
@@ -50,8 +50,8 @@ struct Context {
   static constexpr int32_t kNoneTag = -2;
   static constexpr int32_t kForeignTag = -3;
 
-  int32_t value = 0;          // token index, line or foreign number
-  int32_t col = kNoneTag;     // column of a position, or a tag
+  int32_t value = 0;       // token index, line or foreign number
+  int32_t col = kNoneTag;  // column of a position, or a tag
 
   static constexpr Context None() { return {}; }
   static constexpr Context Index(int32_t index) { return {index, kIndexTag}; }
@@ -71,12 +71,12 @@ struct Context {
 // attributes; `type` is -1 where there is none.
 class ParseError : public Error {
  public:
-  ParseError(std::string message, int type, Text value, Context context)
+  ParseError(std::string message, int token_type, Text token, Context where)
       : Error(ErrorKind::kParseError, std::move(message)),
-        type(type),
-        has_value(!IsNone(value)),
-        value(value),
-        context(context) {}
+        type(token_type),
+        has_value(!IsNone(token)),
+        value(token),
+        context(where) {}
 
   int type;
   bool has_value;
@@ -88,12 +88,12 @@ class ParseError : public Error {
 // offset in UTF-8 bytes.
 class SyntaxError : public Error {
  public:
-  SyntaxError(std::string message, std::string filename, int64_t lineno, int64_t offset, std::string text)
+  SyntaxError(std::string message, std::string file, int64_t line_from_1, int64_t offset_from_1, std::string line_text)
       : Error(ErrorKind::kSyntaxError, std::move(message)),
-        filename(std::move(filename)),
-        lineno(lineno),
-        offset(offset),
-        text(std::move(text)) {}
+        filename(std::move(file)),
+        lineno(line_from_1),
+        offset(offset_from_1),
+        text(std::move(line_text)) {}
 
   std::string filename;
   int64_t lineno;
@@ -105,7 +105,8 @@ class SyntaxError : public Error {
 [[noreturn]] void ThrowError(ErrorKind kind, std::string message);
 
 inline void Assert(bool condition, const char* message) {
-  if (!condition) [[unlikely]] ThrowError(ErrorKind::kAssertionError, message);
+  if (!condition) [[unlikely]]
+    ThrowError(ErrorKind::kAssertionError, message);
 }
 
 // The name of the host's exception class for a kind, such as "ValueError".
