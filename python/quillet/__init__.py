@@ -1,0 +1,40 @@
+"""Per-statement analysis of Python code: what each statement tells about names.
+
+`analyze` takes a whole source. `quillet.tarvex` is the engine below it, which takes one logical line at
+a time; `quillet.logicalline`, `quillet.optpgen`, `quillet.symbolinfo` and `quillet.strutils` are what it
+works with.
+"""
+
+from __future__ import annotations
+
+from typing import TYPE_CHECKING
+
+if TYPE_CHECKING:
+    from quillet._records import Record, RecordKind
+    from quillet._source import SourceEncodingError
+    from quillet.host import Analysis, Line, analyze, analyzer_for, language_version
+
+__all__ = [
+    "Analysis",
+    "Line",
+    "Record",
+    "RecordKind",
+    "SourceEncodingError",
+    "analyze",
+    "analyzer_for",
+    "language_version",
+]
+
+_HOMES = {"Record": "_records", "RecordKind": "_records", "SourceEncodingError": "_source"}
+
+
+def __getattr__(name: str) -> object:
+    # The engine is loaded when something of it is first used, so that what needs none of it (such as
+    # the command line's --help) starts quickly.
+    if name not in __all__:
+        raise AttributeError(f"module {__name__!r} has no attribute {name!r}")
+    from importlib import import_module
+
+    value = getattr(import_module(f"{__name__}.{_HOMES.get(name, 'host')}"), name)
+    globals()[name] = value
+    return value

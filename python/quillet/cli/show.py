@@ -1,0 +1,84 @@
+"""How the command line writes: safe text, colours, and a source line with a caret under a column.
+
+Source text and file names come from anywhere, so control characters are shown as escapes and never
+reach a terminal. Columns count UTF-8 bytes from 1, as everywhere in the data; the caret is set by the
+width that the text in front of it has on a terminal.
+"""
+
+from __future__ import annotations
+
+import os
+import re
+import sys
+import unicodedata
+
+# Everything that moves a terminal's cursor, changes its state or reverses its text; tabs are kept.
+_UNSAFE = re.compile(r"[\x00-\x08\x0a-\x1f\x7f-\x9f\u061c\u200e\u200f\u2028\u2029\u202a-\u202e\u2066-\u2069\ud800-\udfff]")
+# How much of a long line is shown, in characters: the error stands within it.
+_WINDOW = 160
+
+
+def printable(text: str) -> str:
+    """`text` with control characters as escapes; one line, safe to show."""
+    return _UNSAFE.sub(lambda match: match[0].encode("unicode_escape", "surrogatepass").decode("ascii"), text)
+
+
+class Style:
+    """Colours, or none where the stream is no terminal or NO_COLOR is set."""
+
+    def __init__(self, on: bool) -> None:
+        self._on = on
+
+    @classmethod
+    def of_stdout(cls) -> Style:
+        wanted = not os.environ.get("NO_COLOR") and os.environ.get("TERM") != "dumb"
+        return cls(wanted and sys.stdout.isatty())
+
+    def _wrap(self, code: str, text: str) -> str:
+        return f"\x1b[{code}m{text}\x1b[0m" if self._on and text else text
+
+    def place(self, text: str) -> str:
+        return self._wrap("36", text)
+
+    def name(self, text: str) -> str:
+        return self._wrap("1", text)
+
+    def error(self, text: str) -> str:
+        return self._wrap("1;31", text)
+
+    def faint(self, text: str) -> str:
+        return self._wrap("2", text)
+
+
+def width(text: str) -> int:
+    """The cells that `text` takes on a terminal; it holds no tab."""
+    cells = 0
+    for char in text:
+        if char.isascii():
+            cells += 1
+        elif unicodedata.category(char) not in ("Mn", "Me", "Cf"):
+            cells += 2 if unicodedata.east_asian_width(char) in "WF" else 1
+    return cells
+
+
+def source_and_caret(line: bytes, column: int) -> tuple[str, str]:
+    """A source line and the line under it with a caret at `column` (UTF-8 bytes, from 1).
+
+    A column past the end points behind the last character. Tabs stand in both lines, so that they
+    align whatever a tab's width; of a very long line the part around the column is shown.
+    """
+    before = line[: max(column - 1, 0)].decode("utf-8", "replace")
+    after = line[max(column - 1, 0) :].decode("utf-8", "replace")
+    if len(before) + len(after) > _WINDOW:
+        if len(before) > _WINDOW // 2:
+            before = "…" + before[-(_WINDOW // 2) :]
+        if len(after) > _WINDOW // 2:
+            after = after[: _WINDOW // 2] + "…"
+    before = printable(before)
+    blanks = "".join("\t" if char == "\t" else " " * width(char) for char in before)
+    return before + printable(after), blanks + "^"
+
+
+def shortened(text: str) -> str:
+    """`text`, or its beginning where it is very long."""
+    return text if len(text) <= _WINDOW else text[: _WINDOW - 1] + "…"

@@ -1,0 +1,210 @@
+"""A whole source at once: bytes or text in, its statements and what each says of names out.
+
+The source becomes UTF-8 (`_source`), is cut into logical lines by the core, and each line is analysed
+where it stands. Nothing becomes a Python object of its own before it is read: a `Line` is made when
+`Analysis.lines` is asked for it, its records are decoded when `Line.records` is. An analyzer is
+expensive to build and serves one thread, so each thread keeps one a version.
+"""
+
+from __future__ import annotations
+
+import re
+import sys
+import threading
+from collections.abc import Iterator, Sequence
+from functools import cached_property
+from typing import overload
+
+from quillet._keywords import keywords_of
+from quillet._records import Record, decode_record
+from quillet._source import to_utf8
+from quillet.logicalline import CLogicalLine
+from quillet.tarvex import CPGenAnalyzerImpl, _host, kPy2DefaultGrammar, kPy3DefaultGrammar
+
+_LINE_END = re.compile(rb"\r\n|\r|\n")
+_BOM = b"\xef\xbb\xbf"
+
+# A line as the core cuts it: the record, its first and last physical line (from 0), the width of its
+# indentation, whether it stands in an `async def`, and whether it is the first of a function's body.
+_Row = tuple[CLogicalLine, int, int, int, bool, bool]
+
+
+class _Analyzers(threading.local):
+    def __init__(self) -> None:
+        self.by_version: dict[tuple[int, int], CPGenAnalyzerImpl] = {}
+
+
+_analyzers = _Analyzers()
+
+
+def language_version(version: tuple[int, ...] | None = None) -> tuple[int, int]:
+    """The (major, minor) of a version tuple, and the running interpreter's for None.
+
+    Raises `TypeError` for anything but a tuple of two or three integers, `ValueError` for a version
+    that is neither 2.7 nor 3.x.
+    """
+    if version is None:
+        return sys.version_info[:2]
+    if not isinstance(version, tuple) or not 2 <= len(version) <= 3 or not all(isinstance(n, int) for n in version):
+        raise TypeError(f"version must be a tuple such as (3, 12), not {version!r}")
+    major, minor = version[:2]
+    if (major, minor) != (2, 7) and not (major == 3 and 0 <= minor < 256):
+        raise ValueError(f"version must be (2, 7) or (3, x), not {version!r}")
+    return major, minor
+
+
+def analyzer_for(version: tuple[int, ...] | None = None) -> CPGenAnalyzerImpl:
+    """The calling thread's analyzer for a version, with the grammar and the keywords that belong to it.
+
+    It is built at the first call and kept. Raises as `language_version` does.
+    """
+    key = language_version(version)
+    analyzer = _analyzers.by_version.get(key)
+    if analyzer is None:
+        python_3 = key >= (3, 0)
+        analyzer = CPGenAnalyzerImpl(
+            (*key, 0),
+            grammar_file=kPy3DefaultGrammar if python_3 else kPy2DefaultGrammar,
+            keyword_seq=keywords_of(key),
+            py3_grammar=python_3,
+        )
+        _analyzers.by_version[key] = analyzer
+    return analyzer
+
+
+def analyze(
+    source: bytes | bytearray | memoryview | str, *, version: tuple[int, ...] | None = None
+) -> Analysis:
+    """Analyses a source, statement by statement.
+
+    `source` is the content of a file: bytes, read as their byte order mark or their PEP 263 line says and
+    as UTF-8 without either, or text. `version` is the Python that it is written for, such as (2, 7) or
+    (3, 12); None is the running interpreter's. Both grammars are served by any interpreter.
+
+    Any content is analysed to its end: a bad statement has an `error` and no records, and the others are
+    served. Raises `SourceEncodingError` where the source names an encoding that cannot be used,
+    `TypeError` and `ValueError` for wrong arguments.
+
+    >>> for line in analyze("import os.path as p").lines:
+    ...     for record in line.records:
+    ...         print(record.name, record.kind.value, record.detail)
+    p set 
+    p import os.path
+    p import_as p
+    """
+    language = language_version(version)
+    return Analysis(to_utf8(source), language)
+
+
+class Line:
+    """One logical line: a statement, a statement's head, or a line of comment or nothing.
+
+    `logical` is the core's own record, with the raw (name, info) pairs in `fTypeEquivs` and
+    `fArgTypeEquivs`. `first_line` and `last_line` count physical lines from 1, both inclusive; `indent`
+    is the width of the indentation, tabs to multiples of 8. `in_async_def` and `first_in_def` are what
+    the line was analysed with: whether it stands directly in the body of an `async def`, and whether it
+    is the first of a function's body. `error` is the line's SyntaxError or None; its `lineno` counts
+    from the line's own first line, see `error_position`.
+    """
+
+    __slots__ = ("_records", "error", "first_in_def", "first_line", "in_async_def", "indent", "last_line", "logical")
+
+    def __init__(self, row: _Row, error: SyntaxError | None) -> None:
+        self.logical: CLogicalLine = row[0]
+        self.first_line: int = row[1] + 1
+        self.last_line: int = row[2] + 1
+        self.indent: int = row[3]
+        self.in_async_def: bool = row[4]
+        self.first_in_def: bool = row[5]
+        self.error = error
+        self._records: tuple[Record, ...] | None = None
+
+    @property
+    def records(self) -> tuple[Record, ...]:
+        """What the line says of names, in the order in which it was found; parameters come last."""
+        if self._records is None:
+            found = [decode_record(name, info, False) for name, info in self.logical.fTypeEquivs or ()]
+            found += [decode_record(name, info, True) for name, info in self.logical.fArgTypeEquivs or ()]
+            self._records = tuple(found)
+        return self._records
+
+    @property
+    def error_position(self) -> tuple[int, int] | None:
+        """Where the error lies in the source: (line, column), both from 1, the column in UTF-8 bytes."""
+        if self.error is None:
+            return None
+        return self.first_line + (self.error.lineno or 1) - 1, max(self.error.offset or 1, 1)
+
+    def __repr__(self) -> str:
+        return f"<Line {self.first_line}: {self.logical.fType}>"
+
+
+class _Lines(Sequence[Line]):
+    """Lines that are made when they are asked for, and then kept."""
+
+    def __init__(self, rows: list[_Row], errors: dict[int, SyntaxError]) -> None:
+        self._rows = rows
+        self._errors = errors
+        self._made: dict[int, Line] = {}
+
+    def __len__(self) -> int:
+        return len(self._rows)
+
+    @overload
+    def __getitem__(self, index: int) -> Line: ...
+
+    @overload
+    def __getitem__(self, index: slice) -> Sequence[Line]: ...
+
+    def __getitem__(self, index: int | slice) -> Line | Sequence[Line]:
+        places = range(len(self._rows))[index]
+        if isinstance(places, int):
+            return self._at(places)
+        return [self._at(place) for place in places]
+
+    def __iter__(self) -> Iterator[Line]:
+        return map(self._at, range(len(self._rows)))
+
+    def _at(self, index: int) -> Line:
+        line = self._made.get(index)
+        if line is None:
+            line = self._made[index] = Line(self._rows[index], self._errors.get(index))
+        return line
+
+
+class Analysis:
+    """What `analyze` found in one source. `version` is the (major, minor) that it was read as."""
+
+    def __init__(self, source: bytes, version: tuple[int, int]) -> None:
+        self.version = version
+        self._source = source
+        self._rows: list[_Row] = list(_host.CutSource(source, (*version, 0)))
+        self._errors: dict[int, SyntaxError] = {}
+        analyze_line = analyzer_for(version).AnalyzeSingleLogical
+        for index, (logical, _, _, _, in_async_def, first_in_def) in enumerate(self._rows):
+            error = analyze_line(logical, in_async_def, first_in_def)
+            if error is not None:
+                self._errors[index] = error
+
+    @property
+    def source(self) -> bytes:
+        """The source as UTF-8, which is what positions count in."""
+        return self._source
+
+    @cached_property
+    def lines(self) -> Sequence[Line]:
+        """The logical lines, in order; together they cover the source."""
+        return _Lines(self._rows, self._errors)
+
+    @property
+    def errors(self) -> list[Line]:
+        """The lines that have an error, in order."""
+        return [self.lines[index] for index in self._errors]
+
+    def source_line(self, number: int) -> bytes:
+        """A physical line, counted from 1, as UTF-8 without its end; empty past the last one."""
+        return self._physical[number - 1] if 0 < number <= len(self._physical) else b""
+
+    @cached_property
+    def _physical(self) -> list[bytes]:
+        return _LINE_END.split(self._source.removeprefix(_BOM))
