@@ -85,12 +85,11 @@ def analyze(
     served. Raises `SourceEncodingError` where the source names an encoding that cannot be used,
     `TypeError` and `ValueError` for wrong arguments.
 
-    >>> for line in analyze("import os.path as p").lines:
-    ...     for record in line.records:
-    ...         print(record.name, record.kind.value, record.detail)
-    p set 
-    p import os.path
-    p import_as p
+    >>> for record in analyze("import os.path as p").lines[0].records:
+    ...     print((record.name, record.kind.value, record.detail))
+    ('p', 'set', '')
+    ('p', 'import', 'os.path')
+    ('p', 'import_as', 'p')
     """
     language = language_version(version)
     return Analysis(to_utf8(source), language)
