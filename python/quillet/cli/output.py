@@ -10,7 +10,7 @@ import json
 from typing import Protocol
 
 from quillet._records import describe
-from quillet.cli.show import Style, printable, shortened, source_and_caret, width
+from quillet.cli.show import Style, error_text, printable, statement_text, width
 from quillet.host import Analysis, Line
 
 # The `schema` of the first line; raised where a key changes its meaning or goes.
@@ -41,31 +41,19 @@ class TextWriter:
 
     def file(self, path: str, analysis: Analysis) -> str:
         out: list[str] = []
-        shown_path = printable(path)
         for line in analysis.errors if self._errors_only else analysis.lines:
             if line.error is not None:
-                self._add_error(out, shown_path, analysis, line, line.error)
+                row, column = line.error_position or (line.first_line, 1)
+                out.append(error_text(path, analysis, row, column, line.error.msg, self._style))
             else:
-                self._add_records(out, shown_path, analysis, line)
+                self._add_records(out, path, analysis, line)
         return "".join(out)
-
-    def _add_error(
-        self, out: list[str], path: str, analysis: Analysis, line: Line, error: SyntaxError
-    ) -> None:
-        row, column = line.error_position or (line.first_line, 1)
-        source, caret = source_and_caret(analysis.source_line(row), column)
-        out.append(
-            f"{self._style.place(f'{path}:{row}:{column}:')} {self._style.error(printable(error.msg))}\n"
-            f"    {source}\n    {self._style.error(caret)}\n"
-        )
 
     def _add_records(self, out: list[str], path: str, analysis: Analysis, line: Line) -> None:
         records = line.records
         if not records:
             return
-        source = analysis.source_line(line.first_line).decode("utf-8", "replace").strip()
-        more = " …" if line.last_line > line.first_line else ""
-        out.append(f"{self._style.place(f'{path}:{line.first_line}:')} {shortened(printable(source))}{more}\n")
+        out.append(statement_text(path, analysis, line, self._style))
         for record in records:
             name = printable(record.name)
             blanks = " " * max(_NAME_WIDTH - width(name), 2)

@@ -11,6 +11,10 @@ import os
 import re
 import sys
 import unicodedata
+from typing import TYPE_CHECKING
+
+if TYPE_CHECKING:
+    from quillet.host import Analysis, Line
 
 # Everything that moves a terminal's cursor, changes its state or reverses its text; tabs are kept.
 _UNSAFE = re.compile(r"[\x00-\x08\x0a-\x1f\x7f-\x9f\u061c\u200e\u200f\u2028\u2029\u202a-\u202e\u2066-\u2069\ud800-\udfff]")
@@ -79,6 +83,17 @@ def source_and_caret(line: bytes, column: int) -> tuple[str, str]:
     return before + printable(after), blanks + "^"
 
 
-def shortened(text: str) -> str:
-    """`text`, or its beginning where it is very long."""
-    return text if len(text) <= _WINDOW else text[: _WINDOW - 1] + "…"
+def error_text(path: str, analysis: Analysis, row: int, column: int, message: str, style: Style) -> str:
+    """A syntax error as `path:row:column: message`, with the source line and a caret under it."""
+    source, caret = source_and_caret(analysis.source_line(row), column)
+    place = style.place(f"{printable(path)}:{row}:{column}:")
+    return f"{place} {style.error(printable(message))}\n    {source}\n    {style.error(caret)}\n"
+
+
+def statement_text(path: str, analysis: Analysis, line: Line, style: Style) -> str:
+    """`path:line: statement`, the statement by its first physical line."""
+    source = printable(analysis.source_line(line.first_line).decode("utf-8", "replace").strip())
+    if len(source) > _WINDOW:
+        source = source[: _WINDOW - 1] + "…"
+    more = " …" if line.last_line > line.first_line else ""
+    return f"{style.place(f'{printable(path)}:{line.first_line}:')} {source}{more}\n"
