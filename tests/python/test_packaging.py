@@ -11,6 +11,7 @@ from pathlib import Path
 import pytest
 
 import quillet
+from quillet import cli
 
 PACKAGE = Path(quillet.__file__).parent
 MODULES = [
@@ -59,7 +60,7 @@ def test_types_are_declared() -> None:
 
 def test_the_command_is_installed() -> None:
     scripts = importlib.metadata.entry_points(group="console_scripts", name="quillet")
-    assert [script.value for script in scripts] == ["quillet.cli:main"]
+    assert [script.load() for script in scripts] == [cli.main]
 
 
 def test_every_public_name_is_there() -> None:

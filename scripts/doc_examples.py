@@ -1,0 +1,108 @@
+#!/usr/bin/env python3
+"""Checks that the examples in README.md and docs/ show what the code does, or rewrites them.
+
+An example is a comment that names a view, a block of source and a block of output:
+
+    <!-- example: records 3.12 -->
+    ```python
+    x = 1
+    ```
+    ```text
+    (what the view makes of it)
+    ```
+
+The views: `records` (each record raw and decoded), `tree` (the parse tree), `analyze` (what the command
+line prints; the comment may name a file for it). The version is 3.12 where none is given.
+
+    scripts/doc_examples.py            names the examples that are stale; exit code 1 where there is one
+    scripts/doc_examples.py --write    rewrites them
+"""
+
+from __future__ import annotations
+
+import argparse
+import re
+import sys
+from pathlib import Path
+
+from quillet import Record, analyze
+from quillet._trees import tree_text
+from quillet.cli.output import TextWriter
+from quillet.cli.show import Style
+
+ROOT = Path(__file__).resolve().parent.parent
+EXAMPLE = re.compile(
+    r"(?P<head><!-- example: (?P<view>\w+)(?: (?P<version>\d\.\d+))?(?: (?P<file>\S+))? -->\n"
+    r"```python\n(?P<source>.*?)```\n+```text\n)(?P<output>.*?)(?=```)",
+    re.DOTALL,
+)
+
+
+def documents() -> list[Path]:
+    """The files that may hold examples."""
+    return [ROOT / "README.md", *sorted((ROOT / "docs").glob("*.md"))]
+
+
+def records_view(source: str, version: tuple[int, int], _: str) -> str:
+    """One record a line: name, raw info, kind and detail. Parameters are marked."""
+    rows: list[tuple[str, str, Record]] = []
+    for line in analyze(source, version=version).lines:
+        logical = line.logical
+        raw = [*(logical.fTypeEquivs or ()), *(logical.fArgTypeEquivs or ())]
+        rows += [
+            (name.decode(), info.decode(), record) for (name, info), record in zip(raw, line.records, strict=True)
+        ]
+    widths = [max((len(row[column]) for row in rows), default=0) for column in (0, 1)]
+    out = []
+    for name, info, record in rows:
+        kind = f"{'parameter ' if record.is_parameter else ''}{record.kind.value}"
+        out.append(f"{name:{widths[0]}}  {info:{widths[1]}}  {kind}  {record.detail}".rstrip() + "\n")
+    return "".join(out)
+
+
+def tree_view(source: str, version: tuple[int, int], _: str) -> str:
+    """The trees of all statements."""
+    return "".join(tree_text(line, version) for line in analyze(source, version=version).lines)
+
+
+def analyze_view(source: str, version: tuple[int, int], file: str) -> str:
+    """What `quillet analyze` prints."""
+    return TextWriter(errors_only=False, style=Style(on=False)).file(file, analyze(source, version=version))
+
+
+VIEWS = {"records": records_view, "tree": tree_view, "analyze": analyze_view}
+
+
+def output_of(match: re.Match[str]) -> str:
+    """What the example's output block must hold."""
+    major, minor = (match["version"] or "3.12").split(".")
+    return VIEWS[match["view"]](match["source"], (int(major), int(minor)), match["file"] or "example.py")
+
+
+def stale_examples(path: Path) -> list[str]:
+    """The sources of the examples of a file whose output is not what the code does."""
+    return [
+        match["source"]
+        for match in EXAMPLE.finditer(path.read_text(encoding="utf-8"))
+        if match["output"] != output_of(match)
+    ]
+
+
+def main() -> int:
+    """Runs the command."""
+    parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
+    parser.add_argument("--write", action="store_true", help="rewrite the examples that are stale")
+    write = parser.parse_args().write
+    found = False
+    for path in documents():
+        for source in stale_examples(path):
+            found = True
+            print(f"{path.relative_to(ROOT)}: {'rewritten' if write else 'stale'}: {source.splitlines()[0]}")
+        if write:
+            text = path.read_text(encoding="utf-8")
+            path.write_text(EXAMPLE.sub(lambda match: match["head"] + output_of(match), text), encoding="utf-8")
+    return 1 if found and not write else 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())

@@ -1,0 +1,72 @@
+"""The documents are true: examples show what the code does, links lead somewhere, commands exist."""
+
+from __future__ import annotations
+
+import importlib.util
+import re
+import subprocess
+from pathlib import Path
+from types import ModuleType
+
+import pytest
+
+ROOT = Path(__file__).resolve().parent.parent.parent
+
+
+def load_script(name: str) -> ModuleType:
+    spec = importlib.util.spec_from_file_location(name, ROOT / "scripts" / f"{name}.py")
+    assert spec is not None
+    assert spec.loader is not None
+    module = importlib.util.module_from_spec(spec)
+    spec.loader.exec_module(module)
+    return module
+
+
+doc_examples = load_script("doc_examples")
+DOCUMENTS = doc_examples.documents()
+IDS = [path.name for path in DOCUMENTS]
+
+
+@pytest.mark.parametrize("path", DOCUMENTS, ids=IDS)
+def test_examples_show_what_the_code_does(path: Path) -> None:
+    assert doc_examples.stale_examples(path) == [], "./run docs rewrites them"
+
+
+def test_there_are_examples_of_every_view() -> None:
+    views = {match["view"] for path in DOCUMENTS for match in doc_examples.EXAMPLE.finditer(path.read_text())}
+    assert views == set(doc_examples.VIEWS)
+
+
+def test_no_example_is_overlooked_for_its_form() -> None:
+    for path in DOCUMENTS:
+        text = path.read_text()
+        assert text.count("<!-- example:") == len(doc_examples.EXAMPLE.findall(text)), path.name
+
+
+@pytest.mark.parametrize("path", DOCUMENTS, ids=IDS)
+def test_links_lead_to_files(path: Path) -> None:
+    for target in re.findall(r"\]\(([^)#]+)(?:#[^)]*)?\)", path.read_text()):
+        if "://" not in target:
+            assert (path.parent / target).exists(), f"{path.name} links to {target}"
+
+
+@pytest.mark.parametrize("path", DOCUMENTS, ids=IDS)
+def test_commands_of_the_script_exist(path: Path) -> None:
+    listed = subprocess.run([ROOT / "run", "help"], capture_output=True, text=True, check=True).stdout
+    known = set(re.findall(r"^  (\w+) ", listed, re.MULTILINE))
+    assert set(re.findall(r"\./run (\w+)", path.read_text())) <= known
+
+
+def test_every_record_kind_is_documented() -> None:
+    from quillet import RecordKind
+
+    text = (ROOT / "docs" / "records.md").read_text()
+    assert [kind.value for kind in RecordKind if f"`{kind.value}`" not in text] == []
+
+
+def test_every_prefix_that_the_walkers_write_is_documented() -> None:
+    rows = (ROOT / "siblings/symbolinfo/kinds.def").read_text().split("// What consumers")[0]
+    names = re.findall(r"^QUILLET_INFO_KIND\((\w+),", rows, re.MULTILINE)
+    text = (ROOT / "docs" / "records.md").read_text()
+    assert [name for name in names if f"`k{name}Prefix`" not in text] == []
+    assert len(names) == 13
