@@ -3,8 +3,11 @@
 // The words are soft keywords: each entry point may give null, which sends the line to the regular
 // parser. A pattern is split from the outside in, by searches outside of brackets; the order of the
 // tests decides precedence (patterns.cc). The grammar is approximated: some ill-formed patterns
-// pass. Patterns nested deeper than kMaxPatternDepth are a ParseError at the token that opens the
-// next level.
+// pass. Patterns in more than kMaxPatternDepth brackets are a ParseError at the bracket that opens
+// the next level.
+//
+// Children wait on one shared list until their node is made; what is left on it when a statement
+// ends, in success or not, belongs to no tree and goes back to the pool.
 #pragma once
 
 #include <span>
@@ -28,7 +31,9 @@ class CMatchCaseStatementParser {
   CNode* ParseCaseStmt(TokenSpan toks, const PositionView& positions);
 
   // ---- steps, callable on their own by a host between SetTokens and ClearTokens ----
-  void SetTokens(TokenSpan toks, const PositionView& positions);  // drops comments and continuations
+  // Copies the tokens without comments and continuations. TypeError for a removed token, IndexError
+  // for an empty one.
+  void SetTokens(TokenSpan toks, const PositionView& positions);
   void ClearTokens();
   TokenSpan toks() const { return toks_; }
   std::span<const Position> positions() const { return positions_; }
@@ -45,11 +50,38 @@ class CMatchCaseStatementParser {
   ParseError ParseExceptionAt(int64_t tok_i) const;
 
  private:
+  // One more level of brackets, for as long as it lives; throws at the limit.
+  class Level;
+
+  CNode* ParseStmt(TokenSpan toks, const PositionView& positions, CNode* (CMatchCaseStatementParser::*impl)());
+  const Token& At(int64_t i) const;
+  bool Is(int64_t i, TokenCode code) const { return At(i).code == code; }
+  int64_t FindCode(TokenCode code, int64_t start, int64_t end) const;
+  template <class Matches>
+  int64_t FindNonNested(Matches matches, int64_t start, int64_t end) const;
+  void FindGroupEnds();
+  PositionView SlicePositions(int64_t begin, int64_t end) const;
+
+  void Push(CNode* node) { pending_.push_back(node); }
+  size_t Mark() const { return pending_.size(); }
+  // A node whose children are those pending since the mark.
+  template <class T>
+  CNode* Finish(size_t mark) {
+    CNode* node = factory_->NewBare<T>();
+    factory_->SetChildren(node, std::span<CNode* const>(pending_).subspan(mark));
+    pending_.resize(mark);
+    return node;
+  }
+
   CPGenParserImpl* pgen_parser_;
   CNodeFactory* factory_;
   std::vector<Token> toks_;
   std::vector<Position> positions_;
-  bool has_tokens_ = false;
+  // For a bracket, the next index at which the nesting is again what it is in front of it; the token
+  // count where there is none. A search outside of brackets goes on there.
+  std::vector<int32_t> group_end_;
+  std::vector<int32_t> place_of_depth_;
+  std::vector<CNode*> pending_;
   int depth_ = 0;
 };
 

@@ -11,6 +11,7 @@
 // before a failure is given back here.
 #pragma once
 
+#include <array>
 #include <memory>
 #include <span>
 #include <string>
@@ -32,6 +33,10 @@ inline constexpr const char* kPy3DefaultGrammar = "Python-Grammar-3.8";
 std::span<const Text> Py3Keywords();
 std::span<const Text> Py27Keywords();
 
+// Bounds of type parameters that hold type parameters of their own: a deeper one is a ParseError at
+// its colon.
+inline constexpr int kMaxBoundDepth = 40;
+
 // An engine of the host's, used where a Python subclass overrides `convert`.
 class ExternalEngine {
  public:
@@ -45,7 +50,7 @@ class CPGenParserImpl {
  public:
   struct Options {
     Version version;
-    std::string grammar_file;            // an absolute path: resolving is the caller's
+    std::string grammar_file;  // an absolute path: resolving is the caller's
     std::vector<std::string> keywords;
     bool py3_grammar = true;
     TokenNames token_names = TokenNames::Default();
@@ -68,7 +73,10 @@ class CPGenParserImpl {
     return ParseToksToNodeImpl(toks, in_async_def, nullptr);
   }
   void DiscardNode(CNode* node) { factory_->DiscardNodes(node); }
-  bool ShouldSkipSlash(int64_t tok_i, const PositionView* positions) const;
+  // Feeds each token with the type of its own text and the same context.
+  void AddTokenList(TokenSpan toks, int32_t context);
+  // True for a backslash that continues the line: the next token begins on a later one.
+  static bool ShouldSkipSlash(int64_t tok_i, const PositionView* positions);
 
   // ---- finding (find.cc) ----
   // Index of the first significant token after (before) `tok_i`, toks.size() without one.
@@ -105,6 +113,48 @@ class CPGenParserImpl {
   void set_external_engine(ExternalEngine* engine) { external_engine_ = engine; }
 
  private:
+  // Part of a statement's tokens and the index of its first one: what stands in front of it counts
+  // as removed, without a copy that says so.
+  struct TokenRun {
+    TokenSpan toks;
+    int32_t base = 0;
+
+    int64_t count() const { return static_cast<int64_t>(toks.size()); }
+    int32_t IndexOf(int64_t i) const { return base + static_cast<int32_t>(i); }
+  };
+  // How the engine takes a token, by code; one table where async and await are names, one where
+  // they are keywords. kNoLabel: a token that needs a closer look.
+  struct FeedTable {
+    std::array<Grammar::LabelId, 256> label;
+    std::array<uint8_t, 256> type;
+  };
+  // Copies of token lists for rewriting, kept for reuse; statements nest, so there may be several.
+  struct Scratch {
+    std::vector<std::vector<Token>> buffers;
+    size_t used = 0;
+  };
+  class TokenCopy;
+
+  void BuildFeedTables();
+  CNode* ParseRun(TokenRun run, bool in_async_def, const PositionView& positions);
+  CNode* ParseRunImpl(TokenRun run, bool in_async_def, const PositionView* positions);
+  template <class TokenEngine>
+  CNode* Feed(TokenEngine& engine, TokenRun run, bool async_keyword, const PositionView* positions);
+  template <class TokenEngine>
+  bool FeedUnusual(TokenEngine& engine, TokenRun run, int64_t i, const FeedTable& table, const PositionView* positions);
+  CNode* Unwrap(CNode* root, bool is_decorator);
+
+  CNode* SpecialCases(TokenRun run, bool in_async_def, const PositionView& positions);
+  CNode* ParenthesizedWith(TokenRun run, bool in_async_def, const PositionView& positions, int64_t tok_i);
+  CNode* ExceptStar(TokenRun run, bool in_async_def, const PositionView& positions, int64_t tok_i);
+  CNode* WithTypeParameter(TokenRun run, bool in_async_def, const PositionView& positions, int64_t tok_i);
+  NodeList TypeParameters(TokenRun run, bool in_async_def, const PositionView* positions, int64_t start, int64_t end,
+                          bool raise_errors);
+  CNode* SingleTypeParameter(TokenRun run, bool in_async_def, const PositionView* positions, int64_t start, int64_t end,
+                             bool raise_errors);
+  CNode* TypeParameterBound(TokenRun run, bool in_async_def, const PositionView* positions, int64_t colon_i,
+                            int64_t end, bool raise_errors);
+
   Version version_;
   bool py3_grammar_;
   bool async_always_keyword_;
@@ -115,6 +165,9 @@ class CPGenParserImpl {
   std::unique_ptr<FactoryEngine> engine_;
   ExternalEngine* external_engine_ = nullptr;
   std::unique_ptr<CMatchCaseStatementParser> match_case_parser_;
+  FeedTable feed_tables_[2];
+  Scratch scratch_;
+  int bound_depth_ = 0;
 };
 
 // The class for each state number up to the grammar's last symbol: the written-out table and the
