@@ -26,17 +26,17 @@ inline constexpr int kNodeKindCount = 0
 // For each class its kind and the last kind of its range.
 template <class T>
 struct NodeKindRange;
-#define QUILLET_NODE(name, base)                            \
-  template <>                                               \
-  struct NodeKindRange<name> {                              \
-    static constexpr NodeKind kFirst = NodeKind::k##name;   \
-    static constexpr NodeKind kLast = NodeKind::k##name;    \
+#define QUILLET_NODE(name, base)                          \
+  template <>                                             \
+  struct NodeKindRange<name> {                            \
+    static constexpr NodeKind kFirst = NodeKind::k##name; \
+    static constexpr NodeKind kLast = NodeKind::k##name;  \
   };
-#define QUILLET_NODE_BASE(name, base, last)                 \
-  template <>                                               \
-  struct NodeKindRange<name> {                              \
-    static constexpr NodeKind kFirst = NodeKind::k##name;   \
-    static constexpr NodeKind kLast = NodeKind::k##last;    \
+#define QUILLET_NODE_BASE(name, base, last)               \
+  template <>                                             \
+  struct NodeKindRange<name> {                            \
+    static constexpr NodeKind kFirst = NodeKind::k##name; \
+    static constexpr NodeKind kLast = NodeKind::k##last;  \
   };
 #include "tree/node_kinds.def"
 

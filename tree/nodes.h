@@ -54,14 +54,26 @@
 namespace quillet {
 
 using NodeList = std::vector<CNode*>;
+using NodeSpan = std::span<CNode* const>;
 
 struct CStmt : CNode {};
 
+// Where the sub-expressions of an expression stand, found once for all of them.
+struct SubExprView {
+  const CNode* list = nullptr;  // a CTestListStarExpr or a CListmakerNode that has them
+  CNode* single = nullptr;      // or the one element of a list display
+  int32_t count = 0;
+
+  CNode* At(int32_t index) const;
+};
+
 struct CExpression : CNode {
   // The sub-expressions that can be unpacked, as in `(1, 2)`; null and 0 for any expression that
-  // has none. Dispatches on the kind (CAtom and CTestListStarExpr have their own).
-  CNode* GetSubExpr(int32_t index) const;
-  int32_t GetSubExprCount() const;
+  // has none. They dispatch on the kind (CAtom and CTestListStarExpr have their own). Time is linear
+  // in the nesting of brackets, without recursion; who wants all of them takes the view.
+  CNode* GetSubExpr(int32_t index) const { return GetSubExprView().At(index); }
+  int32_t GetSubExprCount() const { return GetSubExprView().count; }
+  SubExprView GetSubExprView() const;
 };
 
 struct CPatternNode : CNode {};
@@ -71,6 +83,8 @@ struct CPatternNode : CNode {};
 struct CClassdefStmt : CStmt {
   Text GetClassName() const { return GetChildText(1); }
   UsedArgList GetBaseClassList() const;
+  // What stands between the brackets, as GetUsedArgInfoList takes it; null where that list is empty.
+  CNode* GetBaseClassesNode() const;
 };
 struct CFuncdefStmt : CStmt {
   Text GetFunctionName() const { return GetChildText(1); }
@@ -79,22 +93,23 @@ struct CFuncdefStmt : CStmt {
   CNode* GetSuite() const { return LastChild(); }
 };
 struct CIfStmt : CStmt {
-  CNode* GetTestExpression() const;  // TypeError for what is no CExpression
+  // The first test only. TypeError for what is no CExpression.
+  CNode* GetTestExpression() const { return Expect<CExpression>(ChildAt(1)); }
 };
 struct CMatchStmt : CStmt {
-  CNode* GetTestExpression() const;
+  CNode* GetTestExpression() const { return Expect<CExpression>(ChildAt(1)); }
 };
 struct CCaseStmt : CStmt {
   CNode* GetPattern() const { return ChildAt(1); }
   // Child 2 of a node of four children or more: the ":" of `case x: y`, which callers tolerate.
-  CNode* GetGuard() const;
-  CNode* GetBody() const;
+  CNode* GetGuard() const { return child_count >= 4 ? children[2] : nullptr; }
+  CNode* GetBody() const { return ChildAtIs(-1, tok::COLON) ? nullptr : LastChild(); }
 };
 struct CDelStmt : CStmt {
   NodeList GetExpressions() const;
 };
 struct CGlobalStmt : CStmt {
-  std::vector<Text> GetUtf8NameList() const;
+  std::vector<Text> GetUtf8NameList() const;  // none where there are fewer than two children
 };
 struct CNonlocalStmt : CStmt {
   std::vector<Text> GetUtf8NameList() const;
@@ -111,7 +126,11 @@ struct CWithStmt : CStmt {
 };
 struct CPassStmt : CStmt {};
 struct CExprStmt : CStmt {
-  int64_t GetEqualCount() const;
+  int64_t GetEqualCount() const {
+    int64_t count = 0;
+    for (uint32_t i = 0; i < child_count; ++i) count += ChildIs(i, tok::EQUAL);
+    return count;
+  }
   CAnnotatedAssignNode* GetAnnotatedAssignNode() const;
   CNode* GetInitialTestExpr() const { return ChildAt(0); }
   // ValueError "Not enough ='s" past the last one.
@@ -124,34 +143,43 @@ struct CReturnStmt : CStmt {
 };
 struct CWithTypeParameters : CStmt {
   NodeList GetTypeParameters() const;
+  NodeSpan TypeParameterSpan() const { return {children, child_count ? child_count - 1 : 0}; }
   CNode* GetTypeParameterScopedStatement() const { return ChildAt(-1); }
 };
 
 // ---- expressions ----
 
 struct CAtom : CExpression {
-  CNode* GetSubExpr(int32_t index) const;
-  int32_t GetSubExprCount() const;
+  // The count is that of the inside wherever that has one, so `[(1, 2)]` has two and not one.
+  CNode* GetSubExpr(int32_t index) const { return GetSubExprView().At(index); }
+  int32_t GetSubExprCount() const { return GetSubExprView().count; }
+  SubExprView GetSubExprView() const;
   // "(", "[" or "{", or none. ValueError "Atom node with no children".
   Text GetInitialBracket() const;
+  // True for whatever is no comprehension, a sequence of strings too.
   bool IsLiteral() const { return !IsComprehension(); }
+  // A list, dict or set comprehension, and a generator expression as well: no bracket is tested.
   bool IsComprehension() const;
-  bool IsTwoPlusStringLiterals() const;
+  bool IsTwoPlusStringLiterals() const { return isa<CStringLiteral>(Child(0)); }
 };
 struct COperatorExpression : CExpression {
   // Text of operator `i`, "not in" and "is not" joined with a blank; none where there is none. The
   // joined forms are static.
   Text GetOperatorStr(int64_t i) const;
-  int64_t GetTermCount() const;
+  int64_t GetTermCount() const {
+    if (child_count < 2) return 0;
+    return child_count == 2 ? 1 : child_count / 2 + 1;
+  }
   CNode* GetTerm(int64_t i) const;
 };
 struct CIfElseExpression : CExpression {};
 struct CStarExpression : CExpression {
-  CNode* GetStarredExpression() const;  // TypeError for what is no CExpression
+  // TypeError for what is no CExpression.
+  CNode* GetStarredExpression() const { return Expect<CExpression>(ChildAt(1)); }
 };
 struct CDottedName : CExpression {};
 struct CLambdaExpr : CExpression {
-  CNode* GetArgumentsNode() const;
+  CNode* GetArgumentsNode() const { return ChildAtIs(1, tok::COLON) ? nullptr : children[1]; }
   CNode* GetBodyExpr() const { return ChildAt(-1); }
 };
 struct CTestExpr : CExpression {};
@@ -164,8 +192,8 @@ struct CTestListStarExpr : CExpression {
   // fChildren = {}".
   CNode* GetSubExpr(int32_t index) const;
   int32_t GetSubExprCount() const;
-  bool IsTuple() const;
-  bool IsGenExpr() const;
+  bool IsTuple() const { return !IsGenExpr() && HasChildWithCode(tok::COMMA); }
+  bool IsGenExpr() const { return isa<CCompForNode>(Child(1)); }
 };
 struct CNameLiteral : CExpression {};
 struct CKeywordLiteral : CExpression {};
@@ -173,13 +201,17 @@ struct CAtomExpr : CExpression {
   CNode* GetPrefix() const;
   CNode* GetAtom() const;
   NodeList GetTrailers() const;
-  // The same without a list: index of the first trailer, and one past the last.
+  // The same without a list: the index of the first trailer, and a view of all of them.
   uint32_t FirstTrailer() const { return GetPrefix() ? 2 : 1; }
+  NodeSpan TrailerSpan() const { return child_count == 0 ? NodeSpan() : fChildren().subspan(FirstTrailer()); }
 };
 struct CPower : CExpression {
+  // The newer grammar nests the atom in a CAtomExpr, the older holds it directly.
   CNode* GetAtom() const;
   NodeList GetTrailers() const;
-  CNode* GetExponentNode() const;
+  // The same without a list.
+  NodeSpan TrailerSpan() const;
+  CNode* GetExponentNode() const { return HasChildWithCode(tok::DOUBLESTAR) ? LastChild() : nullptr; }
 };
 struct CNumberLiteral : CExpression {
   bool IsFloat() const;
@@ -211,12 +243,18 @@ struct CClassPatternNode : CPatternNode {};
 
 struct CImportNamesStmt : CNode {
   std::vector<CAsName> GetAsNameList() const;
+  // What ForEachAsName goes through.
+  CNode* GetNamesNode() const { return ChildAt(1); }
 };
 struct CFromImportStmt : CNode {
   bool HasFromString() const { return GetImportIndex() >= 2; }
+  // The leaves and names that its text is made of.
+  NodeSpan FromNodes() const;
   std::string GetFromString() const;  // empty where HasFromString is false (the host's None)
   bool GetImportStar() const;
   std::vector<CAsName> GetAsNameList() const;
+  // What ForEachAsName goes through: the names behind `import`, without their brackets.
+  CNode* GetNamesNode() const;
   int32_t GetImportIndex() const;
 };
 struct CSingleUsedArgumentNode : CNode {
@@ -239,6 +277,8 @@ struct CSingleDecorator : CNode {
   CNode* GetDottedName() const { return ChildAt(1); }
   // Empty for `@foo()` and `@foo`.
   UsedArgList GetUsedArgList() const;
+  // What stands between the brackets; null where that list is empty.
+  CNode* GetUsedArgsNode() const;
 };
 struct CMultipleDecorators : CNode {};
 struct CWithItem : CNode {
@@ -259,18 +299,27 @@ struct CYieldArg : CNode {
   bool IsYieldFrom() const;
 };
 struct CCompForNode : CNode {
-  bool IsAsync() const { return ChildIs(0, word::kAsync); }
+  bool IsAsync() const { return ChildAtIs(0, word::kAsync); }
   CNode* GetTargetNode() const;
   CNode* GetInNode() const;
   CNode* GetCompIterNode() const;
+
+ private:
+  // The node itself, or the one nested in it behind `async`; that one is flat.
+  const CCompForNode* Flat() const;
 };
 struct CListmakerNode : CNode {
   int32_t GetSubExprCount() const;
   CNode* GetSubExpr(int32_t index) const;  // TypeError for what is no CExpression
 };
 struct CTrailer : CNode {
-  Text GetDotName() const;
-  CNode* GetNestedNode() const;
+  Text GetDotName() const {
+    if (child_count != 2 || children[0] == nullptr || children[0]->code != tok::DOT) return kNoText;
+    return isa<CNameLiteral>(children[1]) ? children[1]->fText() : kNoText;
+  }
+  CNode* GetNestedNode() const {
+    return child_count == 3 && (ChildIs(0, tok::LSQB) || ChildIs(0, tok::LPAR)) ? children[1] : nullptr;
+  }
   Text GetInitialToken() const;  // ValueError "Trailer node with no children"
 };
 struct CTypeParameter : CNode {
@@ -279,7 +328,17 @@ struct CTypeParameter : CNode {
   CNode* GetSpecNode() const;
 };
 
-#define QUILLET_NODE(name, base)                                                  \
+inline CNode* CAtomExpr::GetPrefix() const {
+  if (child_count < 2) return nullptr;
+  CNode* first = children[0];
+  // `await` in front of a trailer is a plain word.
+  return isa<CKeywordLiteral>(first) && first->code == word::kAwait && !isa<CTrailer>(children[1]) ? first : nullptr;
+}
+inline CAnnotatedAssignNode* CExprStmt::GetAnnotatedAssignNode() const {
+  return dyn_cast<CAnnotatedAssignNode>(ChildAt(1));
+}
+
+#define QUILLET_NODE(name, base)                                                 \
   static_assert(sizeof(name) == sizeof(CNode), "subclasses add accessors only"); \
   static_assert(std::is_trivially_destructible_v<name>);
 #include "tree/node_kinds.def"
