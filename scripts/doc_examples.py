@@ -49,9 +49,7 @@ def records_view(source: str, version: tuple[int, int], _: str) -> str:
     for line in analyze(source, version=version).lines:
         logical = line.logical
         raw = [*(logical.fTypeEquivs or ()), *(logical.fArgTypeEquivs or ())]
-        rows += [
-            (name.decode(), info.decode(), record) for (name, info), record in zip(raw, line.records, strict=True)
-        ]
+        rows += [(name.decode(), info.decode(), record) for (name, info), record in zip(raw, line.records, strict=True)]
     widths = [max((len(row[column]) for row in rows), default=0) for column in (0, 1)]
     out = []
     for name, info, record in rows:

@@ -73,10 +73,8 @@ _SUFFIX = symbolinfo.kClassInstanceSuffix
 
 def decode_record(name: bytes, info: bytes, is_parameter: bool) -> Record:
     """The record of a raw pair. Any bytes are taken; what is no UTF-8 is shown by escapes."""
-    if name.startswith(_ARG_PREFIX):
-        shown = f"<argument {_text(name[_PREFIX_LENGTH:])}>"
-    else:
-        shown = _text(name)
+    by_place = name.startswith(_ARG_PREFIX)
+    shown = f"<argument {_text(name[_PREFIX_LENGTH:])}>" if by_place else _text(name)
     if name == b"yield" and info.startswith(b"from "):
         # What `yield from` yields from is itself an info string behind the word.
         inner = decode_record(name, info[5:], is_parameter)

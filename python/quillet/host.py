@@ -72,9 +72,7 @@ def analyzer_for(version: tuple[int, ...] | None = None) -> CPGenAnalyzerImpl:
     return analyzer
 
 
-def analyze(
-    source: bytes | bytearray | memoryview | str, *, version: tuple[int, ...] | None = None
-) -> Analysis:
+def analyze(source: bytes | bytearray | memoryview | str, *, version: tuple[int, ...] | None = None) -> Analysis:
     """Analyses a source, statement by statement.
 
     `source` is the content of a file: bytes, read as their byte order mark or their PEP 263 line says and

@@ -23,7 +23,6 @@ from dataclasses import dataclass
 from pathlib import Path
 
 from doc_examples import records_view
-
 from quillet import analyze
 from quillet._trees import tree_text
 

@@ -8,9 +8,9 @@ from __future__ import annotations
 import re
 from pathlib import Path
 
-import golden
 import pytest
 
+import golden
 from quillet import RecordKind
 
 ROOT = Path(__file__).resolve().parent.parent.parent

@@ -55,7 +55,8 @@ def test_columns_of_a_decoded_source_count_its_utf8_bytes() -> None:
 
 
 @pytest.mark.parametrize(
-    "first_lines", [b"#!/bin/python\n# vim: set fileencoding=cp1252 :\n", b"\n# coding=cp1252\n", b"# coding: cp1252-unix\n"]
+    "first_lines",
+    [b"#!/bin/python\n# vim: set fileencoding=cp1252 :\n", b"\n# coding=cp1252\n", b"# coding: cp1252-unix\n"],
 )
 def test_the_encoding_is_found_where_python_finds_it(first_lines: bytes) -> None:
     assert names_set(first_lines + b"\x8a = 1\n") == ["Š"]
@@ -114,8 +115,8 @@ def test_any_bytes_are_analysed_to_their_end(source: bytes) -> None:
 
 # Statements and scraps of them, so that most texts come near to Python.
 _SCRAPS = st.sampled_from(
-    ["def f(a, *b):", "class C:", "x = ", "(", ")", "[", "]", "\n", "    ", "\t", "if x:", "return", "'", '"""', "f'{",
-     "}'", "# type: int", "lambda", "match x:", "case [a, *_]:", "async ", "await y", ";", "\\", ":", ",", "@", "=", "é"]
+    ["def f(a, *b):", "class C:", "x = ", "(", ")", "[", "]", "\n", "    ", "\t", "if x:", "return", "'", '"""',
+     "f'{", "}'", "# type: int", "lambda", "match x:", "case [a, *_]:", "async ", "await y", ";", "\\", ":", ",", "@", "=", "é"]
 )  # fmt: skip
 
 
@@ -155,7 +156,9 @@ def test_none_is_the_running_interpreter() -> None:
         ("print = None", (3, 8), (2, 7)),
     ],
 )
-def test_the_version_picks_grammar_and_keywords(source: str, accepts: tuple[int, int], rejects: tuple[int, int]) -> None:
+def test_the_version_picks_grammar_and_keywords(
+    source: str, accepts: tuple[int, int], rejects: tuple[int, int]
+) -> None:
     assert analyze(source, version=accepts).errors == []
     assert len(analyze(source, version=rejects).errors) == 1
 

@@ -18,9 +18,7 @@ class PythonVersion(click.ParamType):
 
     name = "X.Y"
 
-    def convert(
-        self, value: object, param: click.Parameter | None, ctx: click.Context | None
-    ) -> tuple[int, int]:
+    def convert(self, value: object, param: click.Parameter | None, ctx: click.Context | None) -> tuple[int, int]:
         match = re.fullmatch(r"(2\.7|3\.\d{1,2})(?:\.\d{1,4})?", str(value))
         if match is None:
             self.fail(f"{value!r} is not 2.7 or 3.x", param, ctx)

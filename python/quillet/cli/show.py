@@ -17,7 +17,9 @@ if TYPE_CHECKING:
     from quillet.host import Analysis, Line
 
 # Everything that moves a terminal's cursor, changes its state or reverses its text; tabs are kept.
-_UNSAFE = re.compile(r"[\x00-\x08\x0a-\x1f\x7f-\x9f\u061c\u200e\u200f\u2028\u2029\u202a-\u202e\u2066-\u2069\ud800-\udfff]")
+_UNSAFE = re.compile(
+    r"[\x00-\x08\x0a-\x1f\x7f-\x9f\u061c\u200e\u200f\u2028\u2029\u202a-\u202e\u2066-\u2069\ud800-\udfff]"
+)
 # How much of a long line is shown, in characters: the error stands within it.
 _WINDOW = 160
 
@@ -49,9 +51,6 @@ class Style:
 
     def error(self, text: str) -> str:
         return self._wrap("1;31", text)
-
-    def faint(self, text: str) -> str:
-        return self._wrap("2", text)
 
 
 def width(text: str) -> int:
