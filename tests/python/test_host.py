@@ -114,13 +114,13 @@ def test_any_bytes_are_analysed_to_their_end(source: bytes) -> None:
 
 
 # Statements and scraps of them, so that most texts come near to Python.
-_SCRAPS = st.sampled_from(
-    ["def f(a, *b):", "class C:", "x = ", "(", ")", "[", "]", "\n", "    ", "\t", "if x:", "return", "'", '"""',
-     "f'{", "}'", "# type: int", "lambda", "match x:", "case [a, *_]:", "async ", "await y", ";", "\\", ":", ",", "@", "=", "é"]
-)  # fmt: skip
+_SCRAPS = (
+    "def f(a, *b):|class C:|x = |(|)|[|]|\n|    |\t|if x:|return|'|\"\"\"|f'{|}'|# type: int|lambda|match x:|"
+    "case [a, *_]:|async |await y|;|\\|:|,|@|=|é"
+).split("|")
 
 
-@given(st.lists(_SCRAPS, max_size=30), st.sampled_from([(2, 7), (3, 6), (3, 8), (3, 12)]))
+@given(st.lists(st.sampled_from(_SCRAPS), max_size=30), st.sampled_from([(2, 7), (3, 6), (3, 8), (3, 12)]))
 def test_lines_are_in_order_and_errors_lie_in_the_source(scraps: list[str], version: tuple[int, int]) -> None:
     source = "".join(scraps)
     analysis = analyze(source, version=version)
