@@ -223,6 +223,16 @@ def test_a_named_file_is_read_whatever_excludes_it(tmp_path: Path) -> None:
     assert len(jsonl("data.txt", cwd=tmp_path)) == 2
 
 
+def test_a_named_folder_is_read_whatever_excludes_it(tmp_path: Path) -> None:
+    make(
+        tmp_path,
+        {".git/HEAD": "", ".gitignore": "venv\n*.pyi\n", "venv/lib/a.py": "x = 1\n", "venv/lib/b.pyi": "x = 1\n"},
+    )
+    assert files_read(tmp_path) == []
+    assert files_read(tmp_path / "venv") == ["./lib/a.py", "./lib/b.pyi"]
+    assert files_read(tmp_path / "venv" / "lib") == ["./a.py", "./b.pyi"]
+
+
 def test_links_to_folders_are_not_followed(tmp_path: Path) -> None:
     make(tmp_path, {"pkg/a.py": "x = 1\n"})
     (tmp_path / "pkg" / "loop").symlink_to(tmp_path)

@@ -2,8 +2,8 @@
 
 A folder gives its .py, .pyi and .pyw files and those whose first line names Python as interpreter.
 .gitignore files count where git would read them: in the folder, in those below it and in those above
-it up to the root of the repository; the one nearest to a file decides. The repository's own folder
-.git is never entered, a link to a folder never followed.
+it up to the root of the repository; the one nearest to a file decides. An argument is read whatever
+excludes it. The repository's own folder .git is never entered, a link to a folder never followed.
 """
 
 from __future__ import annotations
@@ -102,7 +102,10 @@ def _walk(top: str, gitignore: bool) -> Iterator[Found]:
     # Names are shown as they were given; rules are asked with real paths, since those of the
     # repository may stand above the folder that was named.
     real_top = os.path.realpath(top)
-    pending = [(top, real_top, _ignore_above(real_top) if gitignore else None)]
+    above = _ignore_above(real_top) if gitignore else None
+    if above is not None and above.excludes(real_top, is_folder=True):
+        above = None  # a folder that is named is wanted, whatever excludes it
+    pending = [(top, real_top, above)]
     while pending:
         folder, real_folder, outer = pending.pop()
         try:
