@@ -7,16 +7,22 @@
 // inside sub-expressions. Two limits bound the work, 10000 visits and a depth of 40; reaching one
 // prints a line and drops the reads, and is no error to the caller.
 //
+// Texts on the way to a record are views of the source where they can be. Keep decides: a view of
+// the line's own source stays, anything else is copied to where the line's records live.
+//
 // The walker is reused for walk after walk and holds nothing in between but its options.
 #pragma once
 
 #include <cstdint>
+#include <deque>
 #include <span>
 #include <string>
 #include <vector>
 
+#include "foundations/arena.h"
 #include "siblings/logicalline/logical_line.h"
 #include "text/node_to_text.h"
+#include "tree/arg_info.h"
 #include "tree/nodes.h"
 #include "walker/name_set.h"
 
@@ -24,20 +30,35 @@ namespace quillet {
 
 class CNodeWalker {
  public:
+  // A target nested deeper in brackets than this is a RecursionError.
+  static constexpr int kMaxTargetDepth = 400;
+  // The same for a pattern; that of the pattern parser is smaller.
+  static constexpr int kMaxPatternDepth = 400;
+  // Records of one statement may take this much memory for text that is no view of the source, and
+  // kComposedPerSourceByte times its source beside that. Only statements made to do harm come near
+  // it: ten thousand names unpacked from a value of a megabyte would take ten gigabytes. More is a
+  // RuntimeError.
+  static constexpr size_t kMaxComposedSize = size_t{64} << 20;
+  static constexpr size_t kComposedPerSourceByte = 8;
+
   explicit CNodeWalker(Version version);
 
-  // Null `node`: nothing happens. SyntaxError for code that parses but is not valid.
+  // Null `node`: nothing happens. SyntaxError for code that parses but is not valid. ValueError while
+  // a walk is running.
   void Walk(CNode* node, LogicalLine* logical);
 
   // ---- frame (walker.cc, dispatch.cc) ----
   void ProcessNamesFound(CNode* node);
   void VisitChildren(CNode* node);
   void VisitNode(CNode* node);
+  // ValueError unless the node is of the class or of one derived from it.
+  void RaiseIfNotInstance(const CNode* node, NodeKind cls) const;
 
   // ---- names (names.cc) ----
   void VisitStoreContextNode(CNode* node, bool within_sub_expr = false);
   void VisitLoadContextNode(CNode* node);
   void VisitCompForNode(CCompForNode* node);
+  // One name, alone (`has_trailers` false) or as the link of a chain behind `trailer_i` trailers.
   void VisitNameLiteral(CNode* node, CNode* atom_node, std::span<CNode* const> all_trailers, int64_t trailer_i,
                         bool has_trailers);
   void VisitDottedName(CDottedName* node);
@@ -66,25 +87,27 @@ class CNodeWalker {
   void VisitAssignment(CExprStmt* node);
   void VisitAugAssign(CExprStmt* node);
   void VisitAnnotatedAssign(CExprStmt* node);
-  // `extra_trailer` none, or the subscripts to apply to the value.
+  // `extra_trailer` none, or the subscripts to apply to the value. A null `rhs` is an unknown value.
   void ProcessTargets(CNode* lhs, CNode* rhs, Text extra_trailer = kNoText);
   void VisitForStmt(CForStmt* node);
   void VisitWithItem(CWithItem* node);
   void VisitExceptClause(CExceptClause* node);
+  // AssertionError for a node that is neither a CNamedExpr nor a CSingleUsedArgumentNode.
   void VisitNamedExpr(CNode* node);
 
   // ---- calls, returns, yields (calls.cc) ----
   void VisitCall(CNode* atom, std::span<CNode* const> prev_trailers, CNode* arglist);
+  // `func_name` none: the callee is no dotted name.
   void ProcessFunctionCall(Text func_name, const UsedArgList& arg_list);
   void ProcessIsInstanceCall(const UsedArgList& arg_list);
   void VisitReturn(CReturnStmt* node);
   void VisitYield(CYieldExpr* node);
 
   // ---- equivalents (equivs.cc) ----
-  // None where nothing is known. The text is static, a view of the source, or stands in the
-  // walker's buffer until its next call.
+  // None where nothing is known. The text is a view, or stands in a buffer of the walker or of
+  // fToText until the next call of either.
   Text TypeEquivForNode(CNode* node, Text extra_trailer = kNoText);
-  Text TypeEquivForOperatorExpression(CNode* node);
+  Text TypeEquivForOperatorExpression(COperatorExpression* node);
   void AppendEquivNode(CNode* name_node, CNode* equiv_node, Text extra_trailer = kNoText);
   void AppendSubscriptedEquivNode(CNode* name_node, CNode* equiv_node, int64_t subscript);
   void AddNodeInfoStr(CNode* name_node, Text istr);
@@ -96,6 +119,7 @@ class CNodeWalker {
   void VisitTypeParameter(CTypeParameter* node);
 
   // ---- recorders (walker.cc) ----
+  // Any texts. AttributeError outside of a walk.
   void AddTypeEquiv(Text name, Text equiv);
   void AddArgInfoBytes(Text name, Text info);
   void AddNameDefined(Text name);
@@ -118,8 +142,70 @@ class CNodeWalker {
   StoreList fStoredNames;
 
  private:
-  std::string equiv_buffer_;
-  std::string name_buffer_;
+  // Counts one call of VisitNode and checks both limits for it.
+  void CountVisit();
+  void EndWalk();
+  LogicalLine& RequireLogical() const;
+  static bool IsUnnamedLeaf(const CNode* node);
+
+  // ---- texts that records refer to ----
+  bool InSource(Text text) const {
+    return static_cast<size_t>(text.data() - source_begin_) <= source_size_ && source_begin_ != nullptr;
+  }
+  // The text itself where it is a view of the line's source; else a copy that lasts as long as the
+  // line's records.
+  Text Keep(Text text) { return InSource(text) ? text : KeepCopy(text); }
+  Text KeepCopy(Text text);
+  // Where such copies go: to the line, or, where a host's hooks take the records, to the walker.
+  TextArena& Texts() { return fLogical != nullptr && fLogical->hooks == nullptr ? fLogical->texts() : own_texts_; }
+  void CountComposed(size_t size);
+  // For texts that Keep gave, or that are static.
+  void AddStableTypeEquiv(Text name, Text equiv);
+  // Records that the kept name is defined.
+  void AddKeptNameDefined(Text name);
+
+  // ---- names ----
+  // Whether the leaf is a name and none of the three constants.
+  static bool IsName(const CNode* node);
+  // A name met in the current context. `more`: another link of a chain follows. `lasting`: the text
+  // is one that Keep gave. The text of a read comes back as it is kept; `previous` is that of the
+  // chain's link in front.
+  Text ProcessName(const CNode* node, Text text, bool more, bool lasting, Text previous = kNoText);
+  Text AddLoadedName(Text name, bool lasting, Text previous);
+  void AddStoredName(const CNode* node, Text text, bool lasting);
+  class Chain;
+
+  // ---- assignments ----
+  void ProcessTargetsAtDepth(CNode* lhs, CNode* rhs, bool has_trailer, std::string& trailer, int depth);
+  void ProcessStarredTarget(CStarExpression* target);
+
+  // ---- calls ----
+  class ReusedArgList;
+  void ProcessCallOf(Text func_name, CNode* arglist);
+  // The texts of the classes in the second argument of isinstance or behind `except`: one dotted
+  // name or those of a tuple.
+  template <class Function>
+  void ForEachClassText(CNode* node, Function&& function);
+  // The info text of an instance, valid until the next use of scratch_.
+  Text InstanceNameForClass(Text cls_name);
+
+  // ---- equivalents ----
+  Text EquivForAtom(CAtom* atom, Text extra_trailer);
+  Text LiteralInfo(Text cls_name, Text literal);
+  Text StringInstanceName(const CStringLiteral* node) const;
+  Text WithTrailer(Text text, Text extra_trailer);
+
+  void VisitPatternAtDepth(CNode* node, int depth);
+
+  const char* source_begin_ = nullptr;  // of the line's source, during a walk
+  size_t source_size_ = 0;
+  size_t composed_size_ = 0;
+  TextArena own_texts_;
+
+  std::string equiv_buffer_;           // what TypeEquivForNode composes
+  std::string scratch_;                // an info text on its way to its record
+  std::deque<UsedArgList> arg_lists_;  // by nesting of calls
+  size_t arg_lists_used_ = 0;
 };
 
 }  // namespace quillet

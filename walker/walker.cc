@@ -1,0 +1,147 @@
+// The frame of a walk: one entry, the flush of the collected names, the recorders.
+//
+// Whatever leaves a walk, it leaves the walker idle. A limit that is reached, or any other
+// RuntimeError, is printed and otherwise counts as success; what was recorded stays, while the reads
+// and the stores inside sub-expressions, which are recorded at the end, are dropped.
+
+#include "walker/walker.h"
+
+#include <charconv>
+#include <exception>
+
+#include "foundations/console.h"
+#include "siblings/symbolinfo/symbolinfo.h"
+
+namespace quillet {
+namespace {
+
+// The kinds that are RuntimeErrors to the host, subclasses included.
+bool IsRuntimeError(const Error& error) {
+  return error.kind() == ErrorKind::kRuntimeError || error.kind() == ErrorKind::kRecursionError ||
+         error.kind() == ErrorKind::kNotImplementedError;
+}
+
+}  // namespace
+
+CNodeWalker::CNodeWalker(Version version)
+    : fPy3(version.AtLeast(3, 0)), fToText(fIncludeExprText, fIncludeExprText, fIncludeExprText) {}
+
+void CNodeWalker::Walk(CNode* node, LogicalLine* logical) {
+  if (fLogical != nullptr) ThrowError(ErrorKind::kValueError, "Only one logical may be walked at a time");
+  if (node == nullptr) return;
+  fLogical = logical;
+  fLoadNameContext = true;
+  fStoreWithinSubExpr = false;
+  if (const SourceText* source = logical != nullptr ? logical->source.get() : nullptr) {
+    source_begin_ = source->begin();
+    source_size_ = source->size();
+  }
+
+  struct AtEnd {
+    CNodeWalker& walker;
+    ~AtEnd() { walker.EndWalk(); }
+  } at_end{*this};
+  try {
+    VisitNode(node);
+    ProcessNamesFound(node);
+  } catch (const Error& error) {
+    if (!IsRuntimeError(error)) throw;
+    PrintLine("RuntimeError raised in CNodeWalker.Walk: " + ReprOfException(std::current_exception()));
+  }
+}
+
+void CNodeWalker::EndWalk() {
+  fLogical = nullptr;
+  fVisitCount = 0;
+  fRecurseCount = 0;
+  fLoadedNames.Clear();
+  fStoredNames.Clear();
+  source_begin_ = nullptr;
+  source_size_ = 0;
+  if (composed_size_ != 0) {
+    composed_size_ = 0;
+    own_texts_.Reset();
+  }
+}
+
+LogicalLine& CNodeWalker::RequireLogical() const {
+  if (fLogical == nullptr) [[unlikely]]
+    ThrowNoAttribute("AppendTypeEquiv");
+  return *fLogical;
+}
+
+void CNodeWalker::ProcessNamesFound(CNode* node) {
+  // What an import names is defined by its visit and must not read as a use.
+  if (isa<CImportNamesStmt>(node) || isa<CFromImportStmt>(node)) return;
+  for (const Text name : fLoadedNames.names()) {
+    Assert(!IsNone(name), "a name that was read has no text");
+    AddStableTypeEquiv(name, kGetPrefix);
+  }
+  for (size_t i = 0; i < fStoredNames.names().size(); ++i) {
+    const Text name = fStoredNames.names()[i];
+    Assert(!IsNone(name), "a name that was stored has no text");
+    const StoreList::Store* store = &fStoredNames.first(i);
+    while (true) {
+      constexpr size_t kMaxDigits = 11;
+      CountComposed(kPrefixLen + kMaxDigits);
+      char* const info = Texts().Allocate(kPrefixLen + kMaxDigits);
+      kWithinExprPrefix.copy(info, kPrefixLen);
+      const char* end = std::to_chars(info + kPrefixLen, info + kPrefixLen + kMaxDigits, store->place).ptr;
+      AddStableTypeEquiv(name, {info, static_cast<size_t>(end - info)});
+      if (store->next == StoreList::kEnd) break;
+      store = &fStoredNames.at(store->next);
+    }
+  }
+}
+
+void CNodeWalker::RaiseIfNotInstance(const CNode* node, NodeKind cls) const {
+  for (NodeKind kind = node != nullptr ? node->kind : NodeKind::kCNode;; kind = BaseOfNodeKind(kind)) {
+    if (node != nullptr && kind == cls) return;
+    if (kind == NodeKind::kCNode) break;
+  }
+  ThrowError(ErrorKind::kValueError, std::string("Node is not a <class 'quillet.tarvex.") + NameOfNodeKind(cls) +
+                                         "'>: " + (node != nullptr ? ReprOfNode(node) : "None"));
+}
+
+// ---- texts that records refer to ----
+
+Text CNodeWalker::KeepCopy(Text text) {
+  CountComposed(text.size());
+  return Texts().Copy(text);
+}
+
+void CNodeWalker::CountComposed(size_t size) {
+  // One more than the size: also an empty text makes the arena one to be reset.
+  composed_size_ += size + 1;
+  if (composed_size_ > kMaxComposedSize + kComposedPerSourceByte * source_size_) [[unlikely]] {
+    ThrowError(ErrorKind::kRuntimeError, "Maximum size of the texts of a statement exceeded");
+  }
+}
+
+// ---- recorders ----
+
+void CNodeWalker::AddStableTypeEquiv(Text name, Text equiv) { RequireLogical().AppendStableTypeEquiv(name, equiv); }
+
+void CNodeWalker::AddKeptNameDefined(Text name) { AddStableTypeEquiv(name, kSetPrefix); }
+
+void CNodeWalker::AddTypeEquiv(Text name, Text equiv) {
+  LogicalLine& logical = RequireLogical();
+  logical.AppendStableTypeEquiv(Keep(name), Keep(equiv));
+}
+
+void CNodeWalker::AddArgInfoBytes(Text name, Text info) {
+  LogicalLine& logical = RequireLogical();
+  logical.AppendStableArgTypeEquiv(Keep(name), Keep(info));
+}
+
+void CNodeWalker::AddNameDefined(Text name) {
+  LogicalLine& logical = RequireLogical();
+  logical.AppendStableTypeEquiv(Keep(name), kSetPrefix);
+}
+
+void CNodeWalker::AddArgNameDefined(Text name) {
+  LogicalLine& logical = RequireLogical();
+  logical.AppendStableArgTypeEquiv(Keep(name), kSetPrefix);
+}
+
+}  // namespace quillet
