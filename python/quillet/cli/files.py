@@ -10,7 +10,6 @@ from __future__ import annotations
 
 import os
 import re
-import stat
 from collections.abc import Iterator
 from typing import TYPE_CHECKING
 
@@ -133,12 +132,10 @@ def _walk(top: str, gitignore: bool) -> Iterator[Found]:
 
 
 def _is_python(entry: os.DirEntry[str]) -> bool:
-    try:
-        if not stat.S_ISREG(entry.stat().st_mode):
-            return False
-    except OSError:
-        # A link to nothing: a reader should hear of it where its name says that it is Python.
-        return entry.name.endswith(_SUFFIXES)
+    if not entry.is_file():
+        # A link to nothing: a reader should hear of it where its name says that it is Python. Anything
+        # else (a pipe, a device) is no file of a folder's source.
+        return entry.is_symlink() and not os.path.exists(entry.path) and entry.name.endswith(_SUFFIXES)
     if entry.name.endswith(_SUFFIXES):
         return True
     if "." in entry.name:
