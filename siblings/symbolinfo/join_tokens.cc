@@ -76,22 +76,31 @@ bool CanBeUnary(TokenCode code) {
          code == tok::DOUBLESTAR || code == tok::AT;
 }
 
-Edge EdgeOfByte(char byte) {
-  if (IsIdentifierByte(byte) || IsQuoteByte(byte)) return Edge::kValue;
-  if (IsSpaceByte(byte)) return Edge::kBlank;
-  return kEdgeOfCode[CodeOfText({&byte, 1})];
-}
-
 // One end of an item.
 struct Side {
   Edge edge = Edge::kNone;
   TokenCode code = kNoSingleToken;  // where the token at this end is known
 };
 
+// What a byte at the end of an item says of the token there.
+Side SideOfByte(char byte) {
+  if (IsIdentifierByte(byte) || IsQuoteByte(byte)) return {Edge::kValue};
+  if (IsSpaceByte(byte)) return {Edge::kBlank};
+  const TokenCode code = CodeOfText({&byte, 1});
+  return {kEdgeOfCode[code], code};
+}
+
 Side FirstSide(Text item) {
   if (item[0] == '.' && item.size() > 1 && IsDigitByte(item[1])) return {Edge::kValue};
   if (item.starts_with("...")) return {Edge::kValue};
-  return {EdgeOfByte(item[0])};
+  return SideOfByte(item[0]);
+}
+
+// Where the identifier bytes at the end begin.
+size_t StartOfLastRun(Text item) {
+  size_t start = item.size();
+  while (start > 0 && IsIdentifierByte(item[start - 1])) --start;
+  return start;
 }
 
 Side LastSide(Text item) {
@@ -100,9 +109,8 @@ Side LastSide(Text item) {
     const bool number = item.size() > 1 && IsDigitByte(item[item.size() - 2]);
     return {number || item.ends_with("...") ? Edge::kValue : Edge::kDot};
   }
-  if (!IsIdentifierByte(last)) return {EdgeOfByte(last)};
-  size_t start = item.size();
-  while (start > 0 && IsIdentifierByte(item[start - 1])) --start;
+  if (!IsIdentifierByte(last)) return SideOfByte(last);
+  const size_t start = StartOfLastRun(item);
   const TokenCode code = CodeOfName(item.data() + start, item.size() - start);
   return {kEdgeOfCode[code], code};
 }
@@ -113,11 +121,11 @@ bool IsOperatorText(const char* bytes, size_t size) {
   return code >= tok::LPAR && code <= tok::COLONEQUAL;
 }
 
-// The last run of identifier bytes begins with a digit, so it may be (part of) a number.
-bool EndsLikeNumber(Text item) {
-  size_t start = item.size();
-  while (start > 0 && IsIdentifierByte(item[start - 1])) --start;
-  return start < item.size() && IsDigitByte(item[start]);
+// Whether a "." may go on with what stands at the end: the last run of identifier bytes begins with
+// a digit, and is not itself a fraction.
+bool EndsLikeInteger(Text item) {
+  const size_t start = StartOfLastRun(item);
+  return start < item.size() && IsDigitByte(item[start]) && (start == 0 || item[start - 1] != '.');
 }
 
 // Whether the edges of two items read differently when they touch.
@@ -126,7 +134,7 @@ bool GrowTogether(Text before, Text after) {
   const char first = after[0];
   const auto ends_in_token = [](char byte) { return IsIdentifierByte(byte) || IsQuoteByte(byte); };
   if (ends_in_token(last) && ends_in_token(first)) return true;
-  if (first == '.') return last == '.' || EndsLikeNumber(before);
+  if (first == '.') return last == '.' || EndsLikeInteger(before);
   if (last == '.') {
     // A dot begins a number, or is the end of one that letters would go on.
     return IsDigitByte(first) || (before.size() > 1 && IsDigitByte(before[before.size() - 2]));
@@ -276,7 +284,7 @@ class Joiner {
         at = FindStringEndNonNested(item.data(), at, size);
         continue;
       }
-      const Edge edge = IsIdentifierByte(byte) ? Edge::kValue : EdgeOfByte(byte);
+      const Edge edge = SideOfByte(byte).edge;
       if (edge == Edge::kOpen) ++depth;
       if (edge == Edge::kClose) --depth;
       ++at;
