@@ -16,47 +16,8 @@
 namespace quillet {
 namespace {
 
+// What takes part in unpacking, on either side.
 bool IsSequence(const CNode* node) { return isa<CTestListStarExpr>(node) || isa<CAtom>(node); }
-
-// The sub-expressions of a target or a value. A sequence that is alone in brackets unpacks as what
-// is in the brackets does; looking through them once keeps deep brackets cheap.
-class SubExprs {
- public:
-  explicit SubExprs(CNode* node) {
-    if (auto* list = dyn_cast<CTestListStarExpr>(node)) {
-      Set(list, list->GetSubExprCount());
-      return;
-    }
-    // An atom alone in brackets counts what the atom counts, or, where that is nothing, one in square
-    // brackets and none in round ones. So the innermost atom decides, and, where it has nothing, the
-    // innermost square brackets around it.
-    auto* atom = cast<CAtom>(node);
-    CAtom* in_square_brackets = nullptr;
-    while (atom->child_count == 3 && isa<CAtom>(atom->children[1]) &&
-           (atom->ChildIs(0, tok::LPAR) || atom->ChildIs(0, tok::LSQB))) {
-      if (atom->ChildIs(0, tok::LSQB)) in_square_brackets = atom;
-      atom = cast<CAtom>(atom->children[1]);
-    }
-    Set(atom, atom->GetSubExprCount());
-    if (count_ == 0 && in_square_brackets != nullptr) {
-      count_ = 1;
-      only_ = in_square_brackets->children[1];
-    }
-  }
-
-  int32_t count() const { return count_; }
-  CNode* operator[](int32_t i) const { return only_ != nullptr ? only_ : list_->GetSubExpr(i); }
-
- private:
-  void Set(CExpression* list, int32_t count) {
-    list_ = list;
-    count_ = count;
-  }
-
-  CExpression* list_ = nullptr;
-  CNode* only_ = nullptr;
-  int32_t count_ = 0;
-};
 
 void AppendSubscript(int32_t index, std::string& trailer) {
   char digits[12];
@@ -118,13 +79,12 @@ void CNodeWalker::ProcessTargetsAtDepth(CNode* lhs, CNode* rhs, bool has_trailer
   if (depth >= kMaxTargetDepth) {
     ThrowError(ErrorKind::kRecursionError, "maximum recursion depth exceeded while unpacking a target");
   }
-  const SubExprs targets(lhs);
-  const bool pairs = !has_trailer && IsSequence(rhs) && targets.count() > 0;
-  const SubExprs values(pairs ? rhs : lhs);
+  const SubExprView targets = cast<CExpression>(lhs)->GetSubExprView();
+  const SubExprView values = !has_trailer && IsSequence(rhs) ? cast<CExpression>(rhs)->GetSubExprView() : SubExprView();
   const size_t trailer_size = trailer.size();
-  for (int32_t i = 0; i < targets.count(); ++i) {
-    CNode* const value = pairs && i < values.count() ? values[i] : nullptr;
-    CNode* const target = targets[i];
+  for (int32_t i = 0; i < targets.count; ++i) {
+    CNode* const value = i < values.count ? values.At(i) : nullptr;
+    CNode* const target = targets.At(i);
     if (auto* starred = dyn_cast<CStarExpression>(target)) {
       ProcessStarredTarget(starred);
     } else if (value != nullptr) {

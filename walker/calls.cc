@@ -12,31 +12,13 @@
 
 namespace quillet {
 
-// The argument list of one call, out of a stack of lists that keep their memory.
-class CNodeWalker::ReusedArgList {
- public:
-  explicit ReusedArgList(CNodeWalker& walker) : walker_(walker) {
-    if (walker.arg_lists_used_ == walker.arg_lists_.size()) walker.arg_lists_.emplace_back();
-    list_ = &walker.arg_lists_[walker.arg_lists_used_++];
-  }
-  ~ReusedArgList() { --walker_.arg_lists_used_; }
-  ReusedArgList(const ReusedArgList&) = delete;
-  ReusedArgList& operator=(const ReusedArgList&) = delete;
-
-  UsedArgList& operator*() const { return *list_; }
-
- private:
-  CNodeWalker& walker_;
-  UsedArgList* list_;
-};
-
 void CNodeWalker::VisitCall(CNode* atom, std::span<CNode* const> prev_trailers, CNode* arglist) {
   const Text name = fToText.TextForAtomPlusTrailers(atom, prev_trailers, {.dotted_name_only = true});
   ProcessCallOf(IsNone(name) ? kNoText : Keep(name), arglist);
 }
 
 void CNodeWalker::ProcessCallOf(Text func_name, CNode* arglist) {
-  const ReusedArgList list(*this);
+  const ListStack<UsedArgList>::Lease list(used_lists_);
   GetUsedArgInfoList(arglist, *list);
   ProcessFunctionCall(func_name, *list);
 }

@@ -8,39 +8,66 @@
 
 namespace quillet {
 
-void CNodeWalker::VisitImportNames(CImportNamesStmt* node) {
-  for (const CAsName& item : node->GetAsNameList()) {
-    const Text bound = item.has_as_name ? Text(item.as_name) : Text(item.module_name);
-    const size_t dot = bound.find('.');
-    const Text name = Keep(bound.substr(0, dot));
-    AddKeptNameDefined(name);
-    scratch_.assign(kImportPrefix).append(dot == Text::npos ? Text(item.module_name) : name);
-    AddTypeEquiv(name, scratch_);
-    if (item.has_as_name) {
-      scratch_.assign(kImportAsNamePrefix).append(item.as_name);
-      AddTypeEquiv(name, scratch_);
+// The dotted text of an imported name, kept: a view where its tokens stand side by side.
+Text CNodeWalker::ImportedName(CNode* module) {
+  if (module == nullptr) ThrowNoAttribute("fText");
+  if (module->IsLeaf()) return Keep(module->fText());
+  if (isa<CDottedName>(module) && module->child_count > 0) {
+    bool side_by_side = true;
+    for (uint32_t i = 0; i < module->child_count; ++i) {
+      const CNode* child = module->children[i];
+      side_by_side = side_by_side && child != nullptr && child->IsLeaf() &&
+                     (i == 0 || child->text == module->children[i - 1]->text + module->children[i - 1]->text_length);
+    }
+    if (side_by_side) {
+      const CNode* last = module->LastChild();
+      const char* begin = module->children[0]->text;
+      return Keep({begin, static_cast<size_t>(last->text + last->text_length - begin)});
     }
   }
+  name_buffer_.clear();
+  AppendTextForImportName({&module, 1}, name_buffer_);
+  return Keep(name_buffer_);
+}
+
+void CNodeWalker::AddImportAsName(Text name) {
+  scratch_.assign(kImportAsNamePrefix).append(name);
+  AddStableTypeEquiv(name, Keep(scratch_));
+}
+
+void CNodeWalker::VisitImportNames(CImportNamesStmt* node) {
+  ForEachAsName(node->GetNamesNode(), [this](const AsNameParts& parts) {
+    const Text module = ImportedName(parts.module);
+    const bool has_as_name = !IsNone(parts.as_name);
+    const Text bound = has_as_name ? Keep(parts.as_name) : module;
+    const size_t dot = bound.find('.');
+    const Text name = bound.substr(0, dot);
+    AddKeptNameDefined(name);
+    scratch_.assign(kImportPrefix).append(dot == Text::npos ? module : name);
+    AddStableTypeEquiv(name, Keep(scratch_));
+    if (has_as_name) AddImportAsName(name);
+  });
 }
 
 void CNodeWalker::VisitFromImport(CFromImportStmt* node) {
-  scratch_.assign(kFromImportPrefix).append(node->GetFromString()).append(" ");
-  const size_t from_size = scratch_.size();
+  std::string& from = equiv_buffer_;
+  from.assign(kFromImportPrefix);
+  AppendTextForImportName(node->FromNodes(), from);
+  from.append(" ");
   if (node->GetImportStar()) {
     // Which names are bound is not known here.
-    scratch_.append("*");
-    AddTypeEquiv("*", scratch_);
-    return;
+    from.append("*");
+    return AddStableTypeEquiv("*", Keep(from));
   }
-  std::string as_info;
-  for (const CAsName& item : node->GetAsNameList()) {
-    const Text name = Keep(item.has_as_name ? item.as_name : item.module_name);
+  ForEachAsName(node->GetNamesNode(), [&](const AsNameParts& parts) {
+    const Text imported = ImportedName(parts.module);
+    const bool has_as_name = !IsNone(parts.as_name);
+    const Text name = has_as_name ? Keep(parts.as_name) : imported;
     AddKeptNameDefined(name);
-    scratch_.resize(from_size);
-    scratch_.append(item.module_name);
-    AddTypeEquiv(name, scratch_);
-    if (item.has_as_name) AddTypeEquiv(name, as_info.assign(kImportAsNamePrefix).append(name));
-  }
+    scratch_.assign(from).append(imported);
+    AddStableTypeEquiv(name, Keep(scratch_));
+    if (has_as_name) AddImportAsName(name);
+  });
 }
 
 }  // namespace quillet

@@ -14,7 +14,6 @@
 #pragma once
 
 #include <cstdint>
-#include <deque>
 #include <span>
 #include <string>
 #include <vector>
@@ -24,6 +23,7 @@
 #include "text/node_to_text.h"
 #include "tree/arg_info.h"
 #include "tree/nodes.h"
+#include "walker/list_stack.h"
 #include "walker/name_set.h"
 
 namespace quillet {
@@ -175,12 +175,19 @@ class CNodeWalker {
   void AddStoredName(const CNode* node, Text text, bool lasting);
   class Chain;
 
+  // ---- imports ----
+  Text ImportedName(CNode* module);
+  void AddImportAsName(Text name);
+
+  // ---- definitions ----
+  void ProcessDefiningArg(const CArgInfo& arg);
+  void ProcessLambdaDefiningArg(const CArgInfo& arg);
+
   // ---- assignments ----
   void ProcessTargetsAtDepth(CNode* lhs, CNode* rhs, bool has_trailer, std::string& trailer, int depth);
   void ProcessStarredTarget(CStarExpression* target);
 
   // ---- calls ----
-  class ReusedArgList;
   void ProcessCallOf(Text func_name, CNode* arglist);
   // The texts of the classes in the second argument of isinstance or behind `except`: one dotted
   // name or those of a tuple.
@@ -202,10 +209,11 @@ class CNodeWalker {
   size_t composed_size_ = 0;
   TextArena own_texts_;
 
-  std::string equiv_buffer_;           // what TypeEquivForNode composes
-  std::string scratch_;                // an info text on its way to its record
-  std::deque<UsedArgList> arg_lists_;  // by nesting of calls
-  size_t arg_lists_used_ = 0;
+  std::string equiv_buffer_;  // what TypeEquivForNode composes
+  std::string scratch_;       // an info text on its way to its record
+  std::string name_buffer_;   // the name of an import
+  ListStack<UsedArgList> used_lists_;
+  ListStack<ArgList> defining_lists_;
 };
 
 }  // namespace quillet
