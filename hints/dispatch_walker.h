@@ -1,12 +1,14 @@
 // CDispatchWalker: a walk driven by a table from node class to visit.
 //
 // A visit that gives true, or a class without an entry, has the node's children walked; a class
-// marked as pruned is neither visited nor descended into. The walk is bounded as that of
-// CNodeWalker is: 10000 visits, a depth of 40, measured on the stack of nodes, which visits may read
-// to find ancestors. Reaching a limit prints a line and ends the walk normally.
+// marked as pruned is neither visited nor descended into, which keeps the walk of a large statement
+// cheap. The walk is bounded as that of CNodeWalker is: 10000 visits, a depth of 40, measured on the
+// stack of nodes, which visits may read to find ancestors. Reaching a limit prints a line and ends
+// the walk normally, with what was recorded before.
 #pragma once
 
 #include <array>
+#include <cstdint>
 #include <functional>
 #include <vector>
 
@@ -28,9 +30,13 @@ class CDispatchWalker {
   };
   using Table = std::array<Entry, kNodeKindCount>;
 
-  explicit CDispatchWalker(const Table& table) : table_(table) {}
+  // Copies the table.
+  explicit CDispatchWalker(const Table& table) : own_table_(table), table_(&own_table_) {}
+  CDispatchWalker(const CDispatchWalker&) = delete;
+  CDispatchWalker& operator=(const CDispatchWalker&) = delete;
   virtual ~CDispatchWalker() = default;
 
+  // ValueError while another walk of this walker is under way. `first_in_def` is for derived walkers.
   virtual void Walk(CNode* node, LogicalLine* logical, bool first_in_def);
   void VisitNode(CNode* node);
 
@@ -43,8 +49,14 @@ class CDispatchWalker {
   int32_t fMaxRecurseCount = 40;
   std::vector<CNode*> fNodeStack;
 
+ protected:
+  // Walks by another table from now on; it must live as long as it is in use.
+  void UseTable(const Table& table) { table_ = &table; }
+  const Table& own_table() const { return own_table_; }
+
  private:
-  Table table_;
+  Table own_table_;
+  const Table* table_;
 };
 
 }  // namespace quillet

@@ -5,7 +5,10 @@
 // recorded by the general walker, whose walk of the statement has ended by then. A hint that does
 // not parse is a SyntaxError at its column in the comment. Signature comments, "(int, str) -> bool",
 // are in signature_comments.cc. A line without "type:" in a comment costs one pass over its token
-// codes.
+// codes and, where its tree cannot reach a limit, a walk of its statements alone.
+//
+// The text of a comment's hint is copied to where the line's records keep theirs before it is parsed,
+// so that what is recorded from it lives as long as they do.
 #pragma once
 
 #include <memory>
@@ -15,6 +18,7 @@
 
 #include "hints/dispatch_walker.h"
 #include "parser/parser.h"
+#include "siblings/logicalline/cutter.h"
 #include "text/node_to_text.h"
 #include "walker/walker.h"
 
@@ -37,12 +41,16 @@ class CTypeHintWalker : public CDispatchWalker {
     std::string text;
     int32_t tok_i = -1;
   };
-  Hint FindEndingTypeComment(CNode* node);
-  // False: no hint. The hint keeps each character at its column in the comment.
+  Hint FindEndingTypeComment(CNode* node) const;
+  // False: no hint. The hint keeps each character at its column in the comment (blanks stand for
+  // the characters in front of it).
   static bool GetHintFromComment(Text comment, std::string& hint);
-  std::pair<int32_t, int32_t> GetRowRange(CNode* node) const;
-  Comment FindComment(int32_t row, LogicalLine* logical = nullptr) const;
+  // First row, and the row behind the last.
+  std::pair<int64_t, int64_t> GetRowRange(CNode* node) const;
+  // The first comment on a row of a line, by default of the one being walked.
+  Comment FindComment(int64_t row, LogicalLine* logical = nullptr) const;
   static bool IsDottedName(Text text);
+  // Null for a hint that is not exactly one statement. The tree is the caller's.
   CNode* ParseHint(Text hint, int32_t tok_i, bool call_general_node_walker);
   [[noreturn]] void RaiseHintSyntaxError(int32_t tok_i, int64_t utf8_offset_in_hint);
 
@@ -63,6 +71,7 @@ class CTypeHintWalker : public CDispatchWalker {
     std::vector<int64_t> utf8_offsets;
   };
   static RewrittenHint RewriteFuncdefCommentHint(Text hint);
+  // `funcdef_logical` null: the comment stands on a line of its own in the body.
   void ProcessFuncdefComment(Text hint, int32_t tok_i, LogicalLine* funcdef_logical, bool is_arg);
   void ProcessArgSpecificComment(const CArgInfo& arg);
   CNode* ParseFuncdefCommentHint(Text hint, int32_t tok_i);
@@ -72,11 +81,43 @@ class CTypeHintWalker : public CDispatchWalker {
   CNodeWalker* general_node_walker() const { return general_node_walker_; }
 
  private:
+  // A signature's tokens and, for each, its offset in the hint.
+  struct Signature {
+    std::vector<Token> tokens;
+    std::vector<int64_t> utf8_offsets;
+  };
+  // `text` is kSignatureFront, the hint and a colon; the tokens are views into it.
+  static Signature RewriteSignature(Text text);
+
+  LogicalLine& RequireLogical() const;
+  CNodeWalker& RequireGeneralWalker() const;
+  // A copy of `text` that lives as long as the records of the line being walked.
+  Text KeepText(Text text);
+  void ProcessTargetWithHint(const Hint& hint, CNode* target);
+  void ProcessNameAndHint(CNode* name_node, CNode* hint_node, bool is_arg, int depth);
+  // Runs `use` and gives the tree of a hint back, whatever happens.
+  template <class Use>
+  void UseHintTree(CNode* node, Use&& use);
+
   CNodeToTextConverter name_conv_;
   CNodeToTextConverter hint_conv_;
   std::unique_ptr<CPGenParserImpl> hint_parser_;
   Version version_;
   CNodeWalker* general_node_walker_;
+  Ref<SourceText> hint_source_;  // reused for the text of every hint
+  std::vector<LineRow> hint_rows_;
+  std::string info_buffer_;
 };
+
+template <class Use>
+void CTypeHintWalker::UseHintTree(CNode* node, Use&& use) {
+  try {
+    use();
+  } catch (...) {
+    hint_parser_->DiscardNode(node);
+    throw;
+  }
+  hint_parser_->DiscardNode(node);
+}
 
 }  // namespace quillet

@@ -1,0 +1,64 @@
+// The frame of a dispatched walk: limits, the stack of nodes, and an idle walker at every end.
+#include "hints/dispatch_walker.h"
+
+#include "foundations/console.h"
+
+namespace quillet {
+
+void CDispatchWalker::Walk(CNode* node, LogicalLine* logical, bool /*first_in_def*/) {
+  if (fLogical != nullptr) ThrowError(ErrorKind::kValueError, "Only one logical may be walked at a time");
+  struct Idle {
+    CDispatchWalker& walker;
+    ~Idle() {
+      walker.fLogical = nullptr;
+      walker.fVisitCount = 0;
+      walker.fRecurseCount = 0;
+      walker.fNodeStack.clear();
+    }
+  } idle{*this};
+  fLogical = logical;
+  fNodeStack.clear();
+  try {
+    VisitNode(node);
+  } catch (const Error& error) {
+    const bool is_runtime_error =
+        error.kind() == ErrorKind::kRuntimeError || error.kind() == ErrorKind::kRecursionError;
+    if (!is_runtime_error) throw;
+    // The text names the symbol walker, as hosts know it.
+    PrintLine("RuntimeError raised in CNodeWalker.Walk: " + error.message());
+  }
+}
+
+void CDispatchWalker::VisitNode(CNode* node) {
+  if (++fVisitCount > fMaxVisits) {
+    ThrowError(ErrorKind::kRuntimeError, "Maximum number of calls to _VisitNode exceeded");
+  }
+  fNodeStack.push_back(node);
+  // The node stays on the stack; the end of the walk cleans up.
+  if (static_cast<int64_t>(fNodeStack.size()) > fMaxRecurseCount) {
+    ThrowError(ErrorKind::kRuntimeError, "Maximum recurse count in _VisitNode exceeded");
+  }
+  struct Pop {
+    std::vector<CNode*>& stack;
+    ~Pop() {
+      if (!stack.empty()) stack.pop_back();
+    }
+  } pop{fNodeStack};
+
+  bool descend;
+  if (host_visit) [[unlikely]] {
+    descend = host_visit(node);
+  } else {
+    const Entry entry = node != nullptr ? (*table_)[static_cast<size_t>(node->kind)] : Entry{};
+    descend = entry.action == Action::kDescend || (entry.action == Action::kVisit && entry.visit(*this, node));
+  }
+  if (descend) {
+    if (node == nullptr) ThrowError(ErrorKind::kAttributeError, "'NoneType' object has no attribute 'fChildren'");
+    // By index: a visit of the host's may change the list.
+    for (uint32_t i = 0; i < node->child_count; ++i) VisitNode(node->children[i]);
+  }
+  // Not made while an exception is in flight: a limit leaves the node that met it on the stack.
+  Assert(!fNodeStack.empty() && fNodeStack.back() == node, "");
+}
+
+}  // namespace quillet
