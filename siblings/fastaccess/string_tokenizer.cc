@@ -10,19 +10,6 @@ namespace {
 // What the scanner may load behind the text; see scanner.h.
 constexpr size_t kPadding = 32;
 
-struct IgnoreStructure {
-  void BeginStatement(uint32_t, uint32_t) {}
-  void BlankLine(uint32_t, uint32_t) {}
-  void CommentLine(uint32_t, const Token*, uint32_t) {}
-  bool Separator(const Token*, uint32_t) { return false; }
-  void EndStatement(const Token*, uint32_t) {}
-  bool ClosesBrackets(const char*) { return false; }
-  void Assign(uint32_t) {}
-  void Colon(uint32_t) {}
-  void String(uint32_t, bool) {}
-  void Comment(Text) {}
-};
-
 }  // namespace
 
 CStringTokenizer::CStringTokenizer(Text utf8_bytes) {
@@ -31,9 +18,9 @@ CStringTokenizer::CStringTokenizer(Text utf8_bytes) {
   bytes_.append(kPadding, '\0');
   end_ = bytes_.data() + utf8_bytes.size();
   std::vector<uint32_t> line_starts;
-  IgnoreStructure client;
+  TokensOnly client;
   // Formatted strings are read by the rules of 3.12, which take all that older ones take.
-  Scanner<IgnoreStructure>(Text(bytes_.data(), utf8_bytes.size()), true, tokens_, line_starts, client).Run();
+  Scanner<TokensOnly>(Text(bytes_.data(), utf8_bytes.size()), true, tokens_, line_starts, client).Run();
 }
 
 void CStringTokenizer::Advance() {

@@ -41,6 +41,36 @@ inline constexpr bool IsWordCode(TokenCode code) { return code >= tok::FIRST_WOR
 inline constexpr bool IsNameCode(TokenCode code) { return code == tok::NAME || IsWordCode(code); }
 inline constexpr int TypeOfCode(TokenCode code) { return IsWordCode(code) ? tok::NAME : code; }
 
+// True for the keywords, of every version, that stand nowhere but at the front of a statement or of
+// a clause. ("async" is not among them: a comprehension may hold it.)
+inline constexpr bool OnlyBeginsStatement(TokenCode code) {
+  switch (code) {
+    case word::kAssert:
+    case word::kBreak:
+    case word::kClass:
+    case word::kContinue:
+    case word::kDef:
+    case word::kDel:
+    case word::kElif:
+    case word::kExcept:
+    case word::kFinally:
+    case word::kGlobal:
+    case word::kImport:
+    case word::kPass:
+    case word::kRaise:
+    case word::kReturn:
+    case word::kTry:
+    case word::kWhile:
+    case word::kWith:
+      return true;
+    default:
+      return false;
+  }
+}
+
+// A comment or a backslash: dropped in front of the parser.
+inline constexpr bool IsSkipCode(TokenCode code) { return code == tok::COMMENT || code == tok::BACKSLASH; }
+
 struct Token {
   const char* text = nullptr;
   uint32_t length = 0;
@@ -57,8 +87,9 @@ using TokenSpan = std::span<const Token>;
 // The code of a word, or tok::NAME for any other identifier.
 TokenCode CodeOfName(const char* text, size_t length);
 
-// The code that the tokeniser would give a token with this text. Total: text that is no single
-// token has tok::ERRORTOKEN.
+// The code that the tokeniser gives a token with this text. Total: a line end is tok::NEWLINE, what
+// begins with "#" a comment and with "\\" a backslash, whatever follows; other text that is not
+// exactly one token, the empty one included, is tok::ERRORTOKEN.
 TokenCode CodeOfText(Text text);
 
 // GetTokenType of the host: the type id of CodeOfText.

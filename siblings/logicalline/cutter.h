@@ -19,9 +19,9 @@ namespace quillet {
 struct LineRow {
   uint32_t first_token;
   uint32_t token_count;
-  uint32_t first_line;   // from 0, of the first token (or of the blank line)
-  uint32_t last_line;    // from 0, of the end of the last token, inclusive
-  uint32_t indent;       // width of the indentation of the statement's first physical line, tabs to 8
+  uint32_t first_line;  // from 0, of the first token (or of the blank line)
+  uint32_t last_line;   // from 0, of the end of the last token, inclusive
+  uint32_t indent;      // width of the indentation of the statement's first physical line, tabs to 8
   LineKind kind;
   // The statement shares its physical line with a head or with an earlier statement.
   bool continues_physical_line : 1;

@@ -93,7 +93,7 @@ class LogicalLine {
   // True where no token of the line holds an expression of its own (no f-string, no string that
   // may be a hint): GetExpLogicals is then empty without a look at the tokens.
   bool no_embedded = false;
-  int32_t first_line = 0;   // in the coordinates of the enclosing text, from 0
+  int32_t first_line = 0;  // in the coordinates of the enclosing text, from 0
   int32_t token_count = 0;
   LineHooks* hooks = nullptr;
 
@@ -101,6 +101,8 @@ class LogicalLine {
   PositionView positions() const;
   // Positions of the host's own; replaces those worked out from the source.
   void SetPositions(std::vector<Position> positions);
+  // Back to those worked out from the source.
+  void UseSourcePositions();
   bool has_stored_positions() const { return has_stored_positions_; }
 
   // ---- operations ----
@@ -110,34 +112,42 @@ class LogicalLine {
   void AppendArgTypeEquiv(Text name, Text info);
   // Texts that already outlive the line's records (source, this store's arena, static): no copy.
   void AppendStableTypeEquiv(Text name, Text equiv) {
-    if (hooks) [[unlikely]] return hooks->AppendTypeEquiv(*this, name, equiv);
+    if (hooks) [[unlikely]]
+      return hooks->AppendTypeEquiv(*this, name, equiv);
     DirectAppend(name, equiv);
   }
   void AppendStableArgTypeEquiv(Text name, Text info) {
-    if (hooks) [[unlikely]] return hooks->AppendArgTypeEquiv(*this, name, info);
+    if (hooks) [[unlikely]]
+      return hooks->AppendArgTypeEquiv(*this, name, info);
     DirectAppendArg(name, info);
   }
   void SetParsed(bool value) {
-    if (hooks) [[unlikely]] return hooks->SetParsed(*this, value);
+    if (hooks) [[unlikely]]
+      return hooks->SetParsed(*this, value);
     parsed = value;
   }
   void ClearDerivedInfo() {
-    if (hooks) [[unlikely]] return hooks->ClearDerivedInfo(*this);
+    if (hooks) [[unlikely]]
+      return hooks->ClearDerivedInfo(*this);
     DirectClearDerivedInfo();
   }
-  EmbeddedLines GetExpLogicals();
+  EmbeddedLines GetExpLogicals() {
+    if (hooks) [[unlikely]]
+      return hooks->GetExpLogicals(*this);
+    return no_embedded ? EmbeddedLines() : DirectGetExpLogicals();
+  }
   // Appends this line's records to `to`.
   void CopyTypeEquivsTo(LogicalLine& to);
 
   // ---- the same without dispatch, for hooks that end in the built-in behaviour ----
   void DirectAppend(Text name, Text equiv) {
-    store().rows.push_back({name.data(), equiv.data(), static_cast<uint32_t>(name.size()),
-                            static_cast<uint32_t>(equiv.size())});
+    store().rows.push_back(
+        {name.data(), equiv.data(), static_cast<uint32_t>(name.size()), static_cast<uint32_t>(equiv.size())});
     ++row_count_;
   }
   void DirectAppendArg(Text name, Text info) {
-    store().arg_rows.push_back({name.data(), info.data(), static_cast<uint32_t>(name.size()),
-                                static_cast<uint32_t>(info.size())});
+    store().arg_rows.push_back(
+        {name.data(), info.data(), static_cast<uint32_t>(name.size()), static_cast<uint32_t>(info.size())});
     ++arg_row_count_;
   }
   void DirectClearDerivedInfo();
@@ -165,7 +175,8 @@ class LogicalLine {
 
  private:
   RecordStore& store() {
-    if (!store_) [[unlikely]] MakeOwnStore();
+    if (!store_) [[unlikely]]
+      MakeOwnStore();
     return *store_;
   }
   void MakeOwnStore();
@@ -186,8 +197,8 @@ std::string TextFromTokens(TokenSpan toks, const PositionView& positions);
 // True for a line that opens a scope (def, async def, class).
 bool IsScopeStartLogical(const LogicalLine& line);
 
-// kMatch or kCase where the tokens from `start` up to `end` are such a statement's head, and
-// kUnknown otherwise.
+// kMatch or kCase where the tokens from `start` up to `end` are such a statement, and kUnknown
+// otherwise. See soft_keywords.cc for how the two are told from ordinary statements.
 LineKind FindMatchOrCaseType(TokenSpan toks, size_t start, size_t end);
 
 }  // namespace quillet

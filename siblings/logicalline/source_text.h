@@ -37,14 +37,15 @@ class SourceText : public RefCounted {
   // starts are dropped.
   void Assign(Text bytes);
 
-  // Offset of the first byte of each physical line; the first is 0 (or 3, behind a BOM).
+  // Offset of the first byte of each physical line; the first is 0 (or 3, behind a BOM). A source
+  // that ends with a line end has one more, its size.
   std::vector<uint32_t> line_starts;
   std::vector<Token> tokens;
 
   // The line and column (from 0) of a place in the bytes. Logarithmic in the number of lines.
   Position PositionOf(const char* at) const;
-  // The same for a place known to stand at or after `line`, as all tokens of a statement do: it
-  // steps line by line from there.
+  // The same for a place known to stand at or after `line`, as all tokens of a statement do:
+  // logarithmic in the number of lines between.
   Position PositionFrom(int32_t line, const char* at) const;
 
  private:
