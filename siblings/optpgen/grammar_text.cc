@@ -156,7 +156,10 @@ class Reader {
     } else {
       symbol_ = Symbol::kPunctuation;
       spelling_ = c;
-      if (Text(":|()[]*+").find(c) == Text::npos) Fail("'" + spelling_ + "' has no meaning in a grammar");
+      if (Text(":|()[]*+").find(c) == Text::npos) {
+        while (pos_ < text_.size() && (text_[pos_] & 0xC0) == 0x80) spelling_ += text_[pos_++];
+        Fail(ReprOfText(spelling_) + " has no meaning in a grammar");
+      }
     }
   }
 
