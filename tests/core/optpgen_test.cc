@@ -970,24 +970,26 @@ TEST(EngineAgainstPlainDriver, OnThePythonGrammars) {
   }
 }
 
-std::string RandomExpression(std::mt19937& random, int rules, int depth) {
+void AppendRandomExpression(std::string& text, std::mt19937& random, size_t rules, int depth) {
   static const char* const terminals[] = {"NAME", "NUMBER", "'+'", "','", "'if'", "'is'", "'('", "')'"};
-  std::string text;
   for (size_t i = 1 + random() % 3; i > 0; --i) {
     const size_t kind = random() % 10;
     if (kind < 4 || depth == 0) {
       text += terminals[random() % std::size(terminals)];
     } else if (kind < 7) {
-      text += "r" + std::to_string(random() % static_cast<size_t>(rules));
+      text += "r";
+      text += std::to_string(random() % rules);
     } else {
-      const std::string inner = RandomExpression(random, rules, depth - 1);
-      if (kind == 7) text += "(" + inner + " | " + RandomExpression(random, rules, depth - 1) + ")";
-      if (kind == 8) text += "[" + inner + "]";
-      if (kind == 9) text += "(" + inner + ")" + (random() % 2 ? "*" : "+");
+      text += kind == 8 ? "[" : "(";
+      AppendRandomExpression(text, random, rules, depth - 1);
+      if (kind == 7) {
+        text += "| ";
+        AppendRandomExpression(text, random, rules, depth - 1);
+      }
+      text += kind == 7 ? ")" : kind == 8 ? "]" : random() % 2 ? ")*" : ")+";
     }
     text += " ";
   }
-  return text;
 }
 
 TEST(EngineAgainstPlainDriver, OnRandomGrammars) {
@@ -995,10 +997,14 @@ TEST(EngineAgainstPlainDriver, OnRandomGrammars) {
   int grammars = 0;
   int accepted = 0;
   for (int round = 0; round < 6000; ++round) {
-    const int rules = 2 + static_cast<int>(random() % 5);
+    const size_t rules = 2 + random() % 5;
     std::string text;
-    for (int rule = 0; rule < rules; ++rule) {
-      text += "r" + std::to_string(rule) + ": " + RandomExpression(random, rules, 2) + "\n";
+    for (size_t rule = 0; rule < rules; ++rule) {
+      text += "r";
+      text += std::to_string(rule);
+      text += ": ";
+      AppendRandomExpression(text, random, rules, 2);
+      text += "\n";
     }
     std::optional<Grammar> grammar;
     try {
