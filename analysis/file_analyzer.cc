@@ -19,7 +19,7 @@ void FileAnalyzer::Analyze(Text bytes) {
   LogicalLine line;
   for (const LineRow& row : rows_) {
     LineResult result;
-    const ScopeTracker::Place place = scopes_.Enter(row);
+    const LinePlace place = scopes_.Next(row);
     result.in_async_def = place.in_async_def;
     result.first_in_def = place.first_in_def;
     result.record_begin = static_cast<uint32_t>(store_.rows.size());
