@@ -72,6 +72,7 @@ CNode* NodePool::Construct(NodeKind kind, CNodeClassInfo* cls_info) {
     storage = NewNodeStorage();
   }
   CNode* node = ConstructIn(storage, kind);
+  node->kind = kind;
   node->fClsInfo = cls_info;
   node->pool = this;
   node->children = children;
