@@ -254,7 +254,7 @@ class Cutter {
     const auto end = static_cast<uint32_t>(toks.size());
     if (first_ < end) {
       if (continues_ && NextSignificant(toks, first_, end) == end) {
-        ExtendLastRow(end - first_);
+        ExtendLastRow(end - first_, LastLine(toks, end, out));
       } else {
         AddRows(toks, end, out);
       }
@@ -295,10 +295,18 @@ class Cutter {
     return tok::ENDMARKER;
   }
 
+  // The line on which the last token in front of `end` ends.
+  static uint32_t LastLine(TokenSpan toks, uint32_t end, const ScanOutput& out) {
+    uint32_t line = out.line();
+    while (out.LineStart(line) >= toks[end - 1].end()) --line;
+    return line;
+  }
+
   // A comment, or a backslash that joins nothing, behind the last ";" of a line.
-  void ExtendLastRow(uint32_t count) {
+  void ExtendLastRow(uint32_t count, uint32_t last_line) {
     LineRow& row = rows_.back();
     row.token_count += count;
+    row.last_line = last_line;
     row.no_embedded = row.no_embedded && !facts_.has_type_comment;
   }
 
@@ -320,10 +328,8 @@ class Cutter {
 
   void AddRow(const Statement& statement, TokenSpan toks, uint32_t end, bool has_inline_body, const ScanOutput& out) {
     const LineKind kind = statement.Kind();
-    uint32_t last_line = out.line();
-    while (out.LineStart(last_line) >= toks[end - 1].end()) --last_line;
-    rows_.push_back({first_, end - first_, first_line_, last_line, indent_, kind, continues_, has_inline_body,
-                     statement.is_async(), statement.HasNoEmbedded(kind)});
+    rows_.push_back({first_, end - first_, first_line_, LastLine(toks, end, out), indent_, kind, continues_,
+                     has_inline_body, statement.is_async(), statement.HasNoEmbedded(kind)});
   }
 
   const bool python2_;
