@@ -6,6 +6,7 @@
 // that fresh ones give.
 #include <benchmark/benchmark.h>
 
+#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <memory>
@@ -173,10 +174,10 @@ void Walk(benchmark::State& state) {
   RecordStore store;
   std::vector<std::unique_ptr<LogicalLine>> lines;
   std::vector<CNode*> trees;
-  size_t records = 0;
+  size_t records = 0, failures = 0;
   for (auto _ : state) {
     double seconds = 0;
-    records = 0;
+    records = failures = 0;
     for (const CutFile& file : CutCorpus()) {
       trees.clear();
       size_t used = 0;
@@ -199,7 +200,8 @@ void Walk(benchmark::State& state) {
         try {
           analyzer.node_walker().Walk(trees[i], lines[i].get());
           analyzer.type_hint_walker().Walk(trees[i], lines[i].get(), false);
-        } catch (const SyntaxError&) {
+        } catch (const Error&) {
+          ++failures;
         }
       }
       seconds += std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
@@ -210,6 +212,7 @@ void Walk(benchmark::State& state) {
   }
   Require(records > 0, "no records");
   state.counters["records"] = static_cast<double>(records);
+  state.counters["rejected"] = static_cast<double>(failures);
   Report(state);
 }
 BENCHMARK(Walk)->Unit(benchmark::kMillisecond)->UseManualTime();
