@@ -66,7 +66,6 @@ struct Level {
         ReadPlain(child);
       }
     }
-    // A default behind a tuple parameter stands in a record without a name and is dropped.
     if (current.name != nullptr || !IsNone(current.prefix)) entries.emplace_back(current);
     return nullptr;
   }
@@ -81,11 +80,10 @@ struct Level {
     if (child == nullptr) ThrowNoAttribute("fText");
     switch (child->code) {
       case tok::COMMA:
-        // Behind "/" and behind a tuple parameter there is no record to end.
-        if (current.name != nullptr || !IsNone(current.prefix)) {
-          entries.emplace_back(current);
-          current = CArgInfo();
-        }
+        // Behind "/" and behind a tuple parameter there is no record to end. A tuple's default was read
+        // into it and must not become that of the next parameter.
+        if (current.name != nullptr || !IsNone(current.prefix)) entries.emplace_back(current);
+        current = CArgInfo();
         default_follows = false;
         annotation_follows = false;
         return;
