@@ -2,7 +2,9 @@
 //
 // A parser of this module makes what the host asks for: raw tuples, or what a NodeConverter's
 // convert gives. CPGenParserImpl has an engine of its own that makes nodes without a call.
-#include <optional>
+#include <nanobind/stl/unique_ptr.h>
+
+#include <memory>
 #include <string>
 #include <utility>
 
