@@ -16,6 +16,11 @@ namespace {
 constexpr int64_t kMaxDiscardDepth = 100;
 constexpr int64_t kMinDiscardDepth = -900;
 
+void PushFree(CNodeClassInfo* cls_info, CNode* node) {
+  node->fNextFree = cls_info->fFirstFree;
+  cls_info->fFirstFree = node;
+}
+
 void Discard(CNode* node, int64_t depth) {
   if (depth > kMaxDiscardDepth) [[unlikely]] {
     PrintLine("depth too great");
@@ -24,18 +29,26 @@ void Discard(CNode* node, int64_t depth) {
   }
   if (node == nullptr) [[unlikely]]
     ThrowNoAttribute("fClsInfo");
+  NodePool* pool = node->pool;
   CNodeClassInfo* cls_info = node->fClsInfo;
-  if (cls_info != nullptr) {
-    node->fNextFree = cls_info->fFirstFree;
-    cls_info->fFirstFree = node;
-  }
+  if (cls_info != nullptr) PushFree(cls_info, node);
   if (node->has_children) {
     // The count is read anew each time: a tree that was given back twice may hold itself.
-    for (uint32_t i = 0; i < node->child_count; ++i) Discard(node->children[i], depth + 1);
-    node->pool->ClearChildren(node);
+    for (uint32_t i = 0; i < node->child_count; ++i) {
+      CNode* child = node->children[i];
+      // Most children are leaves and need no call; all else, failures too, is for the call.
+      if (child != nullptr && !child->has_children && child->fClsInfo != nullptr && depth < kMaxDiscardDepth)
+          [[likely]] {
+        PushFree(child->fClsInfo, child);
+        child->pool->WipeLeafFields(child);
+      } else {
+        Discard(child, depth + 1);
+      }
+    }
+    pool->ClearChildren(node);
   }
-  node->pool->WipeLeafFields(node);
-  if (cls_info == nullptr) node->pool->KeepForReuse(node);
+  pool->WipeLeafFields(node);
+  if (cls_info == nullptr) pool->KeepForReuse(node);
 }
 
 }  // namespace
