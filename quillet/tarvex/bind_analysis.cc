@@ -1,0 +1,197 @@
+// CPGenAnalyzerImpl and CreateSyntaxError.
+#include <limits>
+
+#include "analysis/analyzer.h"
+#include "quillet/tarvex/bindings.h"
+#include "quillet/tarvex/convert.h"
+#include "quillet/tarvex/errors.h"
+#include "quillet/tarvex/hints_object.h"
+#include "quillet/tarvex/line_object.h"
+#include "quillet/tarvex/node_ref.h"
+#include "quillet/tarvex/parser_object.h"
+#include "quillet/tarvex/walker_object.h"
+#include "siblings/logicalline/syntax_error.h"
+
+namespace quillet::host {
+namespace {
+
+void InitAnalyzer(AnalyzerObject* self, nb::handle version_triple, nb::handle grammar_file, nb::handle keyword_seq,
+                  Truth py3_grammar, nb::handle hint_grammar_file) {
+  new (self) AnalyzerObject();
+  try {
+    CPGenAnalyzerImpl::Options options;
+    options.version = VersionOf(version_triple);
+    options.grammar_file = ResolveGrammarFile(grammar_file);
+    options.hint_grammar_file = ResolveGrammarFile(hint_grammar_file);
+    options.keywords = KeywordList(keyword_seq, self->keywords);
+    nb::object hint_keywords;
+    options.hint_keywords = KeywordList(nb::none(), hint_keywords);
+    options.py3_grammar = py3_grammar;
+    self->version_triple = nb::borrow(version_triple);
+    self->analyzer = std::make_shared<CPGenAnalyzerImpl>(options);
+  } catch (...) {
+    self->~AnalyzerObject();
+    throw;
+  }
+}
+
+// While the host holds wrappers of an analyzer's nodes, what an analysis leaves in nodes must stay
+// readable: texts of the line's source, and those of hints, which stand with the line's records.
+class Retained {
+ public:
+  Retained(CPGenAnalyzerImpl& analyzer, const Ref<SourceText>& source)
+      : hint_pool_(analyzer.type_hint_walker().hint_parser().factory().pool()) {
+    PinSource(analyzer.logical_parser().factory().pool(), source);
+  }
+  ~Retained() { RehomeTexts(hint_pool_); }
+  Retained(const Retained&) = delete;
+  Retained& operator=(const Retained&) = delete;
+
+ private:
+  NodePool& hint_pool_;
+};
+
+nb::object Analyze(AnalyzerObject& self, nb::handle logical, Truth in_async_def, Truth first_in_def) {
+  LineObject& object = LineOf(logical);
+  LogicalLine& line = object.line();
+  if (line.parsed) return nb::none();
+  object.BeginAnalysis();
+  std::optional<SyntaxError> error;
+  {
+    const Retained retained(*self.analyzer, line.source);
+    error = self.analyzer->AnalyzeSingleLogical(line, in_async_def, first_in_def);
+  }
+  object.EndWriting();
+  if (!error) [[likely]] {
+    return nb::none();
+  }
+  nb::object raised = TakeHostSyntaxError(*error);
+  return raised.is_valid() ? raised : ExceptionFor(*error);
+}
+
+bool Inspect(AnalyzerObject& self, nb::handle logical, Truth in_async_def, Truth in_embedded_expression,
+             Truth first_in_def) {
+  LineObject& object = LineOf(logical);
+  Recording recording(&object);
+  const Retained retained(*self.analyzer, object.line().source);
+  return self.analyzer->InspectSingleLogical(object.line(), in_async_def, in_embedded_expression, first_in_def);
+}
+
+void InspectEmbedded(AnalyzerObject& self, nb::handle logical, nb::handle node, Truth in_async_def,
+                     Truth first_in_def) {
+  LineObject& object = LineOf(logical);
+  RefOrNull(node);
+  Recording recording(&object);
+  const Retained retained(*self.analyzer, object.line().source);
+  self.analyzer->InspectEmbeddedExpressions(object.line(), in_async_def, first_in_def);
+}
+
+// ---- syntax errors ----
+
+// The context of an error: an index, of which only whether it lies in the line matters, or a pair.
+Context ErrorContext(nb::handle context) {
+  if (PyTuple_Check(context.ptr())) {
+    auto [line, column] = UnpackPair(context);
+    return Context::At({Int32Of(line), Int32Of(column)});
+  }
+  if (!PyIndex_Check(context.ptr())) ThrowExpected("int", context);
+  const Py_ssize_t index = PyNumber_AsSsize_t(context.ptr(), nullptr);
+  if (index == -1 && PyErr_Occurred()) throw nb::python_error();
+  constexpr Py_ssize_t least = std::numeric_limits<int32_t>::min();
+  constexpr Py_ssize_t most = std::numeric_limits<int32_t>::max();
+  return Context::Index(static_cast<int32_t>(index < least ? least : index > most ? most : index));
+}
+
+nb::object SyntaxErrorFor(nb::handle msg, nb::handle logical, nb::handle context, nb::handle pos_info_in_tok) {
+  const HostText message = HostText::FromStr(msg);
+  Position in_token;
+  if (!pos_info_in_tok.is_none()) {
+    in_token.line = Int32Of(nb::object(pos_info_in_tok.attr("lineno")));
+    in_token.col = Int32Of(nb::object(pos_info_in_tok.attr("utf8_col")));
+  }
+  const Position* place = pos_info_in_tok.is_none() ? nullptr : &in_token;
+  LineObject* object;
+  if (nb::try_cast(logical, object)) {
+    LogicalLine& line = object->line();
+    const Context where = line.token_count == 0 ? Context::Index(0) : ErrorContext(context);
+    return ExceptionFor(CreateSyntaxError(std::string(message.text()), line, where, place));
+  }
+  // Any object with the three fields.
+  LogicalLine line;
+  line.token_count = Int32Of(nb::object(logical.attr("fTokenCount")));
+  Context where = Context::Index(0);
+  if (line.token_count != 0) {
+    where = ErrorContext(context);
+    if (where.IsIndex()) {
+      line.source = SourceOfTokens(TupleOf(nb::object(logical.attr("fToks"))));
+      line.toks = line.source->tokens;
+      line.SetPositions(PositionsOf(TupleOf(nb::object(logical.attr("fPositions")))));
+    }
+  }
+  SyntaxError error = CreateSyntaxError(std::string(message.text()), line, where, place);
+  nb::object text = nb::module_::import_("quillet.logicalinspect").attr("TextFromTokens")(logical);
+  error.text = HostText::FromStr(text).text();
+  return ExceptionFor(error);
+}
+
+}  // namespace
+
+void BindAnalysis(nb::module_& tarvex) {
+  nb::class_<AnalyzerObject, AnalyzerBase> cls(
+      tarvex, "CPGenAnalyzerImpl", "Analyses logical lines, one at a time; one analyzer serves one thread.");
+  cls.def("__init__", &InitAnalyzer, nb::arg("version_triple").none(), nb::arg("grammar_file") = kPy3DefaultGrammar,
+          nb::arg("keyword_seq") = nb::none(), nb::arg("py3_grammar") = true,
+          nb::arg("hint_grammar_file") = kPy3DefaultGrammar);
+  cls.def("AnalyzeSingleLogical", &Analyze, nb::arg("logical"), nb::arg("in_async_def"),
+          nb::arg("first_in_def") = false,
+          "Analyses a line once and gives the exception that describes a failure, or None.");
+  cls.def("_InspectSingleLogical", &Inspect, nb::arg("logical"), nb::arg("in_async_def"),
+          nb::arg("in_embedded_expression") = false, nb::arg("first_in_def") = false);
+  cls.def("_InspectEmbeddedExpressions", &InspectEmbedded, nb::arg("logical"), nb::arg("node").none(),
+          nb::arg("in_async_def"), nb::arg("first_in_def"));
+  cls.def(
+      "ParseToNode",
+      [](AnalyzerObject& self, nb::handle logical, Truth in_async_def) {
+        return ForwardParseToNode(self.analyzer->logical_parser(), logical, in_async_def);
+      },
+      nb::arg("logical"), nb::arg("in_async_def"));
+  cls.def(
+      "ParseTokenListToNode",
+      [](AnalyzerObject& self, nb::handle logical, Truth in_async_def) {
+        return ForwardParseTokenListToNode(self.analyzer->logical_parser(), logical, in_async_def);
+      },
+      nb::arg("logical").none(), nb::arg("in_async_def"));
+  cls.def(
+      "GetTypeParameterNodes",
+      [](AnalyzerObject& self, nb::handle toks) {
+        return ForwardGetTypeParameterNodes(self.analyzer->logical_parser(), toks);
+      },
+      nb::arg("toks").none());
+  cls.def_prop_ro("_fLogicalParser", [](AnalyzerObject& self) {
+    if (!self.logical_parser.is_valid()) {
+      self.logical_parser =
+          NewParserObject(std::shared_ptr<CPGenParserImpl>(self.analyzer, &self.analyzer->logical_parser()),
+                          self.version_triple, self.keywords);
+    }
+    return self.logical_parser;
+  });
+  cls.def_prop_ro("_fNodeWalker", [](AnalyzerObject& self) {
+    if (!self.node_walker.is_valid())
+      self.node_walker = NewWalkerObject(std::shared_ptr<CNodeWalker>(self.analyzer, &self.analyzer->node_walker()));
+    return self.node_walker;
+  });
+  cls.def_prop_ro("_fTypeHintWalker", [](nb::handle self) {
+    auto& object = nb::cast<AnalyzerObject&>(self);
+    if (!object.type_hint_walker.is_valid()) {
+      object.type_hint_walker =
+          NewHintWalkerObject(std::shared_ptr<CTypeHintWalker>(object.analyzer, &object.analyzer->type_hint_walker()),
+                              nb::object(self.attr("_fNodeWalker")), object.version_triple);
+    }
+    return object.type_hint_walker;
+  });
+
+  tarvex.def("CreateSyntaxError", &SyntaxErrorFor, nb::arg("msg"), nb::arg("logical"), nb::arg("context"),
+             nb::arg("pos_info_in_tok") = nb::none(), "The SyntaxError for a place in a logical line.");
+}
+
+}  // namespace quillet::host

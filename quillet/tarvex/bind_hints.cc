@@ -1,0 +1,382 @@
+// CDispatchWalker, over a dict of the host's callables, and CTypeHintWalker.
+#include "hints/hint_walker.h"
+#include "quillet/tarvex/bindings.h"
+#include "quillet/tarvex/convert.h"
+#include "quillet/tarvex/errors.h"
+#include "quillet/tarvex/hints_object.h"
+#include "quillet/tarvex/line_object.h"
+#include "quillet/tarvex/node_ref.h"
+#include "quillet/tarvex/parser_object.h"
+#include "quillet/tarvex/walker_object.h"
+
+namespace quillet::host {
+namespace {
+
+// ---- the dispatch walker ----
+
+// What the host's dict says of a node: whether its children are to be walked.
+bool VisitByDict(DispatchObject& object, nb::handle self, const Ref<SourceText>& source, CNode* node) {
+  nb::handle cls = node == nullptr ? nb::handle((PyObject*)Py_TYPE(Py_None)) : ClassOfNode(node);
+  if (object.dispatch_dict.is_none()) {
+    PyErr_SetString(PyExc_AttributeError, "'NoneType' object has no attribute 'get'");
+    throw nb::python_error();
+  }
+  nb::object visit = nb::borrow(PyDict_GetItemWithError(object.dispatch_dict.ptr(), cls.ptr()));
+  if (!visit.is_valid()) {
+    if (PyErr_Occurred()) throw nb::python_error();
+    return true;
+  }
+  if (visit.ptr() == Py_False) return false;
+  if (visit.is_none()) return true;
+  nb::object result = visit(self, Wrap(node, source));
+  // The host may have changed the children of the node.
+  if (node != nullptr) RefOrNull(Wrap(node, source));
+  const int truth = PyObject_IsTrue(result.ptr());
+  if (truth < 0) throw nb::python_error();
+  return truth != 0;
+}
+
+// Lets a walk of the host's go by its dict while it lives.
+class DictVisits {
+ public:
+  DictVisits(DispatchObject& object, nb::handle self, const Ref<SourceText>& source) : walker_(*object.walker) {
+    walker_.host_visit = [&object, self, source](CNode* node) {
+      return CallingHost([&] { return VisitByDict(object, self, source, node); });
+    };
+  }
+  ~DictVisits() { walker_.host_visit = nullptr; }
+  DictVisits(const DictVisits&) = delete;
+  DictVisits& operator=(const DictVisits&) = delete;
+
+ private:
+  CDispatchWalker& walker_;
+};
+
+nb::object& DispatchDict(DispatchObject& object) {
+  if (!object.dispatch_dict.is_valid()) {
+    nb::handle cls = nb::type<HintWalkerObject>();
+    nb::dict dict;
+    dict[ClassOfKind(NodeKind::kCFuncdefStmt)] = cls.attr("_VisitFuncdefStmt");
+    dict[ClassOfKind(NodeKind::kCExprStmt)] = cls.attr("_VisitExprStmt");
+    dict[ClassOfKind(NodeKind::kCForStmt)] = cls.attr("_VisitForStmt");
+    dict[ClassOfKind(NodeKind::kCWithStmt)] = cls.attr("_VisitWithStmt");
+    dict[ClassOfKind(NodeKind::kCNameLiteral)] = nb::handle(Py_False);
+    object.dispatch_dict = dict;
+  }
+  return object.dispatch_dict;
+}
+
+void SetLogical(DispatchObject& self, nb::handle value) {
+  if (value.is_none()) {
+    self.walker->fLogical = nullptr;
+    self.logical.reset();
+    return;
+  }
+  LineObject& line = LineOf(value);
+  line.BeginWriting();
+  self.walker->fLogical = &line.line();
+  self.logical = nb::borrow(value);
+}
+
+template <int32_t CDispatchWalker::*Field>
+void DefCount(nb::class_<DispatchObject>& cls, const char* name) {
+  cls.def_prop_rw(
+      name, [](DispatchObject& self) { return (*self.walker).*Field; },
+      [](DispatchObject& self, nb::handle value) { (*self.walker).*Field = Int32Of(value); });
+}
+
+void WalkByDict(nb::handle self, nb::handle node, nb::handle logical, Truth first_in_def) {
+  auto& object = nb::cast<DispatchObject&>(self);
+  NodeRef* root = RefOrNull(node);
+  LineObject& line = LineOf(logical);
+  if (object.walker->fLogical != nullptr) return object.walker->Walk(nullptr, nullptr, first_in_def);  // raises
+  Recording recording(&line);
+  object.logical = nb::borrow(logical);
+  DictVisits visits(object, self, SourceOf(root));
+  object.walker->Walk(root == nullptr ? nullptr : root->node(), &line.line(), first_in_def);
+}
+
+int Traverse(PyObject* self, visitproc visit, void* arg) {
+  Py_VISIT(Py_TYPE(self));
+  if (!nb::inst_ready(self)) return 0;
+  Py_VISIT(nb::inst_ptr<DispatchObject>(self)->dispatch_dict.ptr());
+  return 0;
+}
+
+int Clear(PyObject* self) {
+  nb::object dict = std::move(nb::inst_ptr<DispatchObject>(self)->dispatch_dict);
+  return 0;
+}
+
+const PyType_Slot kSlots[] = {
+    {Py_tp_traverse, reinterpret_cast<void*>(Traverse)}, {Py_tp_clear, reinterpret_cast<void*>(Clear)}, {0, nullptr}};
+
+void BindDispatchWalker(nb::module_& m) {
+  nb::class_<DispatchObject> cls(m, "CDispatchWalker", nb::type_slots(kSlots),
+                                 "Walks a tree by a dict from node class to visit.");
+  cls.def(
+      "__init__",
+      [](DispatchObject* self, nb::handle dispatch_dict) {
+        if (!dispatch_dict.is_none() && !PyDict_Check(dispatch_dict.ptr())) ThrowExpected("dict", dispatch_dict);
+        new (self)
+            DispatchObject{std::make_shared<CDispatchWalker>(CDispatchWalker::Table{}), nb::borrow(dispatch_dict), {}};
+      },
+      nb::arg("dispatch_dict").none());
+  cls.def_prop_rw(
+      "_fLogical", [](DispatchObject& self) { return HostLineOf(self.walker->fLogical, self.logical); }, &SetLogical,
+      nb::arg("value").none());
+  cls.def_prop_ro("_fDispatchDict", [](DispatchObject& self) { return DispatchDict(self); });
+  DefCount<&CDispatchWalker::fVisitCount>(cls, "_fVisitCount");
+  DefCount<&CDispatchWalker::fRecurseCount>(cls, "_fRecurseCount");
+  DefCount<&CDispatchWalker::fMaxVisits>(cls, "_fMaxVisits");
+  DefCount<&CDispatchWalker::fMaxRecurseCount>(cls, "_fMaxRecurseCount");
+  cls.def_prop_ro("_fNodeStack", [](DispatchObject& self) { return WrapList(self.walker->fNodeStack, {}); });
+  cls.def("Walk", &WalkByDict, nb::arg("node").none(), nb::arg("logical").none(), nb::arg("first_in_def"));
+  cls.def(
+      "_VisitNode",
+      [](nb::handle self, nb::handle node) {
+        auto& object = nb::cast<DispatchObject&>(self);
+        NodeRef* root = RefOrNull(node);
+        DictVisits visits(object, self, SourceOf(root));
+        object.walker->VisitNode(root == nullptr ? nullptr : root->node());
+      },
+      nb::arg("node").none());
+}
+
+// ---- the hint walker ----
+
+using HintClass = nb::class_<HintWalkerObject, DispatchObject>;
+
+void InitHintWalker(HintWalkerObject* self, nb::handle version_triple, nb::handle grammar_file,
+                    nb::handle general_node_walker) {
+  new (self) HintWalkerObject();
+  try {
+    CPGenParserImpl::Options options;
+    options.version = VersionOf(version_triple);
+    options.grammar_file = ResolveGrammarFile(grammar_file);
+    nb::object keywords;
+    options.keywords = KeywordList(nb::none(), keywords);
+    CNodeWalker* general = nullptr;
+    if (!general_node_walker.is_none()) {
+      WalkerObject* walker;
+      if (!nb::try_cast(general_node_walker, walker)) ThrowExpected("CNodeWalker", general_node_walker);
+      general = walker->walker.get();
+    }
+    self->walker =
+        std::make_shared<CTypeHintWalker>(std::make_unique<CPGenParserImpl>(options), options.version, general);
+    self->general_node_walker = nb::borrow(general_node_walker);
+    self->version_triple = nb::borrow(version_triple);
+  } catch (...) {
+    self->~HintWalkerObject();
+    throw;
+  }
+}
+
+// The trees of hints have texts that stand with the records of the line being walked.
+nb::object WrapHintTree(HintWalkerObject& self, CNode* node) {
+  nb::object wrapper = Wrap(node, {});
+  RehomeTexts(self.hints().hint_parser().factory().pool());
+  return wrapper;
+}
+
+template <bool (CTypeHintWalker::*Operation)(CNode*)>
+bool VisitStatement(HintWalkerObject& self, nb::handle node) {
+  CNode* root = RefOf(node).node();
+  Recording recording(self.walker->fLogical);
+  return (self.hints().*Operation)(root);
+}
+
+nb::object TextAndIndex(nb::object text, int32_t tok_i) { return nb::make_tuple(std::move(text), tok_i); }
+
+void BindHintComments(HintClass& cls) {
+  cls.def(
+      "_FindEndingTypeComment",
+      [](HintWalkerObject& self, nb::handle node) {
+        const CTypeHintWalker::Hint hint = self.hints().FindEndingTypeComment(RefOf(node).node());
+        return TextAndIndex(hint.found ? StrOf(hint.text) : nb::object(nb::none()), hint.tok_i);
+      },
+      nb::arg("node"));
+  cls.def(
+      "_GetHintFromComment",
+      [](HintWalkerObject&, nb::handle comment) {
+        const HostText text = HostText::FromStr(comment);
+        std::string hint;
+        return CTypeHintWalker::GetHintFromComment(text.text(), hint) ? StrOf(hint) : nb::object(nb::none());
+      },
+      nb::arg("comment"));
+  cls.def(
+      "_GetRowRange",
+      [](HintWalkerObject& self, nb::handle node) {
+        const auto [first, end] = self.hints().GetRowRange(RefOf(node).node());
+        return nb::make_tuple(first, end);
+      },
+      nb::arg("node"));
+  cls.def(
+      "_FindComment",
+      [](HintWalkerObject& self, nb::handle row, nb::handle logical) {
+        LogicalLine* line = logical.is_none() ? nullptr : &LineOf(logical).line();
+        const CTypeHintWalker::Comment comment = self.hints().FindComment(Int64Of(row), line);
+        return TextAndIndex(StrOf(comment.text), comment.tok_i);
+      },
+      nb::arg("row"), nb::arg("logical") = nb::none());
+  cls.def(
+      "_IsDottedName",
+      [](HintWalkerObject&, nb::handle text) { return CTypeHintWalker::IsDottedName(HostText::FromStr(text).text()); },
+      nb::arg("text"));
+  cls.def(
+      "_ParseHint",
+      [](HintWalkerObject& self, nb::handle hint, nb::handle tok_i, Truth call_general_node_walker) {
+        const HostText text = HostText::FromStr(hint);
+        const int32_t index = Int32Of(tok_i);
+        Recording recording(self.walker->fLogical);
+        return WrapHintTree(self, self.hints().ParseHint(text.text(), index, call_general_node_walker));
+      },
+      nb::arg("hint"), nb::arg("tok_i"), nb::arg("call_general_node_walker"));
+  cls.def(
+      "_RaiseHintSyntaxError",
+      [](HintWalkerObject& self, nb::handle tok_i, nb::handle offset) {
+        self.hints().RaiseHintSyntaxError(Int32Of(tok_i), Int64Of(offset));
+      },
+      nb::arg("tok_i"), nb::arg("utf8_offset_in_hint"));
+}
+
+void BindHintStatements(HintClass& cls) {
+  cls.def("_VisitExprStmt", &VisitStatement<&CTypeHintWalker::VisitExprStmt>, nb::arg("node"));
+  cls.def("_VisitForStmt", &VisitStatement<&CTypeHintWalker::VisitForStmt>, nb::arg("node"));
+  cls.def("_VisitWithStmt", &VisitStatement<&CTypeHintWalker::VisitWithStmt>, nb::arg("node"));
+  cls.def(
+      "_VisitFuncdefStmt",
+      [](HintWalkerObject& self, nb::handle node) { VisitStatement<&CTypeHintWalker::VisitFuncdefStmt>(self, node); },
+      nb::arg("node"));
+  cls.def(
+      "_ProcessTarget",
+      [](HintWalkerObject& self, nb::handle node, nb::handle target) {
+        CNode* statement = RefOf(node).node();
+        CNode* target_node = NodeOrNull(target, NodeKind::kCExpression);
+        Recording recording(self.walker->fLogical);
+        self.hints().ProcessTarget(statement, target_node);
+      },
+      nb::arg("node"), nb::arg("target").none());
+  cls.def(
+      "_ProcessNameAndHintNodes",
+      [](HintWalkerObject& self, nb::handle name_node, nb::handle hint_node, Truth is_arg) {
+        CNode* name = NodeOrNull(name_node, NodeKind::kCExpression);
+        CNode* hint = NodeOrNull(hint_node, NodeKind::kCExpression);
+        Recording recording(self.walker->fLogical);
+        self.hints().ProcessNameAndHintNodes(name, hint, is_arg);
+      },
+      nb::arg("name_node").none(), nb::arg("hint_node").none(), nb::arg("is_arg"));
+  cls.def(
+      "_GetHintInfoStr",
+      [](HintWalkerObject& self, nb::handle node) {
+        std::string info;
+        return self.hints().GetHintInfoStr(NodeOrNull(node), info) ? BytesOf(info) : nb::object(nb::none());
+      },
+      nb::arg("node").none());
+  cls.def(
+      "_AddSymInfo",
+      [](HintWalkerObject& self, nb::handle name, nb::handle istr, Truth is_arg) {
+        const HostText name_text = HostText::FromStrOrBytes(name);
+        const HostText info_text = HostText::FromStrOrBytes(istr);
+        Recording recording(self.walker->fLogical);
+        self.hints().AddSymInfo(name_text.text(), info_text.text(), is_arg);
+      },
+      nb::arg("name"), nb::arg("istr"), nb::arg("is_arg"));
+}
+
+void BindSignatures(HintClass& cls) {
+  cls.def(
+      "_RewriteFuncdefCommentHint",
+      [](HintWalkerObject&, nb::handle hint) {
+        const HostText text = HostText::FromStr(hint);
+        const CTypeHintWalker::RewrittenHint rewritten = CTypeHintWalker::RewriteFuncdefCommentHint(text.text());
+        nb::list tokens, offsets;
+        for (const std::string& token : rewritten.tokens) tokens.append(StrOf(token));
+        for (int64_t offset : rewritten.utf8_offsets) offsets.append(offset);
+        return nb::make_tuple(tokens, offsets);
+      },
+      nb::arg("hint"));
+  cls.def(
+      "_ProcessFuncdefComment",
+      [](HintWalkerObject& self, nb::handle hint, nb::handle tok_i, nb::handle funcdef_logical, Truth is_arg) {
+        const HostText text = HostText::FromStr(hint);
+        const int32_t index = Int32Of(tok_i);
+        LogicalLine* line = funcdef_logical.is_none() ? nullptr : &LineOf(funcdef_logical).line();
+        Recording recording(self.walker->fLogical);
+        self.hints().ProcessFuncdefComment(text.text(), index, line, is_arg);
+      },
+      nb::arg("hint"), nb::arg("tok_i"), nb::arg("funcdef_logical").none(), nb::arg("is_arg"));
+  cls.def(
+      "_ProcessArgSpecificComment",
+      [](HintWalkerObject& self, nb::handle arg) {
+        const CArgInfo info = ArgOf(arg);
+        Recording recording(self.walker->fLogical);
+        self.hints().ProcessArgSpecificComment(info);
+      },
+      nb::arg("arg"));
+  cls.def(
+      "_ParseFuncdefCommentHint",
+      [](HintWalkerObject& self, nb::handle hint, nb::handle tok_i) {
+        const HostText text = HostText::FromStr(hint);
+        return WrapHintTree(self, self.hints().ParseFuncdefCommentHint(text.text(), Int32Of(tok_i)));
+      },
+      nb::arg("hint"), nb::arg("tok_i"));
+}
+
+void BindHintWalker(nb::module_& m) {
+  HintClass cls(m, "CTypeHintWalker", "Finds type information in a statement and records it on its logical line.");
+  cls.def("__init__", &InitHintWalker, nb::arg("version_triple").none(), nb::arg("grammar_file"),
+          nb::arg("general_node_walker").none());
+  cls.def_prop_rw(
+      "_fCommentHintCount", [](HintWalkerObject& self) { return self.hints().fCommentHintCount; },
+      [](HintWalkerObject& self, nb::handle value) { self.hints().fCommentHintCount = Int32Of(value); });
+  cls.def_prop_ro("_fHintParser", [](HintWalkerObject& self) {
+    if (!self.hint_parser.is_valid()) {
+      nb::object keywords;
+      KeywordList(nb::none(), keywords);
+      self.hint_parser = NewParserObject(std::shared_ptr<CPGenParserImpl>(self.walker, &self.hints().hint_parser()),
+                                         self.version_triple, std::move(keywords));
+    }
+    return self.hint_parser;
+  });
+  cls.def_prop_ro("_fGeneralNodeWalker", [](HintWalkerObject& self) { return self.general_node_walker; });
+  cls.def(
+      "Walk",
+      [](HintWalkerObject& self, nb::handle node, nb::handle logical, Truth first_in_def) {
+        CNode* root = NodeOrNull(node);
+        LineObject& line = LineOf(logical);
+        Recording recording(&line);
+        self.logical = nb::borrow(logical);
+        self.walker->Walk(root, &line.line(), first_in_def);
+      },
+      nb::arg("node").none(), nb::arg("logical").none(), nb::arg("first_in_def"));
+  cls.def(
+      "_VisitNode",
+      [](HintWalkerObject& self, nb::handle node) {
+        CNode* root = NodeOrNull(node);
+        Recording recording(self.walker->fLogical);
+        self.walker->VisitNode(root);
+      },
+      nb::arg("node").none());
+  BindHintComments(cls);
+  BindHintStatements(cls);
+  BindSignatures(cls);
+}
+
+}  // namespace
+
+nb::object NewHintWalkerObject(std::shared_ptr<CTypeHintWalker> walker, nb::object general_node_walker,
+                               nb::object version_triple) {
+  HintWalkerObject object;
+  object.walker = std::move(walker);
+  object.general_node_walker = std::move(general_node_walker);
+  object.version_triple = std::move(version_triple);
+  return nb::cast(std::move(object));
+}
+
+void BindHints(nb::module_& tarvex) {
+  BindDispatchWalker(tarvex);
+  BindHintWalker(tarvex);
+}
+
+}  // namespace quillet::host

@@ -1,0 +1,411 @@
+// CPGenAnalyzer (the interface), CPGenParserImpl, and the grammar files' names.
+#include <limits>
+#include <span>
+
+#include "parser/parser.h"
+#include "quillet/tarvex/bindings.h"
+#include "quillet/tarvex/convert.h"
+#include "quillet/tarvex/errors.h"
+#include "quillet/tarvex/line_object.h"
+#include "quillet/tarvex/matchcase_object.h"
+#include "quillet/tarvex/node_ref.h"
+#include "quillet/tarvex/parser_object.h"
+
+namespace quillet::host {
+namespace {
+
+PyObject* g_builtin_convert = nullptr;  // CPGenParserImpl.convert
+
+// An optpgen.Parser of the host's whose converter is a Python subclass with a convert of its own.
+class HostEngine final : public ExternalEngine {
+ public:
+  HostEngine(ParserObject& owner, nb::object parser) : owner_(owner), parser_(std::move(parser)) {}
+
+  void Setup(int start) override {
+    CallingHost([&] { parser_.attr("setup")(start); });
+  }
+  void AddToken(int type, Text value, int32_t context) override {
+    CallingHost([&] { parser_.attr("addtoken")(type, StrOf(value), context); });
+  }
+  CNode* Finish() override {
+    return CallingHost([&] {
+      root_ = parser_.attr("finish")();
+      if (PyTuple_Check(root_.ptr())) return RecursiveConvert(owner_.parser->factory(), root_);
+      return RefOf(root_).node();
+    });
+  }
+  const nb::object& parser() const { return parser_; }
+
+ private:
+  ParserObject& owner_;
+  nb::object parser_;
+  nb::object root_;  // keeps the wrapper until the caller has its own
+};
+
+nb::object& MadeOnce(nb::object& slot, nb::object (*make)(ParserObject&), ParserObject& self) {
+  if (!slot.is_valid()) slot = make(self);
+  return slot;
+}
+
+nb::object MakeGrammar(ParserObject& self) {
+  return nb::cast(GrammarObject{std::shared_ptr<const Grammar>(self.parser, &self.parser->grammar())});
+}
+nb::object MakeFactory(ParserObject& self) {
+  return NewFactoryObject(std::shared_ptr<CNodeFactory>(self.parser, &self.parser->factory()), self.keywords);
+}
+nb::object MakeClsForStateList(ParserObject& self) {
+  nb::list list;
+  for (NodeKind kind : self.parser->kinds_for_states()) list.append(ClassOfKind(kind));
+  return list;
+}
+nb::object GrammarOf(ParserObject& self) { return MadeOnce(self.grammar, &MakeGrammar, self); }
+
+// The engine as the host sees it: one that calls the parser object's convert.
+nb::object NewEngine(ParserObject& self, nb::handle converter) {
+  return nb::module_::import_("quillet.optpgen")
+      .attr("CreateParser")(GrammarOf(self), converter, nb::arg("promotesinglechild") = true);
+}
+
+void InitParser(nb::pointer_and_handle<ParserObject> self, nb::handle version_triple, nb::handle grammar_file,
+                nb::handle keyword_seq, Truth py3_grammar) {
+  auto* object = new (self.p) ParserObject();
+  try {
+    CPGenParserImpl::Options options;
+    options.version = VersionOf(version_triple);
+    options.grammar_file = ResolveGrammarFile(grammar_file);
+    options.keywords = KeywordList(keyword_seq, object->keywords);
+    options.py3_grammar = py3_grammar;
+    object->version_triple = nb::borrow(version_triple);
+    object->parser = std::make_shared<CPGenParserImpl>(options);
+    nb::object convert = self.h.type().attr("convert");
+    if (!convert.is(g_builtin_convert)) {
+      auto external = std::make_unique<HostEngine>(*object, NewEngine(*object, self.h));
+      object->parser->set_external_engine(external.get());
+      object->engine = external->parser();
+      object->external = std::move(external);
+    }
+  } catch (...) {
+    object->~ParserObject();
+    throw;
+  }
+}
+
+// ---- parsing ----
+
+// Runs an operation of the parser that makes nodes from a source.
+template <class Parse>
+nb::object Parsed(CPGenParserImpl& parser, const Ref<SourceText>& source, Parse&& parse) {
+  PinSource(parser.factory().pool(), source);
+  return Wrap(parse(), source);
+}
+
+nb::object ParseToNode(CPGenParserImpl& parser, nb::handle logical, bool in_async_def) {
+  LogicalLine& line = LineOf(logical).line();
+  return Parsed(parser, line.source, [&] { return parser.ParseToNode(line, in_async_def); });
+}
+
+CNode* ParseToks(CPGenParserImpl& parser, TokenSpan toks, bool in_async_def, const PositionView* positions) {
+  if (positions != nullptr) return parser.ParseToksToNode(toks, in_async_def, *positions);
+  CNode* node = parser.ParseSpecialCases(toks, in_async_def, PositionView());
+  return node != nullptr ? node : parser.ParseToksToNodeImpl(toks, in_async_def, nullptr);
+}
+
+nb::object ParseTokenListToNode(CPGenParserImpl& parser, nb::handle toks, bool in_async_def) {
+  if (!toks.is_none() && !PyList_Check(toks.ptr())) ThrowExpected("list", toks);
+  TokensArg tokens(toks);
+  return Parsed(parser, tokens.source, [&] { return parser.ParseTokenListToNode(tokens.toks(), in_async_def); });
+}
+
+nb::object GetTypeParameterNodes(CPGenParserImpl& parser, nb::handle toks) {
+  TokensArg tokens(toks);
+  PinSource(parser.factory().pool(), tokens.source);
+  return WrapList(parser.GetTypeParameterNodes(tokens.toks()), tokens.source);
+}
+
+// A special case: an operation on tokens, positions and the index of a token.
+template <CNode* (CPGenParserImpl::*Operation)(TokenSpan, bool, const PositionView&, int64_t)>
+nb::object SpecialCase(ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions,
+                       nb::handle tok_i) {
+  TokensArg tokens(toks);
+  PositionsArg places(positions);
+  const int64_t index = Int64Of(tok_i);
+  return Parsed(*self.parser, tokens.source,
+                [&] { return (self.parser.get()->*Operation)(tokens.toks(), in_async_def, places.Required(), index); });
+}
+
+void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
+  cls.def(
+      "ParseToNode",
+      [](ParserObject& self, nb::handle logical, Truth in_async_def) {
+        return ParseToNode(*self.parser, logical, in_async_def);
+      },
+      nb::arg("logical"), nb::arg("in_async_def"));
+  cls.def(
+      "ParseToksToNode",
+      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions) {
+        TokensArg tokens(toks);
+        PositionsArg places(positions);
+        return Parsed(*self.parser, tokens.source,
+                      [&] { return ParseToks(*self.parser, tokens.toks(), in_async_def, places.view()); });
+      },
+      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none());
+  cls.def(
+      "_ParseToksToNodeImpl",
+      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions) {
+        TokensArg tokens(toks);
+        PositionsArg places(positions);
+        return Parsed(*self.parser, tokens.source,
+                      [&] { return self.parser->ParseToksToNodeImpl(tokens.toks(), in_async_def, places.view()); });
+      },
+      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none());
+  cls.def(
+      "ParseTokenListToNode",
+      [](ParserObject& self, nb::handle toks, Truth in_async_def) {
+        return ParseTokenListToNode(*self.parser, toks, in_async_def);
+      },
+      nb::arg("toks").none(), nb::arg("in_async_def"));
+  cls.def(
+      "convert",
+      [](ParserObject& self, nb::handle type, nb::handle value, nb::handle context, nb::handle children) {
+        return ConvertSingleNode(self.parser->factory(), type, value, context, children);
+      },
+      nb::arg("type"), nb::arg("value").none(), nb::arg("context").none(), nb::arg("children").none());
+  cls.def(
+      "DiscardNode", [](ParserObject& self, nb::handle node) { self.parser->DiscardNode(NodeOrNull(node)); },
+      nb::arg("node").none());
+  cls.def(
+      "_AddTokenList",
+      [](ParserObject& self, nb::handle tok_list, nb::handle context) {
+        TokensArg tokens(tok_list);
+        const int32_t index = Int32Of(context);
+        PinSource(self.parser->factory().pool(), tokens.source);
+        self.parser->AddTokenList(tokens.toks(), index);
+      },
+      nb::arg("tok_list").none(), nb::arg("context"));
+  cls.def(
+      "_ShouldSkipSlash",
+      [](ParserObject&, nb::handle tok_i, nb::handle positions) {
+        PositionsArg places(positions);
+        return CPGenParserImpl::ShouldSkipSlash(Int64Of(tok_i), places.view());
+      },
+      nb::arg("tok_i"), nb::arg("positions").none());
+  cls.def(
+      "_FindNextNonSkipIndex",
+      [](ParserObject&, nb::handle toks, nb::handle tok_i) {
+        TokensArg tokens(toks);
+        return CPGenParserImpl::FindNextNonSkipIndex(tokens.toks(), Int64Of(tok_i));
+      },
+      nb::arg("toks").none(), nb::arg("tok_i"));
+  cls.def(
+      "_FindPrevNonSkipIndex",
+      [](ParserObject&, nb::handle toks, nb::handle tok_i) {
+        TokensArg tokens(toks);
+        return CPGenParserImpl::FindPrevNonSkipIndex(tokens.toks(), Int64Of(tok_i));
+      },
+      nb::arg("toks").none(), nb::arg("tok_i"));
+  cls.def(
+      "_NonNestedFindTokenIndex",
+      [](ParserObject&, nb::handle tok, nb::handle toks, nb::handle start, nb::handle end) {
+        const HostText wanted = HostText::FromStr(tok);
+        TokensArg tokens(toks);
+        return CPGenParserImpl::NonNestedFindTokenIndex(wanted.text(), tokens.toks(), Int64Of(start), Int64Of(end));
+      },
+      nb::arg("tok"), nb::arg("toks").none(), nb::arg("start"), nb::arg("end"));
+  cls.def(
+      "_RaiseParseError",
+      [](ParserObject& self, nb::handle context) { self.parser->RaiseParseError(Int64Of(context)); },
+      nb::arg("context"));
+}
+
+void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
+  cls.def(
+      "_ParseSpecialCases",
+      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions) {
+        TokensArg tokens(toks);
+        PositionsArg places(positions);
+        return Parsed(*self.parser, tokens.source,
+                      [&] { return self.parser->ParseSpecialCases(tokens.toks(), in_async_def, places.Required()); });
+      },
+      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none());
+  const auto def_case = [&cls](const char* name, auto operation) {
+    cls.def(name, operation, nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none(),
+            nb::arg("tok_i"));
+  };
+  def_case("_ParseSpecialCaseParenthesizedWith", &SpecialCase<&CPGenParserImpl::ParseSpecialCaseParenthesizedWith>);
+  def_case("_ParseSpecialCaseExceptStar", &SpecialCase<&CPGenParserImpl::ParseSpecialCaseExceptStar>);
+  def_case("_ParseSpecialCaseWithTypeParameter", &SpecialCase<&CPGenParserImpl::ParseSpecialCaseWithTypeParameter>);
+  cls.def(
+      "_NodesForTypeParameters",
+      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions, nb::handle start,
+         nb::handle end, Truth raise_errors) {
+        TokensArg tokens(toks);
+        PositionsArg places(positions);
+        PinSource(self.parser->factory().pool(), tokens.source);
+        return WrapList(self.parser->NodesForTypeParameters(tokens.toks(), in_async_def, places.view(), Int64Of(start),
+                                                            Int64Of(end), raise_errors),
+                        tokens.source);
+      },
+      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none(), nb::arg("start"), nb::arg("end"),
+      nb::arg("raise_errors"));
+  cls.def(
+      "_CreateSingleTypeParameterNode",
+      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions, nb::handle start,
+         nb::handle end, Truth raise_errors) {
+        TokensArg tokens(toks);
+        PositionsArg places(positions);
+        return Parsed(*self.parser, tokens.source, [&] {
+          return self.parser->CreateSingleTypeParameterNode(tokens.toks(), in_async_def, places.view(), Int64Of(start),
+                                                            Int64Of(end), raise_errors);
+        });
+      },
+      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none(), nb::arg("start"), nb::arg("end"),
+      nb::arg("raise_errors"));
+  cls.def(
+      "GetTypeParameterNodes",
+      [](ParserObject& self, nb::handle toks) { return GetTypeParameterNodes(*self.parser, toks); },
+      nb::arg("toks").none());
+}
+
+void BindFields(nb::class_<ParserObject, AnalyzerBase>& cls) {
+  cls.def_prop_ro("_fGrammar", &GrammarOf);
+  cls.def_prop_ro("_fPy3Grammar", [](ParserObject& self) { return self.parser->py3_grammar(); });
+  cls.def_prop_ro("_fFileInputNumber", [](ParserObject& self) { return self.parser->file_input_number(); });
+  cls.def_prop_ro("_fKeywords", [](ParserObject& self) { return self.keywords; });
+  cls.def_prop_ro("_fParser", [](nb::handle self) {
+    auto& object = nb::cast<ParserObject&>(self);
+    if (!object.engine.is_valid()) object.engine = NewEngine(object, self);
+    return object.engine;
+  });
+  cls.def_prop_ro("_fNodeFactory", [](ParserObject& self) { return MadeOnce(self.node_factory, &MakeFactory, self); });
+  cls.def_prop_ro("_fClsForStateList",
+                  [](ParserObject& self) { return MadeOnce(self.cls_for_state_list, &MakeClsForStateList, self); });
+  cls.def_prop_ro("_fVersionTriple", [](ParserObject& self) { return self.version_triple; });
+  cls.def_prop_ro("_fAsyncAlwaysKeyword", [](ParserObject& self) { return self.parser->async_always_keyword(); });
+  cls.def_prop_ro("_fMatchCaseStatementParser", [](nb::handle self) {
+    auto& object = nb::cast<ParserObject&>(self);
+    if (!object.match_case_parser.is_valid()) {
+      object.match_case_parser = NewMatchcaseObject(
+          std::shared_ptr<CMatchCaseStatementParser>(object.parser, &object.parser->match_case_parser()), self);
+    }
+    return object.match_case_parser;
+  });
+  cls.def("_BuildClsForStateList", &MakeClsForStateList);
+  nb::dict cls_for_state;
+  for (const auto& [name, kind] : KindsByStateName()) cls_for_state[StrOf(name)] = ClassOfKind(kind);
+  cls.attr("kClsForState") = cls_for_state;
+}
+
+// A parser and what it made refer to each other.
+int TraverseParser(PyObject* self, visitproc visit, void* arg) {
+  Py_VISIT(Py_TYPE(self));
+  if (!nb::inst_ready(self)) return 0;
+  ParserObject* object = nb::inst_ptr<ParserObject>(self);
+  Py_VISIT(object->engine.ptr());
+  Py_VISIT(object->match_case_parser.ptr());
+  return 0;
+}
+
+int ClearParser(PyObject* self) {
+  ParserObject* object = nb::inst_ptr<ParserObject>(self);
+  nb::object engine = std::move(object->engine);
+  nb::object match_case_parser = std::move(object->match_case_parser);
+  if (object->external) {
+    object->parser->set_external_engine(nullptr);
+    object->external.reset();
+  }
+  return 0;
+}
+
+const PyType_Slot kParserSlots[] = {{Py_tp_traverse, reinterpret_cast<void*>(TraverseParser)},
+                                    {Py_tp_clear, reinterpret_cast<void*>(ClearParser)},
+                                    {0, nullptr}};
+
+}  // namespace
+
+std::string ResolveGrammarFile(nb::handle grammar_file) {
+  nb::object path = nb::borrow(grammar_file);
+  if (!nb::cast<bool>(nb::module_::import_("os.path").attr("isabs")(path))) {
+    path = nb::module_::import_("quillet.config").attr("GetNorvaFilename")(nb::str("resources/pgen-grammars/") + path);
+  }
+  nb::object bytes = nb::module_::import_("os").attr("fsencode")(path);
+  return std::string(HostText::FromBytes(bytes).text());
+}
+
+std::vector<std::string> KeywordList(nb::handle keyword_seq, nb::object& dict) {
+  nb::object sequence =
+      keyword_seq.is_none() ? nb::object(nb::module_::import_("keyword").attr("kwlist")) : nb::borrow(keyword_seq);
+  nb::dict words;
+  std::vector<std::string> keywords;
+  for (nb::handle word : nb::iter(sequence)) {
+    const HostText text = HostText::FromStrOrBytes(word);
+    keywords.emplace_back(text.text());
+    words[StrOf(text.text())] = nb::none();
+  }
+  dict = words;
+  return keywords;
+}
+
+nb::object NewParserObject(std::shared_ptr<CPGenParserImpl> parser, nb::object version_triple, nb::object keywords) {
+  ParserObject object;
+  object.parser = std::move(parser);
+  object.version_triple = std::move(version_triple);
+  object.keywords = std::move(keywords);
+  return nb::cast(std::move(object));
+}
+
+TokensArg::TokensArg(nb::handle toks) : source(SourceOfTokens(TupleOf(toks))) {}
+
+PositionsArg::PositionsArg(nb::handle positions) : is_none(positions.is_none()) {
+  if (is_none) return;
+  positions_ = PositionsOf(TupleOf(positions));
+  view_ = PositionView(positions_);
+}
+
+const PositionView& PositionsArg::Required() const {
+  if (is_none) ThrowError(ErrorKind::kTypeError, "'NoneType' object is not subscriptable");
+  return view_;
+}
+
+void BindParser(nb::module_& tarvex) {
+  tarvex.attr("kPy2DefaultGrammar") = kPy2DefaultGrammar;
+  tarvex.attr("kPy3DefaultGrammar") = kPy3DefaultGrammar;
+
+  nb::class_<AnalyzerBase, NodeConverter> base(tarvex, "CPGenAnalyzer",
+                                               "Analyses a logical line with a parser built on grammar tables.");
+  base.def(nb::init<>());
+  base.def(
+      "AnalyzeSingleLogical",
+      [](AnalyzerBase&, nb::handle, nb::handle, nb::handle) { ThrowError(ErrorKind::kNotImplementedError, ""); },
+      nb::arg("logical").none(), nb::arg("in_async_def"), nb::arg("first_in_def") = false);
+
+  nb::class_<ParserObject, AnalyzerBase> cls(tarvex, "CPGenParserImpl", nb::type_slots(kParserSlots),
+                                             "Turns the tokens of one logical line into a tree of nodes.");
+  cls.def("__init__", &InitParser, nb::arg("version_triple").none(), nb::arg("grammar_file") = kPy3DefaultGrammar,
+          nb::arg("keyword_seq") = nb::none(), nb::arg("py3_grammar") = true);
+  BindFields(cls);
+  BindFeeding(cls);
+  BindSpecialCases(cls);
+  g_builtin_convert = nb::object(cls.attr("convert")).ptr();  // kept by the class
+
+  tarvex.def(
+      "NextNonRemovedTokenInTuple",
+      [](nb::handle toks, nb::handle i) {
+        TokensArg tokens(toks);
+        const Token* token = NextNonRemovedTokenInTuple(tokens.toks(), Int64Of(i));
+        return token == nullptr ? nb::object(nb::none()) : StrOfToken(*token);
+      },
+      nb::arg("toks").none(), nb::arg("i"));
+}
+
+// Operations that the analyzer forwards to its parser.
+nb::object ForwardParseToNode(CPGenParserImpl& parser, nb::handle logical, bool in_async_def) {
+  return ParseToNode(parser, logical, in_async_def);
+}
+nb::object ForwardParseTokenListToNode(CPGenParserImpl& parser, nb::handle toks, bool in_async_def) {
+  return ParseTokenListToNode(parser, toks, in_async_def);
+}
+nb::object ForwardGetTypeParameterNodes(CPGenParserImpl& parser, nb::handle toks) {
+  return GetTypeParameterNodes(parser, toks);
+}
+
+}  // namespace quillet::host

@@ -1,0 +1,585 @@
+// The node classes, their records, the factory, and the argument records.
+#include <array>
+#include <unordered_map>
+
+#include "quillet/tarvex/bindings.h"
+#include "quillet/tarvex/convert.h"
+#include "quillet/tarvex/errors.h"
+#include "quillet/tarvex/node_ref.h"
+#include "tree/arg_info.h"
+#include "tree/factory.h"
+#include "tree/nodes.h"
+
+namespace quillet::host {
+namespace {
+
+std::array<PyObject*, kNodeKindCount> g_classes{};
+
+// ---- records ----
+
+// A pool for records that the host makes: it may bind a record to a class of its own.
+class HostPool : public NodePool {
+ public:
+  std::unordered_map<CNodeClassInfo*, nb::object> classes;
+};
+
+struct ClassInfoObject {
+  CNodeClassInfo* info = nullptr;
+  Ref<NodePool> pool;
+
+  ~ClassInfoObject();
+};
+
+std::unordered_map<CNodeClassInfo*, PyObject*>& ClassInfoObjects() {
+  static auto* objects = new std::unordered_map<CNodeClassInfo*, PyObject*>;
+  return *objects;
+}
+
+ClassInfoObject::~ClassInfoObject() {
+  if (info != nullptr) ClassInfoObjects().erase(info);
+}
+
+// The host's class that serves a record: its own one, or that of the kind.
+nb::handle ClassOfInfo(CNodeClassInfo* info) {
+  if (auto* pool = dynamic_cast<HostPool*>(info->pool)) {
+    auto found = pool->classes.find(info);
+    if (found != pool->classes.end()) return found->second;
+  }
+  return ClassOfKind(info->kind);
+}
+
+CNodeClassInfo* NewInfo(const Ref<HostPool>& pool, nb::handle cls, int32_t node_type, Text name) {
+  const NodeKind kind = KindOfClass(cls);
+  CNodeClassInfo* info = pool->NewClassInfo(kind, node_type, name);
+  if (!cls.is(ClassOfKind(kind))) pool->classes.emplace(info, nb::borrow(cls));
+  return info;
+}
+
+void InitClassInfo(nb::pointer_and_handle<ClassInfoObject> self, nb::handle cls, nb::handle nodetype, nb::handle name) {
+  const int32_t number = Int32Of(nodetype);
+  const HostText name_text = HostText::FromStr(name, true);
+  Ref<HostPool> pool(new HostPool);
+  CNodeClassInfo* info = NewInfo(pool, cls, number, name_text.text());
+  new (self.p) ClassInfoObject{info, Ref<NodePool>(pool.get())};
+  ClassInfoObjects()[info] = self.h.ptr();
+}
+
+CNodeClassInfo* InfoOrNull(nb::handle object) {
+  if (object.is_none()) return nullptr;
+  ClassInfoObject* info;
+  if (!nb::try_cast(object, info)) ThrowExpected("CNodeClassInfo", object);
+  return info->info;
+}
+
+// ---- nodes ----
+
+template <class T>
+void InitNode(nb::pointer_and_handle<NodeHandle<T>> self, nb::handle cls_info) {
+  constexpr NodeKind kind = NodeKindRange<T>::kFirst;
+  CNodeClassInfo* info = InfoOrNull(cls_info);
+  if (info != nullptr && info->kind != kind) ThrowError(ErrorKind::kTypeError, "the record is one of another class");
+  CNode* node = info == nullptr ? NewBareNode(kind) : info->pool->Construct(kind, info);
+  auto* handle = new (self.p) NodeHandle<T>();
+  handle->Attach(self.h.ptr(), node, {});
+  if (info == nullptr) handle->IsLoneBareNode();
+}
+
+void SetText(NodeRef& self, nb::handle value) {
+  const HostText text = HostText::FromStr(value, true);
+  CNode* node = self.node();
+  const Text stored = node->pool->Intern(text.text());
+  node->text = stored.data();
+  node->text_length = static_cast<uint32_t>(stored.size());
+  node->code = IsNone(stored) ? tok::REMOVED : CodeOfText(stored);
+}
+
+void BindNodeCore(nb::class_<NodeHandle<CNode>>& cls) {
+  using Handle = NodeHandle<CNode>;
+  cls.def_prop_rw(
+      "fChildren", [](Handle& self) { return self.GetChildren(); },
+      [](Handle& self, nb::handle value) { self.SetChildren(value); }, nb::arg("value").none());
+  cls.def_prop_rw(
+      "fText", [](Handle& self) { return StrOf(self.node()->fText()); },
+      [](Handle& self, nb::handle value) { SetText(self, value); }, nb::arg("value").none());
+  cls.def_prop_rw(
+      "fContext", [](Handle& self) { return HostContext(self.node()->fContext); },
+      [](Handle& self, nb::handle value) {
+        CNode* node = self.node();
+        node->pool->SetContext(node, CoreContext(value, node->pool));
+      },
+      nb::arg("value").none());
+  cls.def_prop_ro("fClsInfo", [](Handle& self) { return WrapClassInfo(self.node()->fClsInfo); });
+  cls.def_prop_ro("fNextFree", [](Handle& self) { return Wrap(self.node()->fNextFree, {}); });
+
+  const auto count = [](Handle& self) {
+    self.Synchronise();
+    return self.node()->GetChildCount();
+  };
+  const auto child_text = [](Handle& self, nb::handle index) {
+    self.Synchronise();
+    return StrOf(self.node()->GetChildText(Int64Of(index)));
+  };
+  cls.def("GetChildCount", count).def("_GetChildCount", count);
+  cls.def("GetChildText", child_text, nb::arg("index")).def("_GetChildText", child_text, nb::arg("index"));
+  cls.def(
+      "GetChild",
+      [](Handle& self, nb::handle index) {
+        self.Synchronise();
+        return Wrap(self.node()->GetChild(Int32Of(index)), self.source());
+      },
+      nb::arg("index"));
+  cls.def("GetStateName", [](nb::handle self) {
+    // A class of the host's own goes by its own name.
+    CNode* node = RefOf(self).node();
+    return node->fClsInfo == nullptr ? nb::object(nb::handle((PyObject*)Py_TYPE(self.ptr())).attr("__name__"))
+                                     : StrOf(node->GetStateName());
+  });
+  cls.def(
+      "_DoesChildTextMatch",
+      [](Handle& self, nb::handle text) {
+        self.Synchronise();
+        const HostText wanted = HostText::FromStr(text);
+        return self.node()->DoesChildTextMatch(wanted.text());
+      },
+      nb::arg("text"));
+  cls.def("__repr__", [](nb::handle self) {
+    CNode* node = RefOf(self).node();
+    nb::object state = node->fClsInfo == nullptr
+                           ? nb::object(nb::handle((PyObject*)Py_TYPE(self.ptr())).attr("__name__"))
+                           : StrOf(node->GetStateName());
+    return nb::str("{}: {}").format(nb::repr(nb::handle((PyObject*)Py_TYPE(self.ptr()))), state);
+  });
+}
+
+void BindNodeClasses(nb::module_& m) {
+  const auto remember = [](NodeKind kind, nb::handle cls) {
+    g_classes[static_cast<int>(kind)] = nb::borrow(cls).release().ptr();
+    cls.attr("kSupportedRules") = nb::list();
+  };
+  const auto bind = [&]<class T, class Base>(NodeKind kind, const char* name, T*, Base*) {
+    if constexpr (std::is_same_v<T, Base>) {
+      nb::class_<NodeHandle<T>> cls(m, name, "A node of a syntax tree.");
+      cls.def("__init__", &InitNode<T>, nb::arg("cls_info") = nb::none());
+      remember(kind, cls);
+      BindNodeCore(cls);
+    } else {
+      nb::class_<NodeHandle<T>, NodeHandle<Base>> cls(m, name);
+      cls.def("__init__", &InitNode<T>, nb::arg("cls_info") = nb::none());
+      remember(kind, cls);
+    }
+  };
+#define QUILLET_NODE(name, base) \
+  bind(NodeKind::k##name, #name, static_cast<name*>(nullptr), static_cast<base*>(nullptr));
+#include "tree/node_kinds.def"
+#define QUILLET_NODE_RULE(name, rule) \
+  nb::cast<nb::list>(nb::handle(g_classes[static_cast<int>(NodeKind::k##name)]).attr("kSupportedRules")).append(rule);
+#include "tree/node_kinds.def"
+}
+
+// ---- argument records ----
+
+struct ArgInfoObject {
+  nb::object name = nb::none();
+  nb::object value = nb::none();
+  nb::object prefix = nb::none();
+  nb::object type_expr = nb::none();
+};
+
+struct AsNameObject {
+  nb::object module_name = nb::none();
+  nb::object as_name = nb::none();
+};
+
+void BindRecords(nb::module_& m) {
+  nb::class_<ArgInfoObject> arg(m, "CArgInfo", "One parameter of a definition, or one argument of a call.");
+  arg.def(nb::init<>());
+  const auto node_field = [&](const char* name, nb::object ArgInfoObject::*field) {
+    arg.def_prop_rw(
+        name, [field](ArgInfoObject& self) { return self.*field; },
+        [field](ArgInfoObject& self, nb::handle value) {
+          RefOrNull(value);
+          self.*field = nb::borrow(value);
+        },
+        nb::arg("value").none());
+  };
+  node_field("name", &ArgInfoObject::name);
+  node_field("value", &ArgInfoObject::value);
+  node_field("type_expr", &ArgInfoObject::type_expr);
+  arg.def_prop_rw(
+      "prefix", [](ArgInfoObject& self) { return self.prefix; },
+      [](ArgInfoObject& self, nb::handle value) {
+        HostText::FromStr(value, true);
+        self.prefix = nb::borrow(value);
+      },
+      nb::arg("value").none());
+
+  nb::class_<AsNameObject> as_name(m, "CAsName", "One imported name, as written and as bound.");
+  as_name.def(nb::init<>());
+  const auto text_field = [&](const char* name, nb::object AsNameObject::*field) {
+    as_name.def_prop_rw(
+        name, [field](AsNameObject& self) { return self.*field; },
+        [field](AsNameObject& self, nb::handle value) {
+          HostText::FromStr(value, true);
+          self.*field = nb::borrow(value);
+        },
+        nb::arg("value").none());
+  };
+  text_field("module_name", &AsNameObject::module_name);
+  text_field("as_name", &AsNameObject::as_name);
+}
+
+// ---- the factory ----
+
+std::unordered_map<std::string, int> NumbersByText(nb::handle mapping) {
+  std::unordered_map<std::string, int> numbers;
+  nb::object items = nb::steal(PyMapping_Items(mapping.ptr()));
+  if (!items.is_valid()) throw nb::python_error();
+  for (nb::handle item : items) numbers[std::string(HostText::FromStr(item[0]).text())] = Int32Of(nb::object(item[1]));
+  return numbers;
+}
+
+KeywordSet KeywordsOf(nb::handle keywords) {
+  KeywordSet set;
+  const int truth = PyObject_IsTrue(keywords.ptr());
+  if (truth < 0) throw nb::python_error();
+  if (truth == 0) return set;
+  if (!PyDict_Check(keywords.ptr())) ThrowExpected("dict", keywords);
+  set.enabled = true;
+  set.host_lookup = [dict = nb::borrow(keywords)](Text text) {
+    return CallingHost([&] {
+      const int found = PyDict_Contains(dict.ptr(), StrOf(text).ptr());
+      if (found < 0) throw nb::python_error();
+      return found != 0;
+    });
+  };
+  return set;
+}
+
+void InitFactory(nb::pointer_and_handle<FactoryObject> self, nb::handle gram, nb::handle cls_for_nodetype,
+                 nb::handle keywords, nb::handle tok_number2name, nb::handle op_text2number) {
+  std::unordered_map<std::string, int> operators = NumbersByText(op_text2number);
+  nb::object symbol_get = gram.attr("number2symbol").attr("get");
+  nb::object token_get = tok_number2name.attr("get");
+  nb::object classes = TupleOf(cls_for_nodetype);
+  const size_t count = static_cast<size_t>(PyTuple_GET_SIZE(classes.ptr()));
+  std::vector<CNodeFactory::State> states;
+  std::vector<HostText> names(count);
+  for (size_t number = 0; number < count; ++number) {
+    nb::object name = symbol_get(number);
+    if (name.is_none()) name = token_get(number);
+    names[number] = HostText::FromStr(name, true);
+    states.push_back({KindOfClass(PyTuple_GET_ITEM(classes.ptr(), number)), names[number].text()});
+  }
+  Ref<HostPool> pool(new HostPool);
+  auto factory =
+      std::make_shared<CNodeFactory>(Ref<NodePool>(pool.get()), states, KeywordsOf(keywords), std::move(operators));
+  for (size_t number = 0; number < count; ++number) {
+    nb::handle cls = PyTuple_GET_ITEM(classes.ptr(), number);
+    if (!cls.is(ClassOfKind(states[number].kind))) pool->classes.emplace(factory->class_info(number), nb::borrow(cls));
+  }
+  nb::object kept = factory->keywords().enabled ? nb::borrow(keywords) : nb::object(nb::dict());
+  new (self.p) FactoryObject{std::move(factory), std::move(kept), {}, {}};
+}
+
+nb::object ClassInfos(FactoryObject& self) {
+  if (!self.class_infos.is_valid()) {
+    nb::list list;
+    for (size_t i = 0; i < self.factory->state_count(); ++i) list.append(WrapClassInfo(self.factory->class_info(i)));
+    self.class_infos = list;
+  }
+  return self.class_infos;
+}
+
+nb::object OperatorNumbers(FactoryObject& self) {
+  if (!self.op_text2number.is_valid()) {
+    nb::dict dict;
+    for (const auto& [text, number] : self.factory->op_text2number()) dict[StrOf(text)] = number;
+    self.op_text2number = dict;
+  }
+  return self.op_text2number;
+}
+
+// Text of the host's for a node that it makes: kept by the pool.
+Text NodeText(NodePool& pool, nb::handle text) {
+  if (!text.is_none() && !PyUnicode_Check(text.ptr())) ThrowError(ErrorKind::kAssertionError, "");
+  return pool.Intern(HostText::FromStr(text, true).text());
+}
+
+// Children of the host's list, which becomes the node's.
+struct HostChildren {
+  std::vector<CNode*> nodes;
+  bool has_list = false;
+
+  explicit HostChildren(nb::handle list) {
+    if (list.is_none()) return;
+    if (!PyList_Check(list.ptr())) ThrowExpected("list", list);
+    has_list = true;
+    nodes = NodesOf(list, NodeKind::kCNode, true);
+  }
+  // Not null for an empty list, which is not the same as none.
+  CNode* const* data() {
+    static CNode* const none[1] = {nullptr};
+    if (!has_list) return nullptr;
+    return nodes.empty() ? none : nodes.data();
+  }
+  uint32_t count() const { return static_cast<uint32_t>(nodes.size()); }
+};
+
+// A node that was made from the host's list of children keeps that list.
+nb::object WrapWithChildren(CNode* node, nb::handle children) {
+  nb::object wrapper = Wrap(node, {});
+  if (!children.is_none()) RefOf(wrapper).SetChildren(children);
+  return wrapper;
+}
+
+nb::object NewNode(FactoryObject& self, nb::handle cls_info, nb::handle nodetype, nb::handle text, nb::handle context,
+                   nb::handle children) {
+  Int32Of(nodetype);
+  CNodeClassInfo* info = InfoOrNull(cls_info);
+  if (info == nullptr) ThrowNoAttribute("fFirstFree");
+  const Text node_text = NodeText(*info->pool, text);
+  HostChildren nodes(children);
+  CNode* node = self.factory->NewNode(info, node_text, CoreContext(context, info->pool), nodes.data(), nodes.count());
+  return WrapWithChildren(node, children);
+}
+
+CNode* ConvertRaw(CNodeFactory& factory, nb::handle raw_node) {
+  if (!PyTuple_Check(raw_node.ptr())) ThrowExpected("tuple", raw_node);
+  const Py_ssize_t size = PyTuple_GET_SIZE(raw_node.ptr());
+  if (size != 4) {
+    if (size > 4) {
+      PyErr_Format(PyExc_ValueError, "too many values to unpack (expected %zd)", Py_ssize_t{4});
+    } else {
+      PyErr_Format(PyExc_ValueError, "need more than %zd value%.1s to unpack", size, size == 1 ? "" : "s");
+    }
+    throw nb::python_error();
+  }
+  const auto item = [&](Py_ssize_t i) { return nb::handle(PyTuple_GET_ITEM(raw_node.ptr(), i)); };
+  const int32_t type = Int32Of(item(0));
+  nb::handle children = item(3);
+  std::vector<CNode*> converted;
+  if (!children.is_none()) {
+    if (!PyList_Check(children.ptr())) ThrowExpected("list", children);
+    if (Py_EnterRecursiveCall(" in RecursiveConvert")) throw nb::python_error();
+    try {
+      for (Py_ssize_t i = 0; i < PyList_GET_SIZE(children.ptr()); ++i)
+        converted.push_back(ConvertRaw(factory, PyList_GET_ITEM(children.ptr(), i)));
+      Py_LeaveRecursiveCall();
+    } catch (...) {
+      Py_LeaveRecursiveCall();
+      for (CNode* node : converted) factory.pool().Reclaim(node);
+      throw;
+    }
+  }
+  try {
+    NodePool& pool = factory.pool();
+    static CNode* const none[1] = {nullptr};
+    CNode* const* data = children.is_none() ? nullptr : converted.empty() ? none : converted.data();
+    return factory.ConvertSingleNode(type, NodeText(pool, item(1)), CoreContext(item(2), &pool), data,
+                                     static_cast<uint32_t>(converted.size()));
+  } catch (...) {
+    for (CNode* node : converted) factory.pool().Reclaim(node);
+    throw;
+  }
+}
+
+void BindFactory(nb::module_& m) {
+  nb::class_<ClassInfoObject> info(m, "CNodeClassInfo",
+                                   "The record of one parser state; it heads that state's free list.");
+  info.def("__init__", &InitClassInfo, nb::arg("cls"), nb::arg("nodetype"), nb::arg("name").none());
+  info.def_prop_ro("fCls", [](ClassInfoObject& self) { return nb::borrow(ClassOfInfo(self.info)); });
+  info.def_prop_ro("fNodeType", [](ClassInfoObject& self) { return self.info->fNodeType; });
+  info.def_prop_ro("fName", [](ClassInfoObject& self) { return StrOf(self.info->fName); });
+  info.def_prop_ro("fFirstFree", [](ClassInfoObject& self) { return Wrap(self.info->fFirstFree, {}); });
+
+  nb::class_<FactoryObject> cls(m, "CNodeFactory", "Makes nodes from what a parser reduces, and takes them back.");
+  cls.def("__init__", &InitFactory, nb::arg("gram"), nb::arg("cls_for_nodetype"), nb::arg("keywords").none(),
+          nb::arg("tok_number2name"), nb::arg("op_text2number"));
+  cls.def_prop_ro("_fClassInfoList", &ClassInfos);
+  cls.def_prop_ro("_fKeywordClassInfo",
+                  [](FactoryObject& self) { return WrapClassInfo(self.factory->keyword_class_info()); });
+  cls.def_prop_ro("_fKeywords", [](FactoryObject& self) { return self.keywords; });
+  cls.def_prop_ro("_fOperatorStrToNumber", &OperatorNumbers);
+  cls.def(
+      "ConvertSingleNode",
+      [](FactoryObject& self, nb::handle nodetype, nb::handle text, nb::handle context, nb::handle children) {
+        return ConvertSingleNode(*self.factory, nodetype, text, context, children);
+      },
+      nb::arg("nodetype"), nb::arg("text").none(), nb::arg("context").none(), nb::arg("children").none());
+  cls.def("NewNode", &NewNode, nb::arg("cls_info").none(), nb::arg("nodetype"), nb::arg("text").none(),
+          nb::arg("context").none(), nb::arg("children").none());
+  cls.def(
+      "NewKeywordNode",
+      [](FactoryObject& self, nb::handle text, nb::handle context) {
+        NodePool& pool = self.factory->pool();
+        return Wrap(self.factory->NewKeywordNode(NodeText(pool, text), CoreContext(context, &pool)), {});
+      },
+      nb::arg("text").none(), nb::arg("context").none());
+  cls.def(
+      "NewNameNode",
+      [](FactoryObject& self, nb::handle text, nb::handle context) {
+        NodePool& pool = self.factory->pool();
+        return Wrap(self.factory->NewNameNode(NodeText(pool, text), CoreContext(context, &pool)), {});
+      },
+      nb::arg("text").none(), nb::arg("context").none());
+  cls.def(
+      "CreateOperatorNode",
+      [](FactoryObject& self, nb::handle op_str, nb::handle context) {
+        NodePool& pool = self.factory->pool();
+        const HostText text = HostText::FromStr(op_str, true);
+        if (IsNone(text.text()) || !self.factory->op_text2number().contains(std::string(text.text())))
+          return nb::object(nb::none());
+        return Wrap(self.factory->CreateOperatorNode(pool.Intern(text.text()), CoreContext(context, &pool)), {});
+      },
+      nb::arg("op_str").none(), nb::arg("context").none());
+  cls.def(
+      "DiscardNodes", [](FactoryObject& self, nb::handle node) { self.factory->DiscardNodes(NodeOrNull(node)); },
+      nb::arg("node").none());
+  cls.def(
+      "RecursiveConvert",
+      [](FactoryObject& self, nb::handle raw_node) { return Wrap(RecursiveConvert(*self.factory, raw_node), {}); },
+      nb::arg("raw_node").none());
+
+  m.def(
+      "__FinishedWithNode",
+      [](nb::handle node, nb::handle depth) { FinishedWithNodeAtDepth(NodeOrNull(node), Int64Of(depth)); },
+      nb::arg("node").none(), nb::arg("depth"));
+  const auto finished = [](nb::handle node) { FinishedWithNode(NodeOrNull(node)); };
+  m.def("FinishedWithNode", finished, nb::arg("node").none());
+  m.def("NotCompiledFinishedWithNode", finished, nb::arg("node").none());
+}
+
+}  // namespace
+
+nb::handle ClassOfKind(NodeKind kind) { return g_classes[static_cast<int>(kind)]; }
+
+bool IsNodeClass(nb::handle cls) {
+  return PyType_Check(cls.ptr()) &&
+         PyType_IsSubtype((PyTypeObject*)cls.ptr(), (PyTypeObject*)g_classes[static_cast<int>(NodeKind::kCNode)]);
+}
+
+NodeKind KindOfClass(nb::handle cls) {
+  if (!IsNodeClass(cls)) ThrowExpected("a class derived from CNode", cls);
+  // The nearest class of the catalogue; kinds are numbered in preorder, so the last match is it.
+  int kind = 0;
+  for (int i = 0; i < kNodeKindCount; ++i) {
+    if (PyType_IsSubtype((PyTypeObject*)cls.ptr(), (PyTypeObject*)g_classes[i])) kind = i;
+  }
+  return static_cast<NodeKind>(kind);
+}
+
+nb::object WrapClassInfo(CNodeClassInfo* info) {
+  if (info == nullptr) return nb::none();
+  auto found = ClassInfoObjects().find(info);
+  if (found != ClassInfoObjects().end()) return nb::borrow(found->second);
+  nb::object instance = nb::inst_alloc(nb::type<ClassInfoObject>());
+  new (nb::inst_ptr<ClassInfoObject>(instance)) ClassInfoObject{info, Ref<NodePool>(info->pool)};
+  nb::inst_mark_ready(instance);
+  ClassInfoObjects()[info] = instance.ptr();
+  return instance;
+}
+
+nb::object WrapArg(const CArgInfo& arg, const Ref<SourceText>& source) {
+  ArgInfoObject object;
+  object.name = Wrap(arg.name, source);
+  object.value = Wrap(arg.value, source);
+  object.prefix = StrOf(arg.prefix);
+  object.type_expr = Wrap(arg.type_expr, source);
+  return nb::cast(std::move(object));
+}
+
+nb::object WrapUsedArgs(const UsedArgList& args, const Ref<SourceText>& source) {
+  nb::list list;
+  for (const CArgInfo& arg : args) list.append(WrapArg(arg, source));
+  return list;
+}
+
+nb::object WrapArgList(const ArgList& args, const Ref<SourceText>& source) {
+  if (Py_EnterRecursiveCall(" in a list of nested parameters")) throw nb::python_error();
+  nb::list list;
+  try {
+    for (const ArgEntry& entry : args)
+      list.append(entry.is_list ? WrapArgList(entry.list, source) : WrapArg(entry.arg, source));
+  } catch (...) {
+    Py_LeaveRecursiveCall();
+    throw;
+  }
+  Py_LeaveRecursiveCall();
+  return list;
+}
+
+nb::object WrapAsName(const CAsName& name) {
+  AsNameObject object;
+  object.module_name = StrOf(name.module_name);
+  if (name.has_as_name) object.as_name = StrOf(name.as_name);
+  return nb::cast(std::move(object));
+}
+
+CArgInfo ArgOf(nb::handle object) {
+  ArgInfoObject* arg;
+  if (!nb::try_cast(object, arg)) ThrowExpected("CArgInfo", object);
+  CArgInfo result;
+  result.name = NodeOrNull(arg->name);
+  result.value = NodeOrNull(arg->value);
+  result.type_expr = NodeOrNull(arg->type_expr);
+  const HostText prefix = HostText::FromStr(arg->prefix, true);
+  if (prefix.text() == "*") result.prefix = "*";
+  if (prefix.text() == "**") result.prefix = "**";
+  return result;
+}
+
+UsedArgList UsedArgsOf(nb::handle list) {
+  if (!PyList_Check(list.ptr())) ThrowExpected("list", list);
+  UsedArgList args;
+  for (nb::handle item : list) args.push_back(ArgOf(item));
+  return args;
+}
+
+ArgList ArgListOf(nb::handle list) {
+  if (!PyList_Check(list.ptr())) ThrowExpected("list", list);
+  if (Py_EnterRecursiveCall(" in a list of nested parameters")) throw nb::python_error();
+  ArgList args;
+  try {
+    for (nb::handle item : list) {
+      if (PyList_Check(item.ptr())) {
+        args.emplace_back(ArgListOf(item));
+      } else {
+        args.emplace_back(ArgOf(item));
+      }
+    }
+  } catch (...) {
+    Py_LeaveRecursiveCall();
+    throw;
+  }
+  Py_LeaveRecursiveCall();
+  return args;
+}
+
+nb::object NewFactoryObject(std::shared_ptr<CNodeFactory> factory, nb::object keywords) {
+  return nb::cast(FactoryObject{std::move(factory), std::move(keywords), {}, {}});
+}
+
+CNode* RecursiveConvert(CNodeFactory& factory, nb::handle raw_node) { return ConvertRaw(factory, raw_node); }
+
+nb::object ConvertSingleNode(CNodeFactory& factory, nb::handle nodetype, nb::handle text, nb::handle context,
+                             nb::handle children) {
+  const int32_t type = Int32Of(nodetype);
+  NodePool& pool = factory.pool();
+  HostChildren nodes(children);
+  CNode* node =
+      factory.ConvertSingleNode(type, NodeText(pool, text), CoreContext(context, &pool), nodes.data(), nodes.count());
+  if (nodes.has_list && node == nodes.nodes[0]) {
+    // The rule and its line end are gone; what is left of the host's list is the statement.
+    if (PyList_SetSlice(children.ptr(), 1, 2, nullptr) < 0) throw nb::python_error();
+    return Wrap(node, {});
+  }
+  return WrapWithChildren(node, children);
+}
+
+void BindTree(nb::module_& tarvex) {
+  BindNodeClasses(tarvex);
+  BindFactory(tarvex);
+  BindRecords(tarvex);
+}
+
+}  // namespace quillet::host

@@ -1,0 +1,105 @@
+// Values between the host and the core.
+//
+// Token and message text is str at the host's side, records are bytes; both are UTF-8 in the core.
+// Text that is not valid UTF-8 (a source may hold any bytes) reads as str with the "surrogateescape"
+// handler and goes back with it, so reading never raises and the round trip is exact; other lone
+// surrogates in a host's str go in as three bytes each.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "foundations/errors.h"
+#include "foundations/text.h"
+#include "quillet/tarvex/bindings.h"
+#include "quillet/tarvex/errors.h"
+#include "siblings/fastaccess/token.h"
+#include "siblings/logicalline/source_text.h"
+#include "tree/node_pool.h"
+
+namespace quillet::host {
+
+// ---- text ----
+
+// str for text, None for none.
+nb::object StrOf(Text text);
+// The same for a token, whose words and operators are shared objects.
+nb::object StrOfToken(const Token& token);
+// bytes for text, None for none.
+nb::object BytesOf(Text text);
+
+// UTF-8 of a str or bytes of the host's, borrowed from it as long as this lives.
+class HostText {
+ public:
+  HostText() = default;
+  // Takes str only (TypeError "Expected str, got ..."), or None where `none` allows it.
+  static HostText FromStr(nb::handle object, bool none = false);
+  // Takes str or bytes.
+  static HostText FromStrOrBytes(nb::handle object, bool none = false);
+  // Takes bytes only.
+  static HostText FromBytes(nb::handle object);
+
+  Text text() const { return text_; }
+
+ private:
+  Text text_ = kNoText;
+  nb::object keep_;
+};
+
+// ---- numbers and truth ----
+
+// TypeError "an integer is required", OverflowError "value too large to convert to int".
+int32_t Int32Of(nb::handle object);
+int64_t Int64Of(nb::handle object);
+
+// An argument that is taken by its truth value.
+struct Truth {
+  bool value = false;
+  operator bool() const { return value; }  // NOLINT(google-explicit-constructor): stands for a bool
+};
+
+// A version as the host writes it; TypeError for anything but a tuple.
+Version VersionOf(nb::handle object);
+
+// ---- tokens and positions ----
+
+// tuple(object), with the host's own error for what is no sequence.
+nb::object TupleOf(nb::handle object);
+
+// The tokens of a tuple of str and None, as tokens of a source of their own.
+Ref<SourceText> SourceOfTokens(nb::handle tuple);
+// Positions of a tuple of (line, column) pairs; ValueError for what is no pair.
+std::vector<Position> PositionsOf(nb::handle tuple);
+
+// ---- contexts ----
+
+// An int, a tuple or None; a foreign object as it was put in.
+nb::object HostContext(Context context);
+// The same the other way. An object that is none of these is kept in a table until the pool's node
+// lets go of it; without a pool it is a TypeError.
+Context CoreContext(nb::handle object, NodePool* pool);
+
+}  // namespace quillet::host
+
+namespace nanobind::detail {
+
+template <>
+struct type_caster<quillet::host::Truth> {
+  NB_TYPE_CASTER(quillet::host::Truth, const_name("bool"))
+
+  bool from_python(handle src, uint8_t, cleanup_list*) noexcept {
+    const int truth = PyObject_IsTrue(src.ptr());
+    if (truth < 0) {
+      PyErr_Clear();
+      return false;
+    }
+    value.value = truth != 0;
+    return true;
+  }
+  static handle from_cpp(quillet::host::Truth src, rv_policy, cleanup_list*) noexcept {
+    return handle(src.value ? Py_True : Py_False).inc_ref();
+  }
+};
+
+}  // namespace nanobind::detail

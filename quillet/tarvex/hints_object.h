@@ -1,0 +1,27 @@
+// The objects behind CDispatchWalker and CTypeHintWalker.
+#pragma once
+
+#include <memory>
+
+#include "hints/hint_walker.h"
+#include "quillet/tarvex/bindings.h"
+
+namespace quillet::host {
+
+struct DispatchObject {
+  std::shared_ptr<CDispatchWalker> walker;
+  nb::object dispatch_dict;  // the host's dict, or made when read
+  nb::object logical;        // the line that the host handed in
+};
+
+struct HintWalkerObject : DispatchObject {
+  CTypeHintWalker& hints() const { return static_cast<CTypeHintWalker&>(*walker); }
+  nb::object general_node_walker;  // a CNodeWalker object or None; keeps the walker alive
+  nb::object hint_parser;          // made when read
+  nb::object version_triple;
+};
+
+nb::object NewHintWalkerObject(std::shared_ptr<CTypeHintWalker> walker, nb::object general_node_walker,
+                               nb::object version_triple);
+
+}  // namespace quillet::host

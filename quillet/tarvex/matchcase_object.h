@@ -1,0 +1,22 @@
+// The object behind CMatchCaseStatementParser: a parser's own, or one that the host made on it.
+#pragma once
+
+#include <memory>
+
+#include "matchcase/match_case_parser.h"
+#include "quillet/tarvex/bindings.h"
+#include "quillet/tarvex/convert.h"
+
+namespace quillet::host {
+
+struct MatchcaseObject {
+  std::shared_ptr<CMatchCaseStatementParser> parser;
+  nb::object pgen_parser;  // the CPGenParserImpl object
+  nb::object toks;         // what the host put in place, for the steps; null otherwise
+  nb::object positions;
+  Ref<SourceText> source;  // of toks
+};
+
+nb::object NewMatchcaseObject(std::shared_ptr<CMatchCaseStatementParser> parser, nb::handle pgen_parser);
+
+}  // namespace quillet::host

@@ -1,0 +1,147 @@
+// The objects through which the host sees nodes and their records.
+//
+// A wrapper is a small handle: the node, the pool that owns its memory and the source that holds its
+// texts. There is one live wrapper a node, so `is` tells nodes apart and a node that was discarded
+// and handed out again is the same object. The pool is told how many wrappers exist, and leaves
+// memory that they may show alone.
+//
+// A wrapper's list of children is made when the host reads it, and is the host's from then on: what
+// it changes in the list reaches the node on entry to the next operation, and a list whose node was
+// changed by the core meanwhile is dropped.
+//
+// A wrapper held past its tree's discard may show other content; it never shows freed memory. Texts
+// of a pool's nodes stand in sources that come and go, so while wrappers exist the pool pins each
+// source that its nodes may refer to (PinSource).
+#pragma once
+
+#include <memory>
+#include <string>
+#include <unordered_map>
+#include <vector>
+
+#include "quillet/tarvex/bindings.h"
+#include "quillet/tarvex/convert.h"
+#include "siblings/logicalline/source_text.h"
+#include "tree/arg_info.h"
+#include "tree/factory.h"
+#include "tree/node_pool.h"
+#include "tree/nodes.h"
+
+namespace quillet::host {
+
+class NodeRef {
+ public:
+  NodeRef() = default;
+  NodeRef(const NodeRef&) = delete;
+  NodeRef& operator=(const NodeRef&) = delete;
+  ~NodeRef();
+
+  // Makes this the wrapper of a node.
+  void Attach(PyObject* self, CNode* node, Ref<SourceText> source);
+  // Says that the node came from NewBareNode: it goes back there if the host lets go of it before
+  // it has a place in a tree.
+  void IsLoneBareNode() { is_lone_bare_ = true; }
+
+  // The node; RuntimeError where it was given to another class since.
+  CNode* node() const {
+    if (node_ == nullptr || node_->kind != kind_) [[unlikely]]
+      ThrowStale();
+    return node_;
+  }
+  const Ref<SourceText>& source() const { return source_; }
+
+  nb::object GetChildren();
+  void SetChildren(nb::handle list);  // a list or None
+  // Keeps a list that already has the node's children.
+  void KeepChildren(nb::handle list);
+  // Takes over what the host changed in its list of children.
+  void Synchronise();
+
+ private:
+  friend class NodeRegistry;
+  [[noreturn]] static void ThrowStale();
+  void DropChildren();
+
+  CNode* node_ = nullptr;
+  NodeKind kind_ = NodeKind::kCNode;
+  PyObject* self_ = nullptr;
+  Ref<NodePool> pool_;
+  Ref<SourceText> source_;
+  bool is_lone_bare_ = false;         // made by the host, in no tree yet
+  nb::object children_;               // the host's list
+  std::vector<CNode*> synchronised_;  // what list and node had in common last
+};
+
+// The C++ type bound for a node class: the same handle, in the class tree of the nodes.
+template <class T>
+struct NodeHandle;
+#define QUILLET_NODE(name, base) \
+  template <>                    \
+  struct NodeHandle<name> : std::conditional_t<std::is_same_v<name, base>, NodeRef, NodeHandle<base>> {};
+#include "tree/node_kinds.def"
+
+// ---- nodes to the host ----
+
+// The wrapper of a node, whose texts stand in `source`; None for null.
+nb::object Wrap(CNode* node, const Ref<SourceText>& source);
+nb::object WrapList(std::span<CNode* const> nodes, const Ref<SourceText>& source);
+nb::object WrapClassInfo(CNodeClassInfo* info);
+nb::object WrapArg(const CArgInfo& arg, const Ref<SourceText>& source);
+nb::object WrapUsedArgs(const UsedArgList& args, const Ref<SourceText>& source);
+// Nested lists stay nested; RecursionError past the host's limit.
+nb::object WrapArgList(const ArgList& args, const Ref<SourceText>& source);
+nb::object WrapAsName(const CAsName& name);
+
+// The Python class of a kind, and the kind of a class; TypeError for what is no node class.
+nb::handle ClassOfKind(NodeKind kind);
+NodeKind KindOfClass(nb::handle cls);
+bool IsNodeClass(nb::handle cls);
+
+// ---- nodes from the host ----
+
+// TypeError "Expected CNode, got ..." (or the class wanted). Brings all lists of children up to
+// date, since the operation that follows may read the whole tree.
+NodeRef& RefOf(nb::handle object, NodeKind wanted = NodeKind::kCNode);
+// The same with None for null.
+NodeRef* RefOrNull(nb::handle object, NodeKind wanted = NodeKind::kCNode);
+inline CNode* NodeOrNull(nb::handle object, NodeKind wanted = NodeKind::kCNode) {
+  NodeRef* ref = RefOrNull(object, wanted);
+  return ref == nullptr ? nullptr : ref->node();
+}
+inline Ref<SourceText> SourceOf(const NodeRef* ref) { return ref == nullptr ? Ref<SourceText>() : ref->source(); }
+
+// A list of CNode (None where `none` allows it) as nodes.
+std::vector<CNode*> NodesOf(nb::handle list, NodeKind wanted = NodeKind::kCNode, bool none = false);
+CArgInfo ArgOf(nb::handle object);
+UsedArgList UsedArgsOf(nb::handle list);
+ArgList ArgListOf(nb::handle list);
+
+// To be called before nodes of the pool are made from a source while wrappers of the pool exist.
+void PinSource(NodePool& pool, const Ref<SourceText>& source);
+
+// Gives the texts of all nodes that wrappers of the pool may reach to the pool: for texts that are
+// about to go.
+void RehomeTexts(NodePool& pool);
+
+// The host's class of a node: that of its wrapper where there is one.
+nb::handle ClassOfNode(CNode* node);
+
+// A node that the host makes without a record.
+CNode* NewBareNode(NodeKind kind);
+
+// ---- factories ----
+
+// A CNodeFactory of the host: made by it, or a parser's own.
+struct FactoryObject {
+  std::shared_ptr<CNodeFactory> factory;
+  nb::object keywords;        // the host's dict
+  nb::object class_infos;     // list, made when read
+  nb::object op_text2number;  // dict
+};
+nb::object NewFactoryObject(std::shared_ptr<CNodeFactory> factory, nb::object keywords);
+CNode* RecursiveConvert(CNodeFactory& factory, nb::handle raw_node);
+// ConvertSingleNode with the host's values.
+nb::object ConvertSingleNode(CNodeFactory& factory, nb::handle nodetype, nb::handle text, nb::handle context,
+                             nb::handle children);
+
+}  // namespace quillet::host
