@@ -121,13 +121,23 @@ def describe(record: Record) -> str:
         case RecordKind.EXPRESSION | RecordKind.EQUAL:
             return f"= {detail}" if detail else "= nothing"
         case RecordKind.LITERAL:
-            return f"= {detail}"
+            return _describe_literal(detail)
         case RecordKind.HINT:
             return f"hint {detail}"
         case RecordKind.INSTANCE:
             return f"instance of {detail}"
         case RecordKind.OTHER:
             return detail
+
+
+def _describe_literal(detail: str) -> str:
+    start = "from " if detail.startswith("from ") else ""
+    cls, _, text = detail.removeprefix("from ").partition(": ")
+    if text == cls:
+        return f"= {start}{text}"  # None
+    if text:
+        return f"= {start}{text} ({cls})"
+    return f"= {start}{'an' if cls[:1] in 'aeiou' else 'a'} {cls}"
 
 
 def _text(value: bytes) -> str:

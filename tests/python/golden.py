@@ -63,7 +63,7 @@ class Case:
         return "".join(out)
 
     def text(self) -> str:
-        return f"{self.head}\n{self.source}{self.actual()}\n"
+        return f"{self.head}\n{self.source}{self.actual()}"
 
 
 def files() -> list[Path]:

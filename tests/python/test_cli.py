@@ -53,7 +53,7 @@ def test_text_names_each_statement_and_its_records(tmp_path: Path) -> None:
         "    os                  import os",
         f"{path}:3: x = [ …",
         "    x                   set",
-        "    x                   = list: [os.sep]",
+        "    x                   = a list",
         "    os.sep              read",
     ]
 

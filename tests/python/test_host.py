@@ -246,7 +246,7 @@ def test_a_line_knows_the_async_def_that_it_stands_in() -> None:
 
 def test_a_line_knows_that_it_is_first_in_a_function() -> None:
     first = [line.first_line for line in analyze(SOURCE).lines if line.first_in_def]
-    assert first == [4, 10, 15]
+    assert first == [4, 5, 10, 15]  # a comment in front of the first statement counts with it
 
 
 def test_a_signature_comment_on_its_own_line_is_read() -> None:
