@@ -54,6 +54,7 @@ def test_text_names_each_statement_and_its_records(tmp_path: Path) -> None:
         f"{path}:3: x = [ …",
         "    x                   set",
         "    x                   = a list",
+        "    os                  read",
         "    os.sep              read",
     ]
 
