@@ -7,9 +7,7 @@ import time
 
 from quillet.tarvex import _siblings
 
-globals().update(
-    {name: value for name, value in vars(_siblings._fastaccess).items() if not name.startswith("__")}
-)
+globals().update({name: value for name, value in vars(_siblings._fastaccess).items() if not name.startswith("__")})
 
 # The clock that GetNowTime and OutOfTime ask, looked up at each call: a test may put another in its place.
 __TimeFunc = time.time

@@ -11,9 +11,7 @@ from typing import Any
 from quillet._string_values import ObjectForStringLiteral as ObjectForStringLiteral
 from quillet.tarvex import _siblings
 
-globals().update(
-    {name: value for name, value in vars(_siblings.symbolinfo).items() if not name.startswith("__")}
-)
+globals().update({name: value for name, value in vars(_siblings.symbolinfo).items() if not name.startswith("__")})
 
 
 class CLocationCache:
