@@ -10,7 +10,7 @@ from __future__ import annotations
 
 import re
 
-from quillet.tarvex import _siblings
+from quillet._fastaccess import GetTokenType, kTokenId_STRING
 
 _PREFIXES = frozenset(("", "r", "u", "b", "ur", "br", "rb"))
 _PARTS = re.compile(r"""([a-zA-Z]*)('''|\"\"\"|'|")(.*)\2""", re.DOTALL)
@@ -27,8 +27,7 @@ def ObjectForStringLiteral(text: str) -> str | bytes:
     ValueError for what is no string literal or has no constant value (an f-string), and whatever the
     host's decoder raises for a broken escape.
     """
-    fastaccess = _siblings._fastaccess
-    parts = _PARTS.fullmatch(text) if fastaccess.GetTokenType(text) == fastaccess.kTokenId_STRING else None
+    parts = _PARTS.fullmatch(text) if GetTokenType(text) == kTokenId_STRING else None
     if parts is None or (prefix := parts[1].lower()) not in _PREFIXES:
         raise ValueError(f"not a constant string literal: {text!r}")
     body = _LINE_END.sub("\n", parts[3])
