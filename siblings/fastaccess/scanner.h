@@ -283,8 +283,9 @@ class Scanner : private ScanOutput {
           break;
         case ByteClass::kOperator: {
           const Operator op = OperatorAt(at);
-          // The one that has the code of an assignment and is none is "->".
-          if (depth == 0 && IsAssignment(op.code) && at[1] != '>') client_.Assign(tokens_.count());
+          if (depth == 0 && IsAssignment(op.code) && (op.code != tok::ATEQUAL || c == '@')) {
+            client_.Assign(token_count());
+          }
           at = Emit(at, at + op.length, op.code);
           break;
         }

@@ -54,9 +54,8 @@ bool IsWholeString(Text text, size_t prefix_length) {
   const char* quote = copy.begin() + prefix_length;
   const char* end = IsTripleQuote(quote) ? TripleStringEnd(quote, copy.end()) : SingleStringEnd(quote, copy.end());
   if (end == copy.end()) return true;
-  if (!prefix.formatted) return false;
   const char* stop;
-  return NestedFormattedStringEnd(quote, copy.end(), prefix.raw, stop) == copy.end();
+  return prefix.formatted && NestedFormattedStringEnd(quote, copy.end(), prefix.raw, stop) == copy.end();
 }
 
 // Text that begins with a letter, "_" or a byte beyond ASCII.

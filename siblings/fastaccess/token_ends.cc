@@ -52,16 +52,18 @@ const char* StrayEnd(const char* at, const char* end) {
   return at + (decoded.length == 0 ? 1 : decoded.length);
 }
 
-const char* SingleStringEnd(const char* at, const char* end) {
-  const char quote = *at++;
+bool FindSingleStringEnd(const char* at, const char* end, const char*& stop) {
+  const char quote = *at;
+  stop = at + 1;
   for (;;) {
-    at = FindInSingleString(at, end, quote);
-    if (at >= end) return nullptr;
-    if (*at == quote) return at + 1;
-    if (*at != '\\') return nullptr;
-    ++at;
-    if (at >= end) return nullptr;
-    at = LineEndEnd(at);
+    stop = FindInSingleString(stop, end, quote);
+    if (stop >= end || IsLineEnd(*stop)) return false;
+    if (*stop == quote) {
+      ++stop;
+      return true;
+    }
+    ++stop;
+    if (stop < end) stop = LineEndEnd(stop);
   }
 }
 
@@ -210,9 +212,9 @@ class FormattedStringScan {
   }
 
   const char* StepPlainString(const char* at) {
-    const char* string_end = IsTripleQuote(at) ? TripleStringEnd(at, end_) : SingleStringEnd(at, end_);
-    // A string that does not end was searched for to the end of its line or of everything.
-    if (!string_end) stop_ = IsTripleQuote(at) ? end_ : FindAny<'\n', '\r'>(at, end_);
+    if (!IsTripleQuote(at)) return FindSingleStringEnd(at, end_, stop_) ? stop_ : nullptr;
+    const char* string_end = TripleStringEnd(at, end_);
+    if (!string_end) stop_ = end_;
     return string_end;
   }
 

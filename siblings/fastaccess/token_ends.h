@@ -144,8 +144,15 @@ inline const char* FindInSingleString(const char* at, const char* end, char quot
   return quote == '"' ? FindAny<'"', '\\', '\n', '\r'>(at, end) : FindAny<'\'', '\\', '\n', '\r'>(at, end);
 }
 
+// Looks for the end of the string with single quotes at `at`. True: `stop` is behind it. False: it
+// does not end, and `stop` is the place where that was seen.
+bool FindSingleStringEnd(const char* at, const char* end, const char*& stop);
+
 // Behind the string with single quotes at `at`; null if it does not end.
-const char* SingleStringEnd(const char* at, const char* end);
+inline const char* SingleStringEnd(const char* at, const char* end) {
+  const char* stop;
+  return FindSingleStringEnd(at, end, stop) ? stop : nullptr;
+}
 
 // Behind the formatted string whose quotes stand at `at`, by the rules of 3.12 and later: its
 // fields are code and may hold anything, the same quotes included. Null where it does not end, is

@@ -310,20 +310,19 @@ class Cutter {
     row.no_embedded = row.no_embedded && !facts_.has_type_comment;
   }
 
-  // The rows of the tokens from first_ up to `end`: one, unless definitions have their bodies on the
-  // line.
+  // The rows of the tokens from first_ up to `end`: one, or two for a definition with its body on the
+  // line. A definition as such a body is no Python, and stays whole.
   void AddRows(TokenSpan toks, uint32_t end, const ScanOutput& out) {
-    for (;;) {
-      const Statement statement(toks, first_, end, facts_, python2_);
-      const uint32_t body = statement.IsDefinition() ? statement.InlineBody() : end;
-      if (body == end) return AddRow(statement, toks, end, false, out);
-      const StatementFacts head_facts = FactsOf(toks, first_, body);
-      AddRow(Statement(toks, first_, body, head_facts, python2_), toks, body, true, out);
-      facts_ = FactsOf(toks, body, end);
-      while (first_line_ < out.line() && out.LineStart(first_line_ + 1) <= toks[body].text) ++first_line_;
-      first_ = body;
-      continues_ = true;
-    }
+    const Statement statement(toks, first_, end, facts_, python2_);
+    const uint32_t body = statement.IsDefinition() ? statement.InlineBody() : end;
+    if (body == end) return AddRow(statement, toks, end, false, out);
+    const StatementFacts head_facts = FactsOf(toks, first_, body);
+    AddRow(Statement(toks, first_, body, head_facts, python2_), toks, body, true, out);
+    const StatementFacts body_facts = FactsOf(toks, body, end);
+    while (first_line_ < out.line() && out.LineStart(first_line_ + 1) <= toks[body].text) ++first_line_;
+    first_ = body;
+    continues_ = true;
+    AddRow(Statement(toks, body, end, body_facts, python2_), toks, end, false, out);
   }
 
   void AddRow(const Statement& statement, TokenSpan toks, uint32_t end, bool has_inline_body, const ScanOutput& out) {
