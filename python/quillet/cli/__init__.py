@@ -13,7 +13,7 @@ import sys
 import click
 
 
-class PythonVersion(click.ParamType):
+class PythonVersion(click.ParamType):  # type: ignore[type-arg,unused-ignore]
     """A version such as 2.7 or 3.12, as the tuple that the host API takes."""
 
     name = "X.Y"

@@ -6,6 +6,7 @@ counted, and the others are still served. A reader that goes away ends the run w
 
 from __future__ import annotations
 
+import logging
 import sys
 from collections.abc import Iterable, Iterator
 from contextlib import contextmanager
@@ -39,10 +40,13 @@ def run(
 
     unread = 0
     errors = 0
+    reports = _Reports()
+    logging.getLogger("quillet").addHandler(reports)
     with quiet_output() as out:
         out.write(writer.header())
         with _progress(find_files(paths, gitignore=gitignore)) as found:
             for item in found:
+                reports.path = item.path
                 try:
                     source = _read(item)
                     analysis = analyze(source, version=version)
@@ -57,6 +61,17 @@ def run(
     if unread:
         print(f"quillet: {unread} {'file' if unread == 1 else 'files'} could not be read", file=sys.stderr)
     return 1 if unread or (strict and errors) else 0
+
+
+class _Reports(logging.Handler):
+    """Names the file in which a statement was given up, and why, in one line."""
+
+    path = ""
+
+    def emit(self, record: logging.LogRecord) -> None:
+        reason = record.exc_info[1] if record.exc_info else record.getMessage()
+        first_line = str(reason).partition("\n")[0]
+        print(f"quillet: {printable(self.path)}: {printable(first_line)}", file=sys.stderr)
 
 
 class _Unreadable(Exception):
