@@ -91,8 +91,9 @@ void ExpressionCheck::Add(Token& token) {
     } else if (code == tok::COLON) {
       is_good = is_good && lambdas_ > 0;
       if (lambdas_ > 0) --lambdas_;
-    } else if (IsAssignment(code)) {
-      // A lambda's parameters may have defaults; "->" is no part of an expression either.
+    } else if (IsAssignment(code) && *token.text != '-') {
+      // A lambda's parameters may have defaults. ("->" shares the code of "@=", and no statement
+      // that is an expression in front of it has it.)
       is_good = is_good && code == tok::EQUAL && lambdas_ > 0;
     } else if (code == tok::SEMI) {
       is_good = false;

@@ -85,7 +85,7 @@ class FieldScan {
   // From a field's "{" to behind its "}", or to behind the ":" of its format.
   void ScanField() {
     ++at_;
-    const size_t begin = tokens_.size();
+    field_begin_ = tokens_.size();
     ExpressionCheck check;
     bool is_over = false;
     while (!is_over) {
@@ -95,7 +95,7 @@ class FieldScan {
         break;
       }
       if (check.depth() == 0 && IsEndOfExpression()) {
-        if (!HasExpression(begin)) AddError(at_);
+        if (!HasExpression()) AddError(at_);
         is_over = ScanFieldTail();
         continue;
       }
@@ -105,7 +105,7 @@ class FieldScan {
       tokens_.push_back(token);
       if (token.code == tok::STRING && IsFormattedString(token)) nested_.push_back(token);
     }
-    fields_.push_back({begin, tokens_.size()});
+    fields_.push_back({field_begin_, tokens_.size()});
   }
 
   bool IsEndOfExpression() const {
@@ -129,8 +129,8 @@ class FieldScan {
     return next < end_ && (*next == '}' || *next == ':' || (*next == '!' && (next + 1 == end_ || next[1] != '=')));
   }
 
-  bool HasExpression(size_t begin) const {
-    return std::any_of(tokens_.begin() + static_cast<ptrdiff_t>(begin), tokens_.end(),
+  bool HasExpression() const {
+    return std::any_of(tokens_.begin() + static_cast<ptrdiff_t>(field_begin_), tokens_.end(),
                        [](const Token& token) { return !IsSkipCode(token.code); });
   }
 
@@ -158,10 +158,13 @@ class FieldScan {
     return true;
   }
 
-  void AddError(const char* at) { tokens_.push_back({at, 1, tok::ERRORTOKEN}); }
+  // One error a place: what is at fault in two ways holds one token.
+  void AddError(const char* at) {
+    if (tokens_.size() == field_begin_ || tokens_.back().text < at) tokens_.push_back({at, 1, tok::ERRORTOKEN});
+  }
 
   void Reject(const char* at) {
-    AddError(at);
+    tokens_.push_back({at, 1, tok::ERRORTOKEN});
     fields_.push_back({tokens_.size() - 1, tokens_.size()});
   }
 
@@ -171,7 +174,8 @@ class FieldScan {
   const char* at_;
   const char* end_;  // the closing quotes
   bool raw_;
-  size_t formats_ = 0;  // format specifications around the text
+  size_t field_begin_ = 0;  // where the tokens of the field begin
+  size_t formats_ = 0;      // format specifications around the text
 };
 
 }  // namespace

@@ -58,9 +58,7 @@ class HintSearch {
   }
 
   size_t SimpleStatement(size_t i) {
-    const TokenCode lead = CodeAt(i);
-    const bool may_be_target = lead == tok::LPAR || (IsNameCode(lead) && !OnlyBeginsStatement(lead));
-    bool is_decided = !may_be_target;
+    bool is_decided = !MayBeTarget(i);
     size_t annotation = count_;
     const size_t stop = VisitOwnTokens(toks_, i, count_, [&](size_t at) {
       const TokenCode code = toks_[at].code;
@@ -73,6 +71,14 @@ class HintSearch {
     });
     if (annotation < count_) Region(annotation, stop);
     return stop + 1;
+  }
+
+  // Whether an annotated target may begin here: a name, alone or with trailers, or a bracket.
+  bool MayBeTarget(size_t i) const {
+    if (CodeAt(i) == tok::LPAR) return true;
+    if (!IsNameCode(CodeAt(i)) || OnlyBeginsStatement(CodeAt(i))) return false;
+    const TokenCode next = CodeAt(Next(i));
+    return next == tok::COLON || next == tok::DOT || next == tok::LSQB || next == tok::LPAR;
   }
 
   // `def name [type parameters] (parameters) -> type :`
@@ -92,6 +98,10 @@ class HintSearch {
       const TokenCode code = CodeAt(i);
       if (i >= count_) return count_;
       if (code == tok::RPAR) return i + 1;
+      if (code == tok::STAR || code == tok::DOUBLESTAR) {
+        ++i;
+        continue;
+      }
       if (IsNameCode(code) && CodeAt(Next(i)) == tok::COLON) i = Region(Next(i) + 1, count_);
       i = EndOfParameter(i);
     }
