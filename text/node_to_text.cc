@@ -72,22 +72,6 @@ void CNodeToTextConverter::Compose(Run& run) {
   run.composed = true;
 }
 
-void CNodeToTextConverter::Append(Run& run, Text piece) {
-  if (!run.composed) {
-    if (run.view == nullptr) {
-      run.view = piece.data();
-      run.view_size = piece.size();
-      return;
-    }
-    if (run.view + run.view_size == piece.data()) {
-      run.view_size += piece.size();
-      return;
-    }
-    Compose(run);
-  }
-  buffer_.append(piece);
-}
-
 Text CNodeToTextConverter::TextOf(const Run& run) const {
   if (!run.composed) return {run.view, run.view_size};
   return Text(buffer_).substr(run.offset);
@@ -234,25 +218,27 @@ bool CNodeToTextConverter::AppendChain(Run& run, CNode* atom, std::span<CNode* c
 bool CNodeToTextConverter::AppendTrailer(Run& run, CNode* node, bool dotted_name_only, bool literal_only) {
   const auto* trailer = Expect<CTrailer>(node);
   if (trailer == nullptr) ThrowNoAttribute("GetInitialToken");
-  const Text token = trailer->GetInitialToken();
-  if (dotted_name_only && token != ".") return false;
-  if (token == ".") {
+  if (trailer->child_count == 0) (void)trailer->GetInitialToken();
+  const CNode* const first = trailer->children[0];
+  if (first == nullptr) ThrowNoAttribute("fText");
+  if (dotted_name_only && first->code != tok::DOT) return false;
+  if (first->code == tok::DOT) {
     if (literal_only) return false;
     const Text name = trailer->GetDotName();
     if (IsNone(name)) return true;
-    Append(run, token);
+    Append(run, first->fText());
     Append(run, name);
     return true;
   }
-  const bool is_call = token == "(";
-  if (!is_call && token != "[") ThrowError(ErrorKind::kValueError, "Bad trailer node");
+  const bool is_call = first->code == tok::LPAR;
+  if (!is_call && first->code != tok::LSQB) ThrowError(ErrorKind::kValueError, "Bad trailer node");
 
-  Append(run, token);
+  Append(run, first->fText());
   if (is_call ? include_arg_text_ : include_bracket_text_) {
     if (CNode* nested = trailer->GetNestedNode()) AppendTrailerContents(run, nested, literal_only);
   }
-  const CNode* last = trailer->LastChild();
-  const bool is_closed = last->code == (is_call ? tok::RPAR : tok::RSQB);
+  const CNode* const last = trailer->LastChild();
+  const bool is_closed = last != nullptr && last->code == (is_call ? tok::RPAR : tok::RSQB);
   Append(run, is_closed ? last->fText() : is_call ? Text(")") : Text("]"));
   return true;
 }

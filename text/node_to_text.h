@@ -69,7 +69,21 @@ class CNodeToTextConverter {
 
   Text Render(CNode* node, TextOptions options);
   void Begin();
-  void Append(Run& run, Text piece);
+  void Append(Run& run, Text piece) {
+    if (!run.composed) {
+      if (run.view + run.view_size == piece.data()) {
+        run.view_size += piece.size();
+        return;
+      }
+      if (run.view == nullptr) {
+        run.view = piece.data();
+        run.view_size = piece.size();
+        return;
+      }
+      Compose(run);
+    }
+    buffer_.append(piece);
+  }
   void Compose(Run& run);
   Text TextOf(const Run& run) const;
 

@@ -7,21 +7,24 @@
 #include "walker/walker.h"
 
 namespace quillet {
+namespace {
 
-inline void CNodeWalker::CountVisit() {
-  if (++fVisitCount > fMaxVisits) [[unlikely]] {
-    ThrowError(ErrorKind::kRuntimeError, "Maximum number of calls to _VisitNode exceeded");
-  }
-  if (fRecurseCount >= fMaxRecurseCount) [[unlikely]] {
-    ++fRecurseCount;
-    ThrowError(ErrorKind::kRuntimeError, "Maximum recurse count in _VisitNode exceeded");
-  }
+// Classes of leaves that VisitNode has no visit for.
+bool IsWalkedThroughChildren(NodeKind kind) {
+  return kind == NodeKind::kCNode || kind == NodeKind::kCKeywordLiteral || kind == NodeKind::kCNumberLiteral ||
+         kind == NodeKind::kCStringLiteral;
 }
 
-inline bool CNodeWalker::IsUnnamedLeaf(const CNode* node) {
-  return node != nullptr && node->child_count == 0 &&
-         (node->kind == NodeKind::kCNode || node->kind == NodeKind::kCKeywordLiteral ||
-          node->kind == NodeKind::kCNumberLiteral || node->kind == NodeKind::kCStringLiteral);
+}  // namespace
+
+void CNodeWalker::ThrowTooManyVisits() {
+  ThrowError(ErrorKind::kRuntimeError, "Maximum number of calls to _VisitNode exceeded");
+}
+
+void CNodeWalker::ThrowTooDeep() {
+  // The visit was counted when it was found to be one too deep.
+  ++fRecurseCount;
+  ThrowError(ErrorKind::kRuntimeError, "Maximum recurse count in _VisitNode exceeded");
 }
 
 void CNodeWalker::VisitChildren(CNode* node) {
@@ -29,7 +32,7 @@ void CNodeWalker::VisitChildren(CNode* node) {
   for (uint32_t i = 0; i < node->child_count; ++i) {
     CNode* const child = node->children[i];
     // Punctuation, keywords and literals are most of a statement, and nothing is to be done for them.
-    if (IsUnnamedLeaf(child)) {
+    if (child != nullptr && child->child_count == 0 && IsWalkedThroughChildren(child->kind)) {
       CountVisit();
     } else {
       VisitNode(child);

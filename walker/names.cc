@@ -25,13 +25,22 @@ class Restored {
   bool before_;
 };
 
+// `.name`, and no keyword behind the dot.
+bool IsAttribute(const CNode* node) {
+  return isa<CTrailer>(node) && node->child_count == 2 && node->ChildIs(0, tok::DOT) &&
+         isa<CNameLiteral>(node->children[1]);
+}
+
 }  // namespace
 
 // The links of one chain on their way by: texts, and how much of the chain is a dotted name.
 class CNodeWalker::Chain {
  public:
-  Chain(CNodeWalker& walker, CNode* atom, std::span<CNode* const> trailers)
-      : walker_(walker), atom_(atom), trailers_(trailers) {}
+  // `view`, where there is one, is the text of the chain up to trailer `start`.
+  Chain(CNodeWalker& walker, CNode* atom, std::span<CNode* const> trailers, size_t start, Text view)
+      : walker_(walker), atom_(atom), trailers_(trailers), done_(start), started_(!IsNone(view)) {
+    if (started_) text_.StartWithView(view);
+  }
 
   // The text up to and including trailer `i`, or none. `i` never goes down from call to call.
   Text LinkText(size_t i) {
@@ -42,7 +51,7 @@ class CNodeWalker::Chain {
     const size_t size_before = text_.text().size();
     for (; done_ <= i; ++done_) {
       auto* trailer = cast<CTrailer>(trailers_[done_]);
-      if (trailer->child_count == 2 && trailer->ChildIs(0, tok::DOT) && isa<CNameLiteral>(trailer->children[1])) {
+      if (IsAttribute(trailer)) {
         text_.Append(trailer->children[0]->fText(), texts);
         text_.Append(trailer->children[1]->fText(), texts);
       } else {
@@ -58,8 +67,8 @@ class CNodeWalker::Chain {
   // The dotted name in front of trailer `i`, kept, or none: asked for at a call, and only where all
   // trailers in front are attributes.
   Text DottedName(size_t i) {
-    if (isa<CNameLiteral>(atom_) && atom_->IsLeaf() && done_ == i && (started_ || i == 0)) {
-      return text_.composed() ? text_.text() : walker_.Keep(started_ ? text_.text() : atom_->fText());
+    if (isa<CNameLiteral>(atom_) && done_ == i && started_) {
+      return text_.composed() ? text_.text() : walker_.Keep(text_.text());
     }
     const Text name = walker_.fToText.TextForAtomPlusTrailers(atom_, trailers_.first(i), {.dotted_name_only = true});
     return IsNone(name) ? kNoText : walker_.Keep(name);
@@ -82,8 +91,8 @@ class CNodeWalker::Chain {
   CNode* atom_;
   std::span<CNode* const> trailers_;
   ChainText text_;
-  size_t done_ = 0;  // trailers that text_ holds
-  bool started_ = false;
+  size_t done_;  // trailers that text_ holds, once it has been started
+  bool started_;
   bool has_text_ = true;
 };
 
@@ -102,15 +111,10 @@ void CNodeWalker::VisitLoadContextNode(CNode* node) {
 
 // ---- single names ----
 
-bool CNodeWalker::IsName(const CNode* node) {
-  // The three words are no names, in either language.
-  return node->IsLeaf() && node->code != word::kNone && node->code != word::kTrue && node->code != word::kFalse;
-}
-
-Text CNodeWalker::AddLoadedName(Text name, bool lasting, Text previous) {
+inline Text CNodeWalker::AddLoadedName(Text name, bool lasting, Text previous) {
   const NameSet::Place place = fLoadedNames.Add(name, previous);
-  if (place.added && !lasting && !IsNone(name)) fLoadedNames.Replace(place.index, Keep(name));
-  return fLoadedNames.names()[place.index];
+  if (!lasting && place.added && !IsNone(name)) fLoadedNames.Replace(place.index, Keep(name));
+  return fLoadedNames[place.index];
 }
 
 void CNodeWalker::AddStoredName(const CNode* node, Text text, bool lasting) {
@@ -121,7 +125,7 @@ void CNodeWalker::AddStoredName(const CNode* node, Text text, bool lasting) {
   if (place.added && !lasting) fStoredNames.Replace(place.index, Keep(text));
 }
 
-Text CNodeWalker::ProcessName(const CNode* node, Text text, bool more, bool lasting, Text previous) {
+inline Text CNodeWalker::ProcessName(const CNode* node, Text text, bool more, bool lasting, Text previous) {
   if (more || fLoadNameContext) return AddLoadedName(text, lasting, previous);
   if (fStoreWithinSubExpr) AddStoredName(node, text, lasting);
   return kNoText;
@@ -181,16 +185,38 @@ void CNodeWalker::VisitAtomExpr(CAtomExpr* node) {
 
 void CNodeWalker::VisitAtomPlusTrailers(CNode* atom_node, std::span<CNode* const> all_trailers) {
   const size_t count = all_trailers.size();
-  Chain chain(*this, atom_node, all_trailers);
-  Text previous = kNoText;  // the text of the last link that was read, as it is kept
-  if (isa<CNameLiteral>(atom_node)) {
-    if (IsName(atom_node)) previous = ProcessName(atom_node, atom_node->fText(), count > 0, /*lasting=*/false);
-  } else {
+  if (!isa<CNameLiteral>(atom_node)) {
     VisitNode(atom_node);
+    return VisitTrailers(atom_node, all_trailers, 0, kNoText);
   }
+  const char* const begin = atom_node->text;
+  const char* end = begin + atom_node->text_length;
+  const bool lasting = InSource(atom_node->fText());
+  Text previous = kNoText;
+  if (IsName(atom_node)) previous = ProcessName(atom_node, atom_node->fText(), count > 0, lasting);
 
-  bool dotted = true;  // all trailers up to here are attributes
-  for (size_t i = 0; i < count; ++i) {
+  // Attributes that stand side by side in the source: the text of each is a longer view.
+  size_t i = 0;
+  for (; i < count; ++i) {
+    const CNode* const trailer = all_trailers[i];
+    if (!IsAttribute(trailer)) break;
+    const CNode* const dot = trailer->children[0];
+    const CNode* const name = trailer->children[1];
+    if (dot->text != end || name->text != end + 1 || !IsName(name)) break;
+    end = name->text + name->text_length;
+    previous = ProcessName(name, {begin, static_cast<size_t>(end - begin)}, i + 1 < count, lasting, previous);
+  }
+  if (i < count) VisitTrailers(atom_node, all_trailers, i, {begin, static_cast<size_t>(end - begin)});
+}
+
+// The trailers from `start` on, where `view` is the text of the chain in front of them, or none
+// where there is nothing in front but an atom that is no name.
+void CNodeWalker::VisitTrailers(CNode* atom_node, std::span<CNode* const> all_trailers, size_t start, Text view) {
+  const size_t count = all_trailers.size();
+  Chain chain(*this, atom_node, all_trailers, start, view);
+  Text previous = kNoText;  // the text of the last link that was read, as it is kept
+  bool dotted = true;       // all trailers up to here are attributes
+  for (size_t i = start; i < count; ++i) {
     auto* trailer = Expect<CTrailer>(all_trailers[i]);
     if (trailer == nullptr) ThrowNoAttribute("GetInitialToken");
     if (trailer->child_count == 0) (void)trailer->GetInitialToken();
@@ -208,8 +234,10 @@ void CNodeWalker::VisitAtomPlusTrailers(CNode* atom_node, std::span<CNode* const
       ProcessCallOf(dotted ? chain.DottedName(i) : kNoText, child);
     } else if (trailer->ChildIs(0, tok::LSQB) || trailer->ChildIs(0, tok::LBRACE)) {
       VisitLoadContextNode(child);
-    } else {
+    } else if (!trailer->ChildIs(1, tok::RPAR) || child->child_count != 0) {
       VisitNode(child);
+    } else {
+      CountVisit();
     }
     dotted = dotted && is_attribute;
   }

@@ -58,27 +58,25 @@ void CNodeWalker::EndWalk() {
   fStoredNames.Clear();
   source_begin_ = nullptr;
   source_size_ = 0;
-  if (composed_size_ != 0) {
-    composed_size_ = 0;
+  composed_size_ = 0;
+  if (own_texts_used_) {
+    own_texts_used_ = false;
     own_texts_.Reset();
   }
-}
-
-LogicalLine& CNodeWalker::RequireLogical() const {
-  if (fLogical == nullptr) [[unlikely]]
-    ThrowNoAttribute("AppendTypeEquiv");
-  return *fLogical;
 }
 
 void CNodeWalker::ProcessNamesFound(CNode* node) {
   // What an import names is defined by its visit and must not read as a use.
   if (isa<CImportNamesStmt>(node) || isa<CFromImportStmt>(node)) return;
-  for (const Text name : fLoadedNames.names()) {
+  if (fLoadedNames.empty() && fStoredNames.empty()) return;
+  LogicalLine& logical = RequireLogical();
+  for (size_t i = 0; i < fLoadedNames.size(); ++i) {
+    const Text name = fLoadedNames[i];
     Assert(!IsNone(name), "a name that was read has no text");
-    AddStableTypeEquiv(name, kGetPrefix);
+    logical.AppendStableTypeEquiv(name, kGetPrefix);
   }
-  for (size_t i = 0; i < fStoredNames.names().size(); ++i) {
-    const Text name = fStoredNames.names()[i];
+  for (size_t i = 0; i < fStoredNames.size(); ++i) {
+    const Text name = fStoredNames.name(i);
     Assert(!IsNone(name), "a name that was stored has no text");
     const StoreList::Store* store = &fStoredNames.first(i);
     while (true) {
@@ -110,19 +108,11 @@ Text CNodeWalker::KeepCopy(Text text) {
   return Texts().Copy(text);
 }
 
-void CNodeWalker::CountComposed(size_t size) {
-  // One more than the size: also an empty text makes the arena one to be reset.
-  composed_size_ += size + 1;
-  if (composed_size_ > kMaxComposedSize + kComposedPerSourceByte * source_size_) [[unlikely]] {
-    ThrowError(ErrorKind::kRuntimeError, "Maximum size of the texts of a statement exceeded");
-  }
+void CNodeWalker::ThrowTooMuchText() {
+  ThrowError(ErrorKind::kRuntimeError, "Maximum size of the texts of a statement exceeded");
 }
 
 // ---- recorders ----
-
-void CNodeWalker::AddStableTypeEquiv(Text name, Text equiv) { RequireLogical().AppendStableTypeEquiv(name, equiv); }
-
-void CNodeWalker::AddKeptNameDefined(Text name) { AddStableTypeEquiv(name, kSetPrefix); }
 
 void CNodeWalker::AddTypeEquiv(Text name, Text equiv) {
   LogicalLine& logical = RequireLogical();

@@ -20,6 +20,7 @@
 
 #include "foundations/arena.h"
 #include "siblings/logicalline/logical_line.h"
+#include "siblings/symbolinfo/symbolinfo.h"
 #include "text/node_to_text.h"
 #include "tree/arg_info.h"
 #include "tree/nodes.h"
@@ -143,10 +144,20 @@ class CNodeWalker {
 
  private:
   // Counts one call of VisitNode and checks both limits for it.
-  void CountVisit();
+  void CountVisit() {
+    if (++fVisitCount > fMaxVisits) [[unlikely]]
+      ThrowTooManyVisits();
+    if (fRecurseCount >= fMaxRecurseCount) [[unlikely]]
+      ThrowTooDeep();
+  }
+  [[noreturn]] void ThrowTooManyVisits();
+  [[noreturn]] void ThrowTooDeep();
   void EndWalk();
-  LogicalLine& RequireLogical() const;
-  static bool IsUnnamedLeaf(const CNode* node);
+  LogicalLine& RequireLogical() const {
+    if (fLogical == nullptr) [[unlikely]]
+      ThrowNoAttribute("AppendTypeEquiv");
+    return *fLogical;
+  }
 
   // ---- texts that records refer to ----
   bool InSource(Text text) const {
@@ -157,16 +168,29 @@ class CNodeWalker {
   Text Keep(Text text) { return InSource(text) ? text : KeepCopy(text); }
   Text KeepCopy(Text text);
   // Where such copies go: to the line, or, where a host's hooks take the records, to the walker.
-  TextArena& Texts() { return fLogical != nullptr && fLogical->hooks == nullptr ? fLogical->texts() : own_texts_; }
-  void CountComposed(size_t size);
+  TextArena& Texts() {
+    if (fLogical != nullptr && fLogical->hooks == nullptr) [[likely]]
+      return fLogical->texts();
+    own_texts_used_ = true;
+    return own_texts_;
+  }
+  void CountComposed(size_t size) {
+    composed_size_ += size;
+    if (composed_size_ > kMaxComposedSize + kComposedPerSourceByte * source_size_) [[unlikely]]
+      ThrowTooMuchText();
+  }
+  [[noreturn]] void ThrowTooMuchText();
   // For texts that Keep gave, or that are static.
-  void AddStableTypeEquiv(Text name, Text equiv);
+  void AddStableTypeEquiv(Text name, Text equiv) { RequireLogical().AppendStableTypeEquiv(name, equiv); }
   // Records that the kept name is defined.
-  void AddKeptNameDefined(Text name);
+  void AddKeptNameDefined(Text name) { AddStableTypeEquiv(name, kSetPrefix); }
 
   // ---- names ----
   // Whether the leaf is a name and none of the three constants.
-  static bool IsName(const CNode* node);
+  static bool IsName(const CNode* node) {
+    // The three words are no names, in either language.
+    return node->IsLeaf() && node->code != word::kNone && node->code != word::kTrue && node->code != word::kFalse;
+  }
   // A name met in the current context. `more`: another link of a chain follows. `lasting`: the text
   // is one that Keep gave. The text of a read comes back as it is kept; `previous` is that of the
   // chain's link in front.
@@ -174,6 +198,7 @@ class CNodeWalker {
   Text AddLoadedName(Text name, bool lasting, Text previous);
   void AddStoredName(const CNode* node, Text text, bool lasting);
   class Chain;
+  void VisitTrailers(CNode* atom_node, std::span<CNode* const> all_trailers, size_t start, Text view);
 
   // ---- imports ----
   Text ImportedName(CNode* module);
@@ -208,6 +233,7 @@ class CNodeWalker {
   size_t source_size_ = 0;
   size_t composed_size_ = 0;
   TextArena own_texts_;
+  bool own_texts_used_ = false;
 
   std::string equiv_buffer_;  // what TypeEquivForNode composes
   std::string scratch_;       // an info text on its way to its record

@@ -359,7 +359,10 @@ TEST(Names, AHostAsksForOneLinkByItsTrailers) {
   walker.VisitNameLiteral(trailers[0]->children[1], chain->GetAtom(), trailers, 0, true);
   walker.VisitNameLiteral(trailers[2]->children[1], chain->GetAtom(), trailers, 2, true);
   walker.VisitNameLiteral(chain->GetAtom(), nullptr, {}, -1, false);
-  EXPECT_EQ(walker.fLoadedNames.names(), (std::vector<Text>{"a.b", "a.b(c).d", "a"}));
+  ASSERT_EQ(walker.fLoadedNames.size(), 3u);
+  EXPECT_EQ(walker.fLoadedNames[0], "a.b");
+  EXPECT_EQ(walker.fLoadedNames[1], "a.b(c).d");
+  EXPECT_EQ(walker.fLoadedNames[2], "a");
 }
 
 // ---- imports ----
