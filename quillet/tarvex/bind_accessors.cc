@@ -81,7 +81,7 @@ template <class T, class R, class A, R (T::*Accessor)(A) const>
 struct Bound<Accessor> {
   using Class = T;
   template <class Self>
-  static nb::object Call(nb::handle self, nb::handle argument) {
+  static nb::object Call(nb::handle self, Any argument) {
     Source source;
     const T* node = NodeAs<Self>(self, source);
     return ToHost((node->*Accessor)(FromHost<A>::Get(argument)), source);
@@ -290,7 +290,7 @@ T* ArgumentAs(nb::handle node, Source& source) {
 void BindFreeOperations(nb::module_& m) {
   m.def(
       "GetDefiningArgInfoList",
-      [](nb::handle node) {
+      [](Any node) {
         Source source;
         CNode* root = ArgumentAs<CNode>(node, source);
         return WrapArgList(GetDefiningArgInfoList(root), source);
@@ -298,7 +298,7 @@ void BindFreeOperations(nb::module_& m) {
       nb::arg("node"));
   m.def(
       "GetUsedArgInfoList",
-      [](nb::handle node) {
+      [](Any node) {
         Source source;
         CNode* root = ArgumentAs<CNode>(node, source);
         return WrapUsedArgs(GetUsedArgInfoList(root), source);
@@ -306,31 +306,30 @@ void BindFreeOperations(nb::module_& m) {
       nb::arg("node"));
   m.def(
       "GetTokenEndIndex",
-      [](nb::handle node) {
+      [](Any node) {
         Source source;
         return GetTokenEndIndex(ArgumentAs<CNode>(node, source));
       },
       nb::arg("node"));
   m.def(
-      "_TextForImportName", [](nb::handle nodes) { return StrOf(TextForImportName(NodesOf(nodes))); },
-      nb::arg("nodes"));
+      "_TextForImportName", [](Any nodes) { return StrOf(TextForImportName(NodesOf(nodes))); }, nb::arg("nodes"));
   m.def(
       "_ProcessAsNamesList",
-      [](nb::handle node) {
+      [](Any node) {
         Source source;
         return ToHost(ProcessAsNamesList(ArgumentAs<CNode>(node, source)), source);
       },
       nb::arg("node"));
   m.def(
       "_ProcessSingleModuleNameAs",
-      [](nb::handle node) {
+      [](Any node) {
         Source source;
         return WrapAsName(ProcessSingleModuleNameAs(ArgumentAs<CNode>(node, source)));
       },
       nb::arg("node"));
   m.def(
       "_GetMatchingChildToken",
-      [](nb::handle node, nb::handle text) {
+      [](Any node, Any text) {
         Source source;
         const HostText wanted = HostText::FromStr(text);
         return GetMatchingChildToken(ArgumentAs<CNode>(node, source), wanted.text());
@@ -339,7 +338,7 @@ void BindFreeOperations(nb::module_& m) {
 
   m.def(
       "DropSimpleParens",
-      [](nb::handle node) {
+      [](Any node) {
         Source source;
         CNode* root = ArgumentAs<CNode>(node, source);
         return Wrap(DropSimpleParens(root), source);
@@ -347,7 +346,7 @@ void BindFreeOperations(nb::module_& m) {
       nb::arg("node"));
   m.def(
       "ExpandSeqLiteral",
-      [](nb::handle node) {
+      [](Any node) {
         Source source;
         CNode* root = ArgumentAs<CNode>(node, source);
         NodeList elements;
@@ -356,21 +355,21 @@ void BindFreeOperations(nb::module_& m) {
       nb::arg("node"));
   m.def(
       "IsSetLiteral",
-      [](nb::handle node) {
+      [](Any node) {
         Source source;
         return IsSetLiteral(ArgumentAs<CAtom>(node, source));
       },
       nb::arg("node"));
   m.def(
       "IsGenExpression",
-      [](nb::handle atom_node) {
+      [](Any atom_node) {
         Source source;
         return IsGenExpression(ArgumentAs<CAtom>(atom_node, source));
       },
       nb::arg("atom_node"));
   m.def(
       "IsTupleLiteralNode",
-      [](nb::handle node) {
+      [](Any node) {
         Source source;
         return IsTupleLiteralNode(ArgumentAs<CNode>(node, source));
       },
@@ -389,7 +388,7 @@ void BindInstanceNames(nb::module_& m) {
   m.attr("kFloatLiteralName") = BytesOf(kFloatLiteralName);
   m.def(
       "_GetBuiltinInstanceName",
-      [](nb::handle cls_name) {
+      [](Any cls_name) {
         const HostText name = HostText::FromStr(cls_name);
         std::string info(kTypedLiteralPrefix);
         AppendInstanceNameForClass(EnsureScopeNameIndicies(name.text()), info);

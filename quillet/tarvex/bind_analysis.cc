@@ -15,8 +15,8 @@
 namespace quillet::host {
 namespace {
 
-void InitAnalyzer(AnalyzerObject* self, nb::handle version_triple, nb::handle grammar_file, nb::handle keyword_seq,
-                  Truth py3_grammar, nb::handle hint_grammar_file) {
+void InitAnalyzer(AnalyzerObject* self, Any version_triple, Any grammar_file, Any keyword_seq, Truth py3_grammar,
+                  Any hint_grammar_file) {
   new (self) AnalyzerObject();
   try {
     CPGenAnalyzerImpl::Options options;
@@ -51,7 +51,7 @@ class Retained {
   NodePool& hint_pool_;
 };
 
-nb::object Analyze(AnalyzerObject& self, nb::handle logical, Truth in_async_def, Truth first_in_def) {
+nb::object Analyze(AnalyzerObject& self, Any logical, Truth in_async_def, Truth first_in_def) {
   LineObject& object = LineOf(logical);
   LogicalLine& line = object.line();
   if (line.parsed) return nb::none();
@@ -69,16 +69,14 @@ nb::object Analyze(AnalyzerObject& self, nb::handle logical, Truth in_async_def,
   return raised.is_valid() ? raised : ExceptionFor(*error);
 }
 
-bool Inspect(AnalyzerObject& self, nb::handle logical, Truth in_async_def, Truth in_embedded_expression,
-             Truth first_in_def) {
+bool Inspect(AnalyzerObject& self, Any logical, Truth in_async_def, Truth in_embedded_expression, Truth first_in_def) {
   LineObject& object = LineOf(logical);
   Recording recording(&object);
   const Retained retained(*self.analyzer, object.line().source);
   return self.analyzer->InspectSingleLogical(object.line(), in_async_def, in_embedded_expression, first_in_def);
 }
 
-void InspectEmbedded(AnalyzerObject& self, nb::handle logical, nb::handle node, Truth in_async_def,
-                     Truth first_in_def) {
+void InspectEmbedded(AnalyzerObject& self, Any logical, Any node, Truth in_async_def, Truth first_in_def) {
   LineObject& object = LineOf(logical);
   RefOrNull(node);
   Recording recording(&object);
@@ -102,7 +100,7 @@ Context ErrorContext(nb::handle context) {
   return Context::Index(static_cast<int32_t>(index < least ? least : index > most ? most : index));
 }
 
-nb::object SyntaxErrorFor(nb::handle msg, nb::handle logical, nb::handle context, nb::handle pos_info_in_tok) {
+nb::object SyntaxErrorFor(Any msg, Any logical, Any context, Any pos_info_in_tok) {
   const HostText message = HostText::FromStr(msg);
   Position in_token;
   if (!pos_info_in_tok.is_none()) {
@@ -139,7 +137,7 @@ nb::object SyntaxErrorFor(nb::handle msg, nb::handle logical, nb::handle context
 void BindAnalysis(nb::module_& tarvex) {
   nb::class_<AnalyzerObject, AnalyzerBase> cls(
       tarvex, "CPGenAnalyzerImpl", "Analyses logical lines, one at a time; one analyzer serves one thread.");
-  cls.def("__init__", &InitAnalyzer, nb::arg("version_triple").none(), nb::arg("grammar_file") = kPy3DefaultGrammar,
+  cls.def("__init__", &InitAnalyzer, nb::arg("version_triple"), nb::arg("grammar_file") = kPy3DefaultGrammar,
           nb::arg("keyword_seq") = nb::none(), nb::arg("py3_grammar") = true,
           nb::arg("hint_grammar_file") = kPy3DefaultGrammar);
   cls.def("AnalyzeSingleLogical", &Analyze, nb::arg("logical"), nb::arg("in_async_def"),
@@ -147,26 +145,26 @@ void BindAnalysis(nb::module_& tarvex) {
           "Analyses a line once and gives the exception that describes a failure, or None.");
   cls.def("_InspectSingleLogical", &Inspect, nb::arg("logical"), nb::arg("in_async_def"),
           nb::arg("in_embedded_expression") = false, nb::arg("first_in_def") = false);
-  cls.def("_InspectEmbeddedExpressions", &InspectEmbedded, nb::arg("logical"), nb::arg("node").none(),
-          nb::arg("in_async_def"), nb::arg("first_in_def"));
+  cls.def("_InspectEmbeddedExpressions", &InspectEmbedded, nb::arg("logical"), nb::arg("node"), nb::arg("in_async_def"),
+          nb::arg("first_in_def"));
   cls.def(
       "ParseToNode",
-      [](AnalyzerObject& self, nb::handle logical, Truth in_async_def) {
+      [](AnalyzerObject& self, Any logical, Truth in_async_def) {
         return ForwardParseToNode(self.analyzer->logical_parser(), logical, in_async_def);
       },
       nb::arg("logical"), nb::arg("in_async_def"));
   cls.def(
       "ParseTokenListToNode",
-      [](AnalyzerObject& self, nb::handle logical, Truth in_async_def) {
+      [](AnalyzerObject& self, Any logical, Truth in_async_def) {
         return ForwardParseTokenListToNode(self.analyzer->logical_parser(), logical, in_async_def);
       },
-      nb::arg("logical").none(), nb::arg("in_async_def"));
+      nb::arg("logical"), nb::arg("in_async_def"));
   cls.def(
       "GetTypeParameterNodes",
-      [](AnalyzerObject& self, nb::handle toks) {
+      [](AnalyzerObject& self, Any toks) {
         return ForwardGetTypeParameterNodes(self.analyzer->logical_parser(), toks);
       },
-      nb::arg("toks").none());
+      nb::arg("toks"));
   cls.def_prop_ro("_fLogicalParser", [](AnalyzerObject& self) {
     if (!self.logical_parser.is_valid()) {
       self.logical_parser =

@@ -66,7 +66,7 @@ nb::object& DispatchDict(DispatchObject& object) {
   return object.dispatch_dict;
 }
 
-void SetLogical(DispatchObject& self, nb::handle value) {
+void SetLogical(DispatchObject& self, Any value) {
   if (value.is_none()) {
     self.walker->fLogical = nullptr;
     self.logical.reset();
@@ -82,10 +82,10 @@ template <int32_t CDispatchWalker::*Field>
 void DefCount(nb::class_<DispatchObject>& cls, const char* name) {
   cls.def_prop_rw(
       name, [](DispatchObject& self) { return (*self.walker).*Field; },
-      [](DispatchObject& self, nb::handle value) { (*self.walker).*Field = Int32Of(value); });
+      [](DispatchObject& self, Any value) { (*self.walker).*Field = Int32Of(value); });
 }
 
-void WalkByDict(nb::handle self, nb::handle node, nb::handle logical, Truth first_in_def) {
+void WalkByDict(nb::handle self, Any node, Any logical, Truth first_in_def) {
   auto& object = nb::cast<DispatchObject&>(self);
   NodeRef* root = RefOrNull(node);
   LineObject& line = LineOf(logical);
@@ -116,39 +116,38 @@ void BindDispatchWalker(nb::module_& m) {
                                  "Walks a tree by a dict from node class to visit.");
   cls.def(
       "__init__",
-      [](DispatchObject* self, nb::handle dispatch_dict) {
+      [](DispatchObject* self, Any dispatch_dict) {
         if (!dispatch_dict.is_none() && !PyDict_Check(dispatch_dict.ptr())) ThrowExpected("dict", dispatch_dict);
         new (self)
             DispatchObject{std::make_shared<CDispatchWalker>(CDispatchWalker::Table{}), nb::borrow(dispatch_dict), {}};
       },
-      nb::arg("dispatch_dict").none());
+      nb::arg("dispatch_dict"));
   cls.def_prop_rw(
       "_fLogical", [](DispatchObject& self) { return HostLineOf(self.walker->fLogical, self.logical); }, &SetLogical,
-      nb::arg("value").none());
+      nb::arg("value"));
   cls.def_prop_ro("_fDispatchDict", [](DispatchObject& self) { return DispatchDict(self); });
   DefCount<&CDispatchWalker::fVisitCount>(cls, "_fVisitCount");
   DefCount<&CDispatchWalker::fRecurseCount>(cls, "_fRecurseCount");
   DefCount<&CDispatchWalker::fMaxVisits>(cls, "_fMaxVisits");
   DefCount<&CDispatchWalker::fMaxRecurseCount>(cls, "_fMaxRecurseCount");
   cls.def_prop_ro("_fNodeStack", [](DispatchObject& self) { return WrapList(self.walker->fNodeStack, {}); });
-  cls.def("Walk", &WalkByDict, nb::arg("node").none(), nb::arg("logical").none(), nb::arg("first_in_def"));
+  cls.def("Walk", &WalkByDict, nb::arg("node"), nb::arg("logical"), nb::arg("first_in_def"));
   cls.def(
       "_VisitNode",
-      [](nb::handle self, nb::handle node) {
+      [](nb::handle self, Any node) {
         auto& object = nb::cast<DispatchObject&>(self);
         NodeRef* root = RefOrNull(node);
         DictVisits visits(object, self, SourceOf(root));
         object.walker->VisitNode(root == nullptr ? nullptr : root->node());
       },
-      nb::arg("node").none());
+      nb::arg("node"));
 }
 
 // ---- the hint walker ----
 
 using HintClass = nb::class_<HintWalkerObject, DispatchObject>;
 
-void InitHintWalker(HintWalkerObject* self, nb::handle version_triple, nb::handle grammar_file,
-                    nb::handle general_node_walker) {
+void InitHintWalker(HintWalkerObject* self, Any version_triple, Any grammar_file, Any general_node_walker) {
   new (self) HintWalkerObject();
   try {
     CPGenParserImpl::Options options;
@@ -180,7 +179,7 @@ nb::object WrapHintTree(HintWalkerObject& self, CNode* node) {
 }
 
 template <bool (CTypeHintWalker::*Operation)(CNode*)>
-bool VisitStatement(HintWalkerObject& self, nb::handle node) {
+bool VisitStatement(HintWalkerObject& self, Any node) {
   CNode* root = RefOf(node).node();
   Recording recording(self.walker->fLogical);
   return (self.hints().*Operation)(root);
@@ -191,14 +190,14 @@ nb::object TextAndIndex(nb::object text, int32_t tok_i) { return nb::make_tuple(
 void BindHintComments(HintClass& cls) {
   cls.def(
       "_FindEndingTypeComment",
-      [](HintWalkerObject& self, nb::handle node) {
+      [](HintWalkerObject& self, Any node) {
         const CTypeHintWalker::Hint hint = self.hints().FindEndingTypeComment(RefOf(node).node());
         return TextAndIndex(hint.found ? StrOf(hint.text) : nb::object(nb::none()), hint.tok_i);
       },
       nb::arg("node"));
   cls.def(
       "_GetHintFromComment",
-      [](HintWalkerObject&, nb::handle comment) {
+      [](HintWalkerObject&, Any comment) {
         const HostText text = HostText::FromStr(comment);
         std::string hint;
         return CTypeHintWalker::GetHintFromComment(text.text(), hint) ? StrOf(hint) : nb::object(nb::none());
@@ -206,14 +205,14 @@ void BindHintComments(HintClass& cls) {
       nb::arg("comment"));
   cls.def(
       "_GetRowRange",
-      [](HintWalkerObject& self, nb::handle node) {
+      [](HintWalkerObject& self, Any node) {
         const auto [first, end] = self.hints().GetRowRange(RefOf(node).node());
         return nb::make_tuple(first, end);
       },
       nb::arg("node"));
   cls.def(
       "_FindComment",
-      [](HintWalkerObject& self, nb::handle row, nb::handle logical) {
+      [](HintWalkerObject& self, Any row, Any logical) {
         LogicalLine* line = logical.is_none() ? nullptr : &LineOf(logical).line();
         const CTypeHintWalker::Comment comment = self.hints().FindComment(Int64Of(row), line);
         return TextAndIndex(StrOf(comment.text), comment.tok_i);
@@ -221,11 +220,11 @@ void BindHintComments(HintClass& cls) {
       nb::arg("row"), nb::arg("logical") = nb::none());
   cls.def(
       "_IsDottedName",
-      [](HintWalkerObject&, nb::handle text) { return CTypeHintWalker::IsDottedName(HostText::FromStr(text).text()); },
+      [](HintWalkerObject&, Any text) { return CTypeHintWalker::IsDottedName(HostText::FromStr(text).text()); },
       nb::arg("text"));
   cls.def(
       "_ParseHint",
-      [](HintWalkerObject& self, nb::handle hint, nb::handle tok_i, Truth call_general_node_walker) {
+      [](HintWalkerObject& self, Any hint, Any tok_i, Truth call_general_node_walker) {
         const HostText text = HostText::FromStr(hint);
         const int32_t index = Int32Of(tok_i);
         Recording recording(self.walker->fLogical);
@@ -234,7 +233,7 @@ void BindHintComments(HintClass& cls) {
       nb::arg("hint"), nb::arg("tok_i"), nb::arg("call_general_node_walker"));
   cls.def(
       "_RaiseHintSyntaxError",
-      [](HintWalkerObject& self, nb::handle tok_i, nb::handle offset) {
+      [](HintWalkerObject& self, Any tok_i, Any offset) {
         self.hints().RaiseHintSyntaxError(Int32Of(tok_i), Int64Of(offset));
       },
       nb::arg("tok_i"), nb::arg("utf8_offset_in_hint"));
@@ -246,36 +245,36 @@ void BindHintStatements(HintClass& cls) {
   cls.def("_VisitWithStmt", &VisitStatement<&CTypeHintWalker::VisitWithStmt>, nb::arg("node"));
   cls.def(
       "_VisitFuncdefStmt",
-      [](HintWalkerObject& self, nb::handle node) { VisitStatement<&CTypeHintWalker::VisitFuncdefStmt>(self, node); },
+      [](HintWalkerObject& self, Any node) { VisitStatement<&CTypeHintWalker::VisitFuncdefStmt>(self, node); },
       nb::arg("node"));
   cls.def(
       "_ProcessTarget",
-      [](HintWalkerObject& self, nb::handle node, nb::handle target) {
+      [](HintWalkerObject& self, Any node, Any target) {
         CNode* statement = RefOf(node).node();
         CNode* target_node = NodeOrNull(target, NodeKind::kCExpression);
         Recording recording(self.walker->fLogical);
         self.hints().ProcessTarget(statement, target_node);
       },
-      nb::arg("node"), nb::arg("target").none());
+      nb::arg("node"), nb::arg("target"));
   cls.def(
       "_ProcessNameAndHintNodes",
-      [](HintWalkerObject& self, nb::handle name_node, nb::handle hint_node, Truth is_arg) {
+      [](HintWalkerObject& self, Any name_node, Any hint_node, Truth is_arg) {
         CNode* name = NodeOrNull(name_node, NodeKind::kCExpression);
         CNode* hint = NodeOrNull(hint_node, NodeKind::kCExpression);
         Recording recording(self.walker->fLogical);
         self.hints().ProcessNameAndHintNodes(name, hint, is_arg);
       },
-      nb::arg("name_node").none(), nb::arg("hint_node").none(), nb::arg("is_arg"));
+      nb::arg("name_node"), nb::arg("hint_node"), nb::arg("is_arg"));
   cls.def(
       "_GetHintInfoStr",
-      [](HintWalkerObject& self, nb::handle node) {
+      [](HintWalkerObject& self, Any node) {
         std::string info;
         return self.hints().GetHintInfoStr(NodeOrNull(node), info) ? BytesOf(info) : nb::object(nb::none());
       },
-      nb::arg("node").none());
+      nb::arg("node"));
   cls.def(
       "_AddSymInfo",
-      [](HintWalkerObject& self, nb::handle name, nb::handle istr, Truth is_arg) {
+      [](HintWalkerObject& self, Any name, Any istr, Truth is_arg) {
         const HostText name_text = HostText::FromStrOrBytes(name);
         const HostText info_text = HostText::FromStrOrBytes(istr);
         Recording recording(self.walker->fLogical);
@@ -287,7 +286,7 @@ void BindHintStatements(HintClass& cls) {
 void BindSignatures(HintClass& cls) {
   cls.def(
       "_RewriteFuncdefCommentHint",
-      [](HintWalkerObject&, nb::handle hint) {
+      [](HintWalkerObject&, Any hint) {
         const HostText text = HostText::FromStr(hint);
         const CTypeHintWalker::RewrittenHint rewritten = CTypeHintWalker::RewriteFuncdefCommentHint(text.text());
         nb::list tokens, offsets;
@@ -298,17 +297,17 @@ void BindSignatures(HintClass& cls) {
       nb::arg("hint"));
   cls.def(
       "_ProcessFuncdefComment",
-      [](HintWalkerObject& self, nb::handle hint, nb::handle tok_i, nb::handle funcdef_logical, Truth is_arg) {
+      [](HintWalkerObject& self, Any hint, Any tok_i, Any funcdef_logical, Truth is_arg) {
         const HostText text = HostText::FromStr(hint);
         const int32_t index = Int32Of(tok_i);
         LogicalLine* line = funcdef_logical.is_none() ? nullptr : &LineOf(funcdef_logical).line();
         Recording recording(self.walker->fLogical);
         self.hints().ProcessFuncdefComment(text.text(), index, line, is_arg);
       },
-      nb::arg("hint"), nb::arg("tok_i"), nb::arg("funcdef_logical").none(), nb::arg("is_arg"));
+      nb::arg("hint"), nb::arg("tok_i"), nb::arg("funcdef_logical"), nb::arg("is_arg"));
   cls.def(
       "_ProcessArgSpecificComment",
-      [](HintWalkerObject& self, nb::handle arg) {
+      [](HintWalkerObject& self, Any arg) {
         const CArgInfo info = ArgOf(arg);
         Recording recording(self.walker->fLogical);
         self.hints().ProcessArgSpecificComment(info);
@@ -316,7 +315,7 @@ void BindSignatures(HintClass& cls) {
       nb::arg("arg"));
   cls.def(
       "_ParseFuncdefCommentHint",
-      [](HintWalkerObject& self, nb::handle hint, nb::handle tok_i) {
+      [](HintWalkerObject& self, Any hint, Any tok_i) {
         const HostText text = HostText::FromStr(hint);
         return WrapHintTree(self, self.hints().ParseFuncdefCommentHint(text.text(), Int32Of(tok_i)));
       },
@@ -325,11 +324,11 @@ void BindSignatures(HintClass& cls) {
 
 void BindHintWalker(nb::module_& m) {
   HintClass cls(m, "CTypeHintWalker", "Finds type information in a statement and records it on its logical line.");
-  cls.def("__init__", &InitHintWalker, nb::arg("version_triple").none(), nb::arg("grammar_file"),
-          nb::arg("general_node_walker").none());
+  cls.def("__init__", &InitHintWalker, nb::arg("version_triple"), nb::arg("grammar_file"),
+          nb::arg("general_node_walker"));
   cls.def_prop_rw(
       "_fCommentHintCount", [](HintWalkerObject& self) { return self.hints().fCommentHintCount; },
-      [](HintWalkerObject& self, nb::handle value) { self.hints().fCommentHintCount = Int32Of(value); });
+      [](HintWalkerObject& self, Any value) { self.hints().fCommentHintCount = Int32Of(value); });
   cls.def_prop_ro("_fHintParser", [](HintWalkerObject& self) {
     if (!self.hint_parser.is_valid()) {
       nb::object keywords;
@@ -342,22 +341,22 @@ void BindHintWalker(nb::module_& m) {
   cls.def_prop_ro("_fGeneralNodeWalker", [](HintWalkerObject& self) { return self.general_node_walker; });
   cls.def(
       "Walk",
-      [](HintWalkerObject& self, nb::handle node, nb::handle logical, Truth first_in_def) {
+      [](HintWalkerObject& self, Any node, Any logical, Truth first_in_def) {
         CNode* root = NodeOrNull(node);
         LineObject& line = LineOf(logical);
         Recording recording(&line);
         self.logical = nb::borrow(logical);
         self.walker->Walk(root, &line.line(), first_in_def);
       },
-      nb::arg("node").none(), nb::arg("logical").none(), nb::arg("first_in_def"));
+      nb::arg("node"), nb::arg("logical"), nb::arg("first_in_def"));
   cls.def(
       "_VisitNode",
-      [](HintWalkerObject& self, nb::handle node) {
+      [](HintWalkerObject& self, Any node) {
         CNode* root = NodeOrNull(node);
         Recording recording(self.walker->fLogical);
         self.walker->VisitNode(root);
       },
-      nb::arg("node").none());
+      nb::arg("node"));
   BindHintComments(cls);
   BindHintStatements(cls);
   BindSignatures(cls);

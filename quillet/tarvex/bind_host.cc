@@ -49,14 +49,14 @@ void BindHost(nb::module_& tarvex) {
                             "in_async_def, first_in_def), with lines counted from 0.");
   cls.def(
       "__init__",
-      [](CutSource* self, nb::handle source, nb::handle version_triple) {
+      [](CutSource* self, Any source, Any version_triple) {
         const HostText text = HostText::FromBytes(source);
         new (self) CutSource(text.text(), VersionOf(version_triple));
       },
       nb::arg("source"), nb::arg("version_triple"));
   cls.def("__len__", [](CutSource& self) { return self.rows.size(); });
   cls.def(
-      "__getitem__", [](CutSource& self, nb::handle index) { return self.At(Int64Of(index)); }, nb::arg("index"));
+      "__getitem__", [](CutSource& self, Any index) { return self.At(Int64Of(index)); }, nb::arg("index"));
 }
 
 }  // namespace quillet::host

@@ -505,8 +505,8 @@ nb::object CutToTuple(const Ref<SourceText>& source, Version version) {
 
 namespace {
 
-void InitLine(nb::pointer_and_handle<LineObject> self, nb::handle type, nb::handle toks, nb::handle positions,
-              nb::handle tok_types, nb::handle parsed, nb::handle first_line, nb::handle token_count) {
+void InitLine(nb::pointer_and_handle<LineObject> self, Any type, Any toks, Any positions, Any tok_types, Any parsed,
+              Any first_line, Any token_count) {
   auto* object = new (self.p) LineObject();
   try {
     object->SetType(type);
@@ -536,7 +536,7 @@ Version VersionOrOwn(nb::handle version_triple) {
                                   : VersionOf(version_triple);
 }
 
-nb::object GetLogicalsFromText(nb::handle text, nb::handle version_triple) {
+nb::object GetLogicalsFromText(Any text, Any version_triple) {
   HostText host_text = HostText::FromStrOrBytes(text);
   return CutToTuple(SourceText::Copy(host_text.text()), VersionOrOwn(version_triple));
 }
@@ -573,37 +573,37 @@ void BindLogicalline(nb::module_& tarvex) {
           nb::arg("first_line") = 0, nb::arg("token_count") = nb::none());
   cls.def_prop_rw(
       "fType", [](LineObject& self) { return self.GetType(); },
-      [](LineObject& self, nb::handle value) { self.SetType(value); });
+      [](LineObject& self, Any value) { self.SetType(value); });
   cls.def_prop_rw(
       "fToks", [](LineObject& self) { return self.GetToks(); },
-      [](LineObject& self, nb::handle value) { self.SetToks(value); });
+      [](LineObject& self, Any value) { self.SetToks(value); });
   cls.def_prop_rw(
       "fTokTypes", [](LineObject& self) { return self.GetTokTypes(); },
-      [](LineObject& self, nb::handle value) { self.SetTokTypes(value); });
+      [](LineObject& self, Any value) { self.SetTokTypes(value); });
   cls.def_prop_rw(
       "fPositions", [](LineObject& self) { return self.GetPositions(); },
-      [](LineObject& self, nb::handle value) { self.SetPositions(value); });
+      [](LineObject& self, Any value) { self.SetPositions(value); });
   cls.def_prop_rw(
       "fParsed", [](LineObject& self) { return self.line().parsed; },
       [](LineObject& self, Truth value) { self.line().parsed = value; });
   cls.def_prop_rw(
       "fFirstLine", [](LineObject& self) { return self.line().first_line; },
-      [](LineObject& self, nb::handle value) { self.line().first_line = Int32Of(value); });
+      [](LineObject& self, Any value) { self.line().first_line = Int32Of(value); });
   cls.def_prop_rw(
       "fTokenCount", [](LineObject& self) { return self.GetTokenCount(); },
-      [](LineObject& self, nb::handle value) { self.SetTokenCount(Int32Of(value)); });
+      [](LineObject& self, Any value) { self.SetTokenCount(Int32Of(value)); });
   cls.def_prop_rw(
       "fTypeEquivs", [](LineObject& self) { return self.GetTypeEquivs(); },
-      [](LineObject& self, nb::handle value) { self.SetTypeEquivs(value); }, nb::arg("value").none());
+      [](LineObject& self, Any value) { self.SetTypeEquivs(value); }, nb::arg("value"));
   cls.def_prop_rw(
       "fArgTypeEquivs", [](LineObject& self) { return self.GetArgTypeEquivs(); },
-      [](LineObject& self, nb::handle value) { self.SetArgTypeEquivs(value); }, nb::arg("value").none());
+      [](LineObject& self, Any value) { self.SetArgTypeEquivs(value); }, nb::arg("value"));
 
   cls.def(
-      "GetTokType", [](LineObject& self, nb::handle i) { return self.BuiltinGetTokType(Int64Of(i)); }, nb::arg("i"));
+      "GetTokType", [](LineObject& self, Any i) { return self.BuiltinGetTokType(Int64Of(i)); }, nb::arg("i"));
   cls.def(
       "AppendTypeEquiv",
-      [](LineObject& self, nb::handle name, nb::handle equiv) {
+      [](LineObject& self, Any name, Any equiv) {
         const HostText name_text = HostText::FromBytes(name);
         const HostText equiv_text = HostText::FromBytes(equiv);
         self.BuiltinAppend(name_text.text(), equiv_text.text());
@@ -611,7 +611,7 @@ void BindLogicalline(nb::module_& tarvex) {
       nb::arg("name"), nb::arg("equiv"));
   cls.def(
       "AppendArgTypeEquiv",
-      [](LineObject& self, nb::handle name, nb::handle info) {
+      [](LineObject& self, Any name, Any info) {
         const HostText name_text = HostText::FromBytes(name);
         const HostText info_text = HostText::FromBytes(info);
         self.BuiltinAppendArg(name_text.text(), info_text.text());
@@ -634,21 +634,19 @@ void BindLogicalline(nb::module_& tarvex) {
   m.def("GetLogicalsFromText", &GetLogicalsFromText, nb::arg("text"), nb::arg("version_triple") = nb::none(),
         "The logical lines of a text, in order, as a tuple of CLogicalLine.");
   m.def(
-      "FindMatchOrCaseType",
-      [](nb::handle toks, nb::handle start, nb::handle end) { return FindKind(toks, Int64Of(start), Int64Of(end)); },
+      "FindMatchOrCaseType", [](Any toks, Any start, Any end) { return FindKind(toks, Int64Of(start), Int64Of(end)); },
       nb::arg("toks"), nb::arg("start"), nb::arg("end"),
       "kMatch or kCase where the tokens are such a statement's head, kUnknown otherwise.");
   m.def(
-      "IsScopeStartLogical", [](nb::handle logical) { return IsScopeStartLogical(LineOf(logical).line()); },
+      "IsScopeStartLogical", [](Any logical) { return IsScopeStartLogical(LineOf(logical).line()); },
       nb::arg("logical"), "True for a line that opens a scope: def, async def, class.");
 
   nb::module_ inspect = SiblingModule(tarvex, "logicalinspect");
   inspect.def(
-      "_TextFromLine", [](nb::handle logical) { return StrOf(TextFromTokens(LineOf(logical).line())); },
-      nb::arg("logical"));
+      "_TextFromLine", [](Any logical) { return StrOf(TextFromTokens(LineOf(logical).line())); }, nb::arg("logical"));
   inspect.def(
       "_TextFromToks",
-      [](nb::handle toks, nb::handle positions) {
+      [](Any toks, Any positions) {
         nb::object tuple = TupleOf(toks);
         Ref<SourceText> source = SourceOfTokens(tuple);
         const std::vector<Position> stored = PositionsOf(TupleOf(positions));

@@ -26,7 +26,7 @@ void PutTokens(MatchcaseObject& self) {
 }
 
 template <nb::object MatchcaseObject::*Field>
-void SetField(MatchcaseObject& self, nb::handle value) {
+void SetField(MatchcaseObject& self, Any value) {
   self.*Field = value.is_none() ? nb::object() : TupleOf(value);
   PutTokens(self);
 }
@@ -37,7 +37,7 @@ nb::object GetField(MatchcaseObject& self) {
 }
 
 template <CNode* (CMatchCaseStatementParser::*Operation)(TokenSpan, const PositionView&)>
-nb::object ParseStatement(MatchcaseObject& self, nb::handle toks, nb::handle positions) {
+nb::object ParseStatement(MatchcaseObject& self, Any toks, Any positions) {
   TokensArg tokens(toks);
   PositionsArg places(positions);
   PinSource(PoolOf(self), tokens.source);
@@ -51,13 +51,13 @@ nb::object ParseStep(MatchcaseObject& self) {
 }
 
 template <CNode* (CMatchCaseStatementParser::*Operation)(int64_t, int64_t)>
-nb::object PatternStep(MatchcaseObject& self, nb::handle start, nb::handle end) {
+nb::object PatternStep(MatchcaseObject& self, Any start, Any end) {
   PinSource(PoolOf(self), self.source);
   return Wrap((self.parser.get()->*Operation)(Int64Of(start), Int64Of(end)), self.source);
 }
 
 // The two arguments themselves where nothing is dropped, tuples of what is left otherwise.
-nb::object RemoveSkipToks(MatchcaseObject& self, nb::handle toks, nb::handle positions) {
+nb::object RemoveSkipToks(MatchcaseObject& self, Any toks, Any positions) {
   nb::object tok_tuple = TupleOf(toks);
   nb::object place_tuple = TupleOf(positions);
   Ref<SourceText> source = SourceOfTokens(tok_tuple);
@@ -102,39 +102,38 @@ void BindMatchcase(nb::module_& tarvex) {
             "Parses the heads of match and case statements.");
   cls.def(
       "__init__",
-      [](MatchcaseObject* self, nb::handle pgen_parser) {
+      [](MatchcaseObject* self, Any pgen_parser) {
         ParserObject* object;
         if (!nb::try_cast(pgen_parser, object)) ThrowExpected("CPGenParserImpl", pgen_parser);
         new (self) MatchcaseObject();
         self->parser = std::make_shared<CMatchCaseStatementParser>(object->parser.get());
         self->pgen_parser = nb::borrow(pgen_parser);
       },
-      nb::arg("pgen_parser").none());
+      nb::arg("pgen_parser"));
   cls.def_prop_ro("_fPGenParser", [](MatchcaseObject& self) { return self.pgen_parser; });
   cls.def_prop_ro("_fNodeFactory",
                   [](MatchcaseObject& self) { return nb::object(self.pgen_parser.attr("_fNodeFactory")); });
-  cls.def_prop_rw("_fToks", &GetField<&MatchcaseObject::toks>, &SetField<&MatchcaseObject::toks>,
-                  nb::arg("value").none());
+  cls.def_prop_rw("_fToks", &GetField<&MatchcaseObject::toks>, &SetField<&MatchcaseObject::toks>, nb::arg("value"));
   cls.def_prop_rw("_fPositions", &GetField<&MatchcaseObject::positions>, &SetField<&MatchcaseObject::positions>,
-                  nb::arg("value").none());
+                  nb::arg("value"));
 
-  cls.def("ParseMatchStmt", &ParseStatement<&CMatchCaseStatementParser::ParseMatchStmt>, nb::arg("toks").none(),
-          nb::arg("positions").none());
-  cls.def("ParseCaseStmt", &ParseStatement<&CMatchCaseStatementParser::ParseCaseStmt>, nb::arg("toks").none(),
-          nb::arg("positions").none());
+  cls.def("ParseMatchStmt", &ParseStatement<&CMatchCaseStatementParser::ParseMatchStmt>, nb::arg("toks"),
+          nb::arg("positions"));
+  cls.def("ParseCaseStmt", &ParseStatement<&CMatchCaseStatementParser::ParseCaseStmt>, nb::arg("toks"),
+          nb::arg("positions"));
   cls.def("_ParseMatchStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseMatchStmtImpl>);
   cls.def("_ParseCaseStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseCaseStmtImpl>);
   cls.def("_RemoveSkipToks", &RemoveSkipToks, nb::arg("toks"), nb::arg("positions"));
   cls.def(
       "_NonNestedFindTokenIndex",
-      [](MatchcaseObject& self, nb::handle tok, nb::handle start, nb::handle end) {
+      [](MatchcaseObject& self, Any tok, Any start, Any end) {
         const HostText wanted = HostText::FromStr(tok);
         return self.parser->NonNestedFindTokenIndex(wanted.text(), Int64Of(start), Int64Of(end));
       },
       nb::arg("tok"), nb::arg("start"), nb::arg("end"));
   cls.def(
       "_NodeForPattern",
-      [](MatchcaseObject& self, nb::handle start, nb::handle end, Truth allow_as) {
+      [](MatchcaseObject& self, Any start, Any end, Truth allow_as) {
         PinSource(PoolOf(self), self.source);
         return Wrap(self.parser->NodeForPattern(Int64Of(start), Int64Of(end), allow_as), self.source);
       },
@@ -149,14 +148,14 @@ void BindMatchcase(nb::module_& tarvex) {
   def_step("_NodeForNumberPattern", &PatternStep<&CMatchCaseStatementParser::NodeForNumberPattern>);
   cls.def(
       "_TokNode",
-      [](MatchcaseObject& self, nb::handle tok_i) {
+      [](MatchcaseObject& self, Any tok_i) {
         PinSource(PoolOf(self), self.source);
         return Wrap(self.parser->TokNode(Int64Of(tok_i)), self.source);
       },
       nb::arg("tok_i"));
   cls.def(
       "_ParseExceptionAt",
-      [](MatchcaseObject& self, nb::handle tok_i) {
+      [](MatchcaseObject& self, Any tok_i) {
         const ParseError error = self.parser->ParseExceptionAt(Int64Of(tok_i));
         return ExceptionFor(error);
       },

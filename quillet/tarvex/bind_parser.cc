@@ -66,8 +66,8 @@ nb::object NewEngine(ParserObject& self, nb::handle converter) {
       .attr("CreateParser")(GrammarOf(self), converter, nb::arg("promotesinglechild") = true);
 }
 
-void InitParser(nb::pointer_and_handle<ParserObject> self, nb::handle version_triple, nb::handle grammar_file,
-                nb::handle keyword_seq, Truth py3_grammar) {
+void InitParser(nb::pointer_and_handle<ParserObject> self, Any version_triple, Any grammar_file, Any keyword_seq,
+                Truth py3_grammar) {
   auto* object = new (self.p) ParserObject();
   try {
     CPGenParserImpl::Options options;
@@ -124,8 +124,7 @@ nb::object GetTypeParameterNodes(CPGenParserImpl& parser, nb::handle toks) {
 
 // A special case: an operation on tokens, positions and the index of a token.
 template <CNode* (CPGenParserImpl::*Operation)(TokenSpan, bool, const PositionView&, int64_t)>
-nb::object SpecialCase(ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions,
-                       nb::handle tok_i) {
+nb::object SpecialCase(ParserObject& self, Any toks, Truth in_async_def, Any positions, Any tok_i) {
   TokensArg tokens(toks);
   PositionsArg places(positions);
   const int64_t index = Int64Of(tok_i);
@@ -136,108 +135,104 @@ nb::object SpecialCase(ParserObject& self, nb::handle toks, Truth in_async_def, 
 void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
   cls.def(
       "ParseToNode",
-      [](ParserObject& self, nb::handle logical, Truth in_async_def) {
+      [](ParserObject& self, Any logical, Truth in_async_def) {
         return ParseToNode(*self.parser, logical, in_async_def);
       },
       nb::arg("logical"), nb::arg("in_async_def"));
   cls.def(
       "ParseToksToNode",
-      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions) {
+      [](ParserObject& self, Any toks, Truth in_async_def, Any positions) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
         return Parsed(*self.parser, tokens.source,
                       [&] { return ParseToks(*self.parser, tokens.toks(), in_async_def, places.view()); });
       },
-      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none());
+      nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"));
   cls.def(
       "_ParseToksToNodeImpl",
-      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions) {
+      [](ParserObject& self, Any toks, Truth in_async_def, Any positions) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
         return Parsed(*self.parser, tokens.source,
                       [&] { return self.parser->ParseToksToNodeImpl(tokens.toks(), in_async_def, places.view()); });
       },
-      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none());
+      nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"));
   cls.def(
       "ParseTokenListToNode",
-      [](ParserObject& self, nb::handle toks, Truth in_async_def) {
+      [](ParserObject& self, Any toks, Truth in_async_def) {
         return ParseTokenListToNode(*self.parser, toks, in_async_def);
       },
-      nb::arg("toks").none(), nb::arg("in_async_def"));
+      nb::arg("toks"), nb::arg("in_async_def"));
   cls.def(
       "convert",
-      [](ParserObject& self, nb::handle type, nb::handle value, nb::handle context, nb::handle children) {
+      [](ParserObject& self, Any type, Any value, Any context, Any children) {
         return ConvertSingleNode(self.parser->factory(), type, value, context, children);
       },
-      nb::arg("type"), nb::arg("value").none(), nb::arg("context").none(), nb::arg("children").none());
+      nb::arg("type"), nb::arg("value"), nb::arg("context"), nb::arg("children"));
   cls.def(
-      "DiscardNode", [](ParserObject& self, nb::handle node) { self.parser->DiscardNode(NodeOrNull(node)); },
-      nb::arg("node").none());
+      "DiscardNode", [](ParserObject& self, Any node) { self.parser->DiscardNode(NodeOrNull(node)); }, nb::arg("node"));
   cls.def(
       "_AddTokenList",
-      [](ParserObject& self, nb::handle tok_list, nb::handle context) {
+      [](ParserObject& self, Any tok_list, Any context) {
         TokensArg tokens(tok_list);
         const int32_t index = Int32Of(context);
         PinSource(self.parser->factory().pool(), tokens.source);
         self.parser->AddTokenList(tokens.toks(), index);
       },
-      nb::arg("tok_list").none(), nb::arg("context"));
+      nb::arg("tok_list"), nb::arg("context"));
   cls.def(
       "_ShouldSkipSlash",
-      [](ParserObject&, nb::handle tok_i, nb::handle positions) {
+      [](ParserObject&, Any tok_i, Any positions) {
         PositionsArg places(positions);
         return CPGenParserImpl::ShouldSkipSlash(Int64Of(tok_i), places.view());
       },
-      nb::arg("tok_i"), nb::arg("positions").none());
+      nb::arg("tok_i"), nb::arg("positions"));
   cls.def(
       "_FindNextNonSkipIndex",
-      [](ParserObject&, nb::handle toks, nb::handle tok_i) {
+      [](ParserObject&, Any toks, Any tok_i) {
         TokensArg tokens(toks);
         return CPGenParserImpl::FindNextNonSkipIndex(tokens.toks(), Int64Of(tok_i));
       },
-      nb::arg("toks").none(), nb::arg("tok_i"));
+      nb::arg("toks"), nb::arg("tok_i"));
   cls.def(
       "_FindPrevNonSkipIndex",
-      [](ParserObject&, nb::handle toks, nb::handle tok_i) {
+      [](ParserObject&, Any toks, Any tok_i) {
         TokensArg tokens(toks);
         return CPGenParserImpl::FindPrevNonSkipIndex(tokens.toks(), Int64Of(tok_i));
       },
-      nb::arg("toks").none(), nb::arg("tok_i"));
+      nb::arg("toks"), nb::arg("tok_i"));
   cls.def(
       "_NonNestedFindTokenIndex",
-      [](ParserObject&, nb::handle tok, nb::handle toks, nb::handle start, nb::handle end) {
+      [](ParserObject&, Any tok, Any toks, Any start, Any end) {
         const HostText wanted = HostText::FromStr(tok);
         TokensArg tokens(toks);
         return CPGenParserImpl::NonNestedFindTokenIndex(wanted.text(), tokens.toks(), Int64Of(start), Int64Of(end));
       },
-      nb::arg("tok"), nb::arg("toks").none(), nb::arg("start"), nb::arg("end"));
+      nb::arg("tok"), nb::arg("toks"), nb::arg("start"), nb::arg("end"));
   cls.def(
-      "_RaiseParseError",
-      [](ParserObject& self, nb::handle context) { self.parser->RaiseParseError(Int64Of(context)); },
+      "_RaiseParseError", [](ParserObject& self, Any context) { self.parser->RaiseParseError(Int64Of(context)); },
       nb::arg("context"));
 }
 
 void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
   cls.def(
       "_ParseSpecialCases",
-      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions) {
+      [](ParserObject& self, Any toks, Truth in_async_def, Any positions) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
         return Parsed(*self.parser, tokens.source,
                       [&] { return self.parser->ParseSpecialCases(tokens.toks(), in_async_def, places.Required()); });
       },
-      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none());
+      nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"));
   const auto def_case = [&cls](const char* name, auto operation) {
-    cls.def(name, operation, nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none(),
-            nb::arg("tok_i"));
+    cls.def(name, operation, nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"), nb::arg("tok_i"));
   };
   def_case("_ParseSpecialCaseParenthesizedWith", &SpecialCase<&CPGenParserImpl::ParseSpecialCaseParenthesizedWith>);
   def_case("_ParseSpecialCaseExceptStar", &SpecialCase<&CPGenParserImpl::ParseSpecialCaseExceptStar>);
   def_case("_ParseSpecialCaseWithTypeParameter", &SpecialCase<&CPGenParserImpl::ParseSpecialCaseWithTypeParameter>);
   cls.def(
       "_NodesForTypeParameters",
-      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions, nb::handle start,
-         nb::handle end, Truth raise_errors) {
+      [](ParserObject& self, Any toks, Truth in_async_def, Any positions, Any start, Any end, Truth raise_errors) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
         PinSource(self.parser->factory().pool(), tokens.source);
@@ -245,12 +240,11 @@ void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
                                                             Int64Of(end), raise_errors),
                         tokens.source);
       },
-      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none(), nb::arg("start"), nb::arg("end"),
+      nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"), nb::arg("start"), nb::arg("end"),
       nb::arg("raise_errors"));
   cls.def(
       "_CreateSingleTypeParameterNode",
-      [](ParserObject& self, nb::handle toks, Truth in_async_def, nb::handle positions, nb::handle start,
-         nb::handle end, Truth raise_errors) {
+      [](ParserObject& self, Any toks, Truth in_async_def, Any positions, Any start, Any end, Truth raise_errors) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
         return Parsed(*self.parser, tokens.source, [&] {
@@ -258,12 +252,11 @@ void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
                                                             Int64Of(end), raise_errors);
         });
       },
-      nb::arg("toks").none(), nb::arg("in_async_def"), nb::arg("positions").none(), nb::arg("start"), nb::arg("end"),
+      nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"), nb::arg("start"), nb::arg("end"),
       nb::arg("raise_errors"));
   cls.def(
-      "GetTypeParameterNodes",
-      [](ParserObject& self, nb::handle toks) { return GetTypeParameterNodes(*self.parser, toks); },
-      nb::arg("toks").none());
+      "GetTypeParameterNodes", [](ParserObject& self, Any toks) { return GetTypeParameterNodes(*self.parser, toks); },
+      nb::arg("toks"));
 }
 
 void BindFields(nb::class_<ParserObject, AnalyzerBase>& cls) {
@@ -376,11 +369,11 @@ void BindParser(nb::module_& tarvex) {
   base.def(
       "AnalyzeSingleLogical",
       [](AnalyzerBase&, nb::handle, nb::handle, nb::handle) { ThrowError(ErrorKind::kNotImplementedError, ""); },
-      nb::arg("logical").none(), nb::arg("in_async_def"), nb::arg("first_in_def") = false);
+      nb::arg("logical"), nb::arg("in_async_def"), nb::arg("first_in_def") = false);
 
   nb::class_<ParserObject, AnalyzerBase> cls(tarvex, "CPGenParserImpl", nb::type_slots(kParserSlots),
                                              "Turns the tokens of one logical line into a tree of nodes.");
-  cls.def("__init__", &InitParser, nb::arg("version_triple").none(), nb::arg("grammar_file") = kPy3DefaultGrammar,
+  cls.def("__init__", &InitParser, nb::arg("version_triple"), nb::arg("grammar_file") = kPy3DefaultGrammar,
           nb::arg("keyword_seq") = nb::none(), nb::arg("py3_grammar") = true);
   BindFields(cls);
   BindFeeding(cls);
@@ -389,12 +382,12 @@ void BindParser(nb::module_& tarvex) {
 
   tarvex.def(
       "NextNonRemovedTokenInTuple",
-      [](nb::handle toks, nb::handle i) {
+      [](Any toks, Any i) {
         TokensArg tokens(toks);
         const Token* token = NextNonRemovedTokenInTuple(tokens.toks(), Int64Of(i));
         return token == nullptr ? nb::object(nb::none()) : StrOfToken(*token);
       },
-      nb::arg("toks").none(), nb::arg("i"));
+      nb::arg("toks"), nb::arg("i"));
 }
 
 // Operations that the analyzer forwards to its parser.

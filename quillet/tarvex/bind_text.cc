@@ -32,8 +32,8 @@ void BindText(nb::module_& tarvex) {
   nb::class_<ConverterBase> base(tarvex, "CNodeToTextConverter", "Gives a node's text, or None.");
   base.def(nb::init<>());
   base.def(
-      "TextForNode", [](ConverterBase&, nb::handle node, nb::args, nb::kwargs) { RefOrNull(node); },
-      nb::arg("node").none(), nb::arg("args"), nb::arg("kwargs"));
+      "TextForNode", [](ConverterBase&, Any node, nb::args, nb::kwargs) { RefOrNull(node); }, nb::arg("node"),
+      nb::arg("args"), nb::arg("kwargs"));
 
   nb::class_<ConverterObject, ConverterBase> cls(tarvex, "CNodeToTextConverterImpl",
                                                  "The short, stable text of a node, as UTF-8 bytes.");
@@ -52,26 +52,26 @@ void BindText(nb::module_& tarvex) {
   cls.def_prop_ro("_fIncludeArgText", [](ConverterObject& self) { return self.converter->include_arg_text(); });
   cls.def(
       "TextForNode",
-      [](ConverterObject& self, nb::handle node, Truth dotted_name_only, Truth discard_simple_parens,
-         Truth literal_only, Truth add_parens_if_operator) {
+      [](ConverterObject& self, Any node, Truth dotted_name_only, Truth discard_simple_parens, Truth literal_only,
+         Truth add_parens_if_operator) {
         return BytesOf(self.converter->TextForNode(
             RequiredNode(node), {dotted_name_only, discard_simple_parens, literal_only, add_parens_if_operator}));
       },
-      nb::arg("node").none(), nb::arg("dotted_name_only") = false, nb::arg("discard_simple_parens") = true,
+      nb::arg("node"), nb::arg("dotted_name_only") = false, nb::arg("discard_simple_parens") = true,
       nb::arg("literal_only") = false, nb::arg("add_parens_if_operator") = false);
   cls.def(
       "TextForAtomPlusTrailers",
-      [](ConverterObject& self, nb::handle atom, nb::handle trailers, Truth dotted_name_only,
-         Truth discard_simple_parens, Truth literal_only) {
+      [](ConverterObject& self, Any atom, Any trailers, Truth dotted_name_only, Truth discard_simple_parens,
+         Truth literal_only) {
         const std::vector<CNode*> nodes = NodesOf(trailers, NodeKind::kCTrailer);
         return BytesOf(self.converter->TextForAtomPlusTrailers(
             RequiredNode(atom), nodes, {dotted_name_only, discard_simple_parens, literal_only, false}));
       },
-      nb::arg("atom").none(), nb::arg("trailers"), nb::arg("dotted_name_only") = false,
+      nb::arg("atom"), nb::arg("trailers"), nb::arg("dotted_name_only") = false,
       nb::arg("discard_simple_parens") = true, nb::arg("literal_only") = false);
   cls.def(
       "_TextForStringLiteral",
-      [](ConverterObject& self, nb::handle node) {
+      [](ConverterObject& self, Any node) {
         CNode* literal = RefOf(node, NodeKind::kCStringLiteral).node();
         return BytesOf(self.converter->TextForStringLiteral(static_cast<CStringLiteral*>(literal)));
       },

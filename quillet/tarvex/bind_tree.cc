@@ -55,7 +55,7 @@ CNodeClassInfo* NewInfo(const Ref<HostPool>& pool, nb::handle cls, int32_t node_
   return info;
 }
 
-void InitClassInfo(nb::pointer_and_handle<ClassInfoObject> self, nb::handle cls, nb::handle nodetype, nb::handle name) {
+void InitClassInfo(nb::pointer_and_handle<ClassInfoObject> self, Any cls, Any nodetype, Any name) {
   const int32_t number = Int32Of(nodetype);
   const HostText name_text = HostText::FromStr(name, true);
   Ref<HostPool> pool(new HostPool);
@@ -74,7 +74,7 @@ CNodeClassInfo* InfoOrNull(nb::handle object) {
 // ---- nodes ----
 
 template <class T>
-void InitNode(nb::pointer_and_handle<NodeHandle<T>> self, nb::handle cls_info) {
+void InitNode(nb::pointer_and_handle<NodeHandle<T>> self, Any cls_info) {
   constexpr NodeKind kind = NodeKindRange<T>::kFirst;
   CNodeClassInfo* info = InfoOrNull(cls_info);
   if (info != nullptr && info->kind != kind) ThrowError(ErrorKind::kTypeError, "the record is one of another class");
@@ -97,17 +97,17 @@ void BindNodeCore(nb::class_<NodeHandle<CNode>>& cls) {
   using Handle = NodeHandle<CNode>;
   cls.def_prop_rw(
       "fChildren", [](Handle& self) { return self.GetChildren(); },
-      [](Handle& self, nb::handle value) { self.SetChildren(value); }, nb::arg("value").none());
+      [](Handle& self, Any value) { self.SetChildren(value); }, nb::arg("value"));
   cls.def_prop_rw(
       "fText", [](Handle& self) { return StrOf(self.node()->fText()); },
-      [](Handle& self, nb::handle value) { SetText(self, value); }, nb::arg("value").none());
+      [](Handle& self, Any value) { SetText(self, value); }, nb::arg("value"));
   cls.def_prop_rw(
       "fContext", [](Handle& self) { return HostContext(self.node()->fContext); },
-      [](Handle& self, nb::handle value) {
+      [](Handle& self, Any value) {
         CNode* node = self.node();
         node->pool->SetContext(node, CoreContext(value, node->pool));
       },
-      nb::arg("value").none());
+      nb::arg("value"));
   cls.def_prop_ro("fClsInfo", [](Handle& self) { return WrapClassInfo(self.node()->fClsInfo); });
   cls.def_prop_ro("fNextFree", [](Handle& self) { return Wrap(self.node()->fNextFree, {}); });
 
@@ -115,7 +115,7 @@ void BindNodeCore(nb::class_<NodeHandle<CNode>>& cls) {
     self.Synchronise();
     return self.node()->GetChildCount();
   };
-  const auto child_text = [](Handle& self, nb::handle index) {
+  const auto child_text = [](Handle& self, Any index) {
     self.Synchronise();
     return StrOf(self.node()->GetChildText(Int64Of(index)));
   };
@@ -123,7 +123,7 @@ void BindNodeCore(nb::class_<NodeHandle<CNode>>& cls) {
   cls.def("GetChildText", child_text, nb::arg("index")).def("_GetChildText", child_text, nb::arg("index"));
   cls.def(
       "GetChild",
-      [](Handle& self, nb::handle index) {
+      [](Handle& self, Any index) {
         self.Synchronise();
         return Wrap(self.node()->GetChild(Int32Of(index)), self.source());
       },
@@ -136,7 +136,7 @@ void BindNodeCore(nb::class_<NodeHandle<CNode>>& cls) {
   });
   cls.def(
       "_DoesChildTextMatch",
-      [](Handle& self, nb::handle text) {
+      [](Handle& self, Any text) {
         self.Synchronise();
         const HostText wanted = HostText::FromStr(text);
         return self.node()->DoesChildTextMatch(wanted.text());
@@ -196,33 +196,33 @@ void BindRecords(nb::module_& m) {
   const auto node_field = [&](const char* name, nb::object ArgInfoObject::*field) {
     arg.def_prop_rw(
         name, [field](ArgInfoObject& self) { return self.*field; },
-        [field](ArgInfoObject& self, nb::handle value) {
+        [field](ArgInfoObject& self, Any value) {
           RefOrNull(value);
           self.*field = nb::borrow(value);
         },
-        nb::arg("value").none());
+        nb::arg("value"));
   };
   node_field("name", &ArgInfoObject::name);
   node_field("value", &ArgInfoObject::value);
   node_field("type_expr", &ArgInfoObject::type_expr);
   arg.def_prop_rw(
       "prefix", [](ArgInfoObject& self) { return self.prefix; },
-      [](ArgInfoObject& self, nb::handle value) {
+      [](ArgInfoObject& self, Any value) {
         HostText::FromStr(value, true);
         self.prefix = nb::borrow(value);
       },
-      nb::arg("value").none());
+      nb::arg("value"));
 
   nb::class_<AsNameObject> as_name(m, "CAsName", "One imported name, as written and as bound.");
   as_name.def(nb::init<>());
   const auto text_field = [&](const char* name, nb::object AsNameObject::*field) {
     as_name.def_prop_rw(
         name, [field](AsNameObject& self) { return self.*field; },
-        [field](AsNameObject& self, nb::handle value) {
+        [field](AsNameObject& self, Any value) {
           HostText::FromStr(value, true);
           self.*field = nb::borrow(value);
         },
-        nb::arg("value").none());
+        nb::arg("value"));
   };
   text_field("module_name", &AsNameObject::module_name);
   text_field("as_name", &AsNameObject::as_name);
@@ -255,8 +255,8 @@ KeywordSet KeywordsOf(nb::handle keywords) {
   return set;
 }
 
-void InitFactory(nb::pointer_and_handle<FactoryObject> self, nb::handle gram, nb::handle cls_for_nodetype,
-                 nb::handle keywords, nb::handle tok_number2name, nb::handle op_text2number) {
+void InitFactory(nb::pointer_and_handle<FactoryObject> self, Any gram, Any cls_for_nodetype, Any keywords,
+                 Any tok_number2name, Any op_text2number) {
   std::unordered_map<std::string, int> operators = NumbersByText(op_text2number);
   nb::object symbol_get = gram.attr("number2symbol").attr("get");
   nb::object token_get = tok_number2name.attr("get");
@@ -332,8 +332,7 @@ nb::object WrapWithChildren(CNode* node, nb::handle children) {
   return wrapper;
 }
 
-nb::object NewNode(FactoryObject& self, nb::handle cls_info, nb::handle nodetype, nb::handle text, nb::handle context,
-                   nb::handle children) {
+nb::object NewNode(FactoryObject& self, Any cls_info, Any nodetype, Any text, Any context, Any children) {
   Int32Of(nodetype);
   CNodeClassInfo* info = InfoOrNull(cls_info);
   if (info == nullptr) ThrowNoAttribute("fFirstFree");
@@ -386,14 +385,14 @@ CNode* ConvertRaw(CNodeFactory& factory, nb::handle raw_node) {
 void BindFactory(nb::module_& m) {
   nb::class_<ClassInfoObject> info(m, "CNodeClassInfo",
                                    "The record of one parser state; it heads that state's free list.");
-  info.def("__init__", &InitClassInfo, nb::arg("cls"), nb::arg("nodetype"), nb::arg("name").none());
+  info.def("__init__", &InitClassInfo, nb::arg("cls"), nb::arg("nodetype"), nb::arg("name"));
   info.def_prop_ro("fCls", [](ClassInfoObject& self) { return nb::borrow(ClassOfInfo(self.info)); });
   info.def_prop_ro("fNodeType", [](ClassInfoObject& self) { return self.info->fNodeType; });
   info.def_prop_ro("fName", [](ClassInfoObject& self) { return StrOf(self.info->fName); });
   info.def_prop_ro("fFirstFree", [](ClassInfoObject& self) { return Wrap(self.info->fFirstFree, {}); });
 
   nb::class_<FactoryObject> cls(m, "CNodeFactory", "Makes nodes from what a parser reduces, and takes them back.");
-  cls.def("__init__", &InitFactory, nb::arg("gram"), nb::arg("cls_for_nodetype"), nb::arg("keywords").none(),
+  cls.def("__init__", &InitFactory, nb::arg("gram"), nb::arg("cls_for_nodetype"), nb::arg("keywords"),
           nb::arg("tok_number2name"), nb::arg("op_text2number"));
   cls.def_prop_ro("_fClassInfoList", &ClassInfos);
   cls.def_prop_ro("_fKeywordClassInfo",
@@ -402,51 +401,50 @@ void BindFactory(nb::module_& m) {
   cls.def_prop_ro("_fOperatorStrToNumber", &OperatorNumbers);
   cls.def(
       "ConvertSingleNode",
-      [](FactoryObject& self, nb::handle nodetype, nb::handle text, nb::handle context, nb::handle children) {
+      [](FactoryObject& self, Any nodetype, Any text, Any context, Any children) {
         return ConvertSingleNode(*self.factory, nodetype, text, context, children);
       },
-      nb::arg("nodetype"), nb::arg("text").none(), nb::arg("context").none(), nb::arg("children").none());
-  cls.def("NewNode", &NewNode, nb::arg("cls_info").none(), nb::arg("nodetype"), nb::arg("text").none(),
-          nb::arg("context").none(), nb::arg("children").none());
+      nb::arg("nodetype"), nb::arg("text"), nb::arg("context"), nb::arg("children"));
+  cls.def("NewNode", &NewNode, nb::arg("cls_info"), nb::arg("nodetype"), nb::arg("text"), nb::arg("context"),
+          nb::arg("children"));
   cls.def(
       "NewKeywordNode",
-      [](FactoryObject& self, nb::handle text, nb::handle context) {
+      [](FactoryObject& self, Any text, Any context) {
         NodePool& pool = self.factory->pool();
         return Wrap(self.factory->NewKeywordNode(NodeText(pool, text), CoreContext(context, &pool)), {});
       },
-      nb::arg("text").none(), nb::arg("context").none());
+      nb::arg("text"), nb::arg("context"));
   cls.def(
       "NewNameNode",
-      [](FactoryObject& self, nb::handle text, nb::handle context) {
+      [](FactoryObject& self, Any text, Any context) {
         NodePool& pool = self.factory->pool();
         return Wrap(self.factory->NewNameNode(NodeText(pool, text), CoreContext(context, &pool)), {});
       },
-      nb::arg("text").none(), nb::arg("context").none());
+      nb::arg("text"), nb::arg("context"));
   cls.def(
       "CreateOperatorNode",
-      [](FactoryObject& self, nb::handle op_str, nb::handle context) {
+      [](FactoryObject& self, Any op_str, Any context) {
         NodePool& pool = self.factory->pool();
         const HostText text = HostText::FromStr(op_str, true);
         if (IsNone(text.text()) || !self.factory->op_text2number().contains(std::string(text.text())))
           return nb::object(nb::none());
         return Wrap(self.factory->CreateOperatorNode(pool.Intern(text.text()), CoreContext(context, &pool)), {});
       },
-      nb::arg("op_str").none(), nb::arg("context").none());
+      nb::arg("op_str"), nb::arg("context"));
   cls.def(
-      "DiscardNodes", [](FactoryObject& self, nb::handle node) { self.factory->DiscardNodes(NodeOrNull(node)); },
-      nb::arg("node").none());
+      "DiscardNodes", [](FactoryObject& self, Any node) { self.factory->DiscardNodes(NodeOrNull(node)); },
+      nb::arg("node"));
   cls.def(
       "RecursiveConvert",
-      [](FactoryObject& self, nb::handle raw_node) { return Wrap(RecursiveConvert(*self.factory, raw_node), {}); },
-      nb::arg("raw_node").none());
+      [](FactoryObject& self, Any raw_node) { return Wrap(RecursiveConvert(*self.factory, raw_node), {}); },
+      nb::arg("raw_node"));
 
   m.def(
-      "__FinishedWithNode",
-      [](nb::handle node, nb::handle depth) { FinishedWithNodeAtDepth(NodeOrNull(node), Int64Of(depth)); },
-      nb::arg("node").none(), nb::arg("depth"));
-  const auto finished = [](nb::handle node) { FinishedWithNode(NodeOrNull(node)); };
-  m.def("FinishedWithNode", finished, nb::arg("node").none());
-  m.def("NotCompiledFinishedWithNode", finished, nb::arg("node").none());
+      "__FinishedWithNode", [](Any node, Any depth) { FinishedWithNodeAtDepth(NodeOrNull(node), Int64Of(depth)); },
+      nb::arg("node"), nb::arg("depth"));
+  const auto finished = [](Any node) { FinishedWithNode(NodeOrNull(node)); };
+  m.def("FinishedWithNode", finished, nb::arg("node"));
+  m.def("NotCompiledFinishedWithNode", finished, nb::arg("node"));
 }
 
 }  // namespace

@@ -19,7 +19,7 @@ template <auto Operation>
 struct Visit;
 template <class T, void (CNodeWalker::*Operation)(T*)>
 struct Visit<Operation> {
-  static void Call(WalkerObject& self, nb::handle node) {
+  static void Call(WalkerObject& self, Any node) {
     NodeRef& ref = RefOf(node, NodeKindRange<T>::kFirst);
     Recording recording(self.walker->fLogical);
     (self.walker.get()->*Operation)(static_cast<T*>(ref.node()));
@@ -37,7 +37,7 @@ Text TextArgument(nb::handle value, HostText& keep, bool none = true) {
 }
 
 template <void (CNodeWalker::*Operation)(Text)>
-void RecordName(WalkerObject& self, nb::handle name) {
+void RecordName(WalkerObject& self, Any name) {
   HostText keep;
   const Text text = TextArgument(name, keep, false);
   Recording recording(self.walker->fLogical);
@@ -45,7 +45,7 @@ void RecordName(WalkerObject& self, nb::handle name) {
 }
 
 template <void (CNodeWalker::*Operation)(Text, Text)>
-void RecordPair(WalkerObject& self, nb::handle name, nb::handle info) {
+void RecordPair(WalkerObject& self, Any name, Any info) {
   HostText keep_name, keep_info;
   const Text name_text = TextArgument(name, keep_name, false);
   const Text info_text = TextArgument(info, keep_info, false);
@@ -56,20 +56,20 @@ void RecordPair(WalkerObject& self, nb::handle name, nb::handle info) {
 void BindFrame(nb::class_<WalkerObject>& cls) {
   cls.def(
       "Walk",
-      [](WalkerObject& self, nb::handle node, nb::handle logical) {
+      [](WalkerObject& self, Any node, Any logical) {
         CNode* root = NodeOrNull(node);
         if (root == nullptr) return self.walker->Walk(nullptr, nullptr);
         LineObject& line = LineOf(logical);
         Recording recording(&line);
         self.walker->Walk(root, &line.line());
       },
-      nb::arg("node").none(), nb::arg("logical").none());
+      nb::arg("node"), nb::arg("logical"));
   DefVisit<&CNodeWalker::ProcessNamesFound>(cls, "_ProcessNamesFound");
   DefVisit<&CNodeWalker::VisitChildren>(cls, "_VisitChildren");
   DefVisit<&CNodeWalker::VisitNode>(cls, "_VisitNode");
   cls.def(
       "_RaiseIfNotInstance",
-      [](WalkerObject&, nb::handle node, nb::handle cls_wanted) {
+      [](WalkerObject&, Any node, Any cls_wanted) {
         const int is_instance = PyObject_IsInstance(node.ptr(), cls_wanted.ptr());
         if (is_instance < 0) throw nb::python_error();
         if (is_instance == 0) {
@@ -78,13 +78,13 @@ void BindFrame(nb::class_<WalkerObject>& cls) {
           throw nb::python_error();
         }
       },
-      nb::arg("node").none(), nb::arg("cls"));
+      nb::arg("node"), nb::arg("cls"));
 }
 
 void BindNames(nb::class_<WalkerObject>& cls) {
   cls.def(
       "_VisitStoreContextNode",
-      [](WalkerObject& self, nb::handle node, Truth within_sub_expr) {
+      [](WalkerObject& self, Any node, Truth within_sub_expr) {
         NodeRef& ref = RefOf(node);
         Recording recording(self.walker->fLogical);
         self.walker->VisitStoreContextNode(ref.node(), within_sub_expr);
@@ -94,7 +94,7 @@ void BindNames(nb::class_<WalkerObject>& cls) {
   DefVisit<&CNodeWalker::VisitCompForNode>(cls, "_VisitCompForNode");
   cls.def(
       "_VisitNameLiteral",
-      [](WalkerObject& self, nb::handle node, nb::handle atom_node, nb::handle all_trailers, nb::handle trailer_i) {
+      [](WalkerObject& self, Any node, Any atom_node, Any all_trailers, Any trailer_i) {
         NodeRef& ref = RefOf(node);
         CNode* atom = NodeOrNull(atom_node);
         std::vector<CNode*> trailers;
@@ -103,14 +103,14 @@ void BindNames(nb::class_<WalkerObject>& cls) {
         Recording recording(self.walker->fLogical);
         self.walker->VisitNameLiteral(ref.node(), atom, trailers, index, !all_trailers.is_none());
       },
-      nb::arg("node"), nb::arg("atom_node").none(), nb::arg("all_trailers").none(), nb::arg("trailer_i"));
+      nb::arg("node"), nb::arg("atom_node"), nb::arg("all_trailers"), nb::arg("trailer_i"));
   DefVisit<&CNodeWalker::VisitDottedName>(cls, "_VisitDottedName");
   cls.def("_ProcessLoadName", &RecordName<&CNodeWalker::ProcessLoadName>, nb::arg("name"));
   DefVisit<&CNodeWalker::VisitPower>(cls, "_VisitPower");
   DefVisit<&CNodeWalker::VisitAtomExpr>(cls, "_VisitAtomExpr");
   cls.def(
       "_VisitAtomPlusTrailers",
-      [](WalkerObject& self, nb::handle atom_node, nb::handle all_trailers) {
+      [](WalkerObject& self, Any atom_node, Any all_trailers) {
         NodeRef& atom = RefOf(atom_node);
         const std::vector<CNode*> trailers = NodesOf(all_trailers, NodeKind::kCTrailer);
         Recording recording(self.walker->fLogical);
@@ -131,7 +131,7 @@ void BindDefinitions(nb::class_<WalkerObject>& cls) {
   DefVisit<&CNodeWalker::VisitNonlocalStmt>(cls, "_VisitNonlocalStmt");
   cls.def(
       "_ProcessDefiningArgList",
-      [](WalkerObject& self, nb::handle arg_list) {
+      [](WalkerObject& self, Any arg_list) {
         const ArgList args = ArgListOf(arg_list);
         Recording recording(self.walker->fLogical);
         self.walker->ProcessDefiningArgList(args);
@@ -139,7 +139,7 @@ void BindDefinitions(nb::class_<WalkerObject>& cls) {
       nb::arg("arg_list"));
   cls.def(
       "_ProcessLambdaDefiningArgList",
-      [](WalkerObject& self, nb::handle arg_list) {
+      [](WalkerObject& self, Any arg_list) {
         const ArgList args = ArgListOf(arg_list);
         Recording recording(self.walker->fLogical);
         self.walker->ProcessLambdaDefiningArgList(args);
@@ -164,7 +164,7 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
   DefVisit<&CNodeWalker::VisitTypeParameter>(cls, "_VisitTypeParameter");
   cls.def(
       "_ProcessTargets",
-      [](WalkerObject& self, nb::handle lhs, nb::handle rhs, nb::handle extra_trailer) {
+      [](WalkerObject& self, Any lhs, Any rhs, Any extra_trailer) {
         NodeRef& target = RefOf(lhs);
         CNode* value = NodeOrNull(rhs);
         HostText keep;
@@ -172,10 +172,10 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
         Recording recording(self.walker->fLogical);
         self.walker->ProcessTargets(target.node(), value, trailer);
       },
-      nb::arg("lhs"), nb::arg("rhs").none(), nb::arg("extra_trailer") = nb::none());
+      nb::arg("lhs"), nb::arg("rhs"), nb::arg("extra_trailer") = nb::none());
   cls.def(
       "_VisitCall",
-      [](WalkerObject& self, nb::handle atom, nb::handle prev_trailers, nb::handle arglist) {
+      [](WalkerObject& self, Any atom, Any prev_trailers, Any arglist) {
         NodeRef& atom_ref = RefOf(atom);
         const std::vector<CNode*> trailers = NodesOf(prev_trailers, NodeKind::kCTrailer);
         CNode* args = RefOf(arglist).node();
@@ -185,17 +185,17 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
       nb::arg("atom"), nb::arg("prev_trailers"), nb::arg("arglist"));
   cls.def(
       "_ProcessFunctionCall",
-      [](WalkerObject& self, nb::handle func_name, nb::handle arg_list) {
+      [](WalkerObject& self, Any func_name, Any arg_list) {
         HostText keep;
         const Text name = TextArgument(func_name, keep);
         const UsedArgList args = UsedArgsOf(arg_list);
         Recording recording(self.walker->fLogical);
         self.walker->ProcessFunctionCall(name, args);
       },
-      nb::arg("func_name").none(), nb::arg("arg_list"));
+      nb::arg("func_name"), nb::arg("arg_list"));
   cls.def(
       "_ProcessIsInstanceCall",
-      [](WalkerObject& self, nb::handle arg_list) {
+      [](WalkerObject& self, Any arg_list) {
         const UsedArgList args = UsedArgsOf(arg_list);
         Recording recording(self.walker->fLogical);
         self.walker->ProcessIsInstanceCall(args);
@@ -206,7 +206,7 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
 void BindEquivalents(nb::class_<WalkerObject>& cls) {
   cls.def(
       "_AppendEquivNode",
-      [](WalkerObject& self, nb::handle name_node, nb::handle equiv_node, nb::handle extra_trailer) {
+      [](WalkerObject& self, Any name_node, Any equiv_node, Any extra_trailer) {
         NodeRef& name = RefOf(name_node);
         CNode* equiv = NodeOrNull(equiv_node);
         HostText keep;
@@ -214,20 +214,20 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
         Recording recording(self.walker->fLogical);
         self.walker->AppendEquivNode(name.node(), equiv, trailer);
       },
-      nb::arg("name_node"), nb::arg("equiv_node").none(), nb::arg("extra_trailer") = nb::none());
+      nb::arg("name_node"), nb::arg("equiv_node"), nb::arg("extra_trailer") = nb::none());
   cls.def(
       "_AppendSubscriptedEquivNode",
-      [](WalkerObject& self, nb::handle name_node, nb::handle equiv_node, nb::handle subscript) {
+      [](WalkerObject& self, Any name_node, Any equiv_node, Any subscript) {
         NodeRef& name = RefOf(name_node);
         CNode* equiv = NodeOrNull(equiv_node);
         const int64_t index = Int64Of(subscript);
         Recording recording(self.walker->fLogical);
         self.walker->AppendSubscriptedEquivNode(name.node(), equiv, index);
       },
-      nb::arg("name_node"), nb::arg("equiv_node").none(), nb::arg("subscript"));
+      nb::arg("name_node"), nb::arg("equiv_node"), nb::arg("subscript"));
   cls.def(
       "_AddNodeInfoStr",
-      [](WalkerObject& self, nb::handle name_node, nb::handle istr) {
+      [](WalkerObject& self, Any name_node, Any istr) {
         NodeRef& name = RefOf(name_node);
         HostText keep;
         const Text text = TextArgument(istr, keep, false);
@@ -237,7 +237,7 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
       nb::arg("name_node"), nb::arg("istr"));
   cls.def(
       "_TypeEquivForNode",
-      [](WalkerObject& self, nb::handle node, nb::handle extra_trailer) {
+      [](WalkerObject& self, Any node, Any extra_trailer) {
         CNode* root = RefOf(node).node();
         HostText keep;
         return BytesOf(self.walker->TypeEquivForNode(root, TextArgument(extra_trailer, keep)));
@@ -245,7 +245,7 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
       nb::arg("node"), nb::arg("extra_trailer") = nb::none());
   cls.def(
       "_TypeEquivForOperatorExpression",
-      [](WalkerObject& self, nb::handle node) {
+      [](WalkerObject& self, Any node) {
         CNode* root = RefOf(node, NodeKind::kCOperatorExpression).node();
         return BytesOf(self.walker->TypeEquivForOperatorExpression(static_cast<COperatorExpression*>(root)));
       },
@@ -265,7 +265,7 @@ void DefFlag(nb::class_<WalkerObject>& cls, const char* name) {
   } else {
     cls.def_prop_rw(
         name, [](WalkerObject& self) { return (*self.walker).*Field; },
-        [](WalkerObject& self, nb::handle value) {
+        [](WalkerObject& self, Any value) {
           if constexpr (sizeof(Value) == 4) {
             (*self.walker).*Field = Int32Of(value);
           } else {
@@ -277,7 +277,8 @@ void DefFlag(nb::class_<WalkerObject>& cls, const char* name) {
 
 nb::object LoadedNames(WalkerObject& self) {
   nb::dict names;
-  for (Text name : self.walker->fLoadedNames.names()) names[StrOf(name)] = "";
+  const NameSet& loaded = self.walker->fLoadedNames;
+  for (size_t i = 0; i < loaded.size(); ++i) names[StrOf(loaded[i])] = "";
   return names;
 }
 
@@ -285,7 +286,7 @@ nb::object LoadedNames(WalkerObject& self) {
 nb::object StoredNames(WalkerObject& self) {
   const StoreList& stores = self.walker->fStoredNames;
   nb::dict names;
-  for (size_t i = 0; i < stores.names().size(); ++i) {
+  for (size_t i = 0; i < stores.size(); ++i) {
     std::string infos;
     for (const StoreList::Store* store = &stores.first(i);; store = &stores.at(store->next)) {
       if (!infos.empty()) infos += ';';
@@ -293,7 +294,7 @@ nb::object StoredNames(WalkerObject& self) {
       infos += std::to_string(store->place);
       if (store->next == StoreList::kEnd) break;
     }
-    names[StrOf(stores.names()[i])] = StrOf(infos);
+    names[StrOf(stores.name(i))] = StrOf(infos);
   }
   return names;
 }
@@ -301,7 +302,7 @@ nb::object StoredNames(WalkerObject& self) {
 void BindFields(nb::class_<WalkerObject>& cls) {
   cls.def_prop_rw(
       "_fLogical", [](WalkerObject& self) { return HostLineOf(self.walker->fLogical, self.logical); },
-      [](WalkerObject& self, nb::handle value) {
+      [](WalkerObject& self, Any value) {
         if (value.is_none()) {
           self.walker->fLogical = nullptr;
           self.logical.reset();
@@ -312,7 +313,7 @@ void BindFields(nb::class_<WalkerObject>& cls) {
         self.walker->fLogical = &line.line();
         self.logical = nb::borrow(value);
       },
-      nb::arg("value").none());
+      nb::arg("value"));
   DefFlag<bool, &CNodeWalker::fLoadNameContext>(cls, "_fLoadNameContext");
   DefFlag<bool, &CNodeWalker::fStoreWithinSubExpr>(cls, "_fStoreWithinSubExpr");
   cls.def_prop_ro("_fLoadedNames", &LoadedNames);
@@ -349,11 +350,11 @@ void BindWalker(nb::module_& tarvex) {
   nb::class_<WalkerObject> cls(tarvex, "CNodeWalker", "Turns a statement's tree into records on its logical line.");
   cls.def(
       "__init__",
-      [](WalkerObject* self, nb::handle version_triple) {
+      [](WalkerObject* self, Any version_triple) {
         const Version version = VersionOf(version_triple);
         new (self) WalkerObject{std::make_shared<CNodeWalker>(version), {}, {}};
       },
-      nb::arg("version_triple").none());
+      nb::arg("version_triple"));
   BindFields(cls);
   BindFrame(cls);
   BindNames(cls);

@@ -49,6 +49,9 @@ class HostText {
 
 // ---- numbers and truth ----
 
+// An argument of any type, None included: the operation itself says what it takes.
+struct Any : nb::handle {};
+
 // TypeError "an integer is required", OverflowError "value too large to convert to int".
 int32_t Int32Of(nb::handle object);
 int64_t Int64Of(nb::handle object);
@@ -83,6 +86,23 @@ Context CoreContext(nb::handle object, NodePool* pool);
 }  // namespace quillet::host
 
 namespace nanobind::detail {
+
+template <>
+struct has_arg_defaults<quillet::host::Any> : std::true_type {};  // takes None
+
+template <>
+struct type_caster<quillet::host::Any> {
+  NB_TYPE_CASTER(quillet::host::Any, const_name("object"))
+
+  bool from_python(handle src, uint8_t, cleanup_list*) noexcept {
+    static_cast<handle&>(value) = src;
+    return true;
+  }
+  static handle from_cpp(quillet::host::Any src, rv_policy, cleanup_list*) noexcept { return src.inc_ref(); }
+};
+
+template <>
+struct has_arg_defaults<quillet::host::Truth> : std::true_type {};
 
 template <>
 struct type_caster<quillet::host::Truth> {
