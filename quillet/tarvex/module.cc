@@ -51,6 +51,7 @@ NB_MODULE(tarvex_in_owner, tarvex) {
   BindAnalysis(tarvex);
   BindHost(tarvex);
   BindBatch(tarvex);
+  BindBatch(tarvex);
 }
 
 extern "C" NB_EXPORT PyObject* PyInit_tarvex(void);
