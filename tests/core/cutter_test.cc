@@ -4,6 +4,9 @@
 
 #include <gtest/gtest.h>
 
+#include <filesystem>
+#include <fstream>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -640,6 +643,24 @@ TEST(SourceTexts, TakeFileAfterFile) {
   EXPECT_EQ(VerifyLines(*source, rows), "");
   EXPECT_EQ(source->tokens.size(), 1u);
   EXPECT_EQ(source->PositionOf(source->tokens[0].text), (Position{0, 0}));
+}
+
+// ---- what the fuzzer started from ----
+
+TEST(Corpus, HoldsTheInvariantsInEveryVersion) {
+  size_t files = 0;
+  for (const auto& entry : std::filesystem::directory_iterator(QUILLET_SOURCE_DIR "/fuzz/corpus/lines")) {
+    std::ifstream file(entry.path(), std::ios::binary);
+    const std::string bytes((std::istreambuf_iterator<char>(file)), std::istreambuf_iterator<char>());
+    for (const Version version : {Version::Of(2, 7), Version::Of(3, 8), Version::Of(3, 12)}) {
+      const Ref<SourceText> source = SourceText::Copy(bytes);
+      TokenizeOnly(*source, version);
+      EXPECT_EQ(VerifyTokens(*source), "") << entry.path();
+      EXPECT_FALSE(Cut(bytes, version).rows.empty()) << entry.path();
+    }
+    ++files;
+  }
+  EXPECT_GT(files, 0u);
 }
 
 }  // namespace
