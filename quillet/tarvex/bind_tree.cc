@@ -17,12 +17,6 @@ std::array<PyObject*, kNodeKindCount> g_classes{};
 
 // ---- records ----
 
-// A pool for records that the host makes: it may bind a record to a class of its own.
-class HostPool : public NodePool {
- public:
-  std::unordered_map<CNodeClassInfo*, nb::object> classes;
-};
-
 struct ClassInfoObject {
   CNodeClassInfo* info = nullptr;
   Ref<NodePool> pool;
@@ -37,15 +31,6 @@ std::unordered_map<CNodeClassInfo*, PyObject*>& ClassInfoObjects() {
 
 ClassInfoObject::~ClassInfoObject() {
   if (info != nullptr) ClassInfoObjects().erase(info);
-}
-
-// The host's class that serves a record: its own one, or that of the kind.
-nb::handle ClassOfInfo(CNodeClassInfo* info) {
-  if (auto* pool = dynamic_cast<HostPool*>(info->pool)) {
-    auto found = pool->classes.find(info);
-    if (found != pool->classes.end()) return found->second;
-  }
-  return ClassOfKind(info->kind);
 }
 
 CNodeClassInfo* NewInfo(const Ref<HostPool>& pool, nb::handle cls, int32_t node_type, Text name) {
@@ -464,6 +449,14 @@ NodeKind KindOfClass(nb::handle cls) {
     if (PyType_IsSubtype((PyTypeObject*)cls.ptr(), (PyTypeObject*)g_classes[i])) kind = i;
   }
   return static_cast<NodeKind>(kind);
+}
+
+nb::handle ClassOfInfo(CNodeClassInfo* info) {
+  if (auto* pool = dynamic_cast<HostPool*>(info->pool)) {
+    auto found = pool->classes.find(info);
+    if (found != pool->classes.end()) return found->second;
+  }
+  return ClassOfKind(info->kind);
 }
 
 nb::object WrapClassInfo(CNodeClassInfo* info) {

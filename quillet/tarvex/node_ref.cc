@@ -7,6 +7,17 @@
 
 namespace quillet::host {
 
+namespace {
+
+// The handle of a wrapper; TypeError for anything else.
+NodeRef& CheckedRef(nb::handle object, NodeKind wanted) {
+  if (!PyObject_TypeCheck(object.ptr(), (PyTypeObject*)ClassOfKind(wanted).ptr()) || !nb::inst_ready(object))
+    ThrowExpected(NameOfNodeKind(wanted), object);
+  return *nb::inst_ptr<NodeHandle<CNode>>(object);
+}
+
+}  // namespace
+
 // All live wrappers, and what pools keep alive on their account. Guarded by the interpreter lock.
 class NodeRegistry {
  public:
@@ -26,12 +37,11 @@ class NodeRegistry {
     if (found != live_.end() && found->second == ref) live_.erase(found);
   }
 
-  void Remove(NodeRef* ref) {
-    if (--ref->pool_->host_views == 0) {
-      // Moved out first: what goes with it may itself hold nodes.
-      auto kept = kept_.extract(ref->pool_.get());
-      ref->pool_->HostViewsDropped();
-    }
+  void EndView(const Ref<NodePool>& pool) {
+    if (--pool->host_views != 0) return;
+    // Moved out first: what goes with it may itself hold nodes.
+    auto kept = kept_.extract(pool.get());
+    pool->HostViewsDropped();
   }
 
   NodeRef* Find(CNode* node) const {
@@ -45,25 +55,55 @@ class NodeRegistry {
     return nb::borrow(ref->self_);
   }
 
-  void HoldsChildren(NodeRef* ref) { with_children_.insert(ref); }
-  void DropsChildren(NodeRef* ref) { with_children_.erase(ref); }
-  void SynchroniseAll() {
-    if (with_children_.empty()) [[likely]]
-      return;
-    // A list may let go of the last reference to a wrapper that is in the set, too.
-    const std::vector<NodeRef*> refs(with_children_.begin(), with_children_.end());
-    for (NodeRef* ref : refs) {
-      if (!with_children_.contains(ref)) continue;
-      nb::object keep = nb::borrow(ref->self_);
-      ref->Synchronise();
-    }
+  // ---- the host's lists of children ----
+
+  nb::object ListOf(CNode* node) const {
+    auto found = lists_.find(node);
+    return found == lists_.end() ? nb::object() : found->second.list;
   }
 
-  // Nodes of `pool` refer to nodes of another one, or to texts of another source.
-  void Link(NodePool* pool, const NodeRef& child) {
-    Kept& kept = kept_[pool];
-    if (child.pool_.get() != pool) kept.pools.emplace(child.pool_.get(), child.pool_);
-    if (child.source_) Pin(pool, child.source_);
+  // Makes a list that has the node's children the host's own.
+  void KeepList(CNode* node, const Ref<SourceText>& source, nb::object list) {
+    const std::span<CNode* const> native = node->fChildren();
+    HostList& kept = lists_[node];
+    kept = {std::move(list), {native.begin(), native.end()}, node->pool, source};
+    ++node->pool->host_views;
+  }
+
+  void DropList(CNode* node) {
+    auto dropped = lists_.extract(node);
+    if (dropped) EndView(dropped.mapped().pool);
+    // The list goes here, and with it wrappers, which find the registry as it is to be.
+  }
+
+  void Synchronise(CNode* node) {
+    auto found = lists_.find(node);
+    if (found == lists_.end()) return;
+    HostList& kept = found->second;
+    const std::span<CNode* const> native = node->fChildren();
+    if (!node->has_children ||
+        !std::equal(native.begin(), native.end(), kept.synchronised.begin(), kept.synchronised.end()))
+      return DropList(node);
+    PyObject* list = kept.list.ptr();
+    const auto count = static_cast<size_t>(PyList_GET_SIZE(list));
+    std::vector<CNode*> nodes(count);
+    for (size_t i = 0; i < count; ++i) nodes[i] = Adopt(kept, PyList_GET_ITEM(list, static_cast<Py_ssize_t>(i)));
+    if (nodes == kept.synchronised) return;
+    std::copy(nodes.begin(), nodes.end(), node->pool->ResizeChildren(node, static_cast<uint32_t>(count)));
+    kept.synchronised = std::move(nodes);
+  }
+
+  void SynchroniseAll() {
+    if (lists_.empty()) [[likely]]
+      return;
+    std::vector<CNode*> nodes;
+    nodes.reserve(lists_.size());
+    for (const auto& [node, kept] : lists_) nodes.push_back(node);
+    for (CNode* node : nodes) {
+      Synchronise(node);
+      auto found = lists_.find(node);
+      if (found != lists_.end() && Py_REFCNT(found->second.list.ptr()) == 1) DropList(node);
+    }
   }
 
   void RehomeTexts(NodePool& pool) {
@@ -87,11 +127,30 @@ class NodeRegistry {
     size_t sweep_at = 64;
   };
 
+  struct HostList {
+    nb::object list;
+    std::vector<CNode*> synchronised;  // what list and node had in common last
+    Ref<NodePool> pool;
+    Ref<SourceText> source;
+  };
+
+  // The node of a list's item, null for None. It may be a node of another pool, or one with texts in
+  // another source, which then live as long as nodes of this pool are seen.
+  CNode* Adopt(const HostList& kept, nb::handle item) {
+    if (item.is_none()) return nullptr;
+    NodeRef& child = CheckedRef(item, NodeKind::kCNode);
+    child.is_lone_bare_ = false;
+    if (child.pool_.get() != kept.pool.get()) kept_[kept.pool.get()].pools.emplace(child.pool_.get(), child.pool_);
+    if (child.source_ && child.source_.get() != kept.source.get()) Pin(kept.pool.get(), child.source_);
+    return child.node_;
+  }
+
   // All nodes that a host may get at from its wrappers.
   std::unordered_set<const CNode*> Reach() const {
     std::unordered_set<const CNode*> seen;
     std::vector<const CNode*> pending;
     for (const auto& [node, ref] : live_) pending.push_back(node);
+    for (const auto& [node, kept] : lists_) pending.push_back(node);
     while (!pending.empty()) {
       const CNode* node = pending.back();
       pending.pop_back();
@@ -125,7 +184,7 @@ class NodeRegistry {
   }
 
   std::unordered_map<CNode*, NodeRef*> live_;
-  std::unordered_set<NodeRef*> with_children_;
+  std::unordered_map<CNode*, HostList> lists_;
   std::unordered_map<NodePool*, Kept> kept_;
 };
 
@@ -143,8 +202,8 @@ void ConstructHandle(void* storage) {
 }
 
 nb::object NewWrapper(CNode* node, Ref<SourceText> source) {
-  nb::handle cls = ClassOfKind(node->kind);
-  nb::object instance = nb::inst_alloc(cls);
+  nb::object instance =
+      nb::inst_alloc(node->fClsInfo == nullptr ? ClassOfKind(node->kind) : ClassOfInfo(node->fClsInfo));
   switch (node->kind) {
 #define QUILLET_NODE(name, base)                         \
   case NodeKind::k##name:                                \
@@ -174,91 +233,43 @@ void NodeRef::Attach(PyObject* self, CNode* node, Ref<SourceText> source) {
 
 NodeRef::~NodeRef() {
   if (node_ == nullptr) return;
-  NodeRegistry::Get().Forget(this);
-  if (children_.is_valid()) {
-    try {
-      Synchronise();
-    } catch (...) {
-      // A list that holds what is no node never reaches the node.
-    }
-    DropChildren();
-  }
+  NodeRegistry& registry = NodeRegistry::Get();
+  registry.Forget(this);
   if (is_lone_bare_ && !node_->has_children && !node_->given_back) {
     pool_->WipeLeafFields(node_);
     LoneBareNodes()[static_cast<int>(kind_)].push_back(node_);
   }
-  NodeRegistry::Get().Remove(this);
+  registry.EndView(pool_);
 }
 
-void NodeRef::DropChildren() {
-  NodeRegistry::Get().DropsChildren(this);
-  synchronised_.clear();
-  nb::object list = std::move(children_);
-  children_ = nb::object();
-}
-
-void NodeRef::Synchronise() {
-  if (!children_.is_valid()) return;
-  const std::span<CNode* const> native = node_->fChildren();
-  const bool is_same_node = node_->kind == kind_ && node_->has_children &&
-                            std::equal(native.begin(), native.end(), synchronised_.begin(), synchronised_.end());
-  if (!is_same_node) {
-    DropChildren();
-    return;
-  }
-  PyObject* list = children_.ptr();
-  const size_t count = static_cast<size_t>(PyList_GET_SIZE(list));
-  const auto item_node = [&](size_t i) -> NodeRef* {
-    nb::handle item = PyList_GET_ITEM(list, static_cast<Py_ssize_t>(i));
-    if (item.is_none()) return nullptr;
-    if (!PyObject_TypeCheck(item.ptr(), (PyTypeObject*)ClassOfKind(NodeKind::kCNode).ptr()) || !nb::inst_ready(item))
-      ThrowExpected("CNode", item);
-    return nb::inst_ptr<NodeHandle<CNode>>(item);
-  };
-  bool same = count == synchronised_.size();
-  std::vector<CNode*> nodes(count);
-  for (size_t i = 0; i < count; ++i) {
-    NodeRef* ref = item_node(i);
-    nodes[i] = ref == nullptr ? nullptr : ref->node_;
-    if (ref != nullptr) ref->is_lone_bare_ = false;
-    if (same && nodes[i] != synchronised_[i]) same = false;
-    if (ref != nullptr && (ref->pool_.get() != pool_.get() || ref->source_.get() != source_.get()))
-      NodeRegistry::Get().Link(pool_.get(), *ref);
-  }
-  if (same) return;
-  std::copy(nodes.begin(), nodes.end(), pool_->ResizeChildren(node_, static_cast<uint32_t>(count)));
-  synchronised_ = std::move(nodes);
-}
-
-void NodeRef::KeepChildren(nb::handle list) {
-  children_ = nb::borrow(list);
-  const std::span<CNode* const> native = node_->fChildren();
-  synchronised_.assign(native.begin(), native.end());
-  NodeRegistry::Get().HoldsChildren(this);
-}
+void NodeRef::Synchronise() { NodeRegistry::Get().Synchronise(node()); }
 
 nb::object NodeRef::GetChildren() {
+  NodeRegistry& registry = NodeRegistry::Get();
+  registry.SynchroniseAll();
   CNode* self = node();
-  Synchronise();
-  if (children_.is_valid()) return children_;
+  nb::object list = registry.ListOf(self);
+  if (list.is_valid()) return list;
   if (!self->has_children) return nb::none();
-  KeepChildren(WrapList(self->fChildren(), source_));
-  return children_;
+  list = WrapList(self->fChildren(), source_);
+  registry.KeepList(self, source_, list);
+  return list;
 }
 
 void NodeRef::SetChildren(nb::handle list) {
   CNode* self = node();
+  if (!list.is_none() && !PyList_Check(list.ptr())) ThrowExpected("list", list);
+  NodeRegistry& registry = NodeRegistry::Get();
   if (list.is_none()) {
-    if (children_.is_valid()) DropChildren();
+    registry.DropList(self);
     pool_->ClearChildren(self);
     return;
   }
-  if (!PyList_Check(list.ptr())) ThrowExpected("list", list);
   const std::vector<CNode*> nodes = NodesOf(list, NodeKind::kCNode, true);
-  if (children_.is_valid()) DropChildren();
+  registry.DropList(self);
   std::copy(nodes.begin(), nodes.end(), pool_->ResizeChildren(self, static_cast<uint32_t>(nodes.size())));
-  KeepChildren(list);
-  Synchronise();  // links what the nodes need
+  registry.KeepList(self, source_, nb::borrow(list));
+  registry.Synchronise(self);  // adopts the nodes
 }
 
 nb::object Wrap(CNode* node, const Ref<SourceText>& source) {
@@ -275,10 +286,9 @@ nb::object WrapList(std::span<CNode* const> nodes, const Ref<SourceText>& source
 }
 
 NodeRef& RefOf(nb::handle object, NodeKind wanted) {
-  if (!PyObject_TypeCheck(object.ptr(), (PyTypeObject*)ClassOfKind(wanted).ptr()) || !nb::inst_ready(object))
-    ThrowExpected(NameOfNodeKind(wanted), object);
+  NodeRef& ref = CheckedRef(object, wanted);
   NodeRegistry::Get().SynchroniseAll();
-  return *nb::inst_ptr<NodeHandle<CNode>>(object);
+  return ref;
 }
 
 NodeRef* RefOrNull(nb::handle object, NodeKind wanted) { return object.is_none() ? nullptr : &RefOf(object, wanted); }

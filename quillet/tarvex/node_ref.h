@@ -5,9 +5,9 @@
 // and handed out again is the same object. The pool is told how many wrappers exist, and leaves
 // memory that they may show alone.
 //
-// A wrapper's list of children is made when the host reads it, and is the host's from then on: what
-// it changes in the list reaches the node on entry to the next operation, and a list whose node was
-// changed by the core meanwhile is dropped.
+// A node's list of children is made when the host reads it, and is the host's from then on: what it
+// changes in the list reaches the node on entry to the next operation, and a list whose node was
+// changed by the core meanwhile is let go. A list that nobody else holds goes, too.
 //
 // A wrapper held past its tree's discard may show other content; it never shows freed memory. Texts
 // of a pool's nodes stand in sources that come and go, so while wrappers exist the pool pins each
@@ -50,26 +50,22 @@ class NodeRef {
   }
   const Ref<SourceText>& source() const { return source_; }
 
+  // ---- fChildren as the host has it ----
   nb::object GetChildren();
   void SetChildren(nb::handle list);  // a list or None
-  // Keeps a list that already has the node's children.
-  void KeepChildren(nb::handle list);
-  // Takes over what the host changed in its list of children.
+  // Takes over what the host changed in its list of this node's children.
   void Synchronise();
 
  private:
   friend class NodeRegistry;
   [[noreturn]] static void ThrowStale();
-  void DropChildren();
 
   CNode* node_ = nullptr;
   NodeKind kind_ = NodeKind::kCNode;
   PyObject* self_ = nullptr;
   Ref<NodePool> pool_;
   Ref<SourceText> source_;
-  bool is_lone_bare_ = false;         // made by the host, in no tree yet
-  nb::object children_;               // the host's list
-  std::vector<CNode*> synchronised_;  // what list and node had in common last
+  bool is_lone_bare_ = false;  // made by the host, in no tree yet
 };
 
 // The C++ type bound for a node class: the same handle, in the class tree of the nodes.
@@ -91,6 +87,9 @@ nb::object WrapUsedArgs(const UsedArgList& args, const Ref<SourceText>& source);
 // Nested lists stay nested; RecursionError past the host's limit.
 nb::object WrapArgList(const ArgList& args, const Ref<SourceText>& source);
 nb::object WrapAsName(const CAsName& name);
+
+// The host's class that serves a record, where that is a class of its own; that of the kind otherwise.
+nb::handle ClassOfInfo(CNodeClassInfo* info);
 
 // The Python class of a kind, and the kind of a class; TypeError for what is no node class.
 nb::handle ClassOfKind(NodeKind kind);
@@ -128,6 +127,12 @@ nb::handle ClassOfNode(CNode* node);
 
 // A node that the host makes without a record.
 CNode* NewBareNode(NodeKind kind);
+
+// A pool for records that the host makes: it may bind a record to a class of its own.
+class HostPool : public NodePool {
+ public:
+  std::unordered_map<CNodeClassInfo*, nb::object> classes;
+};
 
 // ---- factories ----
 
