@@ -32,6 +32,5 @@ void BindHints(nb::module_& tarvex);
 void BindAnalysis(nb::module_& tarvex);
 void BindHost(nb::module_& tarvex);
 void BindBatch(nb::module_& tarvex);
-void BindBatch(nb::module_& tarvex);
 
 }  // namespace quillet::host

@@ -33,6 +33,8 @@ nb::module_ SiblingModule(nb::module_& tarvex, const char* name) {
 NB_MODULE(tarvex_in_owner, tarvex) {
   using namespace quillet::host;
   if (!IsOwner()) throw nb::import_error(kOneInterpreter);
+  // Classes and shared objects are the process's and stay to its end on purpose.
+  nb::set_leak_warnings(false);
   tarvex.attr("__doc__") = "Per-statement analysis of Python code.";
   BindErrors(tarvex);
   InstallConsole();
@@ -50,7 +52,6 @@ NB_MODULE(tarvex_in_owner, tarvex) {
   BindHints(tarvex);
   BindAnalysis(tarvex);
   BindHost(tarvex);
-  BindBatch(tarvex);
   BindBatch(tarvex);
 }
 
