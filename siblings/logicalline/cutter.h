@@ -1,8 +1,9 @@
 // Bytes to logical lines: one pass that tokenises a source and cuts it into statements.
 //
 // Input: a SourceText. Output: its tokens and line starts, and one row a logical line, in order.
-// Brackets and backslashes join physical lines; ";" cuts statements apart; the body on the line of
-// a `def` or `class` is cut off as a line of its own, any other one-line body stays with its head.
+// Brackets and backslashes join physical lines; ";" cuts statements apart and is in no line, unless it
+// ends nothing (`x;;y`): then it is a line, for the parser to reject. The body on the line of a `def`
+// or `class` is cut off as a line of its own, any other one-line body stays with its head.
 // Comments are tokens of the line they end. A bracket left open is closed by the next line that
 // begins, at the statement's own indentation or further out, with a keyword that can only start a
 // statement. It never fails: what is no token is an error token.
@@ -27,7 +28,7 @@ struct LineRow {
   bool continues_physical_line : 1;
   // The body of a `def` or `class` on the same physical line follows as the next row(s).
   bool has_inline_body : 1;
-  bool is_async : 1;     // begins with `async`
+  bool is_async : 1;     // begins with `async def`, `async for` or `async with`
   bool no_embedded : 1;  // see LogicalLine::no_embedded
 };
 static_assert(sizeof(LineRow) == 24);
