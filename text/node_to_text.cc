@@ -72,6 +72,16 @@ void CNodeToTextConverter::Compose(Run& run) {
   run.composed = true;
 }
 
+void CNodeToTextConverter::AppendApart(Run& run, Text piece) {
+  if (run.view == nullptr && !run.composed) {
+    run.view = piece.data();
+    run.view_size = piece.size();
+    return;
+  }
+  Compose(run);
+  buffer_.append(piece);
+}
+
 Text CNodeToTextConverter::TextOf(const Run& run) const {
   if (!run.composed) return {run.view, run.view_size};
   return Text(buffer_).substr(run.offset);
@@ -110,27 +120,32 @@ Text CNodeToTextConverter::TextForStringLiteral(const CStringLiteral* node) cons
 
 // ---- the descent ----
 
-bool CNodeToTextConverter::AppendNode(Run& run, CNode* node, TextOptions options) {
+inline bool CNodeToTextConverter::AppendNode(Run& run, CNode* node, TextOptions options) {
+  if (node == nullptr) ThrowNoAttribute("fText");
+  if (node->IsLeaf()) return AppendLeaf(run, node, options);
   if (++depth_ > kMaxDepth) {
     ThrowError(ErrorKind::kRecursionError, "maximum recursion depth exceeded while rendering a node");
   }
-  const bool has_text = AppendNodeImpl(run, node, options);
+  const bool has_text = AppendInterior(run, node, options);
   --depth_;
   return has_text;
 }
 
-bool CNodeToTextConverter::AppendNodeImpl(Run& run, CNode* node, TextOptions options) {
-  if (node == nullptr) ThrowNoAttribute("fText");
-  if (options.discard_simple_parens && node->kind == NodeKind::kCAtom) node = DropSimpleParens(node);
+inline bool CNodeToTextConverter::AppendLeaf(Run& run, const CNode* leaf, TextOptions options) {
+  const bool is_name = isa<CNameLiteral>(leaf);
+  if (options.dotted_name_only && !is_name) return false;
+  // A bare name is no literal, but the three words are, where they are names.
+  if (options.literal_only && is_name && !IsLiteralNameCode(leaf->code)) return false;
+  const auto* string = dyn_cast<CStringLiteral>(leaf);
+  Append(run, string != nullptr ? TextForStringLiteral(string) : leaf->fText());
+  return true;
+}
 
-  if (node->IsLeaf()) {
-    const bool is_name = isa<CNameLiteral>(node);
-    if (options.dotted_name_only && !is_name) return false;
-    // A bare name is no literal, but the three words are, where they are names.
-    if (options.literal_only && is_name && !IsLiteralNameCode(node->code)) return false;
-    const auto* string = dyn_cast<CStringLiteral>(node);
-    Append(run, string != nullptr ? TextForStringLiteral(string) : node->fText());
-    return true;
+bool CNodeToTextConverter::AppendInterior(Run& run, CNode* node, TextOptions options) {
+  if (options.discard_simple_parens && node->kind == NodeKind::kCAtom) {
+    node = DropSimpleParens(node);
+    if (node == nullptr) ThrowNoAttribute("fText");
+    if (node->IsLeaf()) return AppendLeaf(run, node, options);
   }
   if (auto* atom_expr = dyn_cast<CAtomExpr>(node)) {
     return AppendChain(run, atom_expr->GetAtom(), atom_expr->TrailerSpan(), options);
@@ -169,14 +184,16 @@ bool CNodeToTextConverter::AppendCompound(Run& run, CNode* node, TextOptions opt
   for (CNode* child : node->fChildren()) {
     Run child_run;
     if (!AppendNode(child_run, child, child_options)) return false;
+    const TokenCode code = child->IsLeaf() ? child->code : tok::ERRORTOKEN;
     if (child_run.composed) {
-      pieces_.push_back({nullptr, child_run.offset, buffer_.size() - child_run.offset});
+      pieces_.push_back({nullptr, child_run.offset, buffer_.size() - child_run.offset, code});
     } else {
-      pieces_.push_back({child_run.view, 0, child_run.view_size});
+      pieces_.push_back({child_run.view, 0, child_run.view_size, code});
     }
   }
 
   texts_.clear();
+  codes_.clear();
   // Whether the pieces stand in the source in this order, at most one character apart.
   bool side_by_side = pieces_.size() > first_piece;
   for (size_t i = first_piece; i < pieces_.size(); ++i) {
@@ -185,9 +202,10 @@ bool CNodeToTextConverter::AppendCompound(Run& run, CNode* node, TextOptions opt
         side_by_side && piece.view != nullptr &&
         (texts_.empty() || static_cast<size_t>(piece.view - texts_.back().data()) - texts_.back().size() < 2);
     texts_.push_back({piece.view != nullptr ? piece.view : buffer_.data() + piece.offset, piece.size});
+    codes_.push_back(piece.code);
   }
   joined_.clear();
-  AppendJoinedTokens(texts_.data(), texts_.size(), joined_);
+  AppendJoinedTokens(texts_.data(), codes_.data(), texts_.size(), joined_);
   pieces_.resize(first_piece);
   buffer_.resize(buffer_size);
 

@@ -65,32 +65,28 @@ class CNodeToTextConverter {
     const char* view;  // null: it stands in buffer_ at `offset`
     size_t offset;
     size_t size;
+    TokenCode code;  // ERRORTOKEN: more than one token
   };
 
   Text Render(CNode* node, TextOptions options);
   void Begin();
   void Append(Run& run, Text piece) {
-    if (!run.composed) {
-      if (run.view + run.view_size == piece.data()) {
-        run.view_size += piece.size();
-        return;
-      }
-      if (run.view == nullptr) {
-        run.view = piece.data();
-        run.view_size = piece.size();
-        return;
-      }
-      Compose(run);
+    if (!run.composed && run.view + run.view_size == piece.data()) {
+      run.view_size += piece.size();
+    } else {
+      AppendApart(run, piece);
     }
-    buffer_.append(piece);
   }
+  // A first piece, or one that does not begin where the text ends.
+  void AppendApart(Run& run, Text piece);
   void Compose(Run& run);
   Text TextOf(const Run& run) const;
 
   // Each appends to the run and is false for none; what it appended before is then the caller's to
   // undo, if it goes on.
   bool AppendNode(Run& run, CNode* node, TextOptions options);
-  bool AppendNodeImpl(Run& run, CNode* node, TextOptions options);
+  bool AppendLeaf(Run& run, const CNode* leaf, TextOptions options);
+  bool AppendInterior(Run& run, CNode* node, TextOptions options);
   bool AppendCompound(Run& run, CNode* node, TextOptions options);
   bool AppendChain(Run& run, CNode* atom, std::span<CNode* const> trailers, TextOptions options);
   bool AppendTrailer(Run& run, CNode* trailer, bool dotted_name_only, bool literal_only);
@@ -105,6 +101,7 @@ class CNodeToTextConverter {
   std::string joined_;
   std::vector<Piece> pieces_;
   std::vector<Text> texts_;
+  std::vector<TokenCode> codes_;
 };
 
 }  // namespace quillet

@@ -70,10 +70,17 @@ void CNodeWalker::ProcessNamesFound(CNode* node) {
   if (isa<CImportNamesStmt>(node) || isa<CFromImportStmt>(node)) return;
   if (fLoadedNames.empty() && fStoredNames.empty()) return;
   LogicalLine& logical = RequireLogical();
-  for (size_t i = 0; i < fLoadedNames.size(); ++i) {
-    const Text name = fLoadedNames[i];
-    Assert(!IsNone(name), "a name that was read has no text");
-    logical.AppendStableTypeEquiv(name, kGetPrefix);
+  for (const NameSet::Name& name : fLoadedNames.names()) {
+    Assert(name.data != nullptr, "a name that was read has no text");
+  }
+  if (logical.hooks == nullptr) {
+    const NameSet::Name* const names = fLoadedNames.names().data();
+    logical.DirectAppendRows(fLoadedNames.size(), [names](size_t i) {
+      return Record{names[i].data, kGetPrefix.data(), static_cast<uint32_t>(names[i].size), kPrefixLen};
+    });
+  } else {
+    // A hook may call back and add names.
+    for (size_t i = 0; i < fLoadedNames.size(); ++i) logical.AppendStableTypeEquiv(fLoadedNames[i], kGetPrefix);
   }
   for (size_t i = 0; i < fStoredNames.size(); ++i) {
     const Text name = fStoredNames.name(i);

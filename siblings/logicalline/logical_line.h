@@ -150,6 +150,13 @@ class LogicalLine {
         {name.data(), info.data(), static_cast<uint32_t>(name.size()), static_cast<uint32_t>(info.size())});
     ++arg_row_count_;
   }
+  // Appends `row_at(i)` for each i below `count`.
+  template <class Function>
+  void DirectAppendRows(size_t count, Function&& row_at) {
+    std::vector<Record>& rows = store().rows;
+    for (size_t i = 0; i < count; ++i) rows.push_back(row_at(i));
+    row_count_ += static_cast<uint32_t>(count);
+  }
   void DirectClearDerivedInfo();
   EmbeddedLines DirectGetExpLogicals() const;
 

@@ -155,9 +155,10 @@ class Joiner {
  public:
   explicit Joiner(std::string& out) : out_(out) {}
 
-  void Add(Text item) {
+  void Add(Text item) { Add(item, item.empty() || IsQuoteByte(item[0]) ? kNoSingleToken : CodeOfText(item)); }
+
+  void Add(Text item, TokenCode code) {
     if (item.empty()) return;
-    const TokenCode code = IsQuoteByte(item[0]) ? kNoSingleToken : CodeOfText(item);
     const bool single = code != kNoSingleToken;
     Side first = single ? Side{kEdgeOfCode[code], code} : FirstSide(item);
     const bool unary = first.edge == Edge::kOperator && IsUnaryPlace() && (!single || CanBeUnary(code));
@@ -319,6 +320,11 @@ class Joiner {
 void AppendJoinedTokens(const Text* items, size_t count, std::string& out) {
   Joiner joiner(out);
   for (size_t i = 0; i < count; ++i) joiner.Add(items[i]);
+}
+
+void AppendJoinedTokens(const Text* items, const TokenCode* codes, size_t count, std::string& out) {
+  Joiner joiner(out);
+  for (size_t i = 0; i < count; ++i) joiner.Add(items[i], codes[i]);
 }
 
 }  // namespace quillet

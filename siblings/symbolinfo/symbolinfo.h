@@ -12,6 +12,7 @@
 #include <string>
 
 #include "foundations/text.h"
+#include "siblings/fastaccess/token.h"
 
 namespace quillet {
 
@@ -78,6 +79,9 @@ void AppendArgInfo(int64_t index, Text info, std::string& out);
 // items, whatever they are; only comments, line ends and strings that are not closed, which swallow
 // what stands behind them, cannot be joined.
 void AppendJoinedTokens(const Text* items, size_t count, std::string& out);
+// The same for a caller who knows what the items are: `codes` has the token code of each, or
+// tok::ERRORTOKEN for an item of more than one token.
+void AppendJoinedTokens(const Text* items, const TokenCode* codes, size_t count, std::string& out);
 // A scope name in its shortest form. A dotted part may carry the index of its definition: "name#1" is
 // the second of that name, "name" and "name#0" are both the first; the "#0" is dropped.
 std::string EnsureScopeNameIndicies(Text name);

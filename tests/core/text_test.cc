@@ -219,7 +219,7 @@ TEST(Failures, NoNodeIsAnAttributeError) {
 
 TEST(Failures, NestingPastTheBoundIsARecursionErrorAndSpoilsNothing) {
   const auto nested = [](int depth) { return std::string(depth, '[') + "1" + std::string(depth, ']'); };
-  const int depth = CNodeToTextConverter::kMaxDepth - 1;
+  const int depth = CNodeToTextConverter::kMaxDepth;
   CNodeToTextConverter converter(true, true, true);
   EXPECT_EQ(TextOf(converter, nested(depth)), nested(depth));
   try {
