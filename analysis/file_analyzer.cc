@@ -1,10 +1,23 @@
 // The loop over the lines of a source. Everything that costs is below: cutting, parsing, walking.
 #include "analysis/file_analyzer.h"
 
+#include "siblings/logicalline/future_imports.h"
+
 namespace quillet {
 
-FileAnalyzer::FileAnalyzer(const CPGenAnalyzerImpl::Options& options)
-    : version_(options.version), analyzer_(options), source_(SourceText::Copy(Text("", 0))) {}
+FileAnalyzer::FileAnalyzer(const Options& options)
+    : options_(options), analyzer_(options), source_(SourceText::Copy(Text("", 0))) {}
+
+CPGenAnalyzerImpl& FileAnalyzer::AnalyzerForSource() {
+  if (options_.print_function_grammar_file.empty() || !ImportsPrintFunction(*source_, rows_)) return analyzer_;
+  if (print_function_analyzer_ == nullptr) {
+    CPGenAnalyzerImpl::Options options = options_;
+    options.grammar_file = options_.print_function_grammar_file;
+    std::erase(options.keywords, "print");
+    print_function_analyzer_ = std::make_unique<CPGenAnalyzerImpl>(options);
+  }
+  return *print_function_analyzer_;
+}
 
 void FileAnalyzer::Analyze(Text bytes) {
   rows_.clear();
@@ -13,7 +26,8 @@ void FileAnalyzer::Analyze(Text bytes) {
   store_.Reset();
   scopes_.Reset();
   source_->Assign(bytes);
-  CutLines(*source_, version_, rows_);
+  CutLines(*source_, options_.version, rows_);
+  CPGenAnalyzerImpl& analyzer = AnalyzerForSource();
   results_.reserve(rows_.size());
 
   LogicalLine line;
@@ -28,7 +42,7 @@ void FileAnalyzer::Analyze(Text bytes) {
       SetFromRow(line, source_, row);
       line.parsed = false;
       line.WriteTo(&store_);
-      if (auto error = analyzer_.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def)) {
+      if (auto error = analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def)) {
         result.error = static_cast<int32_t>(errors_.size());
         errors_.push_back(std::move(*error));
       }

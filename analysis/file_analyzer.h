@@ -26,7 +26,13 @@ class FileAnalyzer {
     bool first_in_def = false;
   };
 
-  explicit FileAnalyzer(const CPGenAnalyzerImpl::Options& options);
+  struct Options : CPGenAnalyzerImpl::Options {
+    // The grammar for sources of 2.7 that switch the print function on; empty where the version has
+    // no such switch.
+    std::string print_function_grammar_file;
+  };
+
+  explicit FileAnalyzer(const Options& options);
 
   // Results stand until the next call. The bytes are copied.
   void Analyze(Text bytes);
@@ -36,11 +42,14 @@ class FileAnalyzer {
   std::span<const LineResult> results() const { return results_; }
   const RecordStore& store() const { return store_; }
   const std::vector<SyntaxError>& errors() const { return errors_; }
-  CPGenAnalyzerImpl& analyzer() { return analyzer_; }
 
  private:
-  Version version_;
+  // The analyzer that reads the source as it asks to be read.
+  CPGenAnalyzerImpl& AnalyzerForSource();
+
+  Options options_;
   CPGenAnalyzerImpl analyzer_;
+  std::unique_ptr<CPGenAnalyzerImpl> print_function_analyzer_;  // built at first need
   Ref<SourceText> source_;
   std::vector<LineRow> rows_;
   std::vector<LineResult> results_;

@@ -20,8 +20,8 @@ namespace {
 
 constexpr Version kVersion{{3, 11, 0}, 3};
 
-CPGenAnalyzerImpl::Options AnalyzerOptions() {
-  CPGenAnalyzerImpl::Options options;
+FileAnalyzer::Options AnalyzerOptions() {
+  FileAnalyzer::Options options;
   options.version = kVersion;
   options.grammar_file = std::string(QUILLET_SOURCE_DIR "/resources/pgen-grammars/") + kPy3DefaultGrammar;
   options.hint_grammar_file = options.grammar_file;

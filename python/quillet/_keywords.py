@@ -16,11 +16,11 @@ _PYTHON_3 = ("False", "None", "True", "nonlocal")
 _SINCE_3_7 = ("async", "await")
 
 
-def keywords_of(version: tuple[int, int]) -> tuple[str, ...]:
-    """The keywords of a version, sorted."""
+def keywords_of(version: tuple[int, int], *, print_function: bool = False) -> tuple[str, ...]:
+    """The keywords of a version, sorted; "print" is none where 2.7 has the print function on."""
     words = list(_BOTH)
     if version < (3, 0):
-        words += _PYTHON_2
+        words += (word for word in _PYTHON_2 if not (print_function and word == "print"))
     else:
         words += _PYTHON_3
         if version >= (3, 7):

@@ -8,20 +8,20 @@ from __future__ import annotations
 
 from collections.abc import Iterator
 
-from quillet.host import Line, analyzer_for
+from quillet.host import Line
 from quillet.optpgen import ParseError
-from quillet.tarvex import CNode, CreateSyntaxError, FinishedWithNode
+from quillet.tarvex import CNode, CPGenAnalyzerImpl, CreateSyntaxError, FinishedWithNode
 
 
-def tree_text(line: Line, version: tuple[int, int]) -> str:
-    """The tree of a line, each line of text ended by a newline; "" for one without tokens to parse.
+def tree_text(line: Line, analyzer: CPGenAnalyzerImpl) -> str:
+    """The tree of a line by an analyzer, each line of text ended by a newline; "" for one without tokens to parse.
 
     Raises SyntaxError for a line that does not parse.
     """
     if line.logical.fType in ("comment", "blank line"):
         return ""
     try:
-        node = analyzer_for(version).ParseToNode(line.logical, line.in_async_def)
+        node = analyzer.ParseToNode(line.logical, line.in_async_def)
     except ParseError as error:
         raise CreateSyntaxError("invalid syntax", line.logical, error.context) from None
     if node is None:

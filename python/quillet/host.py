@@ -29,9 +29,13 @@ _BOM = b"\xef\xbb\xbf"
 _Row = tuple[CLogicalLine, int, int, int, bool, bool]
 
 
+# The grammar of 2.7 for a source that imports the print function.
+PY2_PRINT_FUNCTION_GRAMMAR = kPy2DefaultGrammar + "-print-function"
+
+
 class _Analyzers(threading.local):
     def __init__(self) -> None:
-        self.by_version: dict[tuple[int, int], CPGenAnalyzerImpl] = {}
+        self.by_language: dict[tuple[tuple[int, int], bool], CPGenAnalyzerImpl] = {}
 
 
 _analyzers = _Analyzers()
@@ -53,22 +57,25 @@ def language_version(version: tuple[int, ...] | None = None) -> tuple[int, int]:
     return major, minor
 
 
-def analyzer_for(version: tuple[int, ...] | None = None) -> CPGenAnalyzerImpl:
+def analyzer_for(version: tuple[int, ...] | None = None, *, print_function: bool = False) -> CPGenAnalyzerImpl:
     """The calling thread's analyzer for a version, with the grammar and the keywords that belong to it.
 
-    It is built at the first call and kept. Raises as `language_version` does.
+    `print_function` is for sources that import it from `__future__`: in 2.7 they have no print
+    statement. It is built at the first call and kept. Raises as `language_version` does.
     """
-    key = language_version(version)
-    analyzer = _analyzers.by_version.get(key)
+    language = language_version(version)
+    python_3 = language >= (3, 0)
+    print_function = print_function and not python_3
+    analyzer = _analyzers.by_language.get((language, print_function))
     if analyzer is None:
-        python_3 = key >= (3, 0)
+        python_2_grammar = PY2_PRINT_FUNCTION_GRAMMAR if print_function else kPy2DefaultGrammar
         analyzer = CPGenAnalyzerImpl(
-            (*key, 0),
-            grammar_file=kPy3DefaultGrammar if python_3 else kPy2DefaultGrammar,
-            keyword_seq=keywords_of(key),
+            (*language, 0),
+            grammar_file=kPy3DefaultGrammar if python_3 else python_2_grammar,
+            keyword_seq=keywords_of(language, print_function=print_function),
             py3_grammar=python_3,
         )
-        _analyzers.by_version[key] = analyzer
+        _analyzers.by_language[language, print_function] = analyzer
     return analyzer
 
 
@@ -175,13 +182,20 @@ class Analysis:
     def __init__(self, source: bytes, version: tuple[int, int]) -> None:
         self.version = version
         self._source = source
-        self._rows: list[_Row] = list(_host.CutSource(source, (*version, 0)))
+        cut = _host.CutSource(source, (*version, 0))
+        self._rows: list[_Row] = list(cut)
         self._errors: dict[int, SyntaxError] = {}
-        analyze_line = analyzer_for(version).AnalyzeSingleLogical
+        self._print_function: bool = cut.print_function
+        analyze_line = self.analyzer.AnalyzeSingleLogical
         for index, (logical, _, _, _, in_async_def, first_in_def) in enumerate(self._rows):
             error = analyze_line(logical, in_async_def, first_in_def)
             if error is not None:
                 self._errors[index] = error
+
+    @property
+    def analyzer(self) -> CPGenAnalyzerImpl:
+        """The calling thread's analyzer for sources such as this one."""
+        return analyzer_for(self.version, print_function=self._print_function)
 
     @property
     def source(self) -> bytes:

@@ -16,15 +16,16 @@ namespace {
 class NativeBatch {
  public:
   NativeBatch(nb::handle version_triple, std::string grammar_file, std::string hint_grammar_file,
-              std::vector<std::string> keywords, bool py3_grammar)
+              std::vector<std::string> keywords, bool py3_grammar, std::string print_function_grammar_file)
       : files_([&] {
-          CPGenAnalyzerImpl::Options options;
+          FileAnalyzer::Options options;
           options.version = VersionOf(version_triple);
           options.grammar_file = std::move(grammar_file);
           options.hint_grammar_file = std::move(hint_grammar_file);
           options.hint_keywords = keywords;
           options.keywords = std::move(keywords);
           options.py3_grammar = py3_grammar;
+          options.print_function_grammar_file = std::move(print_function_grammar_file);
           return options;
         }()) {}
 
@@ -55,8 +56,9 @@ void BindBatch(nb::module_& tarvex) {
   nb::class_<NativeBatch>(host, "NativeBatch",
                           "Sources through the native path, without an object a line. Grammar files are absolute "
                           "paths; one thread at a time.")
-      .def(nb::init<nb::handle, std::string, std::string, std::vector<std::string>, bool>(), nb::arg("version_triple"),
-           nb::arg("grammar_file"), nb::arg("hint_grammar_file"), nb::arg("keyword_seq"), nb::arg("py3_grammar"))
+      .def(nb::init<nb::handle, std::string, std::string, std::vector<std::string>, bool, std::string>(),
+           nb::arg("version_triple"), nb::arg("grammar_file"), nb::arg("hint_grammar_file"), nb::arg("keyword_seq"),
+           nb::arg("py3_grammar"), nb::arg("print_function_grammar_file"))
       .def(
           "Analyze",
           [](NativeBatch& self, nb::handle sources) {

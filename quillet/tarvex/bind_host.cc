@@ -7,6 +7,7 @@
 #include "quillet/tarvex/errors.h"
 #include "quillet/tarvex/line_object.h"
 #include "siblings/logicalline/cutter.h"
+#include "siblings/logicalline/future_imports.h"
 #include "siblings/logicalline/scopes.h"
 
 namespace quillet::host {
@@ -54,6 +55,9 @@ void BindHost(nb::module_& tarvex) {
         new (self) CutSource(text.text(), VersionOf(version_triple));
       },
       nb::arg("source"), nb::arg("version_triple"));
+  cls.def_prop_ro(
+      "print_function", [](CutSource& self) { return ImportsPrintFunction(*self.source, self.rows); },
+      "Whether the source switches the print function on, which 2.7 parses otherwise.");
   cls.def("__len__", [](CutSource& self) { return self.rows.size(); });
   cls.def(
       "__getitem__", [](CutSource& self, Any index) { return self.At(Int64Of(index)); }, nb::arg("index"));

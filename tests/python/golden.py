@@ -56,7 +56,7 @@ class Case:
                 out.append(f"{row}:{column}: {line.error.msg}\n")
         else:
             out.append("--- tree\n")
-            out += [tree_text(line, analysis.version) for line in analysis.lines]
+            out += [tree_text(line, analysis.analyzer) for line in analysis.lines]
         records = records_view(self.source, self.version, "")
         if records or not analysis.errors:
             out.append("--- records\n" + records)

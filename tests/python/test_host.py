@@ -11,6 +11,8 @@ from hypothesis import strategies as st
 
 import quillet
 from quillet import RecordKind, SourceEncodingError, analyze
+from quillet.config import GetNorvaFilename
+from quillet.optpgen import ParserGenerator
 
 
 def records_of(source: str | bytes, version: tuple[int, ...] | None = None) -> list[tuple[str, str, str, bool]]:
@@ -322,3 +324,31 @@ def test_a_bad_statement_spoils_no_other() -> None:
 
 def test_a_line_without_an_error_has_no_error_position() -> None:
     assert analyze("x = 1").lines[0].error_position is None
+
+
+# ---- what 2.7 asks of its language ----
+
+PRINT_FUNCTION = "from __future__ import print_function\nprint(a, file=b)\n"
+
+
+def test_the_print_function_of_2_7_is_a_call() -> None:
+    lines = analyze(PRINT_FUNCTION, version=(2, 7)).lines
+    assert [line.error for line in lines] == [None, None]
+    assert {(record.name, record.kind) for record in lines[1].records} == {
+        (name, RecordKind.GET) for name in ("print", "a", "b")
+    }
+
+
+def test_without_the_import_print_is_a_statement_in_2_7() -> None:
+    head, call = analyze("from __future__ import division\nprint(a, file=b)\n", version=(2, 7)).lines
+    assert head.error is None
+    assert isinstance(call.error, SyntaxError)
+    assert analyze("print >>f, x\n", version=(2, 7)).lines[0].error is None
+
+
+def test_the_grammar_with_the_print_function_is_that_of_2_7_less_the_statement() -> None:
+    folder = "resources/pgen-grammars/Python-Grammar-2.7"
+    plain = ParserGenerator(GetNorvaFilename(folder)).make_grammar().symbol2number
+    other = ParserGenerator(GetNorvaFilename(folder + "-print-function")).make_grammar().symbol2number
+    assert set(plain) - set(other) == {"print_stmt"}
+    assert set(other) < set(plain)

@@ -48,7 +48,7 @@ def split_target(target: str) -> tuple[str, int | None]:
 
 def _line_text(path: str, analysis: Analysis, line: Line, style: Style) -> str:
     try:
-        tree = tree_text(line, analysis.version)
+        tree = tree_text(line, analysis.analyzer)
     except SyntaxError as error:
         row = line.first_line + (error.lineno or 1) - 1
         column = max(error.offset or 1, 1)
