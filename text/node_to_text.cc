@@ -196,13 +196,14 @@ bool CNodeToTextConverter::AppendCompound(Run& run, CNode* node, TextOptions opt
   codes_.clear();
   // Whether the pieces stand in the source in this order, at most one character apart.
   bool side_by_side = pieces_.size() > first_piece;
+  const char* end = nullptr;
   for (size_t i = first_piece; i < pieces_.size(); ++i) {
     const Piece& piece = pieces_[i];
-    side_by_side =
-        side_by_side && piece.view != nullptr &&
-        (texts_.empty() || static_cast<size_t>(piece.view - texts_.back().data()) - texts_.back().size() < 2);
+    const bool follows = end == nullptr || piece.view == end || piece.view == end + 1;
+    side_by_side = side_by_side && piece.view != nullptr && follows;
     texts_.push_back({piece.view != nullptr ? piece.view : buffer_.data() + piece.offset, piece.size});
     codes_.push_back(piece.code);
+    end = texts_.back().data() + piece.size;
   }
   joined_.clear();
   AppendJoinedTokens(texts_.data(), codes_.data(), texts_.size(), joined_);
@@ -211,7 +212,7 @@ bool CNodeToTextConverter::AppendCompound(Run& run, CNode* node, TextOptions opt
 
   const bool add_parens = options.add_parens_if_operator && texts_.size() != 1;
   if (add_parens) Append(run, "(");
-  if (side_by_side && joined_ == Text(texts_.front().data(), texts_.back().data() + texts_.back().size())) {
+  if (side_by_side && joined_ == Text(texts_.front().data(), static_cast<size_t>(end - texts_.front().data()))) {
     Append(run, {texts_.front().data(), joined_.size()});
   } else {
     Compose(run);

@@ -33,7 +33,7 @@ void CNodeWalker::Walk(CNode* node, LogicalLine* logical) {
   fLoadNameContext = true;
   fStoreWithinSubExpr = false;
   if (const SourceText* source = logical != nullptr ? logical->source.get() : nullptr) {
-    source_begin_ = source->begin();
+    source_begin_ = reinterpret_cast<uintptr_t>(source->begin());
     source_size_ = source->size();
   }
 
@@ -56,7 +56,7 @@ void CNodeWalker::EndWalk() {
   fRecurseCount = 0;
   fLoadedNames.Clear();
   fStoredNames.Clear();
-  source_begin_ = nullptr;
+  source_begin_ = 0;
   source_size_ = 0;
   composed_size_ = 0;
   if (own_texts_used_) {

@@ -161,7 +161,9 @@ class CNodeWalker {
 
   // ---- texts that records refer to ----
   bool InSource(Text text) const {
-    return static_cast<size_t>(text.data() - source_begin_) <= source_size_ && source_begin_ != nullptr;
+    // Counted from the start, an address in front of it is a huge number. Without a source there is
+    // no text that may stay.
+    return source_begin_ != 0 && reinterpret_cast<uintptr_t>(text.data()) - source_begin_ <= source_size_;
   }
   // The text itself where it is a view of the line's source; else a copy that lasts as long as the
   // line's records.
@@ -229,7 +231,7 @@ class CNodeWalker {
 
   void VisitPatternAtDepth(CNode* node, int depth);
 
-  const char* source_begin_ = nullptr;  // of the line's source, during a walk
+  uintptr_t source_begin_ = 0;  // address of the line's source, during a walk
   size_t source_size_ = 0;
   size_t composed_size_ = 0;
   TextArena own_texts_;

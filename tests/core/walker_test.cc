@@ -266,6 +266,31 @@ TEST(Frame, TextsThatWouldFillTheMemoryEndTheWalk) {
   EXPECT_NE(printed.lines()[0].find("Maximum size of the texts of a statement exceeded"), std::string::npos);
 }
 
+TEST(Frame, RecordsOutliveATreeOfAnotherSource) {
+  LogicalLine line;
+  {
+    const ParsedLine hint("x = [List[a.b], f(c) .d]");
+    CNodeWalker walker(kPy3);
+    walker.Walk(hint.root(), &line);
+  }
+  EXPECT_EQ(RecordStrings(line), (Records{"x :s:", "x :l:list:", "f :c:(c)",
+                                          "List :g:", "a :g:", "a.b :g:", "f :g:", "c :g:", "f(c).d :g:"}));
+}
+
+TEST(Frame, AHookMayAddNamesWhileTheReadsAreRecorded) {
+  const ParsedLine line("a + b");
+  CNodeWalker walker(kPy3);
+  Hooks hooks;
+  int added = 0;
+  hooks.on_record = [&] {
+    if (++added <= 20) walker.ProcessLoadName("added" + std::to_string(added));
+  };
+  line.line().hooks = &hooks;
+  walker.Walk(line.root(), &line.line());
+  EXPECT_EQ(hooks.records.size(), 22u);
+  EXPECT_EQ(hooks.records.back(), "added20 :g:");
+}
+
 // ---- names ----
 
 TEST(Names, ReadsComeOnceAndInOrderOfFirstArrival) {
