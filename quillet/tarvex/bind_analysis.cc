@@ -108,8 +108,7 @@ nb::object SyntaxErrorFor(Any msg, Any logical, Any context, Any pos_info_in_tok
     in_token.col = Int32Of(nb::object(pos_info_in_tok.attr("utf8_col")));
   }
   const Position* place = pos_info_in_tok.is_none() ? nullptr : &in_token;
-  LineObject* object;
-  if (nb::try_cast(logical, object)) {
+  if (LineObject* object = InstanceOf<LineObject>(logical)) {
     LogicalLine& line = object->line();
     const Context where = line.token_count == 0 ? Context::Index(0) : ErrorContext(context);
     return ExceptionFor(CreateSyntaxError(std::string(message.text()), line, where, place));

@@ -157,8 +157,8 @@ void InitHintWalker(HintWalkerObject* self, Any version_triple, Any grammar_file
     options.keywords = KeywordList(nb::none(), keywords);
     CNodeWalker* general = nullptr;
     if (!general_node_walker.is_none()) {
-      WalkerObject* walker;
-      if (!nb::try_cast(general_node_walker, walker)) ThrowExpected("CNodeWalker", general_node_walker);
+      WalkerObject* walker = InstanceOf<WalkerObject>(general_node_walker);
+      if (walker == nullptr) ThrowExpected("CNodeWalker", general_node_walker);
       general = walker->walker.get();
     }
     self->walker =

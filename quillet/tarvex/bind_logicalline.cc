@@ -464,8 +464,8 @@ Recording::~Recording() {
 // ---- instances ----
 
 LineObject& LineOf(nb::handle object) {
-  LineObject* line;
-  if (!nb::isinstance<LineObject>(object) || !nb::try_cast(object, line)) ThrowExpected("CLogicalLine", object);
+  LineObject* line = InstanceOf<LineObject>(object);
+  if (line == nullptr) ThrowExpected("CLogicalLine", object);
   return *line;
 }
 

@@ -103,8 +103,8 @@ void BindMatchcase(nb::module_& tarvex) {
   cls.def(
       "__init__",
       [](MatchcaseObject* self, Any pgen_parser) {
-        ParserObject* object;
-        if (!nb::try_cast(pgen_parser, object)) ThrowExpected("CPGenParserImpl", pgen_parser);
+        ParserObject* object = InstanceOf<ParserObject>(pgen_parser);
+        if (object == nullptr) ThrowExpected("CPGenParserImpl", pgen_parser);
         new (self) MatchcaseObject();
         self->parser = std::make_shared<CMatchCaseStatementParser>(object->parser.get());
         self->pgen_parser = nb::borrow(pgen_parser);

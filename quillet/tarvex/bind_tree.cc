@@ -51,8 +51,8 @@ void InitClassInfo(nb::pointer_and_handle<ClassInfoObject> self, Any cls, Any no
 
 CNodeClassInfo* InfoOrNull(nb::handle object) {
   if (object.is_none()) return nullptr;
-  ClassInfoObject* info;
-  if (!nb::try_cast(object, info)) ThrowExpected("CNodeClassInfo", object);
+  ClassInfoObject* info = InstanceOf<ClassInfoObject>(object);
+  if (info == nullptr) ThrowExpected("CNodeClassInfo", object);
   return info->info;
 }
 
@@ -507,8 +507,8 @@ nb::object WrapAsName(const CAsName& name) {
 }
 
 CArgInfo ArgOf(nb::handle object) {
-  ArgInfoObject* arg;
-  if (!nb::try_cast(object, arg)) ThrowExpected("CArgInfo", object);
+  ArgInfoObject* arg = InstanceOf<ArgInfoObject>(object);
+  if (arg == nullptr) ThrowExpected("CArgInfo", object);
   CArgInfo result;
   result.name = NodeOrNull(arg->name);
   result.value = NodeOrNull(arg->value);

@@ -75,6 +75,13 @@ Ref<SourceText> SourceOfTokens(nb::handle tuple);
 // Positions of a tuple of (line, column) pairs; ValueError for what is no pair.
 std::vector<Position> PositionsOf(nb::handle tuple);
 
+// The C++ object behind an instance of a bound class; null for anything else, None included.
+template <class T>
+T* InstanceOf(nb::handle object) {
+  T* instance = nullptr;
+  return nb::try_cast(object, instance, false) ? instance : nullptr;
+}
+
 // ---- contexts ----
 
 // An int, a tuple or None; a foreign object as it was put in.

@@ -1,0 +1,217 @@
+"""The symbol walker as a host drives it: walks, limits, state, and its operations by name."""
+
+from __future__ import annotations
+
+import pytest
+from lines import expression, line_of, parse, parser
+from quillet.logicalline import CLogicalLine
+from quillet.symbolinfo import kGetPrefix, kSetPrefix
+from quillet.tarvex import CAtomExpr, CNode, CNodeToTextConverterImpl, CNodeWalker
+
+V3 = (3, 8, 0)
+
+
+def walk(text: str, walker: CNodeWalker | None = None) -> list[tuple[bytes, bytes]]:
+    line = line_of(text)
+    node = parser().ParseToNode(line, False)
+    (walker or CNodeWalker(V3)).Walk(node, line)
+    parser().DiscardNode(node)
+    return line.fTypeEquivs or []
+
+
+def nested(depth: int) -> CNode:
+    """A leaf name under `depth` - 1 plain nodes."""
+    node = expression("x")
+    for _ in range(depth - 1):
+        outer = CNode()
+        outer.fChildren = [node]
+        node = outer
+    return node
+
+
+def wide(visits: int) -> CNode:
+    """A tree of `visits` nodes."""
+    node = CNode()
+    leaves = []
+    for _ in range(visits - 2):
+        leaf = CNode()
+        leaf.fText = ","
+        leaves.append(leaf)
+    node.fChildren = [*leaves, expression("x")]
+    return node
+
+
+@pytest.mark.parametrize(
+    ("version", "py3"), [((2, 7), False), ((2, 7, 18), False), ((3, 0), True), ((3, 8, 1), True), ((3,), False)]
+)
+def test_the_language_mode(version: tuple[int, ...], py3: bool) -> None:
+    assert CNodeWalker(version)._fPy3 is py3
+
+
+def test_a_new_walker() -> None:
+    walker = CNodeWalker(V3)
+    assert walker._fLogical is None
+    assert (walker._fLoadNameContext, walker._fStoreWithinSubExpr) == (True, False)
+    assert (walker._fLoadedNames, walker._fStoredNames) == ({}, {})
+    assert (walker._fVisitCount, walker._fRecurseCount, walker._fMaxVisits, walker._fMaxRecurseCount) == (0, 0, 10000, 40)
+    assert (walker._fIncludeExprText, walker._fIncludeOperatorExpressions) == (True, True)
+    assert walker._fMaxOperatorExpressionLength == 120
+    converter = walker._fToText
+    assert isinstance(converter, CNodeToTextConverterImpl)
+    assert converter is walker._fToText
+    assert (converter._fIncludeBracketText, converter._fIncludeStringContents, converter._fIncludeArgText) == (True,) * 3
+    with pytest.raises(AttributeError):
+        walker._fToText = converter
+    walker._fIncludeExprText = False
+    walker._fMaxOperatorExpressionLength = 5
+    walker._fPy3 = 0
+    assert (walker._fIncludeExprText, walker._fMaxOperatorExpressionLength, walker._fPy3) == (False, 5, False)
+
+
+def test_reads_come_once_and_behind_what_is_defined() -> None:
+    assert walk("x + x") == [(b"x", kGetPrefix)]
+    assert walk("y = x") == [(b"y", kSetPrefix), (b"y", b"x"), (b"x", kGetPrefix)]
+    assert all(info != kGetPrefix for _, info in walk("import a"))
+
+
+def test_a_walk_of_nothing_changes_nothing() -> None:
+    walker = CNodeWalker(V3)
+    assert walker.Walk(None, None) is None
+    assert walker._fLogical is None
+
+
+@pytest.mark.parametrize(
+    ("tree", "fits", "message"),
+    [
+        (lambda: nested(40), True, ""),
+        (lambda: nested(41), False, "Maximum recurse count in _VisitNode exceeded"),
+        (lambda: wide(10000), True, ""),
+        (lambda: wide(10001), False, "Maximum number of calls to _VisitNode exceeded"),
+    ],
+)
+def test_the_limits_of_a_walk(
+    tree: object, fits: bool, message: str, capsys: pytest.CaptureFixture[str]
+) -> None:
+    walker = CNodeWalker(V3)
+    line = CLogicalLine()
+    walker.Walk(tree(), line)
+    out = capsys.readouterr().out
+    if fits:
+        assert out == ""
+        assert line.fTypeEquivs == [(b"x", kGetPrefix)]
+    else:
+        assert out == f"RuntimeError raised in CNodeWalker.Walk: RuntimeError('{message}')\n"
+        assert line.fTypeEquivs is None
+    assert (walker._fLogical, walker._fVisitCount, walker._fRecurseCount) == (None, 0, 0)
+    assert (walker._fLoadedNames, walker._fStoredNames) == ({}, {})
+    assert walk("x", walker) == [(b"x", kGetPrefix)]
+
+
+def test_definitions_in_front_of_a_limit_stay(capsys: pytest.CaptureFixture[str]) -> None:
+    walker = CNodeWalker(V3)
+    walker._fMaxVisits = 3
+    assert walk("x = f(a, b, c)", walker)[0] == (b"x", kSetPrefix)
+    assert "Maximum number of calls" in capsys.readouterr().out
+
+
+def test_a_syntax_error_leaves_an_idle_walker() -> None:
+    walker = CNodeWalker(V3)
+    with pytest.raises(SyntaxError, match="Generator expression must be parenthesized if not sole argument"):
+        walk("f(a, b for b in c)", walker)
+    assert walker._fLogical is None
+    assert walk("x", walker) == [(b"x", kGetPrefix)]
+
+
+def test_only_one_line_is_walked_at_a_time() -> None:
+    walker = CNodeWalker(V3)
+
+    class Line(CLogicalLine):
+        def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+            assert walker._fLogical is self
+            with pytest.raises(ValueError, match="^Only one logical may be walked at a time$"):
+                walker.Walk(expression("y"), CLogicalLine())
+            super().AppendTypeEquiv(name, equiv)
+
+    line = Line()
+    walker.Walk(expression("x"), line)
+    assert line.fTypeEquivs == [(b"x", kGetPrefix)]
+
+
+def test_named_arguments() -> None:
+    assert (b"y", kSetPrefix) in walk("f(y := 1)")
+    assert (b"y", kSetPrefix) not in walk("f(y)")
+
+
+def test_operations_by_name_between_walks() -> None:
+    walker = CNodeWalker(V3)
+    line = CLogicalLine()
+    with pytest.raises(AttributeError):
+        walker._AddTypeEquiv("x", "info")
+    walker._fLogical = line
+    assert walker._fLogical is line
+    walker._AddTypeEquiv("x", b"info")
+    walker._AddNameDefined("é")
+    walker._AddArgInfoBytes(b"p", b"info")
+    walker._AddArgNameDefined("p")
+    assert line.fTypeEquivs == [(b"x", b"info"), ("é".encode(), kSetPrefix)]
+    assert line.fArgTypeEquivs == [(b"p", b"info"), (b"p", kSetPrefix)]
+    walker._VisitNode(expression("f(a.b)"))
+    assert list(walker._fLoadedNames) == ["f", "a", "a.b"]
+    assert set(walker._fLoadedNames.values()) == {""}
+    line.ClearDerivedInfo()
+    walker._VisitStoreContextNode(expression("c"), within_sub_expr=True)
+    walker._VisitStoreContextNode(expression("c"), True)
+    assert walker._fStoredNames == {"c": ":w:0;:w:0"}
+    walker._VisitLoadContextNode(expression("d"))
+    walker._ProcessLoadName("e")
+    walker._ProcessNamesFound(expression("x"))
+    assert line.fTypeEquivs[-2:] == [(b"c", b":w:0"), (b"c", b":w:0")]
+    assert (b"e", kGetPrefix) in line.fTypeEquivs
+    walker._fLogical = None
+
+
+def test_equivalents_by_name() -> None:
+    walker = CNodeWalker(V3)
+    assert walker._TypeEquivForNode(expression("a.b")) == b"a.b"
+    assert walker._TypeEquivForNode(expression("a.b"), b"[0]") == b"a.b[0]"
+    assert walker._TypeEquivForNode(expression("1")) == b":l:int: 1"
+    with pytest.raises(TypeError, match="Expected COperatorExpression, got"):
+        walker._TypeEquivForOperatorExpression(expression("a"))
+    line = CLogicalLine()
+    walker._fLogical = line
+    walker._AppendEquivNode(expression("x"), expression("y"))
+    walker._AppendSubscriptedEquivNode(expression("x"), expression("y"), 2)
+    walker._AddNodeInfoStr(expression("z"), ":i:info")
+    walker._ProcessTargets(expression("t"), expression("u"))
+    assert line.fTypeEquivs == [
+        (b"x", kSetPrefix),
+        (b"x", b"y"),
+        (b"x", kSetPrefix),
+        (b"x", b"y[2]"),
+        (b"z", b":i:info"),
+        (b"t", kSetPrefix),
+        (b"t", b"u"),
+    ]
+    walker._fLogical = None
+
+
+def test_wrong_nodes_are_type_errors() -> None:
+    walker = CNodeWalker(V3)
+    with pytest.raises(TypeError, match="Expected CNode, got str"):
+        walker.Walk("x", CLogicalLine())
+    with pytest.raises(TypeError, match="Expected CLogicalLine, got NoneType"):
+        walker.Walk(expression("x"), None)
+    with pytest.raises(TypeError, match="Expected CImportNamesStmt, got CNameLiteral"):
+        walker._VisitImportNames(expression("x"))
+    with pytest.raises(ValueError, match=r"^Node is not a <class 'quillet.tarvex.CAtomExpr'>: <class"):
+        walker._RaiseIfNotInstance(expression("x"), CAtomExpr)
+    walker._RaiseIfNotInstance(expression("x.y"), CAtomExpr)
+
+
+def test_records_of_a_walk_join_a_list_that_the_host_holds() -> None:
+    line = line_of("x")
+    line.AppendTypeEquiv(b"first", b"info")
+    held = line.fTypeEquivs
+    CNodeWalker(V3).Walk(parse("x"), line)
+    assert held == [(b"first", b"info"), (b"x", kGetPrefix)]
+    assert line.fTypeEquivs is held
