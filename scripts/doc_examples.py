@@ -60,7 +60,8 @@ def records_view(source: str, version: tuple[int, int], _: str) -> str:
 
 def tree_view(source: str, version: tuple[int, int], _: str) -> str:
     """The trees of all statements."""
-    return "".join(tree_text(line, version) for line in analyze(source, version=version).lines)
+    analysis = analyze(source, version=version)
+    return "".join(tree_text(line, analysis.analyzer) for line in analysis.lines)
 
 
 def analyze_view(source: str, version: tuple[int, int], file: str) -> str:

@@ -16,6 +16,7 @@ from quillet import cli
 PACKAGE = Path(quillet.__file__).parent
 MODULES = [
     "_fastaccess",
+    "_batch",
     "_keywords",
     "_records",
     "_source",
@@ -44,7 +45,7 @@ def test_each_module_says_what_it_is(name: str) -> None:
     assert (importlib.import_module(f"quillet.{name}").__doc__ or "").strip()
 
 
-@pytest.mark.parametrize("name", ["Python-Grammar-2.7", "Python-Grammar-3.8"])
+@pytest.mark.parametrize("name", ["Python-Grammar-2.7", "Python-Grammar-2.7-print-function", "Python-Grammar-3.8"])
 def test_the_grammar_files_are_installed(name: str) -> None:
     from quillet import config
 
