@@ -2,10 +2,10 @@
 // reads, calls and imports, and what it says of their types.
 //
 // One entry, Walk; one dispatch, VisitNode (dispatch.cc), a table to be read whole; a file for each
-// family of statements. Records reach the line through four recorders only. They appear in this
-// order: what the visits record directly, in the order of the walk; then all reads; then all stores
-// inside sub-expressions. Two limits bound the work, 10000 visits and a depth of 40; reaching one
-// prints a line and drops the reads, and is no error to the caller.
+// family of statements. Records reach the line through the recorders below, which take any text, or
+// through their short form for texts that are kept already. They appear in this order: what the visits record directly,
+// in the order of the walk; then all reads; then all stores inside sub-expressions. Two limits bound the work, 10000
+// visits and a depth of 40; reaching one prints a line and drops the reads, and is no error to the caller.
 //
 // Texts on the way to a record are views of the source where they can be. Keep decides: a view of
 // the line's own source stays, anything else is copied to where the line's records live.
