@@ -58,6 +58,12 @@ def test_commands_of_the_script_exist(path: Path) -> None:
     assert set(re.findall(r"\./run (\w+)", path.read_text())) <= known
 
 
+def test_the_readme_shows_what_the_demo_analyses() -> None:
+    shown = doc_examples.EXAMPLE.search((ROOT / "README.md").read_text())
+    assert shown["source"] == (ROOT / shown["file"]).read_text()
+    assert f"analyze {shown['file']}" in (ROOT / "run").read_text()
+
+
 def test_every_record_kind_is_documented() -> None:
     from quillet import RecordKind
 
