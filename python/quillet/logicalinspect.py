@@ -6,14 +6,17 @@ from collections.abc import Sequence
 from typing import Protocol
 
 from quillet.logicalline import CLogicalLine
-from quillet.tarvex._siblings.logicalinspect import _TextFromLine, _TextFromToks
+from quillet.tarvex import _siblings
 
 __all__ = ["TextFromTokens"]
 
 
 class _HasTokens(Protocol):
-    fToks: Sequence[str | None]
-    fPositions: Sequence[tuple[int, int]]
+    @property
+    def fToks(self) -> Sequence[str | None]: ...
+
+    @property
+    def fPositions(self) -> Sequence[tuple[int, int]]: ...
 
 
 def TextFromTokens(logical: _HasTokens) -> str:
@@ -21,6 +24,7 @@ def TextFromTokens(logical: _HasTokens) -> str:
 
     `logical` is a CLogicalLine or any object with `fToks` and `fPositions`. Removed tokens leave blanks.
     """
+    texts = _siblings.logicalinspect
     if isinstance(logical, CLogicalLine):
-        return _TextFromLine(logical)
-    return _TextFromToks(logical.fToks, logical.fPositions)
+        return texts._TextFromLine(logical)
+    return texts._TextFromToks(logical.fToks, logical.fPositions)

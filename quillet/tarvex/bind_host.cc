@@ -58,6 +58,7 @@ void BindHost(nb::module_& tarvex) {
   cls.def_prop_ro(
       "print_function", [](CutSource& self) { return ImportsPrintFunction(*self.source, self.rows); },
       "Whether the source switches the print function on, which 2.7 parses otherwise.");
+  cls.def("__iter__", [](nb::handle self) { return nb::steal(PySeqIter_New(self.ptr())); });
   cls.def("__len__", [](CutSource& self) { return self.rows.size(); });
   cls.def(
       "__getitem__", [](CutSource& self, Any index) { return self.At(Int64Of(index)); }, nb::arg("index"));

@@ -55,6 +55,8 @@ def shape(node: CNode | None) -> object:
 
 def records(text: str, version: tuple[int, ...] = (3, 8, 0), **where: bool) -> list[tuple[bytes, bytes]]:
     line = line_of(text, version)
-    error = analyzer(version).AnalyzeSingleLogical(line, where.get("in_async_def", False), where.get("first_in_def", False))
+    error = analyzer(version).AnalyzeSingleLogical(
+        line, where.get("in_async_def", False), where.get("first_in_def", False)
+    )
     assert error is None, error
     return (line.fTypeEquivs or []) + (line.fArgTypeEquivs or [])

@@ -5,6 +5,7 @@ from __future__ import annotations
 import gc
 
 import pytest
+
 from lines import analyzer, line_of
 from quillet import _fastaccess, logicalline, utils
 from quillet.logicalinspect import TextFromTokens
@@ -159,7 +160,10 @@ def test_records_are_bytes() -> None:
 def test_clearing_leaves_everything_else_alone() -> None:
     line = line_of("def f(x): pass".split(" pass")[0])
     assert analyzer().AnalyzeSingleLogical(line, False) is None
-    kept = [(name, getattr(line, name)) for name in ("fToks", "fTokTypes", "fPositions", "fType", "fFirstLine", "fTokenCount")]
+    kept = [
+        (name, getattr(line, name))
+        for name in ("fToks", "fTokTypes", "fPositions", "fType", "fFirstLine", "fTokenCount")
+    ]
     line.ClearDerivedInfo()
     assert line.fParsed
     assert (line.fTypeEquivs, line.fArgTypeEquivs) == (None, None)

@@ -5,6 +5,7 @@ from __future__ import annotations
 from types import SimpleNamespace
 
 import pytest
+
 from quillet.logicalline import CLogicalLine
 from quillet.optpgen import ParseError
 from quillet.strutils import TextPosInfo

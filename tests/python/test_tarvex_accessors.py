@@ -6,6 +6,7 @@ from collections.abc import Callable
 from typing import Any
 
 import pytest
+
 from lines import expression, parse, shape
 from quillet import tarvex
 from quillet.symbolinfo import GetInstanceNameForClass, kTypedLiteralPrefix
@@ -54,19 +55,54 @@ def test_base_class_of_expressions() -> None:
     ("text", "version", "asked", "answer"),
     [
         # operators
-        ("not x", PY3, lambda n: (n.GetTermCount(), n.GetTerm(7), n.GetOperatorStr(0), n.GetOperatorStr(1)), (1, "x", "not", None)),
+        (
+            "not x",
+            PY3,
+            lambda n: (n.GetTermCount(), n.GetTerm(7), n.GetOperatorStr(0), n.GetOperatorStr(1)),
+            (1, "x", "not", None),
+        ),
         ("a not in b", PY3, lambda n: (n.GetOperatorStr(0), n.GetOperatorStr(1)), ("not in", None)),
         ("a is not b", PY3, lambda n: n.GetOperatorStr(0), "is not"),
-        ("a < b < c", PY3, lambda n: (n.GetTermCount(), n.GetTerm(2), n.GetTerm(3), n.GetOperatorStr(1), n.GetOperatorStr(-1)), (3, "c", None, "<", None)),
+        (
+            "a < b < c",
+            PY3,
+            lambda n: (n.GetTermCount(), n.GetTerm(2), n.GetTerm(3), n.GetOperatorStr(1), n.GetOperatorStr(-1)),
+            (3, "c", None, "<", None),
+        ),
         # lists of expressions
-        ("a, b", PY3, lambda n: (n.IsTuple(), n.IsGenExpr(), n.GetSubExprCount(), n.GetSubExpr(1)), (True, False, 2, "b")),
+        (
+            "a, b",
+            PY3,
+            lambda n: (n.IsTuple(), n.IsGenExpr(), n.GetSubExprCount(), n.GetSubExpr(1)),
+            (True, False, 2, "b"),
+        ),
         ("a, b,", PY3, lambda n: n.GetSubExprCount(), 2),
         # chains
-        ("x.y(1)[2]", PY3, lambda n: (n.GetPrefix(), n.GetAtom(), [t.GetInitialToken() for t in n.GetTrailers()]), (None, "x", [".", "(", "["])),
+        (
+            "x.y(1)[2]",
+            PY3,
+            lambda n: (n.GetPrefix(), n.GetAtom(), [t.GetInitialToken() for t in n.GetTrailers()]),
+            (None, "x", [".", "(", "["]),
+        ),
         ("await x", PY3, lambda n: (n.GetPrefix(), n.GetAtom(), n.GetTrailers()), ("await", "x", [])),
-        ("await x.y", PY3, lambda n: (n.GetPrefix(), n.GetAtom(), n.GetTrailers()), ("await", "x", [("CTrailer", ".", "y")])),
-        ("x.y ** 2", PY3, lambda n: (n.GetAtom(), n.GetTrailers(), n.GetExponentNode()), ("x", [("CTrailer", ".", "y")], "2")),
-        ("a.b ** 2", PY2, lambda n: (n.GetAtom(), n.GetTrailers(), n.GetExponentNode()), ("a", [("CTrailer", ".", "b")], "2")),
+        (
+            "await x.y",
+            PY3,
+            lambda n: (n.GetPrefix(), n.GetAtom(), n.GetTrailers()),
+            ("await", "x", [("CTrailer", ".", "y")]),
+        ),
+        (
+            "x.y ** 2",
+            PY3,
+            lambda n: (n.GetAtom(), n.GetTrailers(), n.GetExponentNode()),
+            ("x", [("CTrailer", ".", "y")], "2"),
+        ),
+        (
+            "a.b ** 2",
+            PY2,
+            lambda n: (n.GetAtom(), n.GetTrailers(), n.GetExponentNode()),
+            ("a", [("CTrailer", ".", "b")], "2"),
+        ),
         ("a.b", PY2, lambda n: (n.GetAtom(), n.GetExponentNode()), ("a", None)),
         ("f()", PY3, lambda n: (n.GetTrailers()[0].GetNestedNode(), n.GetTrailers()[0].GetDotName()), (None, None)),
         ("f(a)", PY3, lambda n: n.GetTrailers()[0].GetNestedNode(), "a"),
@@ -78,12 +114,22 @@ def test_base_class_of_expressions() -> None:
         ("yield from x", PY3, lambda n: (n.GetValue(), n.IsYieldFrom()), ("x", True)),
         ("yield x", PY3, lambda n: (n.GetValue(), n.IsYieldFrom()), ("x", False)),
         ("yield x", PY2, lambda n: (n.GetValue(), n.IsYieldFrom()), ("x", False)),
-        ("(y := 1)", PY3, lambda n: (n.GetChild(1).GetAssignedName(), n.GetChild(1).GetRightHandExpression()), ("y", "1")),
+        (
+            "(y := 1)",
+            PY3,
+            lambda n: (n.GetChild(1).GetAssignedName(), n.GetChild(1).GetRightHandExpression()),
+            ("y", "1"),
+        ),
         # comprehensions
         ("[a for a in b if c]", PY3, lambda n: comp(n), (False, "a", "b", ("CNode", "if", "c"))),
         ("[a for a in b]", PY2, lambda n: comp(n), (False, "a", "b", None)),
         ("[a async for a in b]", PY3, lambda n: comp(n), (True, "a", "b", None)),
-        ("[a, b,]", PY2, lambda n: (n.GetChild(1).GetSubExprCount(), n.GetChild(1).GetSubExpr(1), n.GetChild(1).GetSubExpr(2)), (2, "b", None)),
+        (
+            "[a, b,]",
+            PY2,
+            lambda n: (n.GetChild(1).GetSubExprCount(), n.GetChild(1).GetSubExpr(1), n.GetChild(1).GetSubExpr(2)),
+            (2, "b", None),
+        ),
         # atoms
         ("[]", PY3, lambda n: (n.GetSubExprCount(), n.GetSubExpr(0), n.GetInitialBracket()), (0, None, "[")),
         ("[x]", PY3, lambda n: (n.GetSubExprCount(), n.GetSubExpr(0)), (1, "x")),
@@ -96,14 +142,32 @@ def test_base_class_of_expressions() -> None:
         ("'a' 'b'", PY3, lambda n: (n.IsTwoPlusStringLiterals(), n.GetInitialBracket()), (True, None)),
         ("`x`", PY2, lambda n: n.GetInitialBracket(), None),
         # statements
-        ("a = b = c", PY3, lambda n: (n.GetEqualCount(), n.GetInitialTestExpr(), n.GetPostEqualsTestExpr(1)), (2, "a", "c")),
+        (
+            "a = b = c",
+            PY3,
+            lambda n: (n.GetEqualCount(), n.GetInitialTestExpr(), n.GetPostEqualsTestExpr(1)),
+            (2, "a", "c"),
+        ),
         ("a += 1", PY3, lambda n: (n.GetEqualCount(), n.GetAugAssignOp(), n.GetPostEqualsTestExpr(0)), (0, "+=", "1")),
         ("a |= 1", PY3, lambda n: n.GetAugAssignOp(), None),
         ("a @= 1", PY3, lambda n: n.GetAugAssignOp(), None),
-        ("a: int", PY3, lambda n: (n.GetAnnotatedAssignNode().GetTypeHintNode(), n.GetAnnotatedAssignNode().GetPostEqualsTestExpr()), ("int", None)),
+        (
+            "a: int",
+            PY3,
+            lambda n: (
+                n.GetAnnotatedAssignNode().GetTypeHintNode(),
+                n.GetAnnotatedAssignNode().GetPostEqualsTestExpr(),
+            ),
+            ("int", None),
+        ),
         ("a: int = 1", PY3, lambda n: n.GetAnnotatedAssignNode().GetPostEqualsTestExpr(), "1"),
         ("a = 1", PY3, lambda n: n.GetAnnotatedAssignNode(), None),
-        ("with a, b as c:", PY3, lambda n: [(i.GetExpression(), i.GetTarget()) for i in n.GetWithItems()], [("b", "c")]),
+        (
+            "with a, b as c:",
+            PY3,
+            lambda n: [(i.GetExpression(), i.GetTarget()) for i in n.GetWithItems()],
+            [("b", "c")],
+        ),
         ("del a, b", PY3, lambda n: n.GetExpressions(), ["a", "b"]),
         ("del a", PY3, lambda n: n.GetExpressions(), ["a"]),
         ("del (a, b)", PY3, lambda n: len(n.GetExpressions()), 1),
@@ -111,23 +175,58 @@ def test_base_class_of_expressions() -> None:
         ("nonlocal a", PY3, lambda n: n.GetUtf8NameList(), ["a"]),
         ("return", PY3, lambda n: type(n).__name__, "CKeywordLiteral"),
         ("return x", PY3, lambda n: n.GetValue(), "x"),
-        ("for x in y:", PY3, lambda n: (n.GetTarget(), n.GetInExpression(), n.GetBody(), n.GetElseBody()), ("x", "y", "pass", None)),
+        (
+            "for x in y:",
+            PY3,
+            lambda n: (n.GetTarget(), n.GetInExpression(), n.GetBody(), n.GetElseBody()),
+            ("x", "y", "pass", None),
+        ),
         ("if x:", PY3, lambda n: n.GetTestExpression(), "x"),
-        ("def f() -> int:", PY3, lambda n: (n.GetFunctionName(), n.GetReturnType(), n.GetSuite()), ("f", "int", "pass")),
+        (
+            "def f() -> int:",
+            PY3,
+            lambda n: (n.GetFunctionName(), n.GetReturnType(), n.GetSuite()),
+            ("f", "int", "pass"),
+        ),
         ("def f():", PY3, lambda n: (n.GetParameters(), n.GetReturnType()), (("CParametersNode", "(", ")"), None)),
         ("class A:", PY3, lambda n: (n.GetClassName(), n.GetBaseClassList()), ("A", [])),
         ("class A():", PY3, lambda n: n.GetBaseClassList(), []),
-        ("class A(B, metaclass=C):", PY3, lambda n: n.GetBaseClassList(), [(None, None, "B", None), (None, "metaclass", "C", None)]),
-        ("@a.b(c)", PY3, lambda n: (n.GetDottedName(), n.GetUsedArgList()), (("CDottedName", "a", ".", "b"), [(None, None, "c", None)])),
+        (
+            "class A(B, metaclass=C):",
+            PY3,
+            lambda n: n.GetBaseClassList(),
+            [(None, None, "B", None), (None, "metaclass", "C", None)],
+        ),
+        (
+            "@a.b(c)",
+            PY3,
+            lambda n: (n.GetDottedName(), n.GetUsedArgList()),
+            (("CDottedName", "a", ".", "b"), [(None, None, "c", None)]),
+        ),
         ("@foo()", PY3, lambda n: n.GetUsedArgList(), []),
         # imports
         ("import a.b as c, d", PY3, lambda n: n.GetAsNameList(), [("a.b", "c"), ("d", None)]),
         ("import a", PY3, lambda n: n.GetAsNameList(), [("a", None)]),
-        ("from ..a.b import c as d", PY3, lambda n: (n.GetFromString(), n.GetAsNameList(), n.GetImportStar()), ("..a.b", [("c", "d")], False)),
-        ("from . import (a, b)", PY3, lambda n: (n.GetFromString(), n.GetAsNameList()), (".", [("a", None), ("b", None)])),
-        ("from x import *", PY3, lambda n: (n.GetImportStar(), n.GetAsNameList(), n._GetImportIndex()), (True, [("*", None)], 2)),
+        (
+            "from ..a.b import c as d",
+            PY3,
+            lambda n: (n.GetFromString(), n.GetAsNameList(), n.GetImportStar()),
+            ("..a.b", [("c", "d")], False),
+        ),
+        (
+            "from . import (a, b)",
+            PY3,
+            lambda n: (n.GetFromString(), n.GetAsNameList()),
+            (".", [("a", None), ("b", None)]),
+        ),
+        (
+            "from x import *",
+            PY3,
+            lambda n: (n.GetImportStar(), n.GetAsNameList(), n._GetImportIndex()),
+            (True, [("*", None)], 2),
+        ),
     ],
-)  # fmt: skip
+)
 def test_accessors(text: str, version: tuple[int, ...], asked: Callable[[Any], Any], answer: object) -> None:
     assert shown(asked(parse(text, version))) == answer
 
@@ -152,7 +251,11 @@ def made(cls: type[CNode], *texts: str) -> Any:
     ("call", "error", "text"),
     [
         (lambda: expression("a, b").GetSubExpr(2), ValueError, "^Not enough expressions in list$"),
-        (lambda: made(CTestListStarExpr, "a", ",").GetSubExpr(0), ValueError, "^Elenment 0 of .* needs to be a CExpression; fChildren = "),
+        (
+            lambda: made(CTestListStarExpr, "a", ",").GetSubExpr(0),
+            ValueError,
+            "^Elenment 0 of .* needs to be a CExpression; fChildren = ",
+        ),
         (lambda: made(CTrailer).GetInitialToken(), ValueError, "^Trailer node with no children$"),
         (lambda: made(CAtom).GetInitialBracket(), ValueError, "^Atom node with no children$"),
         (lambda: expression("a = b").GetPostEqualsTestExpr(1), ValueError, "^Not enough ='s$"),
@@ -166,7 +269,7 @@ def made(cls: type[CNode], *texts: str) -> Any:
         (lambda: CAtom.GetSubExpr(expression("x"), 0), TypeError, "Expected CAtom, got"),
         (lambda: expression("a, b").GetSubExpr(1 << 31), OverflowError, "value too large to convert to int"),
     ],
-)  # fmt: skip
+)
 def test_failures_that_are_meant(call: Callable[[], object], error: type[Exception], text: str) -> None:
     with pytest.raises(error) as caught:
         call()
@@ -222,11 +325,22 @@ def test_the_end_of_a_node() -> None:
 @pytest.mark.parametrize(
     ("token", "is_float", "value"),
     [
-        ("10", False, 10), ("1_000", False, 1000), ("010", False, 10), ("0x10", False, None), ("0xe", True, None),
-        ("10L", False, None), ("1j", False, None), ("1.5", True, 1.5), ("1e5", True, 1e5), (".5", True, 0.5),
-        ("1.", True, 1.0), ("1_0.0", True, 10.0), ("1.5j", True, None), ("0o7", False, None),
+        ("10", False, 10),
+        ("1_000", False, 1000),
+        ("010", False, 10),
+        ("0x10", False, None),
+        ("0xe", True, None),
+        ("10L", False, None),
+        ("1j", False, None),
+        ("1.5", True, 1.5),
+        ("1e5", True, 1e5),
+        (".5", True, 0.5),
+        ("1.", True, 1.0),
+        ("1_0.0", True, 10.0),
+        ("1.5j", True, None),
+        ("0o7", False, None),
     ],
-)  # fmt: skip
+)
 def test_numbers(token: str, is_float: bool, value: object) -> None:
     node = CNumberLiteral()
     node.fText = token
@@ -312,9 +426,15 @@ def test_texts_of_imports_by_hand() -> None:
 
 def test_instance_names_are_built_from_the_vocabulary() -> None:
     for constant, cls_name in {
-        "kListInstanceName": "list", "kDictInstanceName": "dict", "kSetInstanceName": "set", "kTupleInstanceName": "tuple",
-        "kStringInstanceName": "str", "kUnicodeInstanceName": "unicode", "kBytesInstanceName": "bytes",
-        "kIntLiteralName": "int", "kFloatLiteralName": "float",
-    }.items():  # fmt: skip
+        "kListInstanceName": "list",
+        "kDictInstanceName": "dict",
+        "kSetInstanceName": "set",
+        "kTupleInstanceName": "tuple",
+        "kStringInstanceName": "str",
+        "kUnicodeInstanceName": "unicode",
+        "kBytesInstanceName": "bytes",
+        "kIntLiteralName": "int",
+        "kFloatLiteralName": "float",
+    }.items():
         expected = kTypedLiteralPrefix + GetInstanceNameForClass(cls_name).encode()
         assert getattr(tarvex, constant) == expected == tarvex._GetBuiltinInstanceName(cls_name)

@@ -5,6 +5,7 @@ from __future__ import annotations
 import logging
 
 import pytest
+
 from lines import analyzer, line_of
 from quillet import reflect
 from quillet.logicalline import (
@@ -205,9 +206,7 @@ def raising(error: BaseException) -> Raising:
 
 
 @pytest.mark.parametrize("error", [KeyError("no such name"), ZeroDivisionError("by zero"), MemoryError()])
-def test_any_other_failure_is_reported_and_gives_none(
-    error: BaseException, monkeypatch: pytest.MonkeyPatch
-) -> None:
+def test_any_other_failure_is_reported_and_gives_none(error: BaseException, monkeypatch: pytest.MonkeyPatch) -> None:
     import sys
 
     reported = []
@@ -220,9 +219,7 @@ def test_any_other_failure_is_reported_and_gives_none(
     assert analyzer().AnalyzeSingleLogical(line, False) is None
     ((value, suppress_gui),) = reported
     assert isinstance(value, ValueError)
-    assert str(value) == (
-        f"Could not analyze logical -- inner exception is {error!r}\n  logical tokens: x = 1"
-    )
+    assert str(value) == (f"Could not analyze logical -- inner exception is {error!r}\n  logical tokens: x = 1")
     assert suppress_gui is True
     assert line.fParsed
     assert line.fTypeEquivs is None
@@ -286,8 +283,10 @@ def test_the_exception_being_handled_stays_current() -> None:
     try:
         raise LookupError("outer")
     except LookupError as outer:
-        assert isinstance(analyzer().AnalyzeSingleLogical(line_of("x ="), False), SyntaxError)
-        assert sys.exc_info()[1] is outer
+        error = analyzer().AnalyzeSingleLogical(line_of("x ="), False)
+        handled = sys.exc_info()[1] is outer
+    assert isinstance(error, SyntaxError)
+    assert handled
 
 
 def test_inspecting_raises_what_analysing_returns() -> None:

@@ -6,6 +6,7 @@ import gc
 import weakref
 
 import pytest
+
 from lines import analyzer, expression, line_of, parse, records
 from quillet.logicalline import CLogicalLine
 from quillet.symbolinfo import kTypeHintPrefix
@@ -81,7 +82,7 @@ def test_visits_see_the_walk() -> None:
     def visit(walker: CDispatchWalker, node: CNode) -> None:
         assert walker._fLogical is line
         stacks.append(walker._fNodeStack)
-        with pytest.raises(ValueError, match="^Only one logical may be walked at a time$"):
+        with pytest.raises(ValueError, match=r"^Only one logical may be walked at a time$"):
             walker.Walk(node, line, False)
 
     walker = CDispatchWalker({CNameLiteral: visit})
@@ -94,9 +95,7 @@ def test_visits_see_the_walk() -> None:
     assert (walker._fLogical, walker._fVisitCount, walker._fNodeStack) == (None, 0, [])
 
 
-@pytest.mark.parametrize(
-    ("depth", "message"), [(40, None), (41, "Maximum recurse count in _VisitNode exceeded")]
-)
+@pytest.mark.parametrize(("depth", "message"), [(40, None), (41, "Maximum recurse count in _VisitNode exceeded")])
 def test_the_depth_of_a_walk(depth: int, message: str | None, capsys: pytest.CaptureFixture[str]) -> None:
     node = CNode()
     for _ in range(depth - 1):
@@ -187,7 +186,10 @@ def test_a_walker_and_its_callables_are_collected_together() -> None:
         ("with a as b:  # type: int", [(b"b", hint("int"))]),
         ("with a, b as c:  # type: int", [(b"c", hint("int"))]),
         ("x = (1,  # type: int\n  2)", []),
-        ("def f(a, b):  # type: (int, str) -> bool", [(b"a", hint("int")), (b"b", hint("str")), (b"return", hint("bool"))]),
+        (
+            "def f(a, b):  # type: (int, str) -> bool",
+            [(b"a", hint("int")), (b"b", hint("str")), (b"return", hint("bool"))],
+        ),
         ("def f(a: int) -> str:", [(b"a", hint("int")), (b"return", hint("str"))]),
     ],
 )
@@ -258,7 +260,8 @@ def test_finding_comments() -> None:
 
 
 @pytest.mark.parametrize(
-    ("text", "dotted"), [("a", True), ("a.b", True), ("_a1.b", True), ("", True), ("1a", False), ("a b", False), ("é.ü", True)]
+    ("text", "dotted"),
+    [("a", True), ("a.b", True), ("_a1.b", True), ("", True), ("1a", False), ("a b", False), ("é.ü", True)],
 )
 def test_dotted_names(text: str, dotted: bool) -> None:
     assert walker_on("x")[0]._IsDottedName(text) is dotted
@@ -316,8 +319,8 @@ def test_signatures_by_name() -> None:
     line.AppendArgTypeEquiv(b"a", b":s:")
     walker._ProcessFuncdefComment("(int, str) -> bool", 8, line, True)
     assert line.fArgTypeEquivs[1:3] == [(b"a", hint("int")), (b":A:1", hint("str"))]
+    empty = CLogicalLine()
     with pytest.raises(TypeError):
-        empty = CLogicalLine()
         walker._ProcessFuncdefComment("(int) -> bool", 8, empty, True)
     walker._fLogical = None
 

@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import pytest
+
 from lines import line_of, parse, parser, shape
 from quillet.optpgen import ParseError
 from quillet.tarvex import CMatchCaseStatementParser
@@ -67,10 +68,21 @@ def test_patterns(pattern: str, expected: object) -> None:
 @pytest.mark.parametrize(
     ("pattern", "tok_i"),
     [
-        ("1 2", 2), ("1 + x", 3), ("- x", 2), ('"a" "b"', 1), ("a.", 2), ("(a)", 3), ("()", 2), ("{k}", 2),
-        ("a as b as c", 2), ("a as 1", 3), ("a as b | c", 2), ("((a), (b))", 4), ("Point(a b=1)", 5),
+        ("1 2", 2),
+        ("1 + x", 3),
+        ("- x", 2),
+        ('"a" "b"', 1),
+        ("a.", 2),
+        ("(a)", 3),
+        ("()", 2),
+        ("{k}", 2),
+        ("a as b as c", 2),
+        ("a as 1", 3),
+        ("a as b | c", 2),
+        ("((a), (b))", 4),
+        ("Point(a b=1)", 5),
     ],
-)  # fmt: skip
+)
 def test_bad_patterns_point_at_a_token(pattern: str, tok_i: int) -> None:
     line = line_of(f"case {pattern}:")
     with pytest.raises(ParseError) as caught:
@@ -119,7 +131,11 @@ def test_steps_by_name() -> None:
     assert one._fToks is None
     assert shape(with_tokens("case [x]:")._NodeForSequencePattern(1, 4)) == ("CSequencePatternNode", "[", "x", "]")
     assert shape(with_tokens("case {}:")._NodeForMappingPattern(1, 3)) == ("CSequencePatternNode", "{", "}")
-    assert shape(with_tokens("case C():")._NodeForClassPattern(1, 4)) == ("CClassPatternNode", ("CExpression", "C"), "(")
+    assert shape(with_tokens("case C():")._NodeForClassPattern(1, 4)) == (
+        "CClassPatternNode",
+        ("CExpression", "C"),
+        "(",
+    )
     assert shape(with_tokens("case a as b:")._NodeForPattern(1, 4)) == ("CPatternNode", "a", "as", "b")
     with pytest.raises(ParseError):
         with_tokens("case a as b:")._NodeForPattern(1, 4, False)

@@ -4,8 +4,10 @@ from __future__ import annotations
 
 import gc
 import sys
+from typing import ClassVar
 
 import pytest
+
 from lines import expression, line_of, parse, parser, shape
 from quillet import tarvex
 from quillet.tarvex import (
@@ -29,7 +31,7 @@ OPERATORS = {"+": 14, "=": 22, ",": 12}
 
 
 class Symbols:
-    number2symbol = {256: "file_input", 257: "simple_stmt", 258: "expr"}
+    number2symbol: ClassVar[dict[int, str]] = {256: "file_input", 257: "simple_stmt", 258: "expr"}
 
 
 def factory(keywords: object = None, classes: list[type] | None = None) -> CNodeFactory:
@@ -437,7 +439,10 @@ def test_free_lists_are_last_in_first_out() -> None:
     assert info.fFirstFree is None
 
 
-@pytest.mark.parametrize("finish", [FinishedWithNode, NotCompiledFinishedWithNode, lambda node: tarvex.__dict__["__FinishedWithNode"](node, 0)])
+@pytest.mark.parametrize(
+    "finish",
+    [FinishedWithNode, NotCompiledFinishedWithNode, lambda node: tarvex.__dict__["__FinishedWithNode"](node, 0)],
+)
 def test_all_ways_to_give_a_tree_back(finish: object) -> None:
     node = tree(leaf("a"), leaf("b"))
     assert finish(node) is None
@@ -472,7 +477,12 @@ def test_a_deep_tree_is_given_back_down_to_a_depth(capsys: pytest.CaptureFixture
 
 def test_a_raw_tree_is_converted_in_post_order() -> None:
     nodes = factory({"if": None})
-    raw = (258, None, None, [(1, "a", 0, None), (258, None, None, [(1, "if", 1, None), (3, "'s'", 2, None)]), (1, "c", 3, None)])
+    raw = (
+        258,
+        None,
+        None,
+        [(1, "a", 0, None), (258, None, None, [(1, "if", 1, None), (3, "'s'", 2, None)]), (1, "c", 3, None)],
+    )
     node = nodes.RecursiveConvert(raw)
     assert shape(node) == ("CExpression", "a", ("CExpression", "if", "'s'"), "c")
     assert [type(child) for child in node.fChildren] == [CNameLiteral, CExpression, CNameLiteral]

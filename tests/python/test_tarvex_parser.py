@@ -7,6 +7,7 @@ import weakref
 from pathlib import Path
 
 import pytest
+
 from lines import PY2_KEYWORDS, line_of, parse, parser, shape
 from quillet import _fastaccess, config, optpgen
 from quillet.logicalline import CLogicalLine
@@ -46,7 +47,8 @@ def test_an_absolute_grammar_file_is_taken_as_it_stands(tmp_path: Path, monkeypa
 
 
 @pytest.mark.parametrize(
-    ("version", "always"), [((3, 6, 9), False), ((3, 7, 0), True), ((3, 7), True), ((3, 8, 1), True), ((2, 7), False), ((3,), False)]
+    ("version", "always"),
+    [((3, 6, 9), False), ((3, 7, 0), True), ((3, 7), True), ((3, 8, 1), True), ((2, 7), False), ((3,), False)],
 )
 def test_async_is_a_keyword_from_3_7_on(version: tuple[int, ...], always: bool) -> None:
     one = CPGenParserImpl(version)
@@ -244,9 +246,7 @@ def test_nothing_to_feed_gives_none(toks: tuple[str | None, ...]) -> None:
     assert parser().ParseTokenListToNode(list(toks), False) is None
 
 
-@pytest.mark.parametrize(
-    ("text", "context"), [("x = = y", 2), ("x =", 2), ("f(", 2), (") x", 0), ("else x:", 1)]
-)
+@pytest.mark.parametrize(("text", "context"), [("x = = y", 2), ("x =", 2), ("f(", 2), (") x", 0), ("else x:", 1)])
 def test_a_parse_error_has_the_index_of_its_token(text: str, context: int) -> None:
     with pytest.raises(ParseError) as caught:
         parse(text)
@@ -392,14 +392,14 @@ def test_a_subclass_may_override_convert() -> None:
             self.converted: list[tuple[int, str | None]] = []
             super().__init__((3, 8))
 
-        def convert(self, type: int, value: str | None, context: object, children: list[CNode] | None) -> CNode:
-            self.converted.append((type, value))
-            return super().convert(type, value, context, children)
+        def convert(self, number: int, value: str | None, context: object, children: list[CNode] | None) -> CNode:
+            self.converted.append((number, value))
+            return super().convert(number, value, context, children)
 
     mine = Counting()
     node = mine.ParseToNode(line_of("x = y + 1"), False)
     assert shape(node) == shape(parse("x = y + 1"))
-    assert [value for type_, value in mine.converted if value and value.strip()] == ["x", "=", "y", "+", "1"]
+    assert [value for _, value in mine.converted if value and value.strip()] == ["x", "=", "y", "+", "1"]
     mine.DiscardNode(node)
     with pytest.raises(ParseError) as caught:
         mine.ParseToNode(line_of("x = = 1"), False)
@@ -408,10 +408,10 @@ def test_a_subclass_may_override_convert() -> None:
 
 def test_an_error_in_convert_leaves_the_parse() -> None:
     class Failing(CPGenParserImpl):
-        def convert(self, type: int, value: str | None, context: object, children: list[CNode] | None) -> CNode:
+        def convert(self, number: int, value: str | None, context: object, children: list[CNode] | None) -> CNode:
             if value == "y":
                 raise LookupError("no y")
-            return super().convert(type, value, context, children)
+            return super().convert(number, value, context, children)
 
     mine = Failing((3, 8))
     with pytest.raises(LookupError, match="no y"):
@@ -421,7 +421,9 @@ def test_an_error_in_convert_leaves_the_parse() -> None:
 
 def test_every_token_type_has_its_name() -> None:
     numbers = {
-        name.removeprefix("kTokenId_"): value for name, value in vars(_fastaccess).items() if name.startswith("kTokenId_")
+        name.removeprefix("kTokenId_"): value
+        for name, value in vars(_fastaccess).items()
+        if name.startswith("kTokenId_")
     }
     assert numbers["NAME"] == 1
     assert numbers["AWAIT"] == 55

@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import pytest
+
 from lines import expression
 from quillet.tarvex import CNode, CNodeToTextConverter, CNodeToTextConverterImpl, CTrailer
 
@@ -77,7 +78,7 @@ def test_failures() -> None:
     child = CNode()
     child.fText = "{"
     bad.fChildren = [child]
-    with pytest.raises(ValueError, match="^Bad trailer node$"):
+    with pytest.raises(ValueError, match=r"^Bad trailer node$"):
         PLAIN.TextForAtomPlusTrailers(expression("a"), [bad])
     with pytest.raises(AttributeError):
         PLAIN.TextForNode(None)

@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import pytest
+
 from lines import expression, line_of, parse, parser
 from quillet.logicalline import CLogicalLine
 from quillet.symbolinfo import kGetPrefix, kSetPrefix
@@ -53,13 +54,20 @@ def test_a_new_walker() -> None:
     assert walker._fLogical is None
     assert (walker._fLoadNameContext, walker._fStoreWithinSubExpr) == (True, False)
     assert (walker._fLoadedNames, walker._fStoredNames) == ({}, {})
-    assert (walker._fVisitCount, walker._fRecurseCount, walker._fMaxVisits, walker._fMaxRecurseCount) == (0, 0, 10000, 40)
+    assert (walker._fVisitCount, walker._fRecurseCount, walker._fMaxVisits, walker._fMaxRecurseCount) == (
+        0,
+        0,
+        10000,
+        40,
+    )
     assert (walker._fIncludeExprText, walker._fIncludeOperatorExpressions) == (True, True)
     assert walker._fMaxOperatorExpressionLength == 120
     converter = walker._fToText
     assert isinstance(converter, CNodeToTextConverterImpl)
     assert converter is walker._fToText
-    assert (converter._fIncludeBracketText, converter._fIncludeStringContents, converter._fIncludeArgText) == (True,) * 3
+    assert (converter._fIncludeBracketText, converter._fIncludeStringContents, converter._fIncludeArgText) == (
+        True,
+    ) * 3
     with pytest.raises(AttributeError):
         walker._fToText = converter
     walker._fIncludeExprText = False
@@ -89,9 +97,7 @@ def test_a_walk_of_nothing_changes_nothing() -> None:
         (lambda: wide(10001), False, "Maximum number of calls to _VisitNode exceeded"),
     ],
 )
-def test_the_limits_of_a_walk(
-    tree: object, fits: bool, message: str, capsys: pytest.CaptureFixture[str]
-) -> None:
+def test_the_limits_of_a_walk(tree: object, fits: bool, message: str, capsys: pytest.CaptureFixture[str]) -> None:
     walker = CNodeWalker(V3)
     line = CLogicalLine()
     walker.Walk(tree(), line)
@@ -128,7 +134,7 @@ def test_only_one_line_is_walked_at_a_time() -> None:
     class Line(CLogicalLine):
         def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
             assert walker._fLogical is self
-            with pytest.raises(ValueError, match="^Only one logical may be walked at a time$"):
+            with pytest.raises(ValueError, match=r"^Only one logical may be walked at a time$"):
                 walker.Walk(expression("y"), CLogicalLine())
             super().AppendTypeEquiv(name, equiv)
 
