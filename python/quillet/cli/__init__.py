@@ -7,31 +7,14 @@ Exit codes: 0 done, 1 a file could not be read (or, with --strict, has a syntax 
 
 from __future__ import annotations
 
-import re
 import sys
 
 import click
 
-
-class PythonVersion(click.ParamType):  # type: ignore[type-arg,unused-ignore]
-    """A version such as 2.7 or 3.12, as the tuple that the host API takes."""
-
-    name = "X.Y"
-
-    def convert(self, value: object, param: click.Parameter | None, ctx: click.Context | None) -> tuple[int, int]:
-        match = re.fullmatch(r"(2\.7|3\.\d{1,2})(?:\.\d{1,4})?", str(value))
-        if match is None:
-            self.fail(f"{value!r} is not 2.7 or 3.x", param, ctx)
-        major, _, minor = match[1].partition(".")
-        return int(major), int(minor)
+from quillet.cli.index_commands import COMMANDS
+from quillet.cli.options import python_option
 
 
-_python = click.option(
-    "--python",
-    "version",
-    type=PythonVersion(),
-    help="The version of Python that the source is written for; that of the running interpreter without it.",
-)
 _stdin_filename = click.option(
     "--stdin-filename",
     metavar="NAME",
@@ -56,7 +39,7 @@ def main() -> None:
     show_default=True,
     help="text for people, jsonl (a JSON object a line) for programs.",
 )
-@_python
+@python_option
 @click.option("--errors-only", is_flag=True, help="Show syntax errors alone.")
 @click.option("--strict", is_flag=True, help="Exit with 1 where a syntax error was found.")
 @click.option("--no-gitignore", is_flag=True, help="Analyse what .gitignore files exclude, too.")
@@ -92,10 +75,14 @@ def analyze(
 
 @main.command()
 @click.argument("target", metavar="FILE[:LINE]")
-@_python
+@python_option
 @_stdin_filename
 def tree(target: str, version: tuple[int, int] | None, stdin_filename: str) -> None:
     """Shows the parse trees of a file, or of the statement that stands on LINE (from 1)."""
     from quillet.cli.tree import run
 
     sys.exit(run(target, version=version, stdin_filename=stdin_filename))
+
+
+for _command in COMMANDS:
+    main.add_command(_command)

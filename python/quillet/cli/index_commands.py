@@ -1,0 +1,170 @@
+"""The commands around the index: `index`, `find`, `defs`, `outline`, `stats`, `export`, `report`, `completion`.
+
+As in the rest of the command line, what a command needs is imported when it runs.
+"""
+
+from __future__ import annotations
+
+import sys
+from collections.abc import Callable
+
+import click
+
+from quillet.cli.options import python_option
+
+_index_option = click.option(
+    "--index",
+    metavar="FILE",
+    type=click.Path(),
+    help="The index to ask; without it .quillet-index of this folder or the nearest one above.",
+)
+
+
+@click.command()
+@click.argument("paths", nargs=-1, metavar="[PATH]...", type=click.Path())
+@click.option("-o", "--output", metavar="FILE", type=click.Path(), help="The index; .quillet-index without it.")
+@click.option(
+    "--format",
+    "form",
+    type=click.Choice(["sqlite", "parquet"]),
+    default="sqlite",
+    show_default=True,
+    help="sqlite to ask and to update, parquet (needs pyarrow) for data tools.",
+)
+@python_option
+@click.option("-j", "--jobs", type=click.IntRange(1), metavar="N", help="Threads; without it one a core.")
+@click.option("--no-gitignore/--gitignore", default=None, help="Index what .gitignore files exclude, too.")
+@click.option("--watch", is_flag=True, help="Go on, and update the index when a file changes.")
+@click.option("-q", "--quiet", is_flag=True, help="Say nothing of what was done.")
+def index(
+    paths: tuple[str, ...],
+    output: str | None,
+    form: str,
+    version: tuple[int, int] | None,
+    jobs: int | None,
+    no_gitignore: bool | None,
+    watch: bool,
+    quiet: bool,
+) -> None:
+    """Makes or updates the index of files and folders.
+
+    Files that did not change are not analysed again, files that are gone leave the index. Without PATH
+    everything that was indexed before is brought up to date.
+
+    \b
+        quillet index .
+        quillet index src tests -o code.index
+        quillet index . --watch
+    """
+    from quillet.cli.index import run
+    from quillet.index.update import Settings
+
+    gitignore = None if no_gitignore is None else not no_gitignore
+    settings = Settings(paths=paths, version=version, jobs=jobs, gitignore=gitignore)
+    sys.exit(run(settings, output=output, form=form, watch=watch, quiet=quiet))
+
+
+_ROLES = {
+    "set": "Where it is set (parameters: --param).",
+    "get": "Where it is read.",
+    "call": "Where it is called, with arguments by position alone.",
+    "import": "Where it is imported.",
+    "param": "Where it is a parameter.",
+    "hint": "Where it has a type hint.",
+}
+
+
+def _role_options(command: Callable[..., None]) -> Callable[..., None]:
+    for role, text in reversed(_ROLES.items()):
+        command = click.option(f"--{role}", f"role_{role}", is_flag=True, help=text)(command)
+    return command
+
+
+@click.command()
+@click.argument("name")
+@_role_options
+@click.option("--return", "returns", is_flag=True, help="What the functions of this name return and yield.")
+@click.option("--scope", metavar="SCOPE", help="Only in this class or function, such as Shop or Shop.add.")
+@click.option(
+    "--match",
+    type=click.Choice(["exact", "suffix", "glob"]),
+    help="How NAME is meant; without it by its form.",
+)
+@click.option("--json", "as_json", is_flag=True, help="A JSON object a record.")
+@click.option("-l", "--long", is_flag=True, help="Below each place what is said of the name there.")
+@_index_option
+def find(
+    name: str,
+    returns: bool,
+    scope: str | None,
+    match: str | None,
+    as_json: bool,
+    long: bool,
+    index: str | None,
+    **role_options: bool,
+) -> None:
+    """Finds the places that say something of NAME, as path:line:column and the source line.
+
+    NAME is a name or a dotted name as it stands in the source, .attr for anything that ends in it, or a
+    pattern with * and ?. Exit codes are those of grep: 0 found, 1 nothing found, 2 an error.
+
+    \b
+        quillet find os.path.join --call
+        quillet find .total --set
+        quillet find 'test_*' --set --scope TestShop
+        quillet find Shop.price --return --long
+    """
+    from quillet.cli.find import run
+    from quillet.index.questions import Query, match_of
+
+    if not name.strip("."):
+        raise click.UsageError("NAME is empty")
+    roles = tuple(role for role in _ROLES if role_options[f"role_{role}"])
+    query = Query(name, match or match_of(name), roles, returns, scope)
+    sys.exit(run(query, index=index, as_json=as_json, long=long))
+
+
+@click.command()
+@click.argument("file", type=click.Path())
+@click.option("--json", "as_json", is_flag=True, help="A JSON object a record.")
+@_index_option
+def defs(file: str, as_json: bool, index: str | None) -> None:
+    """Lists what FILE defines: classes, functions, and what its module and classes set.
+
+    \b
+        quillet defs src/shop.py
+    """
+    from quillet.cli.defs import run
+
+    sys.exit(run(file, index=index, as_json=as_json))
+
+
+@click.command()
+@click.argument("file", type=click.Path())
+@_index_option
+def outline(file: str, index: str | None) -> None:
+    """Shows the classes and functions of FILE as a tree, with parameters and hints.
+
+    \b
+        quillet outline src/shop.py
+    """
+    from quillet.cli.outline import run
+
+    sys.exit(run(file, index=index))
+
+
+@click.command()
+@click.option("--json", "as_json", is_flag=True, help="One JSON object.")
+@_index_option
+def stats(as_json: bool, index: str | None) -> None:
+    """Says what the index holds: files, lines, records by kind, the names most used.
+
+    \b
+        quillet stats
+    """
+    from quillet.cli.stats import run
+
+    sys.exit(run(index=index, as_json=as_json))
+
+
+COMMANDS = (index, find, defs, outline, stats)

@@ -1,0 +1,28 @@
+"""Options that several commands have."""
+
+from __future__ import annotations
+
+import re
+
+import click
+
+
+class PythonVersion(click.ParamType):  # type: ignore[type-arg,unused-ignore]
+    """A version such as 2.7 or 3.12, as the tuple that the host API takes."""
+
+    name = "X.Y"
+
+    def convert(self, value: object, param: click.Parameter | None, ctx: click.Context | None) -> tuple[int, int]:
+        match = re.fullmatch(r"(2\.7|3\.\d{1,2})(?:\.\d{1,4})?", str(value))
+        if match is None:
+            self.fail(f"{value!r} is not 2.7 or 3.x", param, ctx)
+        major, _, minor = match[1].partition(".")
+        return int(major), int(minor)
+
+
+python_option = click.option(
+    "--python",
+    "version",
+    type=PythonVersion(),
+    help="The version of Python that the source is written for; that of the running interpreter without it.",
+)

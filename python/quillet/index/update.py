@@ -1,0 +1,376 @@
+"""Brings an index up to date with the files on disk.
+
+A file whose size and time of change are as they were is not opened; one whose content has the hash that
+it had is not analysed. Files below the folders of the run that are gone leave the index. The trap: a file
+may be written again within the clock's grain, so a time that is too young to trust is not kept, and the
+hash is taken before the analysis, so that a change between the two is seen by the next run.
+"""
+
+from __future__ import annotations
+
+import json
+import os
+import sqlite3
+import sys
+import time
+from collections.abc import Callable, Iterator
+from contextlib import contextmanager
+from hashlib import blake2b
+from typing import NamedTuple
+
+from quillet.cli.files import find_files, problem_of
+from quillet.index.facts import FileFacts, facts_of_files
+from quillet.index.paths import full_path, is_below, stored_path
+from quillet.index.store import (
+    FILE_SHIFT,
+    KIND_NUMBER,
+    MAX_RECORDS,
+    RECORDS_BY_NAME,
+    IndexProblem,
+    explained,
+    open_to_write,
+    tail_of,
+    write_lock,
+)
+
+# A change within this time of the last one could leave size and time as they are.
+_GRAIN_NS = 2_000_000_000
+_UNTRUSTED = -1
+# A transaction takes about this much source: what an end at the worst moment loses.
+_BATCH_BYTES = 4 << 20
+_BATCH_FILES = 512
+
+
+class Settings(NamedTuple):
+    """What a run is asked to do. Without paths it brings up to date what earlier runs named."""
+
+    paths: tuple[str, ...]
+    version: tuple[int, int] | None
+    jobs: int | None
+    gitignore: bool | None
+
+
+class Outcome(NamedTuple):
+    """What a run did."""
+
+    files: int
+    analysed: int
+    removed: int
+    unread: int
+    records: int
+
+
+class Reports(NamedTuple):
+    """What a run calls while it goes on: with a file and the reason why it was not read, and when it waits."""
+
+    unread: Callable[[str, str], None]
+    waiting: Callable[[], None]
+
+
+class _Known(NamedTuple):
+    id: int
+    size: int
+    mtime_ns: int
+    hash: bytes | None
+    made_by: str
+    problem: str | None
+
+
+class _Candidate(NamedTuple):
+    path: str
+    stored: bytes
+    size: int
+    mtime_ns: int
+
+
+def update(index: str, settings: Settings, reports: Reports) -> Outcome:
+    """Brings the index up to date and returns what was done. Raises `IndexProblem`."""
+    index = os.path.abspath(index)
+    folder = os.path.dirname(index)
+    if not os.path.isdir(folder):
+        raise IndexProblem(f"{index}: there is no folder {folder} to hold the index")
+    with write_lock(index, reports.waiting), explained(index):
+        connection = open_to_write(index)
+        try:
+            return _Run(connection, folder, settings, reports).run()
+        finally:
+            connection.close()
+
+
+def _engine() -> str:
+    """The version of the engine, whose change makes all that was found before worth finding again."""
+    from importlib.metadata import PackageNotFoundError, version
+
+    try:
+        return version("quillet")
+    except PackageNotFoundError:  # run from a build folder
+        return "0"
+
+
+class _Run:
+    def __init__(self, connection: sqlite3.Connection, base: str, settings: Settings, reports: Reports) -> None:
+        self._connection = connection
+        self._base = base
+        self._reports = reports
+        self._jobs = settings.jobs
+        self._unread = 0
+        self._analysed = 0
+        self._removed = 0
+        self._replaced = 0
+
+        remembered = dict(connection.execute("SELECT key, value FROM meta"))
+        roots: list[str] = [os.path.join(base, root) for root in json.loads(remembered.get("roots", "[]"))]
+        if not settings.paths and not roots:
+            raise IndexProblem("nothing was indexed yet; name what to index: quillet index PATH...")
+        self._paths = settings.paths or tuple(roots)
+        gitignore = settings.gitignore
+        self._gitignore = bool(remembered.get("gitignore", 1)) if gitignore is None else gitignore
+        version = settings.version
+        if version is None and "python" in remembered:
+            major, _, minor = str(remembered["python"]).partition(".")
+            version = int(major), int(minor)
+        self._version = version or sys.version_info[:2]
+        python = "{}.{}".format(*self._version)
+        self._made_by = f"quillet {_engine()}, python {python}"
+        named = [os.path.abspath(path) for path in settings.paths]
+        roots = [root for root in dict.fromkeys([*roots, *named]) if os.path.exists(root)]
+        relative = [os.fsdecode(stored_path(root, base)) for root in roots]
+        values = {"roots": json.dumps(relative), "python": python, "gitignore": int(self._gitignore)}
+        if any(remembered.get(key) != value for key, value in values.items()):
+            connection.executemany("INSERT OR REPLACE INTO meta VALUES (?, ?)", values.items())
+
+    def run(self) -> Outcome:
+        connection = self._connection
+        rows = connection.execute("SELECT path, id, size, mtime_ns, hash, made_by, problem FROM files")
+        self._known = {row[0]: _Known(*row[1:]) for row in rows}
+        self._next_id = max((known.id for known in self._known.values()), default=0) + 1
+        empty = connection.execute("SELECT max(id) FROM names").fetchone()[0] == 0
+        self._names = _Texts(connection, "names", "name", empty=empty)
+        self._details = _Texts(connection, "details", "detail", empty=empty)
+        seen: set[bytes] = set()
+        for batch in self._batches(seen):
+            self._take(batch)
+        self._remove_what_is_gone(seen)
+        self._prune()
+        # The first run makes it last, when the records can be sorted at once.
+        connection.execute(RECORDS_BY_NAME)
+        files, records = connection.execute("SELECT count(*), coalesce(sum(records), 0) FROM files").fetchone()
+        return Outcome(files, self._analysed, self._removed, self._unread, records)
+
+    def _report(self, path: str, problem: str) -> None:
+        self._unread += 1
+        self._reports.unread(path, problem)
+
+    def _batches(self, seen: set[bytes]) -> Iterator[list[_Candidate]]:
+        """The files that may have changed, in batches; all files that are there are added to `seen`."""
+        batch: list[_Candidate] = []
+        size = 0
+        for candidate in self._candidates(seen):
+            batch.append(candidate)
+            size += candidate.size
+            if size >= _BATCH_BYTES or len(batch) >= _BATCH_FILES:
+                yield batch
+                batch, size = [], 0
+        if batch:
+            yield batch
+
+    def _candidates(self, seen: set[bytes]) -> Iterator[_Candidate]:
+        for item in find_files(self._paths, gitignore=self._gitignore):
+            if item.problem is not None:
+                self._report(item.path, item.problem)
+                continue
+            try:
+                status = os.stat(item.path)
+            except OSError as error:
+                self._report(item.path, problem_of(error))
+                continue
+            except ValueError as error:  # a NUL in the name
+                self._report(item.path, str(error))
+                continue
+            stored = stored_path(item.path, self._base)
+            if stored in seen:
+                continue
+            seen.add(stored)
+            known = self._known.get(stored)
+            if (
+                known is not None
+                and known.made_by == self._made_by
+                and known.size == status.st_size
+                and known.mtime_ns == status.st_mtime_ns
+            ):
+                if known.problem is not None:
+                    self._report(item.path, known.problem)
+                continue
+            trusted = time.time_ns() - status.st_mtime_ns > _GRAIN_NS
+            yield _Candidate(item.path, stored, status.st_size, status.st_mtime_ns if trusted else _UNTRUSTED)
+
+    def _take(self, batch: list[_Candidate]) -> None:
+        """Brings the index up to date with a batch of files, in one transaction."""
+        changed: list[tuple[_Candidate, bytes]] = []
+        touched: list[tuple[int, int, int]] = []
+        gone: list[int] = []
+        for candidate in batch:
+            known = self._known.get(candidate.stored)
+            try:
+                with open(candidate.path, "rb") as file:
+                    digest = blake2b(file.read(), digest_size=16).digest()
+            except OSError as error:
+                self._report(candidate.path, problem_of(error))
+                if known is not None:
+                    gone.append(known.id)
+                continue
+            if known is None or known.hash != digest or known.made_by != self._made_by:
+                changed.append((candidate, digest))
+                continue
+            if known.problem is not None:
+                self._report(candidate.path, known.problem)
+            if (known.size, known.mtime_ns) != (candidate.size, candidate.mtime_ns):
+                touched.append((candidate.size, candidate.mtime_ns, known.id))
+        if not (changed or touched or gone):
+            return
+        facts = facts_of_files([candidate.path for candidate, _ in changed], self._version, self._jobs)
+        with self._transaction() as connection:
+            connection.executemany("UPDATE files SET size = ?, mtime_ns = ? WHERE id = ?", touched)
+            self._remove(gone)
+            for (candidate, digest), found in zip(changed, facts, strict=True):
+                self._write(candidate, digest, found)
+
+    def _write(self, candidate: _Candidate, digest: bytes, found: FileFacts) -> None:
+        connection = self._connection
+        known = self._known.get(candidate.stored)
+        if known is None:
+            number = self._next_id
+            self._next_id += 1
+        else:
+            number = known.id
+            self._delete_rows(number)
+        problem = found.problem
+        if len(found.facts) >= MAX_RECORDS or len(found.errors) >= MAX_RECORDS:
+            problem = "the file is too large for the index"
+        facts = found.facts if problem is None else ()
+        if problem is not None:
+            self._report(candidate.path, problem)
+        connection.execute(
+            "INSERT INTO files VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?)",
+            (
+                number,
+                candidate.stored,
+                candidate.size,
+                candidate.mtime_ns,
+                digest,
+                self._made_by,
+                found.lines,
+                len(facts),
+                problem,
+            ),
+        )
+        self._analysed += 1
+        first = number << FILE_SHIFT
+        name_id = self._names.id_of
+        detail_id = self._details.id_of
+        kinds = KIND_NUMBER
+        rows = [
+            (number, name_id(name), name_id(scope), line, column, kinds[kind], parameter, opens, detail_id(detail))
+            for number, (line, column, scope, name, kind, detail, parameter, opens) in enumerate(facts, first)
+        ]
+        self._names.write_new()
+        self._details.write_new()
+        connection.executemany("INSERT INTO records VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?)", rows)
+        if problem is None:
+            errors = [(number, *error) for number, error in enumerate(found.errors, first)]
+            connection.executemany("INSERT INTO errors VALUES (?, ?, ?, ?)", errors)
+
+    def _remove_what_is_gone(self, seen: set[bytes]) -> None:
+        roots = [os.path.abspath(path) for path in self._paths]
+        gone = []
+        for stored, known in self._known.items():
+            if stored not in seen:
+                path = full_path(stored, self._base)
+                if any(is_below(path, root) for root in roots):
+                    gone.append(known.id)
+        if gone:
+            with self._transaction():
+                self._remove(gone)
+
+    def _remove(self, numbers: list[int]) -> None:
+        for number in numbers:
+            self._delete_rows(number)
+        self._removed += len(numbers)
+
+    def _delete_rows(self, number: int) -> None:
+        connection = self._connection
+        ends = (number << FILE_SHIFT, (number + 1) << FILE_SHIFT)
+        connection.execute("DELETE FROM records WHERE id >= ? AND id < ?", ends)
+        connection.execute("DELETE FROM errors WHERE id >= ? AND id < ?", ends)
+        connection.execute("DELETE FROM files WHERE id = ?", (number,))
+        self._replaced += 1
+
+    def _prune(self) -> None:
+        """Drops the texts that no record has any more, once as many files were replaced as there are."""
+        connection = self._connection
+        if self._replaced == 0:
+            return
+        with self._transaction():
+            row = connection.execute("SELECT value FROM meta WHERE key = 'replaced'").fetchone()
+            replaced = (row[0] if row else 0) + self._replaced
+            if replaced > connection.execute("SELECT count(*) FROM files").fetchone()[0]:
+                connection.execute(
+                    "DELETE FROM names WHERE id <> 0 AND id NOT IN"
+                    " (SELECT name FROM records UNION SELECT scope FROM records)"
+                )
+                connection.execute(
+                    "DELETE FROM details WHERE id <> 0 AND id NOT IN (SELECT detail FROM records)"
+                )
+                replaced = 0
+            connection.execute("INSERT OR REPLACE INTO meta VALUES ('replaced', ?)", (replaced,))
+
+    @contextmanager
+    def _transaction(self) -> Iterator[sqlite3.Connection]:
+        self._connection.execute("BEGIN IMMEDIATE")
+        try:
+            yield self._connection
+        except BaseException:
+            self._connection.execute("ROLLBACK")
+            raise
+        self._connection.execute("COMMIT")
+
+
+class _Texts:
+    """The numbers of the texts of one table. New ones are kept until `write_new`.
+
+    An index that was empty holds no text that this run did not write, so nothing need be looked up in it.
+    """
+
+    def __init__(self, connection: sqlite3.Connection, table: str, column: str, *, empty: bool) -> None:
+        self._connection = connection
+        self._select = f"SELECT id FROM {table} WHERE {column} = ?"
+        self._insert = f"INSERT INTO {table} VALUES (?, ?, ?)" if table == "names" else f"INSERT INTO {table} VALUES (?, ?)"
+        self._with_tail = table == "names"
+        self._empty = empty
+        self._ids: dict[str, int] = {"": 0}
+        self._new: list[str] = []
+        self._next = connection.execute(f"SELECT max(id) FROM {table}").fetchone()[0] + 1
+
+    def id_of(self, text: str) -> int:
+        number = self._ids.get(text)
+        if number is None:
+            number = self._ids[text] = self._find_or_add(text)
+        return number
+
+    def _find_or_add(self, text: str) -> int:
+        if not self._empty:
+            row: tuple[int] | None = self._connection.execute(self._select, (text,)).fetchone()
+            if row is not None:
+                return row[0]
+        self._new.append(text)
+        self._next += 1
+        return self._next - 1
+
+    def write_new(self) -> None:
+        """Writes the texts that are new since the last call."""
+        numbered = enumerate(self._new, self._next - len(self._new))
+        if self._with_tail:
+            self._connection.executemany(self._insert, [(number, text, tail_of(text)) for number, text in numbered])
+        else:
+            self._connection.executemany(self._insert, numbered)
+        self._new = []
