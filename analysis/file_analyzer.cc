@@ -1,6 +1,8 @@
 // The loop over the lines of a source. Everything that costs is below: cutting, parsing, walking.
 #include "analysis/file_analyzer.h"
 
+#include <algorithm>
+
 #include "siblings/logicalline/future_imports.h"
 
 namespace quillet {
@@ -36,6 +38,7 @@ void FileAnalyzer::Analyze(Text bytes) {
     const LinePlace place = scopes_.Next(row);
     result.in_async_def = place.in_async_def;
     result.first_in_def = place.first_in_def;
+    result.depth = place.depth;
     result.record_begin = static_cast<uint32_t>(store_.rows.size());
     result.arg_record_begin = static_cast<uint32_t>(store_.arg_rows.size());
     if (row.token_count != 0) {
@@ -51,6 +54,19 @@ void FileAnalyzer::Analyze(Text bytes) {
     result.arg_record_end = static_cast<uint32_t>(store_.arg_rows.size());
     results_.push_back(result);
   }
+}
+
+Position FileAnalyzer::ErrorPosition(size_t row) const {
+  // An error's own line and offset count from 1, from the first line of its statement.
+  const SyntaxError& error = errors_[static_cast<size_t>(results_[row].error)];
+  const int64_t line = static_cast<int64_t>(rows_[row].first_line) + std::max<int64_t>(error.lineno, 1) - 1;
+  return {static_cast<int32_t>(line), static_cast<int32_t>(std::max<int64_t>(error.offset, 1) - 1)};
+}
+
+size_t FileAnalyzer::LineCount() const {
+  const std::vector<uint32_t>& starts = source_->line_starts;
+  // A line end at the end of the source begins no line.
+  return starts.size() - (!starts.empty() && starts.back() == source_->size() ? 1 : 0);
 }
 
 }  // namespace quillet

@@ -22,6 +22,7 @@ class FileAnalyzer {
     uint32_t record_begin = 0, record_end = 0;          // in store().rows
     uint32_t arg_record_begin = 0, arg_record_end = 0;  // in store().arg_rows
     int32_t error = -1;                                 // index in errors(), -1 without one
+    uint32_t depth = 0;                                 // of the definitions around it
     bool in_async_def = false;
     bool first_in_def = false;
   };
@@ -42,6 +43,10 @@ class FileAnalyzer {
   std::span<const LineResult> results() const { return results_; }
   const RecordStore& store() const { return store_; }
   const std::vector<SyntaxError>& errors() const { return errors_; }
+  // Where the error of a row lies in the source; the row must have one.
+  Position ErrorPosition(size_t row) const;
+  // The number of physical lines.
+  size_t LineCount() const;
 
  private:
   // The analyzer that reads the source as it asks to be read.

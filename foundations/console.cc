@@ -3,6 +3,7 @@
 
 #include <cstdio>
 #include <new>
+#include <utility>
 
 #include "foundations/errors.h"
 
@@ -33,11 +34,16 @@ std::string DescribeWithoutHost(const std::exception_ptr& exception) {
   }
 }
 
+thread_local Console* thread_console = nullptr;
+
 }  // namespace
 
 Console& TheConsole() {
   static Console console{PrintToStdout, ReportToStderr, DescribeWithoutHost};
-  return console;
+  return thread_console != nullptr ? *thread_console : console;
 }
+
+ThreadConsole::ThreadConsole(Console* console) : before_(std::exchange(thread_console, console)) {}
+ThreadConsole::~ThreadConsole() { thread_console = before_; }
 
 }  // namespace quillet

@@ -22,7 +22,20 @@ struct Console {
   std::string (*describe_exception)(const std::exception_ptr& exception);
 };
 
+// The console of the calling thread where it has one of its own, and of the process otherwise.
 Console& TheConsole();
+
+// Makes `console` that of the calling thread while this lives.
+class ThreadConsole {
+ public:
+  explicit ThreadConsole(Console* console);
+  ~ThreadConsole();
+  ThreadConsole(const ThreadConsole&) = delete;
+  ThreadConsole& operator=(const ThreadConsole&) = delete;
+
+ private:
+  Console* before_;
+};
 
 inline void PrintLine(Text line) { TheConsole().print_line(line); }
 

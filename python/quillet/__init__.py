@@ -1,6 +1,6 @@
 """Per-statement analysis of Python code: what each statement tells about names.
 
-`analyze` takes a whole source. `quillet.tarvex` is the engine below it, which takes one logical line at
+`analyze` takes a whole source, `analyze_files` many files on all cores. `quillet.tarvex` is the engine below it, which takes one logical line at
 a time; `quillet.logicalline`, `quillet.optpgen`, `quillet.symbolinfo` and `quillet.strutils` are what it
 works with.
 """
@@ -10,22 +10,37 @@ from __future__ import annotations
 from typing import TYPE_CHECKING
 
 if TYPE_CHECKING:
+    from quillet._batch import FileAnalyses, FileAnalysis, FileRecord, FileRecords, analyze_files
     from quillet._records import Record, RecordKind
     from quillet._source import SourceEncodingError
     from quillet.host import Analysis, Line, analyze, analyzer_for, language_version
 
 __all__ = [
     "Analysis",
+    "FileAnalyses",
+    "FileAnalysis",
+    "FileRecord",
+    "FileRecords",
     "Line",
     "Record",
     "RecordKind",
     "SourceEncodingError",
     "analyze",
+    "analyze_files",
     "analyzer_for",
     "language_version",
 ]
 
-_HOMES = {"Record": "_records", "RecordKind": "_records", "SourceEncodingError": "_source"}
+_HOMES = {
+    "FileAnalyses": "_batch",
+    "FileAnalysis": "_batch",
+    "FileRecord": "_batch",
+    "FileRecords": "_batch",
+    "Record": "_records",
+    "RecordKind": "_records",
+    "SourceEncodingError": "_source",
+    "analyze_files": "_batch",
+}
 
 
 def __getattr__(name: str) -> object:

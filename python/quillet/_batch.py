@@ -1,19 +1,230 @@
-"""The native path for a version: sources in memory to records in their arenas, no object a line."""
+"""Many files at once: paths in, records out, on all cores and without the interpreter lock.
+
+The core reads the files, analyses each on a thread of its own and keeps what it found as columns. A
+result becomes Python objects when it is asked for its records, and those that it is asked for. Sources
+that name an encoding other than UTF-8 are decoded by `_source`, under the lock.
+"""
 
 from __future__ import annotations
 
+import os
+from collections.abc import Iterable, Iterator, Sequence
+from types import TracebackType
+from typing import NamedTuple, Union, overload
+
 from quillet._keywords import keywords_of
+from quillet._records import RecordKind
+from quillet._source import SourceEncodingError, to_utf8
 from quillet.config import GetNorvaFilename
 from quillet.host import PY2_PRINT_FUNCTION_GRAMMAR, language_version
 from quillet.tarvex import _host, kPy2DefaultGrammar, kPy3DefaultGrammar
 
+StrPath = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
 
-def native_batch(version: tuple[int, ...] | None = None) -> _host.NativeBatch:
-    """A native batch with the grammar and the keywords of a version; None is the running interpreter's."""
+# What the core knows as kinds, in its order.
+_KINDS = tuple(RecordKind(word) for word in _host.RECORD_KIND_WORDS)
+# How many records become objects at a time where all are iterated over.
+_CHUNK = 4096
+
+
+class FileRecord(NamedTuple):
+    """One fact about one name, with its place and its scope.
+
+    `line` and `column` are where the name stands, from 1, the column in UTF-8 bytes; a name that the
+    source does not spell in one piece, or that stands for a keyword ("return", "yield", "*"), has the
+    place of its statement. `scope` is dotted, such as "Shop.total", and empty for the module. The
+    others are those of `Record`, except that a signature comment on the first line of a function's body
+    gives facts about that function's parameters, by their names and with `is_parameter` true.
+    """
+
+    line: int
+    column: int
+    scope: str
+    name: str
+    kind: RecordKind
+    detail: str
+    is_parameter: bool
+
+
+class FileRecords(Sequence[FileRecord]):
+    """The records of a file, in the order in which they were found. Made when they are asked for."""
+
+    def __init__(self, native: _host.FileResult) -> None:
+        self._native = native
+
+    def __len__(self) -> int:
+        return self._native.record_count
+
+    @overload
+    def __getitem__(self, index: int) -> FileRecord: ...
+
+    @overload
+    def __getitem__(self, index: slice) -> Sequence[FileRecord]: ...
+
+    def __getitem__(self, index: int | slice) -> FileRecord | Sequence[FileRecord]:
+        places = range(len(self))[index]
+        if isinstance(places, int):
+            return self._native.Rows(places, places + 1, FileRecord, _KINDS)[0]
+        if places.step == 1:
+            return self._native.Rows(places.start, places.stop, FileRecord, _KINDS)
+        return [self[place] for place in places]
+
+    def __iter__(self) -> Iterator[FileRecord]:
+        for start in range(0, len(self), _CHUNK):
+            yield from self._native.Rows(start, start + _CHUNK, FileRecord, _KINDS)
+
+    def plain(self) -> list[tuple[int, int, str, str, str, str, bool]]:
+        """All records as plain tuples, with the kind as a plain str: for a database."""
+        return self._native.Rows(0, len(self), tuple, _host.RECORD_KIND_WORDS)
+
+
+class FileAnalysis:
+    """What `analyze_files` found in one file.
+
+    `path` is the name that was given. `problem` says why the file could not be analysed, and is None
+    where it was; then `lines` counts its physical lines and `statements` its logical lines that are
+    neither blank nor a comment. `errors` are its syntax errors as (line, column, message), lines and
+    columns from 1, columns in UTF-8 bytes. `reports` are statements that the analysis gave up for a
+    reason other than their syntax, in the same form.
+    """
+
+    __slots__ = ("_native", "path")
+
+    def __init__(self, path: str, native: _host.FileResult) -> None:
+        self.path = path
+        self._native = native
+
+    @property
+    def problem(self) -> str | None:
+        return self._native.problem
+
+    @property
+    def size(self) -> int:
+        """The size of the file in bytes."""
+        return self._native.byte_count
+
+    @property
+    def lines(self) -> int:
+        return self._native.line_count
+
+    @property
+    def statements(self) -> int:
+        return self._native.statement_count
+
+    @property
+    def errors(self) -> list[tuple[int, int, str]]:
+        return self._native.errors
+
+    @property
+    def reports(self) -> list[tuple[int, int, str]]:
+        return self._native.reports
+
+    @property
+    def records(self) -> FileRecords:
+        return FileRecords(self._native)
+
+    def __repr__(self) -> str:
+        what = self.problem or f"{self.lines} lines, {len(self.records)} records"
+        return f"<FileAnalysis {self.path!r}: {what}>"
+
+
+class FileAnalyses(Iterator[FileAnalysis]):
+    """The results of `analyze_files`, one a file, in the order of the paths. They are handed out once.
+
+    Threads run while results are asked for, and a little ahead. `close`, or the end of a `with` block,
+    stops them; so does dropping the object.
+    """
+
+    def __init__(self, paths: list[str], native: _host.Batch) -> None:
+        self._paths = paths
+        self._native = native
+
+    def __next__(self) -> FileAnalysis:
+        result = self._native.Next()
+        if result is None:
+            raise StopIteration
+        return FileAnalysis(self._paths[result.index], result)
+
+    def close(self) -> None:
+        """Stops after the files under way. There are no results after it."""
+        self._native.Cancel()
+
+    def __enter__(self) -> FileAnalyses:
+        return self
+
+    def __exit__(
+        self, exc_type: type[BaseException] | None, exc: BaseException | None, traceback: TracebackType | None
+    ) -> None:
+        self.close()
+
+
+def analyze_files(
+    paths: Iterable[StrPath | tuple[StrPath, bytes]],
+    *,
+    version: tuple[int, ...] | None = None,
+    jobs: int | None = None,
+) -> FileAnalyses:
+    """Analyses files, on `jobs` threads (one a core without it), and yields a result a file in order.
+
+    A path may be given with its source, as a tuple (path, bytes): then nothing is read. `version` is the
+    Python that the files are written for, as for `analyze`.
+
+    No file ends the run: one that cannot be read, or whose encoding is unknown, is a result with a
+    `problem`. Raises `TypeError` and `ValueError` for wrong arguments.
+
+    >>> [result] = analyze_files([("shop.py", b"class Shop:\\n    def total(self): pass\\n")])
+    >>> for record in result.records:
+    ...     print((record.line, record.column, record.scope, record.name, record.kind.value))
+    (1, 7, '', 'Shop', 'set')
+    (2, 9, 'Shop', 'total', 'set')
+    (2, 15, 'Shop.total', 'self', 'set')
+    """
+    native_language = native_language_of(version)
+    count = jobs_of(jobs)
+    names: list[str] = []
+    inputs: list[tuple[bytes, bytes | None, bytes | None]] = []
+    for item in paths:
+        path, source = item if isinstance(item, tuple) else (item, None)
+        name = os.fsencode(path)
+        if source is not None and not isinstance(source, bytes):
+            raise TypeError(f"a source must be bytes, not {type(source).__name__}")
+        names.append(os.fsdecode(path))
+        inputs.append((name, source, None))
+    return FileAnalyses(names, _host.Batch(native_language, inputs, count, decode_source))
+
+
+def jobs_of(jobs: int | None) -> int:
+    """The number of threads for an argument; one a core for None."""
+    if jobs is None:
+        return available_cores()
+    if not isinstance(jobs, int) or isinstance(jobs, bool):
+        raise TypeError(f"jobs must be a number, not {jobs!r}")
+    if not 1 <= jobs <= 1024:
+        raise ValueError(f"jobs must be from 1 to 1024, not {jobs}")
+    return jobs
+
+
+def available_cores() -> int:
+    """The cores that this process may use, which may be fewer than the machine has."""
+    if hasattr(os, "sched_getaffinity"):
+        return len(os.sched_getaffinity(0))
+    return os.cpu_count() or 1
+
+
+def decode_source(source: bytes) -> tuple[bytes | None, str | None]:
+    """The UTF-8 of a source that names its encoding, or why there is none."""
+    try:
+        return to_utf8(source), None
+    except SourceEncodingError as error:
+        return None, str(error)
+
+
+def native_language_of(version: tuple[int, ...] | None = None) -> _host.Language:
+    """What native analyzers of a version are built from; None is the running interpreter's."""
     language = language_version(version)
     python_3 = language >= (3, 0)
     grammar = kPy3DefaultGrammar if python_3 else kPy2DefaultGrammar
-    return _host.NativeBatch(
+    return _host.Language(
         (*language, 0),
         grammar_file=_grammar_path(grammar),
         hint_grammar_file=_grammar_path(kPy3DefaultGrammar),
@@ -21,6 +232,11 @@ def native_batch(version: tuple[int, ...] | None = None) -> _host.NativeBatch:
         py3_grammar=python_3,
         print_function_grammar_file="" if python_3 else _grammar_path(PY2_PRINT_FUNCTION_GRAMMAR),
     )
+
+
+def native_batch(version: tuple[int, ...] | None = None) -> _host.NativeBatch:
+    """Sources in memory through the native path, for measuring: counts and no objects."""
+    return _host.NativeBatch(native_language_of(version))
 
 
 def _grammar_path(grammar_file: str) -> str:

@@ -1,4 +1,4 @@
-from collections.abc import Iterable, Iterator
+from collections.abc import Callable, Iterable, Iterator
 from typing import Any, ClassVar, Final, Protocol
 
 from quillet.logicalline import CLogicalLine
@@ -650,7 +650,9 @@ class _host:  # a module at run time
         def __getitem__(self, index: int, /) -> tuple[CLogicalLine, int, int, int, bool, bool]: ...
         def __iter__(self) -> Iterator[tuple[CLogicalLine, int, int, int, bool, bool]]: ...
 
-    class NativeBatch:
+    RECORD_KIND_WORDS: tuple[str, ...]
+
+    class Language:
         def __init__(
             self,
             version_triple: _Version,
@@ -658,9 +660,42 @@ class _host:  # a module at run time
             hint_grammar_file: str,
             keyword_seq: list[str],
             py3_grammar: bool,
-            print_function_grammar_file: str = ...,
+            print_function_grammar_file: str,
         ) -> None: ...
+
+    class NativeBatch:
+        def __init__(self, language: _host.Language) -> None: ...
         def Analyze(self, sources: Iterable[bytes]) -> tuple[int, int]: ...
+
+    class FileResult:
+        @property
+        def index(self) -> int: ...
+        @property
+        def problem(self) -> str | None: ...
+        @property
+        def byte_count(self) -> int: ...
+        @property
+        def line_count(self) -> int: ...
+        @property
+        def statement_count(self) -> int: ...
+        @property
+        def errors(self) -> list[tuple[int, int, str]]: ...
+        @property
+        def reports(self) -> list[tuple[int, int, str]]: ...
+        @property
+        def record_count(self) -> int: ...
+        def Rows(self, begin: int, end: int, row_class: type, kinds: tuple[object, ...]) -> list[Any]: ...
+
+    class Batch:
+        def __init__(
+            self,
+            language: _host.Language,
+            inputs: Iterable[tuple[bytes, bytes | None, bytes | None]],
+            jobs: int,
+            decode: Callable[[bytes], tuple[bytes | None, str | None]],
+        ) -> None: ...
+        def Next(self) -> _host.FileResult | None: ...
+        def Cancel(self) -> None: ...
 
 class _LineTexts:
     @staticmethod

@@ -1,11 +1,18 @@
-// _host.NativeBatch: many sources through the native path, bytes in memory to records in their
-// arenas, without the interpreter lock and without an object a line.
+// Many files through the native path, without the interpreter lock and without an object a line.
+//
+// _host.NativeBatch takes sources in memory and counts their records; _host.Batch takes paths and hands
+// out a result a file, whose records are columns of the core until Python asks for some of them.
+// The trap: threads of a batch may wait for the interpreter lock (to decode a source), so nothing that
+// waits for them may hold it.
 #include <nanobind/stl/string.h>
 #include <nanobind/stl/vector.h>
 
+#include <chrono>
+#include <memory>
 #include <utility>
 #include <vector>
 
+#include "analysis/batch.h"
 #include "analysis/file_analyzer.h"
 #include "quillet/tarvex/bindings.h"
 #include "quillet/tarvex/convert.h"
@@ -13,21 +20,25 @@
 namespace quillet::host {
 namespace {
 
+// What an analyzer is built from. Grammar files are absolute paths.
+struct Language {
+  FileAnalyzer::Options options;
+
+  Language(nb::handle version_triple, std::string grammar_file, std::string hint_grammar_file,
+           std::vector<std::string> keywords, bool py3_grammar, std::string print_function_grammar_file) {
+    options.version = VersionOf(version_triple);
+    options.grammar_file = std::move(grammar_file);
+    options.hint_grammar_file = std::move(hint_grammar_file);
+    options.hint_keywords = keywords;
+    options.keywords = std::move(keywords);
+    options.py3_grammar = py3_grammar;
+    options.print_function_grammar_file = std::move(print_function_grammar_file);
+  }
+};
+
 class NativeBatch {
  public:
-  NativeBatch(nb::handle version_triple, std::string grammar_file, std::string hint_grammar_file,
-              std::vector<std::string> keywords, bool py3_grammar, std::string print_function_grammar_file)
-      : files_([&] {
-          FileAnalyzer::Options options;
-          options.version = VersionOf(version_triple);
-          options.grammar_file = std::move(grammar_file);
-          options.hint_grammar_file = std::move(hint_grammar_file);
-          options.hint_keywords = keywords;
-          options.keywords = std::move(keywords);
-          options.py3_grammar = py3_grammar;
-          options.print_function_grammar_file = std::move(print_function_grammar_file);
-          return options;
-        }()) {}
+  explicit NativeBatch(const Language& language) : files_(language.options) {}
 
   // The number of records and of statements rejected, over all sources.
   std::pair<size_t, size_t> Analyze(nb::handle sources) {
@@ -49,16 +60,142 @@ class NativeBatch {
   FileAnalyzer files_;
 };
 
+// ---- files ----
+
+// str of a record's text. What is no UTF-8 is shown by escapes.
+nb::object ShownText(Text text) {
+  return nb::steal(PyUnicode_DecodeUTF8(text.data(), static_cast<Py_ssize_t>(text.size()), "backslashreplace"));
+}
+
+nb::object Checked(nb::object made) {
+  if (!made.is_valid()) throw nb::python_error();
+  return made;
+}
+
+struct FileResult {
+  BatchResult result;
+
+  nb::list Messages(const std::vector<BatchResult::Message>& messages) const {
+    nb::list list;
+    for (const BatchResult::Message& message : messages)
+      list.append(nb::make_tuple(message.line, message.column, Checked(ShownText(message.text))));
+    return list;
+  }
+
+  // Records as instances of a class that derives from tuple, with the host's own objects for kinds.
+  nb::list Rows(size_t begin, size_t end, nb::handle row_class, nb::tuple kinds) const {
+    const RecordTable& table = result.table;
+    auto* type = reinterpret_cast<PyTypeObject*>(row_class.ptr());
+    if (!PyType_Check(row_class.ptr()) || !PyType_IsSubtype(type, &PyTuple_Type))
+      ThrowError(ErrorKind::kTypeError, "a class that derives from tuple is needed");
+    if (kinds.size() != RecordKindWords().size()) ThrowError(ErrorKind::kValueError, "an object a kind is needed");
+    end = std::min(end, table.size());
+    begin = std::min(begin, end);
+    std::vector<nb::object> scopes(table.scope_names.size());
+    nb::list rows;
+    for (size_t i = begin; i < end; ++i) {
+      nb::object& scope = scopes[table.scopes[i]];
+      if (!scope.is_valid()) scope = Checked(ShownText(table.scope_names[table.scopes[i]]));
+      nb::object row = Checked(nb::steal(type->tp_alloc(type, 7)));
+      const auto set = [&row](Py_ssize_t at, nb::object value) {
+        PyTuple_SET_ITEM(row.ptr(), at, Checked(std::move(value)).release().ptr());
+      };
+      set(0, nb::steal(PyLong_FromUnsignedLong(table.lines[i])));
+      set(1, nb::steal(PyLong_FromUnsignedLong(table.columns[i])));
+      set(2, scope);
+      set(3, ShownText(table.NameAt(i)));
+      set(4, nb::borrow(kinds[static_cast<size_t>(table.kinds[i])]));
+      set(5, ShownText(table.DetailAt(i)));
+      set(6, nb::borrow(table.is_parameter[i] ? Py_True : Py_False));
+      rows.append(std::move(row));
+    }
+    return rows;
+  }
+};
+
+// Inputs are tuples (path, source or None, problem or None), all bytes.
+std::vector<BatchInput> InputsOf(nb::handle sequence) {
+  std::vector<BatchInput> inputs;
+  for (nb::handle item : TupleOf(sequence)) {
+    const auto tuple = nb::cast<nb::tuple>(item);
+    BatchInput& input = inputs.emplace_back();
+    input.path = HostText::FromBytes(tuple[0]).text();
+    if (!nb::handle(tuple[1]).is_none()) input.bytes = HostText::FromBytes(tuple[1]).text();
+    if (!nb::handle(tuple[2]).is_none()) input.problem = HostText::FromBytes(tuple[2]).text();
+  }
+  return inputs;
+}
+
+class FileBatch {
+ public:
+  FileBatch(const Language& language, nb::handle inputs, unsigned jobs, nb::object decode)
+      : decode_(std::move(decode)),
+        batch_(std::make_unique<BatchAnalyzer>(OptionsOf(language, jobs), InputsOf(inputs))) {}
+  ~FileBatch() { Cancel(); }
+  FileBatch(const FileBatch&) = delete;
+  FileBatch& operator=(const FileBatch&) = delete;
+
+  // Python's own signals end the wait by their exceptions.
+  nb::object Next() {
+    constexpr std::chrono::milliseconds kPatience(100);
+    auto next = std::make_unique<FileResult>();
+    while (true) {
+      BatchAnalyzer::Wait wait;
+      {
+        nb::gil_scoped_release unlocked;
+        const std::lock_guard one_reader(reader_mutex_);
+        wait = batch_->Next(next->result, kPatience);
+      }
+      if (wait == BatchAnalyzer::Wait::kEnd) return nb::none();
+      if (wait == BatchAnalyzer::Wait::kResult) return nb::cast(next.release(), nb::rv_policy::take_ownership);
+      if (PyErr_CheckSignals() != 0) throw nb::python_error();
+    }
+  }
+
+  void Cancel() {
+    nb::gil_scoped_release unlocked;
+    batch_->Cancel();
+  }
+
+ private:
+  BatchAnalyzer::Options OptionsOf(const Language& language, unsigned jobs) const {
+    BatchAnalyzer::Options options;
+    options.analyzer = language.options;
+    options.jobs = jobs;
+    // The host's function gives (UTF-8, None) or (None, reason). It lives as long as this, and so
+    // longer than the threads.
+    PyObject* const decode = decode_.ptr();
+    options.decode = [decode](Text bytes, std::string& utf8) {
+      nb::gil_scoped_acquire lock;
+      try {
+        const auto answer = nb::cast<nb::tuple>(nb::handle(decode)(BytesOf(bytes)));
+        const bool done = nb::handle(answer[1]).is_none();
+        utf8 = done ? HostText::FromBytes(answer[0]).text() : HostText::FromStr(answer[1]).text();
+        return done;
+      } catch (const std::exception& error) {
+        utf8 = error.what();
+        return false;
+      }
+    };
+    return options;
+  }
+
+  nb::object decode_;
+  std::mutex reader_mutex_;
+  std::unique_ptr<BatchAnalyzer> batch_;
+};
+
 }  // namespace
 
 void BindBatch(nb::module_& tarvex) {
   nb::module_ host = SiblingModule(tarvex, "host");
-  nb::class_<NativeBatch>(host, "NativeBatch",
-                          "Sources through the native path, without an object a line. Grammar files are absolute "
-                          "paths; one thread at a time.")
+  nb::class_<Language>(host, "Language", "What an analyzer is built from. Grammar files are absolute paths.")
       .def(nb::init<nb::handle, std::string, std::string, std::vector<std::string>, bool, std::string>(),
            nb::arg("version_triple"), nb::arg("grammar_file"), nb::arg("hint_grammar_file"), nb::arg("keyword_seq"),
-           nb::arg("py3_grammar"), nb::arg("print_function_grammar_file"))
+           nb::arg("py3_grammar"), nb::arg("print_function_grammar_file"));
+  nb::class_<NativeBatch>(host, "NativeBatch",
+                          "Sources through the native path, without an object a line. One thread at a time.")
+      .def(nb::init<const Language&>(), nb::arg("language"))
       .def(
           "Analyze",
           [](NativeBatch& self, nb::handle sources) {
@@ -66,6 +203,29 @@ void BindBatch(nb::module_& tarvex) {
             return nb::make_tuple(records, rejected);
           },
           nb::arg("sources"), "Analyses UTF-8 sources, a sequence of bytes; gives (records, statements rejected).");
+
+  nb::list words;
+  for (const Text word : RecordKindWords()) words.append(StrOf(word));
+  host.attr("RECORD_KIND_WORDS") = nb::tuple(words);
+  nb::class_<FileResult>(host, "FileResult", "What became of a file of a batch.")
+      .def_prop_ro("index", [](const FileResult& self) { return self.result.index; })
+      .def_prop_ro("problem",
+                   [](const FileResult& self) {
+                     return self.result.problem.empty() ? nb::object(nb::none()) : StrOf(self.result.problem);
+                   })
+      .def_prop_ro("byte_count", [](const FileResult& self) { return self.result.byte_count; })
+      .def_prop_ro("line_count", [](const FileResult& self) { return self.result.line_count; })
+      .def_prop_ro("statement_count", [](const FileResult& self) { return self.result.statement_count; })
+      .def_prop_ro("errors", [](const FileResult& self) { return self.Messages(self.result.errors); })
+      .def_prop_ro("reports", [](const FileResult& self) { return self.Messages(self.result.reports); })
+      .def_prop_ro("record_count", [](const FileResult& self) { return self.result.table.size(); })
+      .def("Rows", &FileResult::Rows, nb::arg("begin"), nb::arg("end"), nb::arg("row_class"), nb::arg("kinds"),
+           "Records from `begin` up to `end` as instances of a class that derives from tuple.");
+  nb::class_<FileBatch>(host, "Batch", "Files through the native path, on threads without the interpreter lock.")
+      .def(nb::init<const Language&, nb::handle, unsigned, nb::object>(), nb::arg("language"), nb::arg("inputs"),
+           nb::arg("jobs"), nb::arg("decode"))
+      .def("Next", &FileBatch::Next, "The next file's result, in the order of the inputs; None at the end.")
+      .def("Cancel", &FileBatch::Cancel, "Stops after the files under way.");
 }
 
 }  // namespace quillet::host

@@ -93,7 +93,10 @@ void LogicalLine::CopyTypeEquivsTo(LogicalLine& to) {
   // By index: with a shared store the rows move as the other line's grow.
   for (size_t i = 0; i < type_equivs().size(); ++i) {
     const Record record = type_equivs()[i];
-    to.AppendTypeEquiv(record.name(), record.info());
+    // A name that stands in the source is kept as a view, which tells its place.
+    const bool in_source = to.source && to.source->Holds(record.name_text);
+    to.AppendStableTypeEquiv(in_source ? record.name() : to.texts().Copy(record.name()),
+                             to.texts().Copy(record.info()));
   }
 }
 

@@ -13,6 +13,7 @@ LinePlace ScopeTracker::Next(const LineRow& row) {
   }
 
   LinePlace place;
+  place.depth = static_cast<uint32_t>(scopes_.size());
   if (!scopes_.empty()) {
     Scope& scope = scopes_.back();
     place.in_async_def = scope.is_async;

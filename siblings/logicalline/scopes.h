@@ -19,6 +19,7 @@ namespace quillet {
 struct LinePlace {
   bool in_async_def = false;
   bool first_in_def = false;
+  uint32_t depth = 0;  // of the open definitions around the line; 0 for a blank line
 };
 
 class ScopeTracker {

@@ -1,0 +1,122 @@
+// Many files at once: paths in, records (or the lines of an output format) out, in the order of the
+// paths whatever the number of threads.
+//
+// Each thread has an analyzer of its own and takes the next file that nobody has; nothing is shared
+// but the list and the results. How far threads run ahead of the reader is bounded, in files and in
+// bytes, so that memory does not grow with the list. No file fails the batch: one that cannot be read
+// is a result that says why.
+// What the core prints or reports while a file is analysed (a walk that met its limit, an internal
+// failure) is collected with that file's result and printed by nobody.
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "analysis/file_analyzer.h"
+#include "analysis/placed_records.h"
+#include "analysis/record_table.h"
+#include "analysis/scope_names.h"
+
+namespace quillet {
+
+// A file to analyse.
+struct BatchInput {
+  std::string path;
+  std::optional<std::string> bytes;  // the source itself, where it is at hand
+  std::string problem;               // why it cannot be read, where that is known
+};
+
+// What became of a file.
+struct BatchResult {
+  struct Message {
+    uint32_t line;    // from 1
+    uint32_t column;  // from 1, in UTF-8 bytes
+    std::string text;
+  };
+
+  size_t index = 0;     // of its input
+  std::string problem;  // why it could not be analysed; empty where it was
+  size_t byte_count = 0;
+  size_t line_count = 0;       // physical lines
+  size_t statement_count = 0;  // logical lines that are neither blank nor a comment
+  std::vector<Message> errors;
+  std::vector<Message> reports;  // of the analysis about itself
+  RecordTable table;             // empty where a writer took its place
+  std::string output;
+
+  // What the result occupies, nearly.
+  size_t ByteSize() const;
+};
+
+// Turns a file that was analysed into text; each thread has one.
+class FileWriter {
+ public:
+  virtual ~FileWriter() = default;
+  virtual void Write(const BatchInput& input, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
+                     std::string& out) = 0;
+};
+
+class BatchAnalyzer {
+ public:
+  struct Options {
+    FileAnalyzer::Options analyzer;
+    unsigned jobs = 0;  // 0 stands for one a core
+    // Results that may wait for the reader, and the bytes that they may hold.
+    size_t most_waiting = 64;
+    size_t most_waiting_bytes = size_t{256} << 20;
+    // Makes a thread's writer; without it, results carry tables.
+    std::function<std::unique_ptr<FileWriter>()> make_writer;
+    // Decodes a source that names an encoding of its own to UTF-8: false, and the reason in `utf8`,
+    // where that cannot be done. Called by any thread. Without it such a source is a problem.
+    std::function<bool(Text bytes, std::string& utf8)> decode;
+  };
+
+  BatchAnalyzer(Options options, std::vector<BatchInput> inputs);
+  // Cancels what was not handed out.
+  ~BatchAnalyzer();
+  BatchAnalyzer(const BatchAnalyzer&) = delete;
+  BatchAnalyzer& operator=(const BatchAnalyzer&) = delete;
+
+  const std::vector<BatchInput>& inputs() const { return inputs_; }
+
+  enum class Wait { kResult, kEnd, kTimeout };
+  // The next result in order. kEnd behind the last one and after Cancel. For one thread at a time.
+  Wait Next(BatchResult& result, std::chrono::milliseconds patience);
+  // The same, however long it takes; false at the end.
+  bool Next(BatchResult& result);
+
+  // Stops after the files under way, and waits for that. For any thread but those of the batch.
+  void Cancel();
+
+ private:
+  void Start();
+  void Work();
+  // The next index for a thread; nothing at the end.
+  std::optional<size_t> Take();
+  void Deliver(BatchResult&& result);
+
+  const Options options_;
+  const std::vector<BatchInput> inputs_;
+
+  std::mutex mutex_;
+  std::condition_variable may_take_;
+  std::condition_variable may_hand_out_;
+  size_t next_to_take_ = 0;      // the first input that no thread has
+  size_t next_to_hand_out_ = 0;  // the first result that the reader lacks
+  size_t waiting_bytes_ = 0;
+  std::vector<std::optional<BatchResult>> waiting_;  // a ring, by index
+  std::atomic<bool> cancelled_{false};
+  std::mutex join_mutex_;
+  std::vector<std::thread> threads_;
+  bool started_ = false;
+};
+
+}  // namespace quillet

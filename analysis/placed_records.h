@@ -1,0 +1,73 @@
+// Records in words and in their place: for each row of two byte ranges the kind, the detail, the line
+// and column of the name, and the scope.
+//
+// Input: a file that was analysed, and its scopes. A name's place follows from its bytes, which nearly
+// always are a view of the source; a name that was composed stands where its statement begins.
+// A signature comment on a line of its own knows parameters by their places alone; here it meets the
+// head of its function, and its records become facts about the real parameters.
+// The trap: views overlap (a.b.c.d gives four names in one), so the texts of all records together may
+// grow with the square of the source. Behind a budget in proportion to the source, long texts are cut.
+#pragma once
+
+#include <cstdint>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "analysis/file_analyzer.h"
+#include "analysis/scope_names.h"
+#include "foundations/arena.h"
+
+namespace quillet {
+
+enum class RecordKind : uint8_t {
+#define QUILLET_RECORD_KIND(identifier, word) k##identifier,
+#include "analysis/record_kinds.def"
+};
+
+// The words of all kinds, in their order.
+std::span<const Text> RecordKindWords();
+
+struct PlacedRecord {
+  Text name;
+  Text detail;  // empty where the kind says everything
+  uint32_t line = 0;
+  uint32_t column = 0;  // both from 1, the column in UTF-8 bytes
+  uint32_t scope = 0;   // index in ScopeNames::names()
+  RecordKind kind = RecordKind::kSet;
+  bool is_parameter = false;
+};
+
+class PlacedRecords {
+ public:
+  // Texts of a file's records may hold so many bytes before long ones are cut, and are cut to that.
+  static constexpr size_t kBudgetPerSourceByte = 16;
+  static constexpr size_t kSmallestBudget = size_t{1} << 20;
+  static constexpr size_t kCutSize = 200;
+
+  // Both stand until the next call.
+  void Begin(const FileAnalyzer& file, const ScopeNames& scopes);
+
+  // The records of a row, in the order in which they were found, parameters last. They stand until the
+  // next call; texts until Begin.
+  std::span<const PlacedRecord> OfRow(size_t row);
+
+ private:
+  void Add(size_t row, const Record& record, bool is_parameter);
+  void SetPlace(const LineRow& row, Text name, PlacedRecord& placed);
+  void Decode(Text info, PlacedRecord& placed);
+  bool FindSignature(size_t row);
+  Text ShownArgument(Text name);
+  Text Cut(Text text);
+
+  const FileAnalyzer* file_ = nullptr;
+  const ScopeNames* scopes_ = nullptr;
+  size_t budget_ = 0;
+  std::vector<PlacedRecord> placed_;
+  std::vector<Text> parameters_;
+  bool in_signature_ = false;
+  std::string buffer_;
+  TextArena texts_;
+};
+
+}  // namespace quillet

@@ -1,0 +1,178 @@
+// Reading by the operating system's own calls, and the encoding line of PEP 263.
+#include "analysis/source_bytes.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <system_error>
+
+#include "foundations/utf8.h"
+
+#ifdef _WIN32
+#include <cstdio>
+#include <filesystem>
+#else
+#include <fcntl.h>
+#include <poll.h>
+#include <sys/stat.h>
+#include <unistd.h>
+#endif
+
+namespace quillet {
+
+namespace {
+
+constexpr size_t kReadSize = size_t{1} << 16;
+
+std::string ReasonOf(int error) { return std::generic_category().message(error); }
+
+// Calls `read(at, size)`, which gives the number of bytes read, 0 at the end, or -1, until the end;
+// false where it failed. `expected` is what the size of the file is thought to be.
+template <class Function>
+bool ReadAll(size_t expected, std::string& bytes, Function&& read) {
+  size_t size = 0;
+  // One byte more than expected, so that the end is met without growing.
+  bytes.resize(std::max(expected + 1, kReadSize));
+  while (true) {
+    const auto count = read(bytes.data() + size, bytes.size() - size);
+    if (count < 0) return false;
+    if (count == 0) break;
+    size += static_cast<size_t>(count);
+    if (size == bytes.size()) bytes.resize(size * 2);
+  }
+  bytes.resize(size);
+  return true;
+}
+
+}  // namespace
+
+#ifdef _WIN32
+
+std::string ReadSourceFile(const std::string& path, std::string& bytes, const std::atomic<bool>& cancelled) {
+  if (path.find('\0') != std::string::npos) return "embedded null byte";
+  const std::filesystem::path wide(std::u8string(path.begin(), path.end()));
+  std::FILE* file = _wfopen(wide.c_str(), L"rb");
+  if (file == nullptr) return ReasonOf(errno);
+  const bool done = ReadAll(0, bytes, [&](char* at, size_t size) -> int64_t {
+    if (cancelled) return -1;
+    const size_t count = std::fread(at, 1, size, file);
+    return count == 0 && std::ferror(file) ? -1 : static_cast<int64_t>(count);
+  });
+  const int error = errno;
+  std::fclose(file);
+  return done ? std::string() : ReasonOf(error);
+}
+
+#else
+
+namespace {
+
+// How long a read of a pipe waits before it looks whether it is still wanted.
+constexpr int kPollMilliseconds = 100;
+
+class OpenFile {
+ public:
+  explicit OpenFile(const std::string& path) : descriptor_(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK)) {}
+  ~OpenFile() {
+    if (descriptor_ >= 0) close(descriptor_);
+  }
+  OpenFile(const OpenFile&) = delete;
+  OpenFile& operator=(const OpenFile&) = delete;
+  int get() const { return descriptor_; }
+
+ private:
+  int descriptor_;
+};
+
+// Waits until there is something to read; false once it is no longer wanted.
+bool WaitForInput(int descriptor, const std::atomic<bool>& cancelled) {
+  while (!cancelled) {
+    pollfd wanted{descriptor, POLLIN, 0};
+    const int ready = poll(&wanted, 1, kPollMilliseconds);
+    if (ready > 0 || (ready < 0 && errno != EINTR)) return true;
+  }
+  errno = ECANCELED;
+  return false;
+}
+
+}  // namespace
+
+std::string ReadSourceFile(const std::string& path, std::string& bytes, const std::atomic<bool>& cancelled) {
+  if (path.find('\0') != std::string::npos) return "embedded null byte";
+  const OpenFile file(path);
+  if (file.get() < 0) return ReasonOf(errno);
+  struct stat info;
+  if (fstat(file.get(), &info) != 0) return ReasonOf(errno);
+  if (S_ISDIR(info.st_mode)) return ReasonOf(EISDIR);
+  const bool is_regular = S_ISREG(info.st_mode);
+  const size_t expected = is_regular ? static_cast<size_t>(info.st_size) : 0;
+  const bool done = ReadAll(expected, bytes, [&](char* at, size_t size) -> ssize_t {
+    while (true) {
+      if (!is_regular && !WaitForInput(file.get(), cancelled)) return -1;
+      const ssize_t count = read(file.get(), at, size);
+      if (count >= 0 || (errno != EINTR && errno != EAGAIN)) return count;
+    }
+  });
+  return done ? std::string() : ReasonOf(errno);
+}
+
+#endif
+
+// ---- encodings ----
+
+namespace {
+
+constexpr Text kUtf8Mark = "\xEF\xBB\xBF";
+
+bool IsEncodingChar(char c) {
+  return (AsciiClassOf(c) & (kAsciiAlpha | kAsciiDigit | kAsciiUnderscore)) != 0 || c == '-' || c == '.';
+}
+
+// The first line of a text without its end.
+Text FirstLine(Text text) { return text.substr(0, text.find_first_of("\r\n")); }
+
+Text BehindFirstLine(Text text) {
+  const size_t size = FirstLine(text).size();
+  return text.substr(std::min(text.size(), size + (text.substr(size, 2) == "\r\n" ? 2 : 1)));
+}
+
+// The encoding that a line names; empty without one. A comment may stand behind blanks alone, and the
+// name behind "coding:" or "coding=" anywhere in it.
+Text EncodingOfLine(Text line) {
+  const size_t comment = line.find_first_not_of(" \t\f");
+  if (comment == Text::npos || line[comment] != '#') return {};
+  for (size_t at = line.find("coding", comment); at != Text::npos; at = line.find("coding", at + 1)) {
+    Text rest = line.substr(at + 6);
+    if (rest.empty() || (rest[0] != ':' && rest[0] != '=')) continue;
+    rest.remove_prefix(1);
+    rest.remove_prefix(std::min(rest.find_first_not_of(" \t"), rest.size()));
+    const auto end = std::find_if_not(rest.begin(), rest.end(), IsEncodingChar);
+    if (end != rest.begin()) return rest.substr(0, static_cast<size_t>(end - rest.begin()));
+  }
+  return {};
+}
+
+bool IsBlankOrComment(Text line) {
+  const size_t first = line.find_first_not_of(" \t\f");
+  return first == Text::npos || line[first] == '#';
+}
+
+bool IsUtf8(Text encoding) {
+  std::string name(encoding);
+  for (char& c : name) c = c == '_' ? '-' : c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
+  return name == "utf8" || name == "u8" || name == "utf-8" || name.starts_with("utf-8-");
+}
+
+}  // namespace
+
+bool NeedsHostDecoding(Text bytes) {
+  if (bytes.starts_with(kUtf8Mark)) return false;
+  if (bytes.starts_with("\xFF\xFE") || bytes.starts_with("\xFE\xFF")) return true;
+  if (bytes.starts_with(Text("\0\0\xFE\xFF", 4))) return true;
+  const Text first = FirstLine(bytes);
+  Text encoding = EncodingOfLine(first);
+  if (encoding.empty() && first.size() < bytes.size() && IsBlankOrComment(first))
+    encoding = EncodingOfLine(FirstLine(BehindFirstLine(bytes)));
+  return !encoding.empty() && !IsUtf8(encoding);
+}
+
+}  // namespace quillet

@@ -1,0 +1,24 @@
+// The bytes of a file, read without a host, and whether they can be analysed as they are.
+//
+// Nearly all sources are UTF-8. One that names another encoding in one of its first two lines, or
+// begins with the byte order mark of UTF-16 or UTF-32, must be decoded by a host that knows encodings.
+// The trap: a named file may be a pipe that nobody writes to, and a reader that waits for it must still
+// be stoppable.
+#pragma once
+
+#include <atomic>
+#include <string>
+
+#include "foundations/text.h"
+
+namespace quillet {
+
+// Reads a whole file into `bytes`, whose memory is kept. Empty, or why it could not be read, as one
+// phrase. `path` is as the operating system spells it (UTF-8 on Windows). Gives up, with a reason,
+// once `cancelled` is set.
+std::string ReadSourceFile(const std::string& path, std::string& bytes, const std::atomic<bool>& cancelled);
+
+// Whether a source names an encoding other than UTF-8 for itself.
+bool NeedsHostDecoding(Text bytes);
+
+}  // namespace quillet
