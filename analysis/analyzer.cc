@@ -111,7 +111,9 @@ bool CPGenAnalyzerImpl::InspectSingleLogical(LogicalLine& logical, bool in_async
   try {
     node_walker_->Walk(node, &logical);
     type_hint_walker_->Walk(node, &logical, first_in_def);
-    if (!in_embedded_expression) InspectEmbeddedExpressions(logical, in_async_def, first_in_def);
+    const bool may_hold_expressions = logical.hooks != nullptr || !logical.no_embedded;
+    if (may_hold_expressions && !in_embedded_expression)
+      InspectEmbeddedExpressions(logical, in_async_def, first_in_def);
   } catch (...) {
     failure = std::current_exception();
   }

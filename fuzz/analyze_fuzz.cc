@@ -103,8 +103,14 @@ void CheckLine(Analyzers& analyzers, LogicalLine& line, Place place) {
 
   const auto analyze = [&](CPGenAnalyzerImpl& analyzer) {
     line.parsed = false;
-    const auto error = analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def);
-    return ShowResult(line, error);
+    try {
+      const auto error = analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def);
+      return ShowResult(line, error);
+    } catch (const Error& error) {
+      // The place of an error behind a last token that was removed.
+      if (line.toks.empty() || !line.toks.back().removed()) Check(error.message(), text);
+      return error.message();
+    }
   };
   const std::string recycled = analyze(*analyzers.recycled);
   const std::string fresh = analyze(analyzers.Fresh());

@@ -6,27 +6,20 @@
 namespace quillet {
 
 void CDispatchWalker::Walk(CNode* node, LogicalLine* logical, bool /*first_in_def*/) {
-  if (fLogical != nullptr) ThrowError(ErrorKind::kValueError, "Only one logical may be walked at a time");
-  struct Idle {
-    CDispatchWalker& walker;
-    ~Idle() {
-      walker.fLogical = nullptr;
-      walker.fVisitCount = 0;
-      walker.fRecurseCount = 0;
-      walker.fNodeStack.clear();
-    }
-  } idle{*this};
-  fLogical = logical;
+  RunWalk(logical, [&] { VisitNode(node); });
+}
+
+void CDispatchWalker::BecomeIdle() {
+  fLogical = nullptr;
+  fVisitCount = 0;
+  fRecurseCount = 0;
   fNodeStack.clear();
-  try {
-    VisitNode(node);
-  } catch (const Error& error) {
-    const bool is_runtime_error =
-        error.kind() == ErrorKind::kRuntimeError || error.kind() == ErrorKind::kRecursionError;
-    if (!is_runtime_error) throw;
-    // The text names the symbol walker, as hosts know it.
-    PrintLine("RuntimeError raised in CNodeWalker.Walk: " + error.message());
-  }
+}
+
+void CDispatchWalker::PrintIfRuntimeError(const Error& error) {
+  if (error.kind() != ErrorKind::kRuntimeError && error.kind() != ErrorKind::kRecursionError) throw;
+  // The text names the symbol walker, as hosts know it.
+  PrintLine("RuntimeError raised in CNodeWalker.Walk: " + error.message());
 }
 
 void CDispatchWalker::VisitNode(CNode* node) {
@@ -49,7 +42,7 @@ void CDispatchWalker::VisitNode(CNode* node) {
   if (host_visit) [[unlikely]] {
     descend = host_visit(node);
   } else {
-    const Entry entry = node != nullptr ? (*table_)[static_cast<size_t>(node->kind)] : Entry{};
+    const Entry entry = node != nullptr ? table_[static_cast<size_t>(node->kind)] : Entry{};
     descend = entry.action == Action::kDescend || (entry.action == Action::kVisit && entry.visit(*this, node));
   }
   if (descend) {

@@ -31,7 +31,7 @@ class CDispatchWalker {
   using Table = std::array<Entry, kNodeKindCount>;
 
   // Copies the table.
-  explicit CDispatchWalker(const Table& table) : own_table_(table), table_(&own_table_) {}
+  explicit CDispatchWalker(const Table& table) : table_(table) {}
   CDispatchWalker(const CDispatchWalker&) = delete;
   CDispatchWalker& operator=(const CDispatchWalker&) = delete;
   virtual ~CDispatchWalker() = default;
@@ -50,13 +50,30 @@ class CDispatchWalker {
   std::vector<CNode*> fNodeStack;
 
  protected:
-  // Walks by another table from now on; it must live as long as it is in use.
-  void UseTable(const Table& table) { table_ = &table; }
-  const Table& own_table() const { return own_table_; }
+  // The frame of a walk: refuses a second one, prints what a RuntimeError says, and leaves the walker
+  // idle whatever happens.
+  template <class Visits>
+  void RunWalk(LogicalLine* logical, Visits&& visits) {
+    if (fLogical != nullptr) ThrowError(ErrorKind::kValueError, "Only one logical may be walked at a time");
+    struct Idle {
+      CDispatchWalker& walker;
+      ~Idle() { walker.BecomeIdle(); }
+    } idle{*this};
+    fLogical = logical;
+    fNodeStack.clear();
+    try {
+      visits();
+    } catch (const Error& error) {
+      PrintIfRuntimeError(error);
+    }
+  }
 
  private:
-  Table own_table_;
-  const Table* table_;
+  void BecomeIdle();
+  // Throws the error in flight on where it is another one.
+  static void PrintIfRuntimeError(const Error& error);
+
+  Table table_;
 };
 
 }  // namespace quillet

@@ -26,7 +26,7 @@ CTypeHintWalker& Self(CDispatchWalker& walker) { return static_cast<CTypeHintWal
 
 using Table = CDispatchWalker::Table;
 
-Table MakeTable() {
+constexpr Table MakeTable() {
   Table table;
   const auto visit = [&table](NodeKind kind, CDispatchWalker::Visit fn) {
     table[static_cast<size_t>(kind)] = {CDispatchWalker::Action::kVisit, fn};
@@ -42,7 +42,7 @@ Table MakeTable() {
 
 // The same for trees that cannot reach a limit, and in which it makes no difference whether the walk
 // goes on below the statements: nothing in an expression is of interest.
-Table MakeStatementsOnlyTable() {
+constexpr Table MakeStatementsOnlyTable() {
   Table table = MakeTable();
   const auto prune = [&table](NodeKind first, NodeKind last) {
     for (size_t kind = static_cast<size_t>(first); kind <= static_cast<size_t>(last); ++kind)
@@ -58,10 +58,7 @@ Table MakeStatementsOnlyTable() {
   return table;
 }
 
-const Table& StatementsOnlyTable() {
-  static const Table table = MakeStatementsOnlyTable();
-  return table;
-}
+constexpr Table kStatementsOnly = MakeStatementsOnlyTable();
 
 // A node of two children or more has a leaf that no node above it has, so a tree is at most as deep
 // as it has leaves: the line's tokens and, at most, a dozen invented ones.
@@ -117,8 +114,8 @@ void CTypeHintWalker::Walk(CNode* node, LogicalLine* logical, bool first_in_def)
   if (node != nullptr) {
     const bool is_small = logical->toks.size() + kInventedTokens <= static_cast<size_t>(fMaxRecurseCount) &&
                           fMaxVisits >= 4 * fMaxRecurseCount;
-    UseTable(is_small ? StatementsOnlyTable() : own_table());
-    return CDispatchWalker::Walk(node, logical, first_in_def);
+    if (!is_small) return CDispatchWalker::Walk(node, logical, first_in_def);
+    return RunWalk(logical, [&] { VisitStatements(node); });
   }
   if (fCommentHintCount == 0) return;
 
@@ -132,6 +129,16 @@ void CTypeHintWalker::Walk(CNode* node, LogicalLine* logical, bool first_in_def)
   std::string hint;
   if (!IsNone(comment.text) && GetHintFromComment(comment.text, hint) && first_in_def)
     ProcessFuncdefComment(hint, comment.tok_i, nullptr, false);
+}
+
+void CTypeHintWalker::VisitStatements(CNode* node) {
+  const Entry& entry = kStatementsOnly[static_cast<size_t>(node->kind)];
+  if (entry.action == Action::kPrune) return;
+  if (entry.action == Action::kVisit && !entry.visit(*this, node)) return;
+  for (CNode* child : node->fChildren()) {
+    if (child == nullptr) ThrowError(ErrorKind::kAttributeError, "'NoneType' object has no attribute 'fChildren'");
+    if (!child->IsLeaf()) VisitStatements(child);
+  }
 }
 
 // ---- statements ----

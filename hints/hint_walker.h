@@ -89,6 +89,9 @@ class CTypeHintWalker : public CDispatchWalker {
   // `text` is kSignatureFront, the hint and a colon; the tokens are views into it.
   static Signature RewriteSignature(Text text);
 
+  // Walks a tree that cannot reach a limit: statements alone, none of their expressions.
+  void VisitStatements(CNode* node);
+
   LogicalLine& RequireLogical() const;
   CNodeWalker& RequireGeneralWalker() const;
   // A copy of `text` that lives as long as the records of the line being walked.

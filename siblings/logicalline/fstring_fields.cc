@@ -125,8 +125,14 @@ class FieldScan {
   // The "=" behind an expression whose text is shown, too.
   bool IsDebugSign() const {
     if (NextIs('=')) return false;
-    const char* next = SkipBlanksAndLineEnds(at_ + 1, end_);
+    const char* next = SkipToTail(at_ + 1);
     return next < end_ && (*next == '}' || *next == ':' || (*next == '!' && (next + 1 == end_ || next[1] != '=')));
+  }
+
+  // Over blanks, line ends and comments behind an expression.
+  const char* SkipToTail(const char* at) const {
+    while ((at = SkipBlanksAndLineEnds(at, end_)) < end_ && *at == '#') at = FindAny<'\n', '\r'>(at, end_);
+    return at;
   }
 
   bool HasExpression() const {
@@ -137,13 +143,13 @@ class FieldScan {
   // "=", "!r" and the end of the field or ":"; false where something else follows, which then is
   // scanned behind an error token.
   bool ScanFieldTail() {
-    if (*at_ == '=') at_ = SkipBlanksAndLineEnds(at_ + 1, end_);
+    if (*at_ == '=') at_ = SkipToTail(at_ + 1);
     if (*at_ == '!') {
       const char* sign = at_++;
       const char* name = at_;
       while (at_ < end_ && IsAsciiIdentifierByte(*at_)) ++at_;
       if (at_ - name != 1 || (*name != 'r' && *name != 's' && *name != 'a')) AddError(sign);
-      at_ = SkipBlanksAndLineEnds(at_, end_);
+      at_ = SkipToTail(at_);
       if (at_ >= end_) {
         AddError(end_);
         return true;

@@ -361,7 +361,9 @@ TEST(Fields, OfNestedStringsFollowThoseOfTheOuterOne) {
   ExpectEmbedded({{"f'{f\"{x}\"}'", {"f\"{x}\"", "x"}}, {"f'''{f'{x}'}'''", {"f'{x}'", "x"}}}, Version::Of(3, 8));
 }
 
-TEST(Fields, CommentsInThemEndWithTheirLine) { ExpectEmbedded({{"f'''{x # }\n}'''", {"x # }"}}}); }
+TEST(Fields, CommentsInThemEndWithTheirLine) {
+  ExpectEmbedded({{"f'''{x # }\n}'''", {"x # }"}}, {"f'''{x = # }\n!r # }\n}'''", {"x"}}});
+}
 
 TEST(Fields, WhatTheLanguageDoesNotHaveHoldsAnErrorToken) {
   ExpectEmbedded(

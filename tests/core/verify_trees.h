@@ -14,12 +14,13 @@ namespace quillet {
 
 // A tree of a parser: leaves have text and no children, other nodes no text and children, two at
 // least where an engine made them; a node's class is its record's; no node stands in two places; token
-// indices lie within the line and never go back from left to right.
+// indices lie within the line and, in the tree of one feed, never go back from left to right.
 inline std::string VerifyTree(const CNode* root, const CNodeFactory& factory, int32_t token_count) {
   std::unordered_set<const CNode*> seen;
   std::vector<const CNode*> stack{root};
   int32_t last_index = 0;
-  bool has_slices = false;  // guards and bodies count their tokens anew
+  // Guards and bodies count their tokens anew, and type parameters stand in front of their statement.
+  bool is_ordered = true;
   while (!stack.empty()) {
     const CNode* node = stack.back();
     stack.pop_back();
@@ -32,14 +33,14 @@ inline std::string VerifyTree(const CNode* root, const CNodeFactory& factory, in
           (state >= factory.state_count() || factory.class_info(state) != node->fClsInfo))
         return "a record of no state";
     }
-    has_slices |= isa<CCaseStmt>(node) || isa<CMatchStmt>(node);
+    if (isa<CCaseStmt>(node) || isa<CMatchStmt>(node) || isa<CWithTypeParameters>(node)) is_ordered = false;
     if (node->IsLeaf()) {
       if (node->has_children || node->child_count != 0) return "a leaf with children";
       if (node->code == tok::REMOVED) return "a leaf without a code";
       const Context context = node->fContext;
       if (context.IsIndex()) {
         if (context.value < 0 || context.value > token_count) return "a token index outside the line";
-        if (!has_slices && context.value < last_index) return "token indices that go back";
+        if (is_ordered && context.value < last_index) return "token indices that go back";
         last_index = context.value;
       } else if (!context.IsPosition()) {
         return "a leaf without a place";
