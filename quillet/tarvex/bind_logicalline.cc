@@ -34,43 +34,55 @@ nb::object OverrideOf(PyObject* self, const Shared::Operation& operation) {
 }
 
 // bytes objects of record halves. Most infos are a bare prefix and most names occur many times, so
-// the latest texts are kept by a hash of their bytes.
+// the latest texts are kept, by a hash of their ends.
 class BytesCache {
  public:
-  nb::object Get(const char* text, uint32_t length) {
-    if (length > kLongest) return BytesOf({text, length});
-    PyObject*& slot = slots_[Hash(text, length)];
+  // A new reference.
+  PyObject* Get(const char* text, uint32_t length) {
+    if (length > kLongest || length == 0) return BytesOf({text, length}).release().ptr();
+    PyObject*& slot = slots_[SlotOf(text, length)];
     if (slot != nullptr && PyBytes_GET_SIZE(slot) == static_cast<Py_ssize_t>(length) &&
-        std::memcmp(PyBytes_AS_STRING(slot), text, length) == 0)
-      return nb::borrow(slot);
-    nb::object made = BytesOf({text, length});
-    Py_XDECREF(slot);
-    slot = nb::object(made).release().ptr();
+        std::memcmp(PyBytes_AS_STRING(slot), text, length) == 0) [[likely]]
+      return Py_NewRef(slot);
+    PyObject* made = BytesOf({text, length}).release().ptr();
+    Py_XSETREF(slot, Py_NewRef(made));
     return made;
   }
 
  private:
-  static constexpr uint32_t kLongest = 32;
-  static constexpr size_t kSlots = 2048;
+  static constexpr uint32_t kLongest = 40;
+  static constexpr int kSlotBits = 12;
 
-  static size_t Hash(const char* text, uint32_t length) {
-    uint64_t hash = length;
-    for (uint32_t i = 0; i < length; ++i) hash = (hash ^ static_cast<unsigned char>(text[i])) * 0x9E3779B97F4A7C15u;
-    return static_cast<size_t>(hash >> 53);
+  template <class Word>
+  static uint64_t Load(const char* at) {
+    Word word;
+    std::memcpy(&word, at, sizeof word);
+    return word;
   }
-  static_assert(kSlots == size_t{1} << (64 - 53), "the hash's top bits number the slots");
+  static size_t SlotOf(const char* text, uint32_t length) {
+    uint64_t ends;
+    if (length >= 8) {
+      ends = Load<uint64_t>(text) ^ (Load<uint64_t>(text + length - 8) * 31);
+    } else if (length >= 4) {
+      ends = Load<uint32_t>(text) << 32 | Load<uint32_t>(text + length - 4);
+    } else {
+      ends = Load<uint8_t>(text) << 16 | Load<uint8_t>(text + length / 2) << 8 | Load<uint8_t>(text + length - 1);
+    }
+    return static_cast<size_t>(((ends ^ length) * 0x9E3779B97F4A7C15u) >> (64 - kSlotBits));
+  }
 
-  std::array<PyObject*, kSlots> slots_{};
+  std::array<PyObject*, size_t{1} << kSlotBits> slots_{};
 };
 BytesCache g_bytes;
 
-nb::object PairOf(const Record& row) {
+// A new reference. The pair cannot be part of a cycle, so the collector need not look at it.
+PyObject* PairOf(const Record& row) {
   PyObject* pair = PyTuple_New(2);
   if (pair == nullptr) throw nb::python_error();
-  PyTuple_SET_ITEM(pair, 0, g_bytes.Get(row.name_text, row.name_length).release().ptr());
-  PyTuple_SET_ITEM(pair, 1, g_bytes.Get(row.info_text, row.info_length).release().ptr());
-  PyObject_GC_UnTrack(pair);  // two bytes objects cannot be part of a cycle
-  return nb::steal(pair);
+  PyTuple_SET_ITEM(pair, 0, g_bytes.Get(row.name_text, row.name_length));
+  PyTuple_SET_ITEM(pair, 1, g_bytes.Get(row.info_text, row.info_length));
+  PyObject_GC_UnTrack(pair);
+  return pair;
 }
 
 // The half of a host's pair as bytes that the core may keep a moment.
@@ -198,7 +210,7 @@ void LineObject::SetTokenCount(int32_t count) {
 
 void LineObject::Extend(RecordList& records, std::span<const Record> rows) {
   for (; records.made < rows.size(); ++records.made) {
-    nb::object pair = PairOf(rows[records.made]);
+    nb::object pair = nb::steal(PairOf(rows[records.made]));
     if (PyList_Append(records.list.ptr(), pair.ptr()) < 0) throw nb::python_error();
   }
 }
@@ -208,7 +220,10 @@ nb::object LineObject::ReadRecords(RecordList& records, std::span<const Record> 
     if (rows.empty()) return nb::none();
     nb::object list = nb::steal(PyList_New(static_cast<Py_ssize_t>(rows.size())));
     if (!list.is_valid()) throw nb::python_error();
-    for (size_t i = 0; i < rows.size(); ++i) PyList_SET_ITEM(list.ptr(), i, PairOf(rows[i]).release().ptr());
+    for (size_t i = 0; i < rows.size(); ++i) PyList_SET_ITEM(list.ptr(), i, PairOf(rows[i]));
+    // Neither need it look at the list, of which there is one a line: the line that holds it is no
+    // object of the collector's either.
+    PyObject_GC_UnTrack(list.ptr());
     records.list = std::move(list);
     records.made = rows.size();
     UpdateHooks();
@@ -267,9 +282,11 @@ void LineObject::MoveToOwnStore() {
 
 void LineObject::BeginAnalysis() {
   if (line_->hooks != nullptr && is_python_subclass_) return BeginWriting();
-  equivs_ = {};
-  arg_equivs_ = {};
-  UpdateHooks();
+  if (line_->hooks != nullptr) {
+    equivs_ = {};
+    arg_equivs_ = {};
+    UpdateHooks();
+  }
   if (shared_) {
     line_->WriteTo(&shared_->store);
     writes_to_shared_ = true;
