@@ -19,9 +19,11 @@ PyObject* g_builtin_convert = nullptr;  // CPGenParserImpl.convert
 // An optpgen.Parser of the host's whose converter is a Python subclass with a convert of its own.
 class HostEngine final : public ExternalEngine {
  public:
-  HostEngine(ParserObject& owner, nb::object parser) : owner_(owner), parser_(std::move(parser)) {}
+  // The owner holds the host's parser, too, and shows it to the collector.
+  HostEngine(ParserObject& owner, nb::handle parser) : owner_(owner), parser_(parser) {}
 
   void Setup(int start) override {
+    root_.reset();
     CallingHost([&] { parser_.attr("setup")(start); });
   }
   void AddToken(int type, Text value, int32_t context) override {
@@ -34,11 +36,10 @@ class HostEngine final : public ExternalEngine {
       return RefOf(root_).node();
     });
   }
-  const nb::object& parser() const { return parser_; }
 
  private:
   ParserObject& owner_;
-  nb::object parser_;
+  nb::handle parser_;
   nb::object root_;  // keeps the wrapper until the caller has its own
 };
 
@@ -79,10 +80,9 @@ void InitParser(nb::pointer_and_handle<ParserObject> self, Any version_triple, A
     object->parser = std::make_shared<CPGenParserImpl>(options);
     nb::object convert = self.h.type().attr("convert");
     if (!convert.is(g_builtin_convert)) {
-      auto external = std::make_unique<HostEngine>(*object, NewEngine(*object, self.h));
-      object->parser->set_external_engine(external.get());
-      object->engine = external->parser();
-      object->external = std::move(external);
+      object->engine = NewEngine(*object, self.h);
+      object->external = std::make_unique<HostEngine>(*object, object->engine);
+      object->parser->set_external_engine(object->external.get());
     }
   } catch (...) {
     object->~ParserObject();
@@ -300,12 +300,9 @@ int TraverseParser(PyObject* self, visitproc visit, void* arg) {
 
 int ClearParser(PyObject* self) {
   ParserObject* object = nb::inst_ptr<ParserObject>(self);
+  object->DropEngine();
   nb::object engine = std::move(object->engine);
   nb::object match_case_parser = std::move(object->match_case_parser);
-  if (object->external) {
-    object->parser->set_external_engine(nullptr);
-    object->external.reset();
-  }
   return 0;
 }
 

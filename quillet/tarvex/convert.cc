@@ -222,7 +222,9 @@ Context CoreContext(nb::handle object, NodePool* pool) {
   if (pool == nullptr) ThrowError(ErrorKind::kTypeError, "a context is an int, a pair of ints or None here");
   pool->release_foreign = ReleaseForeign;
   ForeignContexts& foreign = Foreign();
-  const int32_t number = foreign.next++;
+  int32_t number = foreign.next;
+  while (foreign.objects.contains(number)) number = number == std::numeric_limits<int32_t>::max() ? 1 : number + 1;
+  foreign.next = number == std::numeric_limits<int32_t>::max() ? 1 : number + 1;
   foreign.objects.emplace(number, nb::borrow(object));
   return Context::Foreign(number);
 }

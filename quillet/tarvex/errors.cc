@@ -29,7 +29,8 @@ class ParseError(Exception):
 )";
 
 PyObject* g_parse_error = nullptr;
-PyObject* g_host_syntax_error = nullptr;
+// Between a host's raise and the end of the operation of the core that it ended.
+thread_local PyObject* g_host_syntax_error = nullptr;
 
 PyObject* BuiltinFor(ErrorKind kind) {
   switch (kind) {

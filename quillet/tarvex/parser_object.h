@@ -18,6 +18,15 @@ struct AnalyzerBase : NodeConverter {};
 
 // A parser of the host's making, or that of an analyzer or a hint walker, which it then keeps alive.
 struct ParserObject : AnalyzerBase {
+  ParserObject() = default;
+  ParserObject(ParserObject&&) = default;
+  ~ParserObject() { DropEngine(); }
+  // The parser may outlive the object, but not with an engine of the object's.
+  void DropEngine() {
+    if (external) parser->set_external_engine(nullptr);
+    external.reset();
+  }
+
   std::shared_ptr<CPGenParserImpl> parser;
   nb::object version_triple;
   nb::object keywords;  // dict of text to None

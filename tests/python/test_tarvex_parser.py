@@ -112,9 +112,11 @@ def test_a_bad_grammar_is_an_error_that_says_where(tmp_path: Path) -> None:
 
 def test_a_parser_and_what_it_made_are_collected_together() -> None:
     class Mine(CPGenParserImpl):
-        pass
+        def convert(self, number: int, value: str | None, context: object, children: list[CNode] | None) -> CNode:
+            return super().convert(number, value, context, children)
 
     one = Mine((3, 8))
+    one.DiscardNode(one.ParseToNode(line_of("x = 1"), False))
     one._fParser  # noqa: B018  (made when read)
     one._fMatchCaseStatementParser  # noqa: B018
     gone = weakref.ref(one)
