@@ -12,9 +12,9 @@
 // of them an attribute or a subscript:  case.x: T   case(y).x: T   case[y][z]: T.  A pattern is none
 // of these but for one form, `case [x]: y`, which is both a sequence pattern with a body and a
 // subscript with an annotation. It is a statement where what follows cannot be an annotation (it
-// begins with a word that begins statements, or assigns more than once or with an operation) or
-// where the brackets are empty; what is left is settled as it is written: a subscript's bracket
-// touches its name, a pattern's does not.
+// begins with a word that begins statements, has an annotation of its own, or assigns more than once
+// or with an operation) or where the brackets are empty; what is left is settled as it is written: a
+// subscript's bracket touches its name, a pattern's does not.
 #include <algorithm>
 
 #include "siblings/fastaccess/operators.h"
@@ -82,17 +82,17 @@ class SoftKeywordStatement {
       return false;
     }
     size_t assignments = 0;
-    bool augmented = false;
+    bool is_statement = false;
     VisitOwnTokens(toks_, body, end_, [&](size_t i) {
       const TokenCode code = toks_[i].code;
       if (code == tok::EQUAL) {
         ++assignments;
-      } else if (IsAssignment(code)) {
-        augmented = true;
+      } else if (IsAssignment(code) || code == tok::COLON) {
+        is_statement = true;
       }
-      return true;
+      return !is_statement;
     });
-    return assignments <= 1 && !augmented;
+    return assignments <= 1 && !is_statement;
   }
 
   TokenSpan toks_;

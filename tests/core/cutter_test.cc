@@ -341,6 +341,7 @@ TEST(SoftKeywords, CaseStatementsAreFoundWithAndWithoutABody) {
                            "case[x]: return y",
                            "case[x]: y += 1",
                            "case[x]: y = z = 1",
+                           "case[x]: y: z",
                            "case[x]: yield y",
                            "case[]: y",
                            "case *a, b: c",
