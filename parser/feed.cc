@@ -153,16 +153,7 @@ CNode* CPGenParserImpl::Feed(TokenEngine& engine, TokenRun run, bool async_keywo
     last_code = first->code;
     ++i;
   }
-  for (; i < count; ++i) {
-    const Token& token = toks[i];
-    const Grammar::LabelId label = table.label[token.code];
-    if (label == Grammar::kNoLabel) [[unlikely]] {
-      if (FeedUnusual(engine, run, i, table, positions)) last_code = token.code;
-      continue;
-    }
-    engine.Add(label, table.type[token.code], token, run.IndexOf(i));
-    last_code = token.code;
-  }
+  last_code = FeedRest(engine, run, i, last_code, table, positions);
 
   const int32_t end_index = run.IndexOf(count);
   const bool lacks_body = last_code == tok::COLON;
@@ -179,11 +170,29 @@ CNode* CPGenParserImpl::Feed(TokenEngine& engine, TokenRun run, bool async_keywo
   return Unwrap(engine.Finish(), is_decorator);
 }
 
+// The tokens from `i` on; gives the code of the last one fed as itself. All that a plain token takes is
+// inlined here.
+template <class TokenEngine>
+[[gnu::flatten]] TokenCode CPGenParserImpl::FeedRest(TokenEngine& engine, TokenRun run, int64_t i, TokenCode last_code,
+                                                     const FeedTable& table, const PositionView* positions) {
+  for (const int64_t count = run.count(); i < count; ++i) {
+    const Token& token = run.toks[i];
+    const Grammar::LabelId label = table.label[token.code];
+    if (label == Grammar::kNoLabel) [[unlikely]] {
+      if (FeedUnusual(engine, run, i, table, positions)) last_code = token.code;
+      continue;
+    }
+    engine.Add(label, table.type[token.code], token, run.IndexOf(i));
+    last_code = token.code;
+  }
+  return last_code;
+}
+
 // A token without a label of its own: dropped, spelt otherwise, looked up by its text, or given to
 // the engine, which rejects it. True if it was fed as itself.
 template <class TokenEngine>
-bool CPGenParserImpl::FeedUnusual(TokenEngine& engine, TokenRun run, int64_t i, const FeedTable& table,
-                                  const PositionView* positions) {
+[[gnu::noinline]] bool CPGenParserImpl::FeedUnusual(TokenEngine& engine, TokenRun run, int64_t i,
+                                                    const FeedTable& table, const PositionView* positions) {
   const Token& token = run.toks[i];
   const int32_t index = run.IndexOf(i);
   Grammar::LabelId label = Grammar::kNoLabel;

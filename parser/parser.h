@@ -141,6 +141,9 @@ class CPGenParserImpl {
   template <class TokenEngine>
   CNode* Feed(TokenEngine& engine, TokenRun run, bool async_keyword, const PositionView* positions);
   template <class TokenEngine>
+  TokenCode FeedRest(TokenEngine& engine, TokenRun run, int64_t i, TokenCode last_code, const FeedTable& table,
+                     const PositionView* positions);
+  template <class TokenEngine>
   bool FeedUnusual(TokenEngine& engine, TokenRun run, int64_t i, const FeedTable& table, const PositionView* positions);
   CNode* Unwrap(CNode* root, bool is_decorator);
 
