@@ -5,6 +5,7 @@
 #include <array>
 #include <charconv>
 
+#include "analysis/shown_text.h"
 #include "foundations/utf8.h"
 #include "siblings/symbolinfo/symbolinfo.h"
 
@@ -71,11 +72,13 @@ void PlacedRecords::Begin(const FileAnalyzer& file, const ScopeNames& scopes) {
   file_ = &file;
   scopes_ = &scopes;
   budget_ = std::max(kSmallestBudget, kBudgetPerSourceByte * file.source().size());
+  has_odd_bytes_ = !IsWellFormedUtf8(file.source().text());
   texts_.Reset();
 }
 
 std::span<const PlacedRecord> PlacedRecords::OfRow(size_t row) {
   placed_.clear();
+  spelled_at_ = 0;
   const FileAnalyzer::LineResult& result = file_->results()[row];
   const RecordStore& store = file_->store();
   in_signature_ = result.first_in_def && file_->rows()[row].kind == LineKind::kComment && FindSignature(row);
@@ -94,21 +97,34 @@ void PlacedRecords::Add(size_t row, const Record& record, bool is_parameter) {
   if (in_signature_ && placed.kind == RecordKind::kHint) placed.is_parameter = true;
   if (name.starts_with(kArgPrefix)) [[unlikely]]
     name = ShownArgument(name);
-  placed.name = Cut(name);
-  placed.detail = Cut(placed.detail);
+  placed.name = Shown(Cut(name));
+  placed.detail = Shown(Cut(placed.detail));
 }
 
 void PlacedRecords::SetPlace(const LineRow& row, Text name, PlacedRecord& placed) {
   const SourceText& source = file_->source();
   const char* at = name.data();
-  if (name.empty() || !source.Holds(at)) {
-    const TokenSpan toks = TokenSpan(source.tokens).subspan(row.first_token, row.token_count);
-    const auto first = std::find_if(toks.begin(), toks.end(), [](const Token& tok) { return !IsSkipCode(tok.code); });
-    at = (first != toks.end() ? *first : toks.front()).text;
-  }
+  if (name.empty() || !source.Holds(at)) at = PlaceOfCopy(row, name);
   const Position position = source.PositionFrom(static_cast<int32_t>(row.first_line), at);
   placed.line = static_cast<uint32_t>(position.line) + 1;
   placed.column = static_cast<uint32_t>(position.col) + 1;
+}
+
+// Copies come in the order of their tokens, so the search goes on where the last one was found, and
+// gives up after a while.
+const char* PlacedRecords::PlaceOfCopy(const LineRow& row, Text name) {
+  constexpr uint32_t kMaxTokensSearched = 500;
+  const TokenSpan toks = TokenSpan(file_->source().tokens).subspan(row.first_token, row.token_count);
+  const Text root = RootOfName(name);
+  const auto count = static_cast<uint32_t>(toks.size());
+  for (uint32_t i = 0; i < std::min(count, kMaxTokensSearched); ++i) {
+    const uint32_t token = (spelled_at_ + i) % count;
+    if (toks[token].view() != root) continue;
+    spelled_at_ = token;
+    return toks[token].text;
+  }
+  const auto first = std::find_if(toks.begin(), toks.end(), [](const Token& tok) { return !IsSkipCode(tok.code); });
+  return (first != toks.end() ? *first : toks.front()).text;
 }
 
 void PlacedRecords::Decode(Text info, PlacedRecord& placed) {
@@ -155,7 +171,7 @@ Text PlacedRecords::ShownArgument(Text name) {
   return texts_.Copy(buffer_);
 }
 
-// ---- the budget ----
+// ---- what texts may be ----
 
 Text PlacedRecords::Cut(Text text) {
   if (text.size() <= budget_) {
@@ -167,6 +183,13 @@ Text PlacedRecords::Cut(Text text) {
   size_t size = kCutSize;
   while (size > 0 && !IsUtf8LeadByte(text[size])) --size;
   buffer_.assign(text.substr(0, size)).append(kEllipsis);
+  return texts_.Copy(buffer_);
+}
+
+Text PlacedRecords::Shown(Text text) {
+  if (!has_odd_bytes_ || IsWellFormedUtf8(text)) return text;
+  buffer_.clear();
+  AppendShown(text, buffer_);
   return texts_.Copy(buffer_);
 }
 

@@ -2,11 +2,13 @@
 // and column of the name, and the scope.
 //
 // Input: a file that was analysed, and its scopes. A name's place follows from its bytes, which nearly
-// always are a view of the source; a name that was composed stands where its statement begins.
+// always are a view of the source. A copy stands where the statement spells its first part, and a name
+// that the statement does not spell where the statement begins.
 // A signature comment on a line of its own knows parameters by their places alone; here it meets the
 // head of its function, and its records become facts about the real parameters.
 // The trap: views overlap (a.b.c.d gives four names in one), so the texts of all records together may
 // grow with the square of the source. Behind a budget in proportion to the source, long texts are cut.
+// All texts are UTF-8, whatever the source is.
 #pragma once
 
 #include <cstdint>
@@ -58,11 +60,15 @@ class PlacedRecords {
   void Decode(Text info, PlacedRecord& placed);
   bool FindSignature(size_t row);
   Text ShownArgument(Text name);
+  const char* PlaceOfCopy(const LineRow& row, Text name);
   Text Cut(Text text);
+  Text Shown(Text text);
 
   const FileAnalyzer* file_ = nullptr;
   const ScopeNames* scopes_ = nullptr;
   size_t budget_ = 0;
+  bool has_odd_bytes_ = false;
+  uint32_t spelled_at_ = 0;  // the token of the row's last copy that was found, counted from its first
   std::vector<PlacedRecord> placed_;
   std::vector<Text> parameters_;
   bool in_signature_ = false;

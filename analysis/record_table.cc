@@ -31,6 +31,17 @@ void RecordTable::Fill(const FileAnalyzer& file, const ScopeNames& scope_source,
     }
   }
   for (const Text name : scope_source.names()) scope_names.emplace_back(name);
+  definitions.reserve(scope_source.scopes().size() - 1);
+  for (const ScopeNames::Scope& scope : scope_source.scopes().subspan(1)) {
+    const LineRow& head = file.rows()[scope.row];
+    const Text own_name = scope.own_name;
+    // A head without a name stands for it.
+    const char* at =
+        file.source().Holds(own_name.data()) ? own_name.data() : file.source().tokens[head.first_token].text;
+    const Position position = file.source().PositionFrom(static_cast<int32_t>(head.first_line), at);
+    definitions.push_back({scope.name, scope.kind, static_cast<uint32_t>(position.line) + 1,
+                           static_cast<uint32_t>(position.col) + 1, head.first_line + 1, scope.last_line + 1});
+  }
 }
 
 }  // namespace quillet

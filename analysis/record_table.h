@@ -13,6 +13,14 @@
 namespace quillet {
 
 struct RecordTable {
+  // A class, a function or a type alias.
+  struct Definition {
+    uint32_t scope;  // that it opens; index in scope_names
+    ScopeNames::ScopeKind kind;
+    uint32_t line, column;           // of its name, from 1
+    uint32_t first_line, last_line;  // of its head's first line and of its body's last statement, from 1
+  };
+
   std::vector<uint32_t> lines;    // from 1
   std::vector<uint32_t> columns;  // from 1, in UTF-8 bytes
   std::vector<uint32_t> scopes;   // index in scope_names
@@ -23,6 +31,7 @@ struct RecordTable {
   std::string names;
   std::string details;
   std::vector<std::string> scope_names;  // that of the module first
+  std::vector<Definition> definitions;   // in order of their heads
 
   size_t size() const { return lines.size(); }
   Text NameAt(size_t i) const { return Slice(names, name_offsets, i); }

@@ -5,6 +5,7 @@
 
 #include <algorithm>
 
+#include "analysis/shown_text.h"
 #include "siblings/symbolinfo/symbolinfo.h"
 
 namespace quillet {
@@ -56,35 +57,42 @@ uint32_t ScopeNames::ScopeOpenedBy(size_t row) const {
 
 void ScopeNames::FindScopes(const FileAnalyzer& file) {
   const std::span<const LineRow> rows = file.rows();
-  scopes_.push_back({kNone, kNone, InternName(""), ScopeKind::kModule, false});
+  scopes_.push_back({kNone, kNone, 0, InternName(""), {}, ScopeKind::kModule, false});
   row_scopes_.resize(rows.size());
   open_.assign(1, 0);
   for (uint32_t i = 0; i < rows.size(); ++i) {
     const LineRow& row = rows[i];
     if (row.kind != LineKind::kBlankLine) open_.resize(std::min<size_t>(open_.size(), file.results()[i].depth + 1));
     row_scopes_[i] = open_.back();
-    if (row.kind != LineKind::kFunctionDef && row.kind != LineKind::kClassDef && row.kind != LineKind::kTypeStatement)
-      continue;
-    const TokenSpan toks = TokenSpan(file.source().tokens).subspan(row.first_token, row.token_count);
+    if (row.kind == LineKind::kBlankLine || row.kind == LineKind::kComment) continue;
+    scopes_[open_.back()].last_line = row.last_line;
     if (row.kind == LineKind::kTypeStatement) {
-      Open(open_.back(), i, ScopeKind::kTypeAlias, NameOfHead(toks));
-    } else {
-      const ScopeKind kind = row.kind == LineKind::kClassDef ? ScopeKind::kClass : ScopeKind::kFunction;
-      open_.push_back(Open(open_.back(), i, kind, NameOfHead(toks)));
+      Open(file, i, ScopeKind::kTypeAlias);
+    } else if (row.kind == LineKind::kFunctionDef || row.kind == LineKind::kClassDef) {
+      const bool is_class = row.kind == LineKind::kClassDef;
+      open_.push_back(Open(file, i, is_class ? ScopeKind::kClass : ScopeKind::kFunction));
     }
+  }
+  // A scope ends no earlier than those inside it, which stand behind it.
+  for (size_t i = scopes_.size(); i-- > 1;) {
+    Scope& around = scopes_[scopes_[i].parent];
+    around.last_line = std::max(around.last_line, scopes_[i].last_line);
   }
 }
 
-uint32_t ScopeNames::Open(uint32_t parent, uint32_t row, ScopeKind kind, Text own_name) {
+uint32_t ScopeNames::Open(const FileAnalyzer& file, uint32_t row, ScopeKind kind) {
+  const LineRow& head = file.rows()[row];
+  const Text own_name = NameOfHead(TokenSpan(file.source().tokens).subspan(head.first_token, head.token_count));
+  const uint32_t parent = open_.back();
   const Text around = NameOf(scopes_[parent]);
   uint32_t name = scopes_[parent].name;
   if (around.size() + 1 + own_name.size() <= kMaxNameSize) {
     buffer_.assign(around);
     if (!around.empty()) buffer_ += '.';
-    buffer_ += own_name;
+    AppendShown(own_name, buffer_);
     name = InternName(buffer_);
   }
-  scopes_.push_back({parent, row, name, kind, false});
+  scopes_.push_back({parent, row, head.last_line, name, own_name, kind, false});
   return static_cast<uint32_t>(scopes_.size() - 1);
 }
 

@@ -39,9 +39,11 @@ class ScopeNames {
 
   enum class ScopeKind : uint8_t { kModule, kClass, kFunction, kTypeAlias };
   struct Scope {
-    uint32_t parent;  // kNone for the module
-    uint32_t row;     // of its head; kNone for the module
-    uint32_t name;    // index in names()
+    uint32_t parent;     // kNone for the module
+    uint32_t row;        // of its head; kNone for the module
+    uint32_t last_line;  // from 0, of its last statement
+    uint32_t name;       // index in names()
+    Text own_name;       // as the head spells it; empty for the module
     ScopeKind kind;
     bool has_declarations;  // holds a `global` or `nonlocal` statement
   };
@@ -82,7 +84,7 @@ class ScopeNames {
   void FindScopes(const FileAnalyzer& file);
   void FindDeclarations(const FileAnalyzer& file);
   void ResolveNonlocals(const FileAnalyzer& file);
-  uint32_t Open(uint32_t parent, uint32_t row, ScopeKind kind, Text own_name);
+  uint32_t Open(const FileAnalyzer& file, uint32_t row, ScopeKind kind);
   uint32_t InternName(Text dotted);
   uint32_t DeclaredScope(uint32_t scope, const Record& record) const;
 

@@ -27,7 +27,8 @@ from pathlib import Path
 
 from quillet import Record, analyze
 from quillet._trees import tree_text
-from quillet.cli.output import TextWriter
+from quillet._batch import write_files
+from quillet.cli.output import output_format
 from quillet.cli.show import Style
 
 ROOT = Path(__file__).resolve().parent.parent
@@ -66,7 +67,9 @@ def tree_view(source: str, version: tuple[int, int], _: str) -> str:
 
 def analyze_view(source: str, version: tuple[int, int], file: str) -> str:
     """What `quillet analyze` prints."""
-    return TextWriter(errors_only=False, style=Style(on=False)).file(file, analyze(source, version=version))
+    inputs = [(file.encode(), source.encode(), None)]
+    form = output_format("text", errors_only=False, style=Style(on=False))
+    return "".join(result.output.decode() for result in write_files(inputs, version=version, jobs=1, form=form))
 
 
 VIEWS = {"records": records_view, "tree": tree_view, "analyze": analyze_view}

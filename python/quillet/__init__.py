@@ -10,13 +10,14 @@ from __future__ import annotations
 from typing import TYPE_CHECKING
 
 if TYPE_CHECKING:
-    from quillet._batch import FileAnalyses, FileAnalysis, FileRecord, FileRecords, analyze_files
+    from quillet._batch import Definition, FileAnalyses, FileAnalysis, FileRecord, FileRecords, analyze_files
     from quillet._records import Record, RecordKind
     from quillet._source import SourceEncodingError
     from quillet.host import Analysis, Line, analyze, analyzer_for, language_version
 
 __all__ = [
     "Analysis",
+    "Definition",
     "FileAnalyses",
     "FileAnalysis",
     "FileRecord",
@@ -32,6 +33,7 @@ __all__ = [
 ]
 
 _HOMES = {
+    "Definition": "_batch",
     "FileAnalyses": "_batch",
     "FileAnalysis": "_batch",
     "FileRecord": "_batch",

@@ -23,6 +23,9 @@ StrPath = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
 
 # What the core knows as kinds, in its order.
 _KINDS = tuple(RecordKind(word) for word in _host.RECORD_KIND_WORDS)
+# A file to analyse: its name, its source where that is at hand, and why it cannot be read where that is
+# known.
+BatchInput = tuple[bytes, Union[bytes, None], Union[bytes, None]]
 # How many records become objects at a time where all are iterated over.
 _CHUNK = 4096
 
@@ -44,6 +47,21 @@ class FileRecord(NamedTuple):
     kind: RecordKind
     detail: str
     is_parameter: bool
+
+
+class Definition(NamedTuple):
+    """A class, a function or a type alias: `kind` is "class", "def" or "type", `scope` what it opens.
+
+    `line` and `column` are those of its name, `first_line` and `last_line` those of its head and of the
+    last statement of its body. All count from 1.
+    """
+
+    scope: str
+    kind: str
+    line: int
+    column: int
+    first_line: int
+    last_line: int
 
 
 class FileRecords(Sequence[FileRecord]):
@@ -123,6 +141,11 @@ class FileAnalysis:
     def records(self) -> FileRecords:
         return FileRecords(self._native)
 
+    @property
+    def definitions(self) -> list[Definition]:
+        """The classes, functions and type aliases, in the order in which they begin."""
+        return self._native.Definitions(Definition)
+
     def __repr__(self) -> str:
         what = self.problem or f"{self.lines} lines, {len(self.records)} records"
         return f"<FileAnalysis {self.path!r}: {what}>"
@@ -179,18 +202,33 @@ def analyze_files(
     (2, 9, 'Shop', 'total', 'set')
     (2, 15, 'Shop.total', 'self', 'set')
     """
-    native_language = native_language_of(version)
+    language = native_language_of(version)
     count = jobs_of(jobs)
     names: list[str] = []
-    inputs: list[tuple[bytes, bytes | None, bytes | None]] = []
+    inputs: list[BatchInput] = []
     for item in paths:
         path, source = item if isinstance(item, tuple) else (item, None)
-        name = os.fsencode(path)
         if source is not None and not isinstance(source, bytes):
             raise TypeError(f"a source must be bytes, not {type(source).__name__}")
         names.append(os.fsdecode(path))
-        inputs.append((name, source, None))
-    return FileAnalyses(names, _host.Batch(native_language, inputs, count, decode_source))
+        inputs.append((os.fsencode(path), source, None))
+    return FileAnalyses(names, _host.Batch(language, inputs, count, decode_source, None))
+
+
+def write_files(
+    inputs: Iterable[BatchInput], *, version: tuple[int, ...] | None, jobs: int | None, form: tuple[object, ...]
+) -> Iterator[_host.FileResult]:
+    """Analyses files and writes what was found: each result has the `output` of a format.
+
+    The formats are ("jsonl", errors_only) and ("text", errors_only, colours, width_of), where `width_of`
+    gives the cells that a code point takes on a terminal.
+    """
+    batch = _host.Batch(native_language_of(version), inputs, jobs_of(jobs), decode_source, form)
+    try:
+        while (result := batch.Next()) is not None:
+            yield result
+    finally:
+        batch.Cancel()
 
 
 def jobs_of(jobs: int | None) -> int:

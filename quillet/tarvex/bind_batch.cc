@@ -14,6 +14,8 @@
 
 #include "analysis/batch.h"
 #include "analysis/file_analyzer.h"
+#include "analysis/json_lines.h"
+#include "analysis/text_lines.h"
 #include "quillet/tarvex/bindings.h"
 #include "quillet/tarvex/convert.h"
 
@@ -82,6 +84,29 @@ struct FileResult {
     return list;
   }
 
+  nb::list Definitions(nb::handle row_class) const {
+    nb::list list;
+    for (const RecordTable::Definition& definition : result.table.definitions) {
+      list.append(row_class(Checked(ShownText(result.table.scope_names[definition.scope])), WordOf(definition.kind),
+                            definition.line, definition.column, definition.first_line, definition.last_line));
+    }
+    return list;
+  }
+
+  static const char* WordOf(ScopeNames::ScopeKind kind) {
+    switch (kind) {
+      case ScopeNames::ScopeKind::kModule:
+        return "module";
+      case ScopeNames::ScopeKind::kClass:
+        return "class";
+      case ScopeNames::ScopeKind::kFunction:
+        return "def";
+      case ScopeNames::ScopeKind::kTypeAlias:
+        return "type";
+    }
+    return "";
+  }
+
   // Records as instances of a class that derives from tuple, with the host's own objects for kinds.
   nb::list Rows(size_t begin, size_t end, nb::handle row_class, nb::tuple kinds) const {
     const RecordTable& table = result.table;
@@ -128,8 +153,9 @@ std::vector<BatchInput> InputsOf(nb::handle sequence) {
 
 class FileBatch {
  public:
-  FileBatch(const Language& language, nb::handle inputs, unsigned jobs, nb::object decode)
+  FileBatch(const Language& language, nb::handle inputs, unsigned jobs, nb::object decode, nb::object format)
       : decode_(std::move(decode)),
+        format_(std::move(format)),
         batch_(std::make_unique<BatchAnalyzer>(OptionsOf(language, jobs), InputsOf(inputs))) {}
   ~FileBatch() { Cancel(); }
   FileBatch(const FileBatch&) = delete;
@@ -177,10 +203,30 @@ class FileBatch {
         return false;
       }
     };
+    options.make_writer = WriterMaker();
     return options;
   }
 
+  // The format is None, ("jsonl", errors_only) or ("text", errors_only, colours, width of a character).
+  std::function<std::unique_ptr<FileWriter>()> WriterMaker() const {
+    if (format_.is_none()) return {};
+    const auto format = nb::cast<nb::tuple>(format_);
+    const bool errors_only = nb::cast<bool>(format[1]);
+    if (nb::cast<std::string>(format[0]) == "jsonl") {
+      const JsonLinesOptions options{errors_only};
+      return [options] { return MakeJsonLinesWriter(options); };
+    }
+    TextLinesOptions options{errors_only, nb::cast<bool>(format[2]), {}};
+    PyObject* const width_of = nb::handle(format[3]).ptr();
+    options.width_of = [width_of](uint32_t code_point) {
+      nb::gil_scoped_acquire lock;
+      return nb::cast<uint32_t>(nb::handle(width_of)(code_point));
+    };
+    return [options] { return MakeTextLinesWriter(options); };
+  }
+
   nb::object decode_;
+  nb::object format_;
   std::mutex reader_mutex_;
   std::unique_ptr<BatchAnalyzer> batch_;
 };
@@ -219,11 +265,14 @@ void BindBatch(nb::module_& tarvex) {
       .def_prop_ro("errors", [](const FileResult& self) { return self.Messages(self.result.errors); })
       .def_prop_ro("reports", [](const FileResult& self) { return self.Messages(self.result.reports); })
       .def_prop_ro("record_count", [](const FileResult& self) { return self.result.table.size(); })
+      .def_prop_ro("output", [](const FileResult& self) { return BytesOf(self.result.output); })
+      .def("Definitions", &FileResult::Definitions, nb::arg("row_class"),
+           "Classes, functions and type aliases: row_class(scope, kind, line, column, first_line, last_line).")
       .def("Rows", &FileResult::Rows, nb::arg("begin"), nb::arg("end"), nb::arg("row_class"), nb::arg("kinds"),
            "Records from `begin` up to `end` as instances of a class that derives from tuple.");
   nb::class_<FileBatch>(host, "Batch", "Files through the native path, on threads without the interpreter lock.")
-      .def(nb::init<const Language&, nb::handle, unsigned, nb::object>(), nb::arg("language"), nb::arg("inputs"),
-           nb::arg("jobs"), nb::arg("decode"))
+      .def(nb::init<const Language&, nb::handle, unsigned, nb::object, nb::object>(), nb::arg("language"),
+           nb::arg("inputs"), nb::arg("jobs"), nb::arg("decode"), nb::arg("format").none())
       .def("Next", &FileBatch::Next, "The next file's result, in the order of the inputs; None at the end.")
       .def("Cancel", &FileBatch::Cancel, "Stops after the files under way.");
 }

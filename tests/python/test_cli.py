@@ -147,8 +147,8 @@ def test_json_lines_have_stable_keys() -> None:
         "in_async_def": False,
         "first_in_def": False,
         "records": [
-            {"name": "f", "kind": "set", "detail": "", "is_parameter": False},
-            {"name": "a", "kind": "set", "detail": "", "is_parameter": True},
+            {"name": "f", "kind": "set", "detail": "", "is_parameter": False, "line": 1, "column": 5, "scope": ""},
+            {"name": "a", "kind": "set", "detail": "", "is_parameter": True, "line": 1, "column": 7, "scope": "f"},
         ],
     }
 

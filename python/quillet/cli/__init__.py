@@ -43,6 +43,12 @@ def main() -> None:
 @click.option("--errors-only", is_flag=True, help="Show syntax errors alone.")
 @click.option("--strict", is_flag=True, help="Exit with 1 where a syntax error was found.")
 @click.option("--no-gitignore", is_flag=True, help="Analyse what .gitignore files exclude, too.")
+@click.option(
+    "--jobs",
+    type=click.IntRange(1, 1024),
+    metavar="N",
+    help="How many files to analyse at once; one a core without it.",
+)
 @_stdin_filename
 def analyze(
     paths: tuple[str, ...],
@@ -51,6 +57,7 @@ def analyze(
     errors_only: bool,
     strict: bool,
     no_gitignore: bool,
+    jobs: int | None,
     stdin_filename: str,
 ) -> None:
     """Analyses files and folders, and standard input for "-".
@@ -69,6 +76,7 @@ def analyze(
             strict=strict,
             gitignore=not no_gitignore,
             stdin_filename=stdin_filename,
+            jobs=jobs,
         )
     )
 

@@ -33,7 +33,7 @@ class Style:
     """Colours, or none where the stream is no terminal or NO_COLOR is set."""
 
     def __init__(self, on: bool) -> None:
-        self._on = on
+        self.on = on
 
     @classmethod
     def of_stdout(cls) -> Style:
@@ -41,7 +41,7 @@ class Style:
         return cls(wanted and sys.stdout.isatty())
 
     def _wrap(self, code: str, text: str) -> str:
-        return f"\x1b[{code}m{text}\x1b[0m" if self._on and text else text
+        return f"\x1b[{code}m{text}\x1b[0m" if self.on and text else text
 
     def place(self, text: str) -> str:
         return self._wrap("36", text)

@@ -1,0 +1,32 @@
+// A file's statements and their records as text for people: `path:line: statement` and the records below
+// it, a syntax error with its source line and a caret. docs/cli.md shows both.
+//
+// Source text and file names come from anywhere, so whatever moves a terminal's cursor, changes its
+// state or reverses its text is shown as an escape. How wide a character is on a terminal is known to
+// the host alone; ASCII is settled here.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "analysis/batch.h"
+
+namespace quillet {
+
+// Appends a text with control characters as escapes, and odd bytes as the surrogates that Python has for
+// them: one line, safe to show. Tabs are kept.
+void AppendPrintable(Text text, std::string& out);
+
+// Appends a record's kind and detail as a phrase that follows its name.
+void AppendDescription(const PlacedRecord& record, std::string& out);
+
+struct TextLinesOptions {
+  bool errors_only = false;
+  bool colours = false;
+  // The cells that a character beyond ASCII takes on a terminal; without it, one. For any thread.
+  std::function<uint32_t(uint32_t code_point)> width_of;
+};
+std::unique_ptr<FileWriter> MakeTextLinesWriter(const TextLinesOptions& options);
+
+}  // namespace quillet
