@@ -167,4 +167,23 @@ def stats(as_json: bool, index: str | None) -> None:
     sys.exit(run(index=index, as_json=as_json))
 
 
-COMMANDS = (index, find, defs, outline, stats)
+@click.command()
+@click.argument("form", metavar="FORMAT", type=click.Choice(["tags", "scip", "jsonl"]))
+@click.option("-o", "--output", metavar="FILE", type=click.Path(), help='Where to; "-" is standard output.')
+@_index_option
+def export(form: str, output: str | None, index: str | None) -> None:
+    """Writes the index as tags (for editors), scip (for code intelligence servers) or jsonl (for programs).
+
+    Without -o tags go to "tags", scip to "index.scip", jsonl to standard output.
+
+    \b
+        quillet export tags
+        quillet export scip -o index.scip
+        quillet export jsonl | head
+    """
+    from quillet.cli.export import run
+
+    sys.exit(run(form, output=output, index=index))
+
+
+COMMANDS = (index, find, defs, outline, stats, export)

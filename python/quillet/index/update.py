@@ -2,8 +2,8 @@
 
 A file whose size and time of change are as they were is not opened; one whose content has the hash that
 it had is not analysed. Files below the folders of the run that are gone leave the index. The trap: a file
-may be written again within the clock's grain, so a time that is too young to trust is not kept, and the
-hash is taken before the analysis, so that a change between the two is seen by the next run.
+may be written again within the clock's grain, so a time that is too young to trust is not kept; and size
+and time are taken before the content, so that a change between the two is seen by the next run.
 """
 
 from __future__ import annotations
@@ -28,6 +28,7 @@ from quillet.index.store import (
     RECORDS_BY_NAME,
     IndexProblem,
     explained,
+    open_to_read,
     open_to_write,
     tail_of,
     write_lock,
@@ -97,7 +98,7 @@ def update(index: str, settings: Settings, reports: Reports) -> Outcome:
             connection.close()
 
 
-def _engine() -> str:
+def engine_version() -> str:
     """The version of the engine, whose change makes all that was found before worth finding again."""
     from importlib.metadata import PackageNotFoundError, version
 
@@ -105,6 +106,18 @@ def _engine() -> str:
         return version("quillet")
     except PackageNotFoundError:  # run from a build folder
         return "0"
+
+
+def watched_paths(index: str, settings: Settings) -> tuple[tuple[str, ...], bool]:
+    """What a run with these settings looks at: the paths, and whether .gitignore files count."""
+    base = os.path.dirname(os.path.abspath(index))
+    connection = open_to_read(index)
+    try:
+        remembered = dict(connection.execute("SELECT key, value FROM meta"))
+    finally:
+        connection.close()
+    roots = tuple(os.path.join(base, root) for root in json.loads(remembered["roots"]))
+    return settings.paths or roots, bool(remembered["gitignore"])
 
 
 class _Run:
@@ -131,7 +144,7 @@ class _Run:
             version = int(major), int(minor)
         self._version = version or sys.version_info[:2]
         python = "{}.{}".format(*self._version)
-        self._made_by = f"quillet {_engine()}, python {python}"
+        self._made_by = f"quillet {engine_version()}, python {python}"
         named = [os.path.abspath(path) for path in settings.paths]
         roots = [root for root in dict.fromkeys([*roots, *named]) if os.path.exists(root)]
         relative = [os.fsdecode(stored_path(root, base)) for root in roots]
@@ -207,20 +220,23 @@ class _Run:
     def _take(self, batch: list[_Candidate]) -> None:
         """Brings the index up to date with a batch of files, in one transaction."""
         changed: list[tuple[_Candidate, bytes]] = []
+        sources: list[tuple[str, bytes]] = []
         touched: list[tuple[int, int, int]] = []
         gone: list[int] = []
         for candidate in batch:
             known = self._known.get(candidate.stored)
             try:
                 with open(candidate.path, "rb") as file:
-                    digest = blake2b(file.read(), digest_size=16).digest()
+                    source = file.read()
             except OSError as error:
                 self._report(candidate.path, problem_of(error))
                 if known is not None:
                     gone.append(known.id)
                 continue
+            digest = blake2b(source, digest_size=16).digest()
             if known is None or known.hash != digest or known.made_by != self._made_by:
                 changed.append((candidate, digest))
+                sources.append((candidate.path, source))
                 continue
             if known.problem is not None:
                 self._report(candidate.path, known.problem)
@@ -228,7 +244,7 @@ class _Run:
                 touched.append((candidate.size, candidate.mtime_ns, known.id))
         if not (changed or touched or gone):
             return
-        facts = facts_of_files([candidate.path for candidate, _ in changed], self._version, self._jobs)
+        facts = facts_of_files(sources, self._version, self._jobs)
         with self._transaction() as connection:
             connection.executemany("UPDATE files SET size = ?, mtime_ns = ? WHERE id = ?", touched)
             self._remove(gone)
@@ -269,10 +285,15 @@ class _Run:
         name_id = self._names.id_of
         detail_id = self._details.id_of
         kinds = KIND_NUMBER
-        rows = [
-            (number, name_id(name), name_id(scope), line, column, kinds[kind], parameter, opens, detail_id(detail))
-            for number, (line, column, scope, name, kind, detail, parameter, opens) in enumerate(facts, first)
-        ]
+        opens = found.opens
+        rows = []
+        for number, (line, column, scope, name, kind, detail, is_parameter) in enumerate(facts, first):
+            opened = 0 if kind != "set" or is_parameter else opens.get((line, column), 0)
+            name_number, scope_number, detail_number = name_id(name), name_id(scope), detail_id(detail)
+            kind_number = kinds[kind]
+            rows.append(
+                (number, name_number, scope_number, line, column, kind_number, is_parameter, opened, detail_number)
+            )
         self._names.write_new()
         self._details.write_new()
         connection.executemany("INSERT INTO records VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?)", rows)

@@ -1,0 +1,74 @@
+"""`quillet export`: an index as a tags file, as SCIP or as JSON lines."""
+
+from __future__ import annotations
+
+import os
+import sys
+import tempfile
+from collections.abc import Iterator
+
+from quillet.cli.find import fail
+from quillet.cli.show import printable
+from quillet.cli.streams import quiet_output
+from quillet.index.questions import Index
+from quillet.index.store import IndexProblem, find_index
+
+_NAMES = {"tags": "tags", "scip": "index.scip", "jsonl": "-"}
+
+
+def run(form: str, *, output: str | None, index: str | None) -> int:
+    """Runs the command and returns its exit code."""
+    target = output or _NAMES[form]
+    try:
+        with Index(index or find_index()) as opened:
+            base = os.getcwd() if target == "-" else os.path.dirname(os.path.abspath(target))
+            parts = _parts(opened, form, base)
+            if target == "-":
+                with quiet_output() as out:
+                    for part in parts:
+                        out.flush()
+                        out.buffer.write(part)
+            else:
+                _write(target, parts)
+    except IndexProblem as problem:
+        return fail(problem)
+    except OSError as error:
+        print(f"quillet: {printable(target)}: {error.strerror or error}", file=sys.stderr)
+        return 2
+    return 0
+
+
+def _parts(index: Index, form: str, base: str) -> Iterator[bytes]:
+    if form == "tags":
+        from quillet.index.tags import tag_lines
+
+        yield from (line + b"\n" for line in tag_lines(index, base))
+    elif form == "scip":
+        from quillet.index.scip import scip_parts
+        from quillet.index.update import engine_version
+
+        yield from scip_parts(index, index.base, engine_version(), _say_skipped)
+    else:
+        from quillet.index.jsonl import json_lines
+
+        yield from (line.encode("ascii") + b"\n" for line in json_lines(index, base))
+
+
+def _say_skipped(path: str) -> None:
+    print(f"quillet: {printable(path)}: left out, as it lies outside the index's folder", file=sys.stderr)
+
+
+def _write(target: str, parts: Iterator[bytes]) -> None:
+    """Writes a file beside the target and puts it in its place, so that nobody reads half of one."""
+    folder = os.path.dirname(os.path.abspath(target))
+    handle, path = tempfile.mkstemp(prefix=".quillet-", dir=folder)
+    try:
+        with os.fdopen(handle, "wb") as file:
+            file.writelines(parts)
+        umask = os.umask(0)
+        os.umask(umask)
+        os.chmod(path, 0o666 & ~umask)
+        os.replace(path, target)
+    except BaseException:
+        os.unlink(path)
+        raise
