@@ -12,9 +12,9 @@
 // of them an attribute or a subscript:  case.x: T   case(y).x: T   case[y][z]: T.  A pattern is none
 // of these but for one form, `case [x]: y`, which is both a sequence pattern with a body and a
 // subscript with an annotation. It is a statement where what follows cannot be an annotation (it
-// begins with a word that begins statements, has an annotation of its own, or assigns more than once
-// or with an operation) or where the brackets are empty; what is left is settled as it is written: a
-// subscript's bracket touches its name, a pattern's does not.
+// begins with a word that begins statements, is a tuple, has an annotation of its own, or assigns more
+// than once or with an operation) or where the brackets are empty; what is left is settled as it is
+// written: a subscript's bracket touches its name, a pattern's does not.
 #include <algorithm>
 
 #include "siblings/fastaccess/operators.h"
@@ -78,7 +78,8 @@ class SoftKeywordStatement {
   // An expression, with at most one "=" behind it.
   bool CanBeAnnotation(size_t body) const {
     const TokenCode begin = toks_[body].code;
-    if (OnlyBeginsStatement(begin) || begin == word::kFrom || begin == word::kNonlocal || begin == word::kYield) {
+    if (OnlyBeginsStatement(begin) || begin == word::kFrom || begin == word::kNonlocal || begin == word::kYield ||
+        begin == tok::STAR) {
       return false;
     }
     size_t assignments = 0;
@@ -87,7 +88,7 @@ class SoftKeywordStatement {
       const TokenCode code = toks_[i].code;
       if (code == tok::EQUAL) {
         ++assignments;
-      } else if (IsAssignment(code) || code == tok::COLON) {
+      } else if (IsAssignment(code) || code == tok::COLON || (code == tok::COMMA && assignments == 0)) {
         is_statement = true;
       }
       return !is_statement;
