@@ -14,7 +14,6 @@ import click
 from quillet.cli.index_commands import COMMANDS
 from quillet.cli.options import python_option
 
-
 _stdin_filename = click.option(
     "--stdin-filename",
     metavar="NAME",

@@ -27,9 +27,7 @@ class FileFacts(NamedTuple):
     problem: str | None
 
 
-def facts_of_files(
-    sources: list[tuple[str, bytes]], version: tuple[int, int], jobs: int | None
-) -> Iterator[FileFacts]:
+def facts_of_files(sources: list[tuple[str, bytes]], version: tuple[int, int], jobs: int | None) -> Iterator[FileFacts]:
     """The facts of files by path and content, in their order."""
     from quillet import analyze_files
 

@@ -7,12 +7,11 @@ their records by an index on those. A dotted suffix is found by what stands behi
 from __future__ import annotations
 
 import os
-import sqlite3
 from collections.abc import Iterable, Iterator, Sequence
 from typing import Any, NamedTuple
 
-from quillet.index.store import CLASS, FILE_SHIFT, FUNCTION, KIND_NUMBER, KINDS, explained, open_to_read, tail_of
 from quillet.index.paths import full_path, stored_path
+from quillet.index.store import CLASS, FILE_SHIFT, FUNCTION, KIND_NUMBER, KINDS, explained, open_to_read, tail_of
 
 # What the options of `quillet find` ask for. A record is wanted when one of the roles takes it.
 ROLES = {
@@ -199,7 +198,9 @@ class Index:
 
     def counts(self) -> dict[str, int]:
         """Totals: files, lines, records, names."""
-        files, lines, records = self._rows("SELECT count(*), coalesce(sum(lines), 0), coalesce(sum(records), 0) FROM files")[0]
+        files, lines, records = self._rows(
+            "SELECT count(*), coalesce(sum(lines), 0), coalesce(sum(records), 0) FROM files"
+        )[0]
         return {"files": files, "lines": lines, "records": records}
 
     def most_used(self, count: int) -> list[tuple[str, int]]:
@@ -222,7 +223,7 @@ class Index:
         """A file's path for people: from the working folder where it lies below it."""
         path = self.full_path(stored)
         relative = os.path.relpath(path)
-        return path if relative.startswith("..") else relative
+        return path if relative.split(os.sep, 1)[0] == ".." else relative
 
 
 def match_of(name: str) -> str:

@@ -15,7 +15,7 @@ from quillet.index.questions import Hit, Index
 from quillet.index.store import CLASS, FUNCTION
 
 _PSEUDO_TAGS = (
-    b"!_TAG_FILE_FORMAT\t2\t/extended format; --format=1 will not append ;\" to lines/",
+    b'!_TAG_FILE_FORMAT\t2\t/extended format; --format=1 will not append ;" to lines/',
     b"!_TAG_FILE_SORTED\t1\t/0=unsorted, 1=sorted, 2=foldcase/",
     b"!_TAG_KIND_DESCRIPTION!Python\tc,class\t/classes/",
     b"!_TAG_KIND_DESCRIPTION!Python\tf,function\t/functions/",

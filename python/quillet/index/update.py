@@ -339,9 +339,7 @@ class _Run:
                     "DELETE FROM names WHERE id <> 0 AND id NOT IN"
                     " (SELECT name FROM records UNION SELECT scope FROM records)"
                 )
-                connection.execute(
-                    "DELETE FROM details WHERE id <> 0 AND id NOT IN (SELECT detail FROM records)"
-                )
+                connection.execute("DELETE FROM details WHERE id <> 0 AND id NOT IN (SELECT detail FROM records)")
                 replaced = 0
             connection.execute("INSERT OR REPLACE INTO meta VALUES ('replaced', ?)", (replaced,))
 
@@ -365,7 +363,9 @@ class _Texts:
     def __init__(self, connection: sqlite3.Connection, table: str, column: str, *, empty: bool) -> None:
         self._connection = connection
         self._select = f"SELECT id FROM {table} WHERE {column} = ?"
-        self._insert = f"INSERT INTO {table} VALUES (?, ?, ?)" if table == "names" else f"INSERT INTO {table} VALUES (?, ?)"
+        self._insert = (
+            f"INSERT INTO {table} VALUES (?, ?, ?)" if table == "names" else f"INSERT INTO {table} VALUES (?, ?)"
+        )
         self._with_tail = table == "names"
         self._empty = empty
         self._ids: dict[str, int] = {"": 0}

@@ -1,0 +1,78 @@
+"""What the tests of the index share: the command as a process, and folders of source."""
+
+from __future__ import annotations
+
+import json
+import os
+import subprocess
+import sys
+from pathlib import Path
+
+from quillet.index.questions import Index
+
+ENVIRONMENT = {**os.environ, "PYTHONUTF8": "1", "NO_COLOR": "1"}
+COMMAND = [sys.executable, "-m", "quillet"]
+
+SHOP = """\
+import os.path
+from decimal import Decimal as D
+
+LIMIT: int = 10
+
+
+class Item:
+    price = D(0)
+
+    def __init__(self, price: D) -> None:
+        self.price = price
+
+
+class Shop:
+    def add(self, item: Item, count=1):
+        for one in range(count):
+            self.items.append(item)
+        return self.items
+
+    def path(self, name):
+        return os.path.join('shop', name)
+
+
+def main():
+    shop = Shop()
+    shop.add(Item(D(3)), 2)
+"""
+
+
+def run(*arguments: str | Path, cwd: Path) -> subprocess.CompletedProcess[str]:
+    return subprocess.run(
+        [*COMMAND, *map(str, arguments)],
+        capture_output=True,
+        cwd=cwd,
+        env=ENVIRONMENT,
+        timeout=120,
+        check=False,
+        encoding="utf-8",
+        errors="surrogateescape",
+    )
+
+
+def make_index(folder: Path, **files: str) -> None:
+    """Writes `name.py` for each keyword, and indexes the folder."""
+    for name, text in files.items():
+        (folder / f"{name}.py").write_text(text, encoding="utf-8")
+    result = run("index", ".", "-q", cwd=folder)
+    assert result.returncode == 0, result.stderr
+
+
+def content(index: Path) -> dict[bytes, list[tuple[object, ...]]]:
+    """All that an index says, by file: to compare two indexes that were made by different ways."""
+    with Index(str(index)) as opened:
+        return {row.path: [row[4:], sorted(opened.records_of(row)), opened.errors_of(row)] for row in opened.files()}
+
+
+def found(*arguments: str, cwd: Path) -> list[str]:
+    """The places that `quillet find` names, as line:column of the one file there is."""
+    result = run("find", "--json", *arguments, cwd=cwd)
+    rows = [json.loads(line) for line in result.stdout.splitlines()]
+    assert result.returncode == (0 if rows else 1), result.stderr
+    return list(dict.fromkeys(f"{row['line']}:{row['column']}" for row in rows))

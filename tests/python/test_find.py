@@ -1,0 +1,198 @@
+"""Questions to an index: which records answer, how they are shown, how the command ends."""
+
+from __future__ import annotations
+
+import json
+import sys
+from pathlib import Path
+
+import pytest
+
+from indexing import SHOP, found, make_index, run
+from quillet.index.questions import match_of, scope_matches
+
+
+@pytest.fixture
+def shop(tmp_path: Path) -> Path:
+    make_index(tmp_path, shop=SHOP)
+    return tmp_path
+
+
+@pytest.mark.parametrize(
+    ("arguments", "places"),
+    [
+        (["LIMIT"], ["4:1"]),
+        (["D", "--import"], ["2:32"]),
+        (["os.path.join", "--call"], ["21:16"]),
+        (["join"], []),
+        ([".join", "--get"], ["21:16"]),
+        (["join", "--match", "suffix", "--call"], ["21:16"]),
+        (["path.join", "--match", "suffix", "--call"], ["21:16"]),
+        (["ath.join", "--match", "suffix"], []),
+        (["self.price", "--set"], ["11:9"]),
+        ([".price", "--set"], ["11:9"]),
+        (["*price", "--set"], ["8:5", "11:9"]),
+        (["item", "--param"], ["15:19"]),
+        (["item", "--set"], []),
+        (["item", "--hint"], ["15:19"]),
+        (["item", "--param", "--get"], ["15:19", "17:31"]),
+        (["Item", "--call"], ["26:14"]),
+        (["shop.add", "--call"], ["26:5"]),
+        (["Shop.add"], ["15:9"]),
+        (["Shop.add", "--return"], ["18:9"]),
+        (["add", "--return"], ["18:9"]),
+        (["price", "--scope", "Item", "--set"], ["8:5"]),
+        (["name", "--scope", "path"], ["20:20", "21:37"]),
+        (["name", "--scope", "Shop.path"], ["20:20", "21:37"]),
+        (["name", "--scope", "Item"], []),
+        (["nowhere"], []),
+    ],
+)
+def test_the_places_of_a_name(shop: Path, arguments: list[str], places: list[str]) -> None:
+    assert found(*arguments, cwd=shop) == places
+
+
+def test_a_place_is_one_line_with_its_source(shop: Path) -> None:
+    result = run("find", "os.path.join", cwd=shop)
+    assert (result.returncode, result.stderr) == (0, "")
+    assert result.stdout == "shop.py:21:16: return os.path.join('shop', name)\n"
+
+
+def test_long_says_what_is_said_of_the_name(shop: Path) -> None:
+    assert run("find", "os.path.join", "--call", "--long", cwd=shop).stdout.splitlines() == [
+        "shop.py:21:16: return os.path.join('shop', name)",
+        "    os.path.join  called with ('shop',name)  in Shop.path",
+    ]
+
+
+def test_json_is_an_object_a_record(shop: Path) -> None:
+    (row,) = map(json.loads, run("find", "os.path.join", "--call", "--json", cwd=shop).stdout.splitlines())
+    assert row == {
+        "type": "record",
+        "path": "shop.py",
+        "line": 21,
+        "column": 16,
+        "scope": "Shop.path",
+        "name": "os.path.join",
+        "kind": "called",
+        "detail": "('shop',name)",
+        "is_parameter": False,
+        "source": "        return os.path.join('shop', name)",
+        "changed": False,
+    }
+
+
+def test_nothing_found_is_1_and_silent(shop: Path) -> None:
+    result = run("find", "nowhere", cwd=shop)
+    assert (result.returncode, result.stdout, result.stderr) == (1, "", "")
+
+
+def test_the_nearest_index_above_is_asked(shop: Path) -> None:
+    (shop / "sub").mkdir()
+    result = run("find", "LIMIT", cwd=shop / "sub")
+    assert result.returncode == 0
+    assert result.stdout.endswith("shop.py:4:1: LIMIT: int = 10\n")
+
+
+def test_a_file_that_changed_since_is_told(shop: Path) -> None:
+    (shop / "shop.py").write_text("LIMIT = 3\n" + SHOP)
+    result = run("find", "LIMIT", cwd=shop)
+    assert result.stderr == "quillet: shop.py: changed since it was indexed; run: quillet index\n"
+    (shop / "shop.py").unlink()
+    result = run("find", "LIMIT", cwd=shop)
+    assert result.stdout == "shop.py:4:1:\n"
+    assert "changed since" in result.stderr
+
+
+def test_a_star_import_is_found_by_its_name(tmp_path: Path) -> None:
+    make_index(tmp_path, a="from b import *\nx = 1\n")
+    assert found("*", "--match", "exact", cwd=tmp_path) == ["1:15"]
+
+
+def test_names_that_look_like_patterns_or_sql_are_names(tmp_path: Path) -> None:
+    make_index(tmp_path, a="x['a%_'] = 1\ny[0] = 2\n")
+    assert found("y[0]", cwd=tmp_path) == ["2:1"]
+    assert found("?[0]", cwd=tmp_path) == ["2:1"]
+    assert found("' OR 1 --", cwd=tmp_path) == []
+
+
+def test_control_characters_of_the_source_do_not_reach_the_terminal(tmp_path: Path) -> None:
+    make_index(tmp_path, a="x = '\x1b[2J' # \x07\n")
+    assert run("find", "x", cwd=tmp_path).stdout == "a.py:1:1: x = '\\x1b[2J' # \\x07\n"
+
+
+def test_lines_of_another_encoding_are_shown(tmp_path: Path) -> None:
+    (tmp_path / "a.py").write_bytes("# coding: latin-1\nx = 'ä'\n".encode("latin-1"))
+    make_index(tmp_path)
+    assert run("find", "x", cwd=tmp_path).stdout == "a.py:2:1: x = 'ä'\n"
+
+
+def test_defs_lists_what_module_and_classes_define(shop: Path) -> None:
+    lines = run("defs", "shop.py", cwd=shop).stdout.splitlines()
+    assert [line.split(" ", 1)[0] for line in lines] == [
+        f"shop.py:{place}:" for place in ("1:8", "2:32", "4:1", "7:7", "8:5", "10:9", "14:7", "15:9", "20:9", "24:5")
+    ]
+
+
+def test_outline_is_a_tree_with_parameters_and_hints(shop: Path) -> None:
+    assert run("outline", "shop.py", cwd=shop).stdout.splitlines() == [
+        " 7 class Item",
+        "10     def __init__(self, price: D) -> None",
+        "14 class Shop",
+        "15     def add(self, item: Item, count)",
+        "20     def path(self, name)",
+        "24 def main()",
+    ]
+
+
+@pytest.mark.parametrize("command", ["defs", "outline"])
+def test_a_file_that_is_not_in_the_index_is_named(shop: Path, command: str) -> None:
+    result = run(command, "other.py", cwd=shop)
+    assert result.returncode == 2
+    assert "other.py: is not in the index" in result.stderr
+
+
+def test_stats_counts(shop: Path) -> None:
+    values = json.loads(run("stats", "--json", cwd=shop).stdout)
+    assert values["files"] == 1
+    assert values["lines"] == SHOP.count("\n")
+    assert values["records"] == sum(values["kinds"].values())
+    assert values["errors"] == 0
+    assert run("stats", cwd=shop).stdout.splitlines()[3].split() == ["files", "1"]
+
+
+@pytest.mark.parametrize(
+    ("name", "match"),
+    [("a", "exact"), ("a.b", "exact"), (".a", "suffix"), ("a*", "glob"), (".a?", "glob"), ("x[0]", "exact")],
+)
+def test_the_form_of_a_name_says_how_it_is_meant(name: str, match: str) -> None:
+    assert match_of(name) == match
+
+
+@pytest.mark.parametrize(
+    ("scope", "wanted", "result"),
+    [
+        ("Shop.add", "Shop", True),
+        ("Shop.add", "add", True),
+        ("Shop.add", "Shop.add", True),
+        ("a.Shop.add.inner", "Shop.add", True),
+        ("Shopping", "Shop", False),
+        ("", "Shop", False),
+        ("Shop.add", "S*.a??", True),
+    ],
+)
+def test_scopes_are_matched_by_whole_names(scope: str, wanted: str, result: bool) -> None:
+    assert scope_matches(scope, wanted) is result
+
+
+def test_a_question_does_not_load_the_engine(shop: Path) -> None:
+    import subprocess
+
+    from indexing import ENVIRONMENT
+
+    code = (
+        "import sys\nfrom quillet.cli import main\n"
+        "try: main(['find', 'LIMIT'])\nexcept SystemExit: pass\n"
+        "assert 'quillet.index.questions' in sys.modules\nassert 'quillet.tarvex' not in sys.modules"
+    )
+    subprocess.run([sys.executable, "-c", code], cwd=shop, env=ENVIRONMENT, check=True, stdout=subprocess.DEVNULL)
