@@ -49,6 +49,8 @@ class Statement:
         self.comment: tuple[int, int] | None = None
         depth = 0
         for token, (line, column) in zip(logical.fToks, logical.fPositions, strict=True):
+            if token is None:
+                continue
             start = starts[line] + column - begin
             last_end = start + len(token.encode("utf-8", "surrogateescape"))
             if token[0] in "#\\":
@@ -80,7 +82,9 @@ class Statement:
 
     def find(self, text: str, start: int, end: int, depth: int) -> int:
         """The first such word at a depth, or -1."""
-        found = (i for i in range(start, min(end, len(self.words))) if self.depths[i] == depth and self.words[i] == text)
+        found = (
+            i for i in range(start, min(end, len(self.words))) if self.depths[i] == depth and self.words[i] == text
+        )
         return next(found, -1)
 
     def head_end(self) -> int:

@@ -20,14 +20,12 @@ import os
 import re
 import subprocess
 import sys
-from collections import Counter
 from collections.abc import Iterator, Sequence
 from dataclasses import dataclass, field
 from pathlib import Path
 
-from rejections import KINDS, explain
-
 from quillet import Analysis, Line, SourceEncodingError, analyze, reflect
+from rejections import KINDS, explain
 
 ROOT = Path(__file__).resolve().parent.parent
 DOCUMENT = ROOT / "docs" / "rejections.md"
@@ -77,7 +75,9 @@ class Library:
         if not paths:
             return {}
         names = "\n".join(map(str, paths))
-        run = subprocess.run([self.executable, "-c", _COMPILER], input=names, capture_output=True, text=True, check=True)
+        run = subprocess.run(
+            [self.executable, "-c", _COMPILER], input=names, capture_output=True, text=True, check=True
+        )
         answers = run.stdout.split("\n")[: len(paths)]
         return {path: answer for path, answer in zip(paths, answers, strict=True) if answer}
 
@@ -151,7 +151,12 @@ class Findings:
 def reports_to(found: list[str]) -> Iterator[None]:
     """Collects what the analysis reports as internal errors."""
     report = reflect.ReportCurrentException
-    reflect.ReportCurrentException = lambda suppress_gui=False: found.append(str(sys.exc_info()[1]))
+
+    def collect(suppress_gui: bool = False) -> None:
+        del suppress_gui
+        found.append(str(sys.exc_info()[1]))
+
+    reflect.ReportCurrentException = collect
     try:
         yield
     finally:
@@ -216,11 +221,12 @@ def table(all_findings: Sequence[Findings]) -> str:
     rows.append(["walk ended at its limit", *(str(count or "") for count in limits), ""])
     widths = [max(len(row[column]) for row in rows) for column in range(len(rows[0]))]
     align = ["left", *("right" for _ in all_findings), "left"]
-    rule = ["-" * width if side == "left" else "-" * (width - 1) + ":" for width, side in zip(widths, align, strict=True)]
+    sides = list(zip(widths, align, strict=True))
+    rule = ["-" * width if side == "left" else "-" * (width - 1) + ":" for width, side in sides]
 
     def text(row: Sequence[str]) -> str:
-        cells = zip(row, widths, align, strict=True)
-        return "| " + " | ".join(c.ljust(w) if side == "left" else c.rjust(w) for c, w, side in cells) + " |\n"
+        cells = (c.ljust(w) if side == "left" else c.rjust(w) for c, (w, side) in zip(row, sides, strict=True))
+        return f"| {' | '.join(cells)} |\n"
 
     return "".join([text(rows[0]), text(rule), *map(text, rows[1:])])
 

@@ -17,10 +17,10 @@ from collections.abc import Iterator
 from pathlib import Path
 
 import pytest
-from survey import NOT_THE_LIBRARY
 
 from quillet import Analysis, Line, analyze
 from quillet.logicalline import CLogicalLine, FindMatchOrCaseType, GetLogicalsFromText, kCase, kMatch, kUnknown
+from survey import NOT_THE_LIBRARY
 
 FULL = os.environ.get("QUILLET_FULL") == "1"
 MADE = 200_000 if FULL else 15_000
@@ -351,7 +351,9 @@ def test_what_could_be_either_is_taken_as_it_is_written(text: str, kind: str) ->
     assert kind_of(text) == kind
 
 
-@pytest.mark.parametrize("text", ["match:", "case:", "match", "case", "match x", "case x", "match x: pass", "matches x:"])
+@pytest.mark.parametrize(
+    "text", ["match:", "case:", "match", "case", "match x", "case x", "match x: pass", "matches x:"]
+)
 def test_what_is_no_statement_at_all_is_no_match_and_no_case(text: str) -> None:
     assert kind_of(text) == kUnknown
 
@@ -360,9 +362,9 @@ def test_what_is_no_statement_at_all_is_no_match_and_no_case(text: str) -> None:
 
 ATOMS = ["x", "match", "case", "_", "1", "'s'", "None", "...", "[]", "()", "{}"]
 FORMS = [
-    *["{}"] * 6, "({})", "[{}]", "{{{}}}", "{{{}: {}}}", "{}.x", "{}.match", "{}[{}]", "{}[{}:{}]", "{}({})", "{}(x={})",
-    "lambda: {}", "lambda x={}: {}", "{} if {} else {}", "-{}", "not {}", "*{}", "{}, {}", "{},", "({} := {})",
-    "{} | {}", "{} as x", "{} in {}", "{} == {}", "{} or {}", "await {}", "(yield {})", "x({}, {})", "x({}).y",
+    *["{}"] * 6, "({})", "[{}]", "{{{}}}", "{{{}: {}}}", "{}.x", "{}.match", "{}[{}]", "{}[{}:{}]", "{}({})",
+    "{}(x={})", "lambda: {}", "lambda x={}: {}", "{} if {} else {}", "-{}", "not {}", "*{}", "{}, {}", "{},",
+    "({} := {})", "{} | {}", "{} as x", "{} in {}", "{} == {}", "{} or {}", "await {}", "(yield {})", "x({}, {})", "x({}).y",
     "**{}", "{{'k': {}, **{}}}", "[{}, *{}]", "x.y.z", "A(x={})", "[{} for x in {}]",
 ]  # fmt: skip
 TAILS = [
