@@ -23,7 +23,7 @@ class CPGenAnalyzerImpl {
  public:
   struct Options {
     Version version;
-    std::string grammar_file;        // absolute paths
+    std::string grammar_file;  // absolute paths
     std::string hint_grammar_file;
     std::vector<std::string> keywords;
     std::vector<std::string> hint_keywords;
