@@ -34,7 +34,7 @@ class ScopeNames {
   // A dotted name holds at most so many bytes. What would have a longer one keeps that of the scope
   // around it, so that neither depth nor long identifiers make names that grow with the square of a
   // source.
-  static constexpr size_t kMaxNameSize = 1000;
+  static constexpr size_t kMaxNameSize = 400;
   static constexpr uint32_t kNone = UINT32_MAX;
 
   enum class ScopeKind : uint8_t { kModule, kClass, kFunction, kTypeAlias };

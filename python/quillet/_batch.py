@@ -168,6 +168,19 @@ class FileAnalyses(Iterator[FileAnalysis]):
             raise StopIteration
         return FileAnalysis(self._paths[result.index], result)
 
+    def __arrow_c_stream__(self, requested_schema: object = None) -> object:
+        """The records of all files that are left, as columns, for readers of the Arrow C data interface.
+
+        The columns are `path` and those of `FileRecord`. The schema is fixed: a reader that asks for another
+        one converts what it gets. Files with a problem have no records; `problems` names them.
+        """
+        return self._native.ArrowStream()
+
+    @property
+    def problems(self) -> list[tuple[str, str]]:
+        """The files so far that could not be analysed, as (path, reason)."""
+        return [(self._paths[index], reason) for index, reason in self._native.problems]
+
     def close(self) -> None:
         """Stops after the files under way. There are no results after it."""
         self._native.Cancel()

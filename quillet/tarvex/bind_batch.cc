@@ -12,6 +12,7 @@
 #include <utility>
 #include <vector>
 
+#include "analysis/arrow_stream.h"
 #include "analysis/batch.h"
 #include "analysis/file_analyzer.h"
 #include "analysis/json_lines.h"
@@ -138,6 +139,20 @@ struct FileResult {
   }
 };
 
+// Without the interpreter lock while this lives, whether the thread has it or not.
+class Unlocked {
+ public:
+  Unlocked() : state_(PyGILState_Check() ? PyEval_SaveThread() : nullptr) {}
+  ~Unlocked() {
+    if (state_ != nullptr) PyEval_RestoreThread(state_);
+  }
+  Unlocked(const Unlocked&) = delete;
+  Unlocked& operator=(const Unlocked&) = delete;
+
+ private:
+  PyThreadState* state_;
+};
+
 // Inputs are tuples (path, source or None, problem or None), all bytes.
 std::vector<BatchInput> InputsOf(nb::handle sequence) {
   std::vector<BatchInput> inputs;
@@ -163,19 +178,42 @@ class FileBatch {
 
   // Python's own signals end the wait by their exceptions.
   nb::object Next() {
-    constexpr std::chrono::milliseconds kPatience(100);
     auto next = std::make_unique<FileResult>();
+    if (!NextResult(next->result)) return nb::none();
+    return nb::cast(next.release(), nb::rv_policy::take_ownership);
+  }
+
+  // The same for native readers, which may call with or without the lock; false at the end.
+  bool NextResult(BatchResult& result) {
+    constexpr std::chrono::milliseconds kPatience(100);
     while (true) {
       BatchAnalyzer::Wait wait;
       {
-        nb::gil_scoped_release unlocked;
+        const Unlocked unlocked;
         const std::lock_guard one_reader(reader_mutex_);
-        wait = batch_->Next(next->result, kPatience);
+        wait = batch_->Next(result, kPatience);
+        if (wait == BatchAnalyzer::Wait::kResult && !result.problem.empty())
+          problems_.emplace_back(result.index, result.problem);
       }
-      if (wait == BatchAnalyzer::Wait::kEnd) return nb::none();
-      if (wait == BatchAnalyzer::Wait::kResult) return nb::cast(next.release(), nb::rv_policy::take_ownership);
+      if (wait != BatchAnalyzer::Wait::kTimeout) return wait == BatchAnalyzer::Wait::kResult;
+      nb::gil_scoped_acquire lock;
       if (PyErr_CheckSignals() != 0) throw nb::python_error();
     }
+  }
+
+  const std::string& PathOf(size_t index) const { return batch_->inputs()[index].path; }
+
+  // The files so far that could not be analysed, as (index, reason).
+  nb::list Problems() {
+    std::vector<std::pair<size_t, std::string>> problems;
+    {
+      const Unlocked unlocked;
+      const std::lock_guard one_reader(reader_mutex_);
+      problems = problems_;
+    }
+    nb::list list;
+    for (const auto& [index, problem] : problems) list.append(nb::make_tuple(index, StrOf(problem)));
+    return list;
   }
 
   void Cancel() {
@@ -228,8 +266,59 @@ class FileBatch {
   nb::object decode_;
   nb::object format_;
   std::mutex reader_mutex_;
+  std::vector<std::pair<size_t, std::string>> problems_;
   std::unique_ptr<BatchAnalyzer> batch_;
 };
+
+// ---- columns ----
+
+class StreamSource : public RecordSource {
+ public:
+  explicit StreamSource(nb::object batch) : batch_(std::move(batch)), files_(nb::cast<FileBatch*>(batch_)) {}
+  // The stream may be released by a thread without the lock.
+  ~StreamSource() override {
+    nb::gil_scoped_acquire lock;
+    batch_.reset();
+  }
+
+  bool Next(BatchResult& result) override {
+    try {
+      return files_->NextResult(result);
+    } catch (nb::python_error& interrupt) {
+      nb::gil_scoped_acquire lock;
+      const std::string message = interrupt.what();
+      interrupt.restore();
+      PyErr_Clear();
+      ThrowError(ErrorKind::kRuntimeError, message);
+    }
+  }
+  const std::string& PathOf(const BatchResult& result) override { return files_->PathOf(result.index); }
+
+ private:
+  nb::object batch_;
+  FileBatch* files_;
+};
+
+constexpr const char* kStreamCapsule = "arrow_array_stream";
+
+void ReleaseStreamCapsule(PyObject* capsule) {
+  auto* stream = static_cast<ArrowArrayStream*>(PyCapsule_GetPointer(capsule, kStreamCapsule));
+  if (stream->release != nullptr) stream->release(stream);
+  delete stream;
+}
+
+// A capsule as the interface lays it down: a reader that takes the stream leaves it released.
+nb::object StreamCapsule(nb::object batch) {
+  auto stream = std::make_unique<ArrowArrayStream>();
+  ExportRecordStream(std::make_unique<StreamSource>(std::move(batch)), stream.get());
+  nb::object capsule = nb::steal(PyCapsule_New(stream.get(), kStreamCapsule, ReleaseStreamCapsule));
+  if (!capsule.is_valid()) {
+    stream->release(stream.get());
+    throw nb::python_error();
+  }
+  static_cast<void>(stream.release());
+  return capsule;
+}
 
 }  // namespace
 
@@ -274,6 +363,10 @@ void BindBatch(nb::module_& tarvex) {
       .def(nb::init<const Language&, nb::handle, unsigned, nb::object, nb::object>(), nb::arg("language"),
            nb::arg("inputs"), nb::arg("jobs"), nb::arg("decode"), nb::arg("format").none())
       .def("Next", &FileBatch::Next, "The next file's result, in the order of the inputs; None at the end.")
+      .def_prop_ro("problems", &FileBatch::Problems)
+      .def(
+          "ArrowStream", [](nb::object self) { return StreamCapsule(std::move(self)); },
+          "The records that were not handed out yet, as a capsule of the Arrow C stream interface.")
       .def("Cancel", &FileBatch::Cancel, "Stops after the files under way.");
 }
 

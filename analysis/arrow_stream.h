@@ -1,0 +1,72 @@
+// Records of many files as a stream of columns through the Arrow C data interface, which most readers of
+// columns take without a copy: pyarrow, polars, duckdb, pandas.
+//
+// A batch of the stream holds the records of whole files, as many as make a batch worth while; its
+// buffers are the columns themselves, and live until the reader releases them. Columns:
+//   path          dictionary<int32, large_utf8>    name          large_utf8
+//   line, column  uint32                           kind          dictionary<int8, large_utf8>
+//   scope         dictionary<int32, large_utf8>    detail        large_utf8
+//                                                  is_parameter  bool
+// Strings have 64-bit offsets, since the details of one large file may pass 2 GiB.
+// Dictionaries belong to their batch: one has the paths and scopes of its own files.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "analysis/batch.h"
+
+extern "C" {
+
+// The structures as the interface lays them down.
+struct ArrowSchema {
+  const char* format;
+  const char* name;
+  const char* metadata;
+  int64_t flags;
+  int64_t n_children;
+  ArrowSchema** children;
+  ArrowSchema* dictionary;
+  void (*release)(ArrowSchema*);
+  void* private_data;
+};
+
+struct ArrowArray {
+  int64_t length;
+  int64_t null_count;
+  int64_t offset;
+  int64_t n_buffers;
+  int64_t n_children;
+  const void** buffers;
+  ArrowArray** children;
+  ArrowArray* dictionary;
+  void (*release)(ArrowArray*);
+  void* private_data;
+};
+
+struct ArrowArrayStream {
+  int (*get_schema)(ArrowArrayStream*, ArrowSchema* out);
+  int (*get_next)(ArrowArrayStream*, ArrowArray* out);
+  const char* (*get_last_error)(ArrowArrayStream*);
+  void (*release)(ArrowArrayStream*);
+  void* private_data;
+};
+}
+
+namespace quillet {
+
+// Where a stream's records come from.
+class RecordSource {
+ public:
+  virtual ~RecordSource() = default;
+  // The next file that was analysed; false at the end. An exception ends the stream with its message.
+  virtual bool Next(BatchResult& result) = 0;
+  virtual const std::string& PathOf(const BatchResult& result) = 0;
+};
+
+// Fills `stream`, which then owns the source. Its reader calls from one thread at a time.
+void ExportRecordStream(std::unique_ptr<RecordSource> source, ArrowArrayStream* stream);
+
+}  // namespace quillet
