@@ -26,8 +26,8 @@ import sys
 from pathlib import Path
 
 from quillet import Record, analyze
-from quillet._trees import tree_text
 from quillet._batch import write_files
+from quillet._trees import tree_text
 from quillet.cli.output import output_format
 from quillet.cli.show import Style
 
