@@ -42,6 +42,8 @@ def main():
     shop.add(Item(D(3)), 2)
 """
 
+ODD_NAMES = ["new\nline.py", "quote\"'.py", "..py.py", "<script>a(1)<.py", "tab\there.py", "back\\slash.py", b"\xff.py"]
+
 
 def run(*arguments: str | Path, cwd: Path) -> subprocess.CompletedProcess[str]:
     return subprocess.run(

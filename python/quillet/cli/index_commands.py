@@ -186,4 +186,37 @@ def export(form: str, output: str | None, index: str | None) -> None:
     sys.exit(run(form, output=output, index=index))
 
 
-COMMANDS = (index, find, defs, outline, stats, export)
+@click.command()
+@click.option("-o", "--output", metavar="DIR", type=click.Path(), required=True, help="The folder of the site.")
+@_index_option
+def report(output: str, index: str | None) -> None:
+    """Writes a static site that is read from disk: files, source with linked names, syntax errors.
+
+    DIR is new, empty, or holds an earlier report, which is replaced.
+
+    \b
+        quillet report -o site
+    """
+    from quillet.cli.report import run
+
+    sys.exit(run(output, index=index))
+
+
+@click.command()
+@click.argument("shell", type=click.Choice(["bash", "zsh", "fish"]))
+def completion(shell: str) -> None:
+    """Prints the script that completes commands, options and files in a shell.
+
+    \b
+        eval "$(quillet completion bash)"
+        quillet completion fish > ~/.config/fish/completions/quillet.fish
+    """
+    from click.shell_completion import get_completion_class
+
+    found = get_completion_class(shell)
+    assert found is not None
+    command = click.get_current_context().find_root().command
+    click.echo(found(command, {}, "quillet", "_QUILLET_COMPLETE").source())
+
+
+COMMANDS = (index, find, defs, outline, stats, export, report, completion)

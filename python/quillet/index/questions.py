@@ -134,10 +134,7 @@ class Index:
 
     def _returns(self, name: str, match: str) -> Iterator[Hit]:
         """What the functions of a name return and yield, and the hints for it."""
-        if match == "glob":
-            scopes = self._names(name, "glob")
-        else:
-            scopes = self._names(name.lstrip("."), "suffix")
+        scopes = self._names(name, "glob") if match == "glob" else self._names(name.lstrip("."), "suffix")
         for start in range(0, len(scopes), _VARIABLES):
             part = scopes[start : start + _VARIABLES]
             marks = ",".join("?" * len(part))
@@ -183,8 +180,7 @@ class Index:
     def errors_of(self, file: FileRow) -> list[tuple[int, int, str]]:
         """The syntax errors of a file as line, column and message."""
         ends = (file.id << FILE_SHIFT, (file.id + 1) << FILE_SHIFT)
-        rows = self._rows("SELECT line, column, message FROM errors WHERE id >= ? AND id < ? ORDER BY id", ends)
-        return rows
+        return self._rows("SELECT line, column, message FROM errors WHERE id >= ? AND id < ? ORDER BY id", ends)
 
     def errors(self) -> int:
         """The number of all syntax errors."""
@@ -197,7 +193,7 @@ class Index:
         return [(KINDS[number], count) for number, count in rows]
 
     def counts(self) -> dict[str, int]:
-        """Totals: files, lines, records, names."""
+        """Totals of files, lines and records."""
         files, lines, records = self._rows(
             "SELECT count(*), coalesce(sum(lines), 0), coalesce(sum(records), 0) FROM files"
         )[0]

@@ -380,9 +380,9 @@ class _Texts:
 
     def _find_or_add(self, text: str) -> int:
         if not self._empty:
-            row: tuple[int] | None = self._connection.execute(self._select, (text,)).fetchone()
+            row = self._connection.execute(self._select, (text,)).fetchone()
             if row is not None:
-                return row[0]
+                return int(row[0])
         self._new.append(text)
         self._next += 1
         return self._next - 1
