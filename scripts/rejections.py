@@ -264,6 +264,11 @@ def _star_in_signature_comment(s: Statement) -> list[Edit]:
     return [(*s.comment, " ")] if is_kind and s.comment else []
 
 
+def _bracketed_type_in_signature_comment(s: Statement) -> list[Edit]:
+    is_kind = _is_signature_comment(s) and re.search(r"[(,]\s*\(", _comment_text(s))
+    return [(*s.comment, " ")] if is_kind and s.comment else []
+
+
 def _comment_that_is_no_expression(s: Statement) -> list[Edit]:
     is_kind = s.comment and not _is_signature_comment(s) and not _parses(_comment_text(s), "eval")
     return [(*s.comment, " ")] if is_kind and s.comment else []
@@ -291,6 +296,7 @@ KINDS = (
     Kind("string in an annotation that is no expression", _text_in_annotation),
     Kind("type comment behind a `def` that is no signature", _comment_that_is_no_signature),
     Kind("star in a signature comment", _star_in_signature_comment),
+    Kind("type in round brackets in a signature comment", _bracketed_type_in_signature_comment),
     Kind("type comment that is no expression", _comment_that_is_no_expression),
 )
 
