@@ -107,7 +107,7 @@ Text Stripped(Text text) {
 
 // The parts of a line that are looked at: more than is shown, and bounded, since a line may hold any
 // number of statements.
-constexpr size_t kMostBytes = 4096;
+constexpr size_t kMostBytes = 1024;
 
 Text FirstBytes(Text line) {
   size_t size = std::min(line.size(), kMostBytes);

@@ -31,6 +31,11 @@ bool IsWellFormedUtf8(Text text) {
   const char* at = text.data();
   const char* const end = at + text.size();
   while (at < end) {
+    // Eight bytes of ASCII at a time.
+    if (uint64_t word; end - at >= 8 && (std::memcpy(&word, at, 8), (word & 0x8080808080808080u) == 0)) {
+      at += 8;
+      continue;
+    }
     const uint32_t length = DecodeUtf8(at, end).length;
     if (length == 0) return false;
     at += length;

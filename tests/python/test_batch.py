@@ -1,0 +1,301 @@
+"""Many files at once: what `analyze_files` gives, to Python and to readers of columns, and how it ends."""
+
+from __future__ import annotations
+
+import os
+import re
+import signal
+import subprocess
+import sys
+import threading
+from pathlib import Path
+
+import pytest
+
+import quillet
+from quillet import FileRecord, RecordKind, analyze, analyze_files
+from quillet._records import describe
+from quillet.tarvex import _host
+
+STDLIB = Path(os.__file__).parent
+SHOP = b"""\
+class Shop:
+    def total(self, price, tax=1):
+        # type: (int, float) -> float
+        global count
+        count = price.value
+        def add(n):
+            nonlocal tax
+            tax = n
+        return add
+"""
+
+
+def shop_records(name: str) -> list[FileRecord]:
+    [result] = analyze_files([("shop.py", SHOP)], version=(3, 12))
+    return [record for record in result.records if record.name == name]
+
+
+# ---- records ----
+
+
+def test_records_have_their_place_and_scope() -> None:
+    assert shop_records("price.value") == [
+        FileRecord(5, 17, "Shop.total", "price.value", RecordKind.GET, "", False),
+    ]
+    assert [(r.line, r.scope, r.kind.value) for r in shop_records("count")] == [
+        (4, "Shop.total", "global"),
+        (5, "", "set"),
+        (5, "", "equal"),
+    ]
+    assert [(r.line, r.scope) for r in shop_records("tax") if r.line > 6] == [
+        (7, "Shop.total.add"),
+        (8, "Shop.total"),
+        (8, "Shop.total"),
+    ]
+    assert [(r.line, r.detail, r.is_parameter) for r in shop_records("price") if r.kind is RecordKind.HINT] == [
+        (3, "int", True)
+    ]
+
+
+def test_records_are_a_sequence() -> None:
+    [result] = analyze_files([("shop.py", SHOP)])
+    records = result.records
+    assert records[0].name == "Shop"
+    assert records[-1] == list(records)[-1]
+    assert records[1:4] == list(records)[1:4]
+    assert records[::-2] == list(records)[::-2]
+    with pytest.raises(IndexError):
+        records[len(records)]
+    assert records.plain() == [(*record[:4], record.kind.value, *record[5:]) for record in records]
+    assert {type(row) for row in records.plain()} == {tuple}
+
+
+def test_kinds_are_those_of_single_sources() -> None:
+    assert tuple(kind.value for kind in RecordKind) == _host.RECORD_KIND_WORDS
+
+
+def test_definitions_have_their_extent() -> None:
+    [result] = analyze_files([("shop.py", SHOP)])
+    assert result.definitions == [
+        ("Shop", "class", 1, 7, 1, 9),
+        ("Shop.total", "def", 2, 9, 2, 9),
+        ("Shop.total.add", "def", 6, 13, 6, 8),
+    ]
+
+
+def test_files_say_what_single_sources_say() -> None:
+    # Signature comments on a line of their own are joined to their function here alone.
+    paths = sorted((STDLIB / "json").glob("*.py")) + sorted((STDLIB / "email").glob("*.py"))
+    for result in analyze_files(paths, version=(3, 11)):
+        single = analyze(Path(result.path).read_bytes(), version=(3, 11))
+        expected = [record for line in single.lines for record in line.records]
+        assert [(r.name, r.kind, r.detail, r.is_parameter) for r in result.records] == expected
+        source = Path(result.path).read_bytes().splitlines()
+        for record in result.records:
+            first = re.split(r"[.(\[]", record.name)[0]
+            if record.kind is RecordKind.GET and first.isidentifier():
+                assert source[record.line - 1][record.column - 1 :].startswith(first.encode()), record
+
+
+# ---- files ----
+
+
+def test_results_come_in_order_whatever_the_threads() -> None:
+    paths = sorted(STDLIB.glob("*.py"))[:60]
+    seen = []
+    for jobs in (1, 2, 5):
+        results = list(analyze_files(paths, version=(3, 11), jobs=jobs))
+        assert [result.path for result in results] == [str(path) for path in paths]
+        seen.append([(r.lines, r.statements, r.errors, r.records.plain()) for r in results])
+    assert seen[0] == seen[1] == seen[2]
+
+
+def test_what_cannot_be_read_is_a_result(tmp_path: Path) -> None:
+    good = tmp_path / "good.py"
+    good.write_bytes(b"x = = 1\ny\n")
+    odd = tmp_path / "odd.py"
+    odd.write_bytes(b"# coding: no-such\n")
+    results = list(analyze_files([tmp_path / "gone.py", tmp_path, odd, good, "a\0b"]))
+    assert [result.problem for result in results] == [
+        "No such file or directory",
+        "Is a directory",
+        "cannot read the source as 'no-such': unknown encoding: no-such",
+        None,
+        "embedded null byte",
+    ]
+    assert results[3].errors == [(1, 5, "invalid syntax")]
+    assert (results[3].lines, results[3].statements, results[3].size) == (2, 2, 10)
+    assert len(results[0].records) == 0
+
+
+def test_other_encodings_are_decoded(tmp_path: Path) -> None:
+    path = tmp_path / "a.py"
+    path.write_bytes("# coding: latin-1\né = 'ü'\n".encode("latin-1"))
+    [result] = analyze_files([path])
+    assert [(r.name, r.detail) for r in result.records] == [("é", ""), ("é", "str: 'ü'")]
+
+
+def test_odd_file_names_pass(tmp_path: Path) -> None:
+    path = os.fsencode(tmp_path) + b"/a\n'\"\xff.py"
+    Path(os.fsdecode(path)).write_text("x\n")
+    [result] = analyze_files([path])
+    assert (os.fsencode(result.path), result.problem, len(result.records)) == (path, None, 1)
+
+
+def test_a_walk_that_meets_its_limit_is_told_with_its_file(capfd: pytest.CaptureFixture[str]) -> None:
+    deep = b"y\nx = " + b"a + " * 20_000 + b"a\n"
+    results = list(analyze_files([("a.py", b"x\n"), ("deep.py", deep)], jobs=2))
+    assert results[0].reports == []
+    [(line, _, message)] = results[1].reports
+    assert line == 2
+    assert "RuntimeError" in message
+    assert capfd.readouterr() == ("", "")
+
+
+def test_wrong_arguments_are_refused_at_once() -> None:
+    with pytest.raises(TypeError):
+        analyze_files([1])  # type: ignore[list-item]
+    with pytest.raises(TypeError):
+        analyze_files([("a.py", "text")])  # type: ignore[list-item]
+    with pytest.raises(TypeError):
+        analyze_files([], jobs="2")  # type: ignore[arg-type]
+    with pytest.raises(ValueError, match="jobs"):
+        analyze_files([], jobs=0)
+    with pytest.raises(ValueError, match="version"):
+        analyze_files([], version=(4, 0))
+
+
+# ---- how it ends ----
+
+
+def test_closing_ends_it() -> None:
+    with analyze_files([("a.py", b"x\n")] * 1000, jobs=2) as results:
+        assert next(results).path == "a.py"
+    assert list(results) == []
+
+
+def test_dropping_it_half_way_leaves_no_thread() -> None:
+    before = len(os.listdir("/proc/self/task")) if os.path.exists("/proc/self/task") else 0
+    results = analyze_files([("a.py", SHOP)] * 1000, jobs=4)
+    next(results)
+    del results
+    after = len(os.listdir("/proc/self/task")) if os.path.exists("/proc/self/task") else 0
+    assert after == before
+
+
+def test_several_threads_may_read_one_batch() -> None:
+    results = analyze_files([(f"{i}.py", SHOP) for i in range(300)], jobs=2)
+    seen: list[str] = []
+
+    def read() -> None:
+        for result in results:
+            seen.append(result.path)
+
+    threads = [threading.Thread(target=read) for _ in range(4)]
+    for thread in threads:
+        thread.start()
+    for thread in threads:
+        thread.join()
+    assert sorted(seen) == sorted(f"{i}.py" for i in range(300))
+
+
+@pytest.mark.skipif(not hasattr(os, "mkfifo"), reason="needs pipes with names")
+def test_an_interrupt_ends_the_wait_for_a_pipe(tmp_path: Path) -> None:
+    pipe = tmp_path / "pipe.py"
+    os.mkfifo(pipe)
+    code = "import sys, quillet\nprint('ready', flush=True)\nnext(quillet.analyze_files([sys.argv[1]]))"
+    with subprocess.Popen(
+        [sys.executable, "-c", code, str(pipe)], stdout=subprocess.PIPE, stderr=subprocess.PIPE
+    ) as process:
+        assert process.stdout is not None
+        assert process.stderr is not None
+        process.stdout.readline()
+        for _ in range(50):
+            process.send_signal(signal.SIGINT)
+            try:
+                process.wait(timeout=1)
+                break
+            except subprocess.TimeoutExpired:
+                continue
+        assert b"KeyboardInterrupt" in process.stderr.read()
+
+
+# ---- columns ----
+
+
+def expected_rows(results: quillet.FileAnalyses) -> list[tuple[object, ...]]:
+    return [(result.path, *row) for result in results for row in result.records.plain()]
+
+
+PATHS = sorted((STDLIB / "json").glob("*.py"))
+
+
+def test_pyarrow_reads_columns() -> None:
+    pyarrow = pytest.importorskip("pyarrow")
+    results = analyze_files([*PATHS, "gone.py"], version=(3, 11))
+    table = pyarrow.table(results)
+    table.validate(full=True)
+    columns = [table.column(name).to_pylist() for name in ("path", *FileRecord._fields)]
+    assert list(zip(*columns, strict=True)) == expected_rows(analyze_files(PATHS, version=(3, 11)))
+    assert results.problems == [("gone.py", "No such file or directory")]
+
+
+def test_pyarrow_reads_many_batches() -> None:
+    pyarrow = pytest.importorskip("pyarrow")
+    sources = [(f"{i}.py", b"name = call(value)\n" * 9000) for i in range(6)]
+    batches = list(pyarrow.RecordBatchReader.from_stream(analyze_files(sources)))
+    assert len(batches) > 1
+    assert sum(batch.num_rows for batch in batches) == 6 * 9000 * 5
+    assert {path for batch in batches for path in batch.column("path").to_pylist()} == {path for path, _ in sources}
+
+
+def test_polars_reads_columns() -> None:
+    polars = pytest.importorskip("polars")
+    frame = polars.DataFrame(analyze_files(PATHS, version=(3, 11)))
+    assert frame.rows() == expected_rows(analyze_files(PATHS, version=(3, 11)))
+
+
+def test_duckdb_reads_columns() -> None:
+    duckdb = pytest.importorskip("duckdb")
+    records = analyze_files(PATHS, version=(3, 11))  # noqa: F841 -- found by its name
+    [(count,)] = duckdb.sql("select count(*) from records where kind = 'called'").fetchall()
+    assert count == sum(row[5] == "called" for row in expected_rows(analyze_files(PATHS, version=(3, 11))))
+
+
+def test_a_stream_that_nobody_reads_is_released() -> None:
+    capsule = analyze_files([("a.py", SHOP)] * 100).__arrow_c_stream__()
+    assert "arrow_array_stream" in repr(capsule)
+    del capsule
+
+
+# ---- formats ----
+
+
+def test_a_phrase_is_the_same_for_one_record_and_for_a_file() -> None:
+    source = (
+        "import os.path as p\nfrom a import b\nx = y = [1], -2\nz: int = None\ndel x\nglobal g\n"
+        "def f[T: int](*a, b='s'): yield from []; yield; return x(1)\nisinstance(x, C)\nq = [i for i in j] + k\n"
+    )
+    from quillet._batch import write_files
+    from quillet.cli.output import output_format
+    from quillet.cli.show import Style
+
+    form = output_format("text", errors_only=False, style=Style(on=False))
+    [result] = write_files([(b"a.py", source.encode(), None)], version=(3, 12), jobs=1, form=form)
+    phrases = [line[4:].partition("  ")[2].strip() for line in result.output.decode().splitlines() if line[:4] == "    "]
+    expected = [describe(record) for line in analyze(source, version=(3, 12)).lines for record in line.records]
+    assert phrases == expected
+
+
+@pytest.mark.parametrize("form", ["text", "jsonl"])
+def test_the_command_writes_the_same_bytes_whatever_the_jobs(form: str) -> None:
+    def output(jobs: int) -> bytes:
+        options = ["--format", form, "--jobs", str(jobs)]
+        command = [sys.executable, "-m", "quillet", "analyze", *options, str(STDLIB / "email")]
+        return subprocess.run(command, capture_output=True, check=True, timeout=120).stdout
+
+    one = output(1)
+    assert len(one) > 100_000
+    assert output(2) == one
+    assert output(7) == one
