@@ -12,7 +12,7 @@ An example is a comment that names a view, a block of source and a block of outp
     ```
 
 The views: `records` (each record raw and decoded), `tree` (the parse tree), `analyze` (what the command
-line prints; the comment may name a file for it). The version is 3.12 where none is given.
+line prints; the comment may name a file for it), `find` (what it answers of the name in the comment). The version is 3.12 where none is given.
 
     scripts/doc_examples.py            names the examples that are stale; exit code 1 where there is one
     scripts/doc_examples.py --write    rewrites them
@@ -21,8 +21,13 @@ line prints; the comment may name a file for it). The version is 3.12 where none
 from __future__ import annotations
 
 import argparse
+import io
+import os
 import re
 import sys
+import tempfile
+from collections.abc import Iterator
+from contextlib import contextmanager
 from pathlib import Path
 
 from quillet import Record, analyze
@@ -72,7 +77,34 @@ def analyze_view(source: str, version: tuple[int, int], file: str) -> str:
     return "".join(result.output.decode() for result in write_files(inputs, version=version, jobs=1, form=form))
 
 
-VIEWS = {"records": records_view, "tree": tree_view, "analyze": analyze_view}
+@contextmanager
+def working_folder(folder: str) -> Iterator[None]:
+    """Works in a folder for a while, since paths are shown from there."""
+    before = os.getcwd()
+    os.chdir(folder)
+    try:
+        yield
+    finally:
+        os.chdir(before)
+
+
+def find_view(source: str, version: tuple[int, int], name: str) -> str:
+    """What `quillet find NAME --long` prints for an index of the source as shop.py."""
+    from quillet.cli.find import show_hits
+    from quillet.index.questions import Index, Query, match_of
+    from quillet.index.update import Reports, Settings, update
+
+    with tempfile.TemporaryDirectory() as folder, working_folder(folder):
+        Path("shop.py").write_text(source, encoding="utf-8")
+        settings = Settings(paths=("shop.py",), version=version, jobs=1, gitignore=None)
+        update("index", settings, Reports(unread=lambda *_: None, waiting=lambda: None))
+        with Index("index") as index:
+            out = io.StringIO()
+            show_hits(out, index, index.find(Query(name, match_of(name))), as_json=False, long=True)
+    return out.getvalue()
+
+
+VIEWS = {"records": records_view, "tree": tree_view, "analyze": analyze_view, "find": find_view}
 
 
 def output_of(match: re.Match[str]) -> str:

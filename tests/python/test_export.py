@@ -244,3 +244,15 @@ def test_completion_offers_commands(tmp_path: Path) -> None:
         check=False,
     )
     assert result.stdout.splitlines() == ["plain,outline"]
+
+
+def test_the_man_page_has_every_command_and_option() -> None:
+    from quillet.cli import main
+
+    page = (Path(__file__).resolve().parent.parent.parent / "docs" / "man" / "quillet.1").read_text()
+    page = page.replace("\\-", "-")
+    assert len(main.commands) >= 10
+    for name, command in main.commands.items():
+        section = page.split(f".SS quillet {name} ")[1].split(".SS")[0]
+        for option in (option for parameter in command.params for option in parameter.opts if option.startswith("-")):
+            assert option in section, f"{name} {option}: scripts/man_page.py --write adds it"

@@ -8,6 +8,7 @@ and time are taken before the content, so that a change between the two is seen 
 
 from __future__ import annotations
 
+import gc
 import json
 import os
 import sqlite3
@@ -245,7 +246,7 @@ class _Run:
         if not (changed or touched or gone):
             return
         facts = facts_of_files(sources, self._version, self._jobs)
-        with self._transaction() as connection:
+        with self._transaction() as connection, _no_collection():
             connection.executemany("UPDATE files SET size = ?, mtime_ns = ? WHERE id = ?", touched)
             self._remove(gone)
             for (candidate, digest), found in zip(changed, facts, strict=True):
@@ -282,18 +283,21 @@ class _Run:
         )
         self._analysed += 1
         first = number << FILE_SHIFT
-        name_id = self._names.id_of
-        detail_id = self._details.id_of
-        kinds = KIND_NUMBER
-        opens = found.opens
-        rows = []
-        for number, (line, column, scope, name, kind, detail, is_parameter) in enumerate(facts, first):
-            opened = 0 if kind != "set" or is_parameter else opens.get((line, column), 0)
-            name_number, scope_number, detail_number = name_id(name), name_id(scope), detail_id(detail)
-            kind_number = kinds[kind]
-            rows.append(
-                (number, name_number, scope_number, line, column, kind_number, is_parameter, opened, detail_number)
+        names, details, kinds, opens = self._names, self._details, KIND_NUMBER, found.opens
+        rows = [
+            (
+                number,
+                names[name],
+                names[scope],
+                line,
+                column,
+                kinds[kind],
+                is_parameter,
+                opens.get((line, column), 0) if kind == "set" else 0,
+                details[detail],
             )
+            for number, (line, column, scope, name, kind, detail, is_parameter) in enumerate(facts, first)
+        ]
         self._names.write_new()
         self._details.write_new()
         connection.executemany("INSERT INTO records VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?)", rows)
@@ -354,28 +358,36 @@ class _Run:
         self._connection.execute("COMMIT")
 
 
-class _Texts:
+@contextmanager
+def _no_collection() -> Iterator[None]:
+    """Keeps the collector of cycles from looking at rows without number, none of which is in a cycle."""
+    enabled = gc.isenabled()
+    gc.disable()
+    try:
+        yield
+    finally:
+        if enabled:
+            gc.enable()
+
+
+class _Texts(dict[str, int]):
     """The numbers of the texts of one table. New ones are kept until `write_new`.
 
     An index that was empty holds no text that this run did not write, so nothing need be looked up in it.
     """
 
     def __init__(self, connection: sqlite3.Connection, table: str, column: str, *, empty: bool) -> None:
+        super().__init__({"": 0})
         self._connection = connection
         self._select = f"SELECT id FROM {table} WHERE {column} = ?"
-        self._insert = (
-            f"INSERT INTO {table} VALUES (?, ?, ?)" if table == "names" else f"INSERT INTO {table} VALUES (?, ?)"
-        )
         self._with_tail = table == "names"
+        self._insert = f"INSERT INTO {table} VALUES (?, ?{', ?' if self._with_tail else ''})"
         self._empty = empty
-        self._ids: dict[str, int] = {"": 0}
         self._new: list[str] = []
         self._next = connection.execute(f"SELECT max(id) FROM {table}").fetchone()[0] + 1
 
-    def id_of(self, text: str) -> int:
-        number = self._ids.get(text)
-        if number is None:
-            number = self._ids[text] = self._find_or_add(text)
+    def __missing__(self, text: str) -> int:
+        number = self[text] = self._find_or_add(text)
         return number
 
     def _find_or_add(self, text: str) -> int:
