@@ -8,9 +8,9 @@ that name an encoding other than UTF-8 are decoded by `_source`, under the lock.
 from __future__ import annotations
 
 import os
-from collections.abc import Iterable, Iterator, Sequence
+from collections.abc import Generator, Iterable, Iterator, Sequence
 from types import TracebackType
-from typing import NamedTuple, Union, overload
+from typing import NamedTuple, Union, cast, overload
 
 from quillet._keywords import keywords_of
 from quillet._records import RecordKind
@@ -25,7 +25,7 @@ StrPath = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
 _KINDS = tuple(RecordKind(word) for word in _host.RECORD_KIND_WORDS)
 # A file to analyse: its name, its source where that is at hand, and why it cannot be read where that is
 # known.
-BatchInput = tuple[bytes, Union[bytes, None], Union[bytes, None]]
+BatchInput = tuple[bytes, bytes | None, bytes | None]
 # How many records become objects at a time where all are iterated over.
 _CHUNK = 4096
 
@@ -82,7 +82,8 @@ class FileRecords(Sequence[FileRecord]):
     def __getitem__(self, index: int | slice) -> FileRecord | Sequence[FileRecord]:
         places = range(len(self))[index]
         if isinstance(places, int):
-            return self._native.Rows(places, places + 1, FileRecord, _KINDS)[0]
+            [record] = self._native.Rows(places, places + 1, FileRecord, _KINDS)
+            return cast(FileRecord, record)
         if places.step == 1:
             return self._native.Rows(places.start, places.stop, FileRecord, _KINDS)
         return [self[place] for place in places]
@@ -230,7 +231,7 @@ def analyze_files(
 
 def write_files(
     inputs: Iterable[BatchInput], *, version: tuple[int, ...] | None, jobs: int | None, form: tuple[object, ...]
-) -> Iterator[_host.FileResult]:
+) -> Generator[_host.FileResult, None, None]:
     """Analyses files and writes what was found: each result has the `output` of a format.
 
     The formats are ("jsonl", errors_only) and ("text", errors_only, colours, width_of), where `width_of`

@@ -10,6 +10,12 @@ from __future__ import annotations
 import re
 
 _BOM = b"\xef\xbb\xbf"
+_WIDE_MARKS = (
+    (b"\xff\xfe\0\0", "utf-32"),
+    (b"\0\0\xfe\xff", "utf-32"),
+    (b"\xff\xfe", "utf-16"),
+    (b"\xfe\xff", "utf-16"),
+)
 _COOKIE = re.compile(rb"[ \t\f]*#[^\r\n]*?coding[:=][ \t]*([-\w.]+)")
 _COMMENT_OR_BLANK = re.compile(rb"[ \t\f]*(?:#[^\r\n]*)?(?:\r\n|\r|\n)")
 
@@ -45,6 +51,9 @@ def to_utf8(source: bytes | bytearray | memoryview | str) -> bytes:
         raise TypeError(f"source must be bytes or str, not {type(source).__name__}")
     if source.startswith(_BOM):
         return source
+    for mark, encoding in _WIDE_MARKS:
+        if source.startswith(mark):
+            return source.decode(encoding, "replace").encode("utf-8", "surrogatepass")
     name = named_encoding(source)
     if name is None or _is_utf8(name):
         return source

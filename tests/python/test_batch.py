@@ -132,8 +132,10 @@ def test_what_cannot_be_read_is_a_result(tmp_path: Path) -> None:
 def test_other_encodings_are_decoded(tmp_path: Path) -> None:
     path = tmp_path / "a.py"
     path.write_bytes("# coding: latin-1\né = 'ü'\n".encode("latin-1"))
-    [result] = analyze_files([path])
-    assert [(r.name, r.detail) for r in result.records] == [("é", ""), ("é", "str: 'ü'")]
+    wide = tmp_path / "b.py"
+    wide.write_bytes("é = 'ü'\n".encode("utf-16"))
+    for result in analyze_files([path, wide]):
+        assert [(r.name, r.detail) for r in result.records] == [("é", ""), ("é", "str: 'ü'")]
 
 
 def test_odd_file_names_pass(tmp_path: Path) -> None:
@@ -283,7 +285,9 @@ def test_a_phrase_is_the_same_for_one_record_and_for_a_file() -> None:
 
     form = output_format("text", errors_only=False, style=Style(on=False))
     [result] = write_files([(b"a.py", source.encode(), None)], version=(3, 12), jobs=1, form=form)
-    phrases = [line[4:].partition("  ")[2].strip() for line in result.output.decode().splitlines() if line[:4] == "    "]
+    phrases = [
+        line[4:].partition("  ")[2].strip() for line in result.output.decode().splitlines() if line[:4] == "    "
+    ]
     expected = [describe(record) for line in analyze(source, version=(3, 12)).lines for record in line.records]
     assert phrases == expected
 

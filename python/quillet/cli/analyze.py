@@ -78,7 +78,8 @@ def _bytes_writer(out: TextIO) -> Callable[[bytes], object]:
     """Writes UTF-8 to a text stream: as it is where that is the stream's encoding."""
     if isinstance(out, io.TextIOWrapper) and out.encoding.lower().replace("_", "-") in ("utf-8", "utf8"):
         out.flush()
-        return out.buffer.write
+        binary = out.buffer
+        return lambda data: binary.write(data)
     return lambda data: out.write(data.decode("utf-8", "surrogatepass"))
 
 
