@@ -295,7 +295,8 @@ void BindFreeOperations(nb::module_& m) {
         CNode* root = ArgumentAs<CNode>(node, source);
         return WrapArgList(GetDefiningArgInfoList(root), source);
       },
-      nb::arg("node"));
+      nb::arg("node"),
+      "The parameters of the node behind `def name` or `lambda`: a list of CArgInfo, nested for tuple parameters.");
   m.def(
       "GetUsedArgInfoList",
       [](Any node) {
@@ -303,14 +304,14 @@ void BindFreeOperations(nb::module_& m) {
         CNode* root = ArgumentAs<CNode>(node, source);
         return WrapUsedArgs(GetUsedArgInfoList(root), source);
       },
-      nb::arg("node"));
+      nb::arg("node"), "The arguments of the inside of `value(...)`, as a list of CArgInfo.");
   m.def(
       "GetTokenEndIndex",
       [](Any node) {
         Source source;
         return GetTokenEndIndex(ArgumentAs<CNode>(node, source));
       },
-      nb::arg("node"));
+      nb::arg("node"), "The token index just past a node.");
   m.def(
       "_TextForImportName", [](Any nodes) { return StrOf(TextForImportName(NodesOf(nodes))); }, nb::arg("nodes"));
   m.def(
@@ -343,7 +344,7 @@ void BindFreeOperations(nb::module_& m) {
         CNode* root = ArgumentAs<CNode>(node, source);
         return Wrap(DropSimpleParens(root), source);
       },
-      nb::arg("node"));
+      nb::arg("node"), "The inside of `( test )`, however deep; any other node as it is.");
   m.def(
       "ExpandSeqLiteral",
       [](Any node) {
@@ -352,28 +353,28 @@ void BindFreeOperations(nb::module_& m) {
         NodeList elements;
         return ExpandSeqLiteral(root, elements) ? WrapList(elements, source) : nb::object(nb::none());
       },
-      nb::arg("node"));
+      nb::arg("node"), "The elements of a parenthesised tuple; None for anything else.");
   m.def(
       "IsSetLiteral",
       [](Any node) {
         Source source;
         return IsSetLiteral(ArgumentAs<CAtom>(node, source));
       },
-      nb::arg("node"));
+      nb::arg("node"), "True for an atom that is clearly a set display.");
   m.def(
       "IsGenExpression",
       [](Any atom_node) {
         Source source;
         return IsGenExpression(ArgumentAs<CAtom>(atom_node, source));
       },
-      nb::arg("atom_node"));
+      nb::arg("atom_node"), "True for a parenthesised atom with a direct child `for`.");
   m.def(
       "IsTupleLiteralNode",
       [](Any node) {
         Source source;
         return IsTupleLiteralNode(ArgumentAs<CNode>(node, source));
       },
-      nb::arg("node"));
+      nb::arg("node"), "True for a tuple, bare or in any number of parentheses.");
 }
 
 void BindInstanceNames(nb::module_& m) {

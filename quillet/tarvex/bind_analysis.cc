@@ -143,9 +143,10 @@ void BindAnalysis(nb::module_& tarvex) {
           nb::arg("first_in_def") = false,
           "Analyses a line once and gives the exception that describes a failure, or None.");
   cls.def("_InspectSingleLogical", &Inspect, nb::arg("logical"), nb::arg("in_async_def"),
-          nb::arg("in_embedded_expression") = false, nb::arg("first_in_def") = false);
+          nb::arg("in_embedded_expression") = false, nb::arg("first_in_def") = false,
+          "Parses and walks a line; raises what AnalyzeSingleLogical returns.");
   cls.def("_InspectEmbeddedExpressions", &InspectEmbedded, nb::arg("logical"), nb::arg("node"), nb::arg("in_async_def"),
-          nb::arg("first_in_def"));
+          nb::arg("first_in_def"), "Inspects the line's embedded expressions and copies their records up.");
   cls.def(
       "ParseToNode",
       [](AnalyzerObject& self, Any logical, Truth in_async_def) {

@@ -617,7 +617,8 @@ void BindLogicalline(nb::module_& tarvex) {
       [](LineObject& self, Any value) { self.SetArgTypeEquivs(value); }, nb::arg("value"));
 
   cls.def(
-      "GetTokType", [](LineObject& self, Any i) { return self.BuiltinGetTokType(Int64Of(i)); }, nb::arg("i"));
+      "GetTokType", [](LineObject& self, Any i) { return self.BuiltinGetTokType(Int64Of(i)); }, nb::arg("i"),
+      "The token type id of token `i`.");
   cls.def(
       "AppendTypeEquiv",
       [](LineObject& self, Any name, Any equiv) {
@@ -625,7 +626,7 @@ void BindLogicalline(nb::module_& tarvex) {
         const HostText equiv_text = HostText::FromBytes(equiv);
         self.BuiltinAppend(name_text.text(), equiv_text.text());
       },
-      nb::arg("name"), nb::arg("equiv"));
+      nb::arg("name"), nb::arg("equiv"), "Appends a record of a name in the statement's own scope.");
   cls.def(
       "AppendArgTypeEquiv",
       [](LineObject& self, Any name, Any info) {
@@ -633,11 +634,15 @@ void BindLogicalline(nb::module_& tarvex) {
         const HostText info_text = HostText::FromBytes(info);
         self.BuiltinAppendArg(name_text.text(), info_text.text());
       },
-      nb::arg("name"), nb::arg("info"));
+      nb::arg("name"), nb::arg("info"), "Appends a record of a parameter of the scope that the statement opens.");
   cls.def(
       "SetParsed", [](LineObject& self, Truth parsed) { self.line().parsed = parsed; }, nb::arg("parsed"));
-  cls.def("ClearDerivedInfo", [](LineObject& self) { self.BuiltinClearDerivedInfo(); });
-  cls.def("GetExpLogicals", [](LineObject& self) { return self.BuiltinGetExpLogicals(); });
+  cls.def(
+      "ClearDerivedInfo", [](LineObject& self) { self.BuiltinClearDerivedInfo(); },
+      "Removes everything that analysis wrote on the line.");
+  cls.def(
+      "GetExpLogicals", [](LineObject& self) { return self.BuiltinGetExpLogicals(); },
+      "The expressions embedded in the line (f-string fields, stringified and commented hints).");
   cls.def("__repr__",
           [](LineObject& self) { return nb::str("<CLogicalLine {} {!r}>").format(self.GetType(), self.GetToks()); });
 

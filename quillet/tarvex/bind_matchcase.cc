@@ -118,9 +118,9 @@ void BindMatchcase(nb::module_& tarvex) {
                   nb::arg("value"));
 
   cls.def("ParseMatchStmt", &ParseStatement<&CMatchCaseStatementParser::ParseMatchStmt>, nb::arg("toks"),
-          nb::arg("positions"));
+          nb::arg("positions"), "A CMatchStmt, or None for a line that is no such statement.");
   cls.def("ParseCaseStmt", &ParseStatement<&CMatchCaseStatementParser::ParseCaseStmt>, nb::arg("toks"),
-          nb::arg("positions"));
+          nb::arg("positions"), "A CCaseStmt, or None for a line that is no such statement.");
   cls.def("_ParseMatchStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseMatchStmtImpl>);
   cls.def("_ParseCaseStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseCaseStmtImpl>);
   cls.def("_RemoveSkipToks", &RemoveSkipToks, nb::arg("toks"), nb::arg("positions"));

@@ -138,7 +138,8 @@ void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
       [](ParserObject& self, Any logical, Truth in_async_def) {
         return ParseToNode(*self.parser, logical, in_async_def);
       },
-      nb::arg("logical"), nb::arg("in_async_def"));
+      nb::arg("logical"), nb::arg("in_async_def"),
+      "The tree of a logical line, or None for one without tokens to parse. It goes back through DiscardNode.");
   cls.def(
       "ParseToksToNode",
       [](ParserObject& self, Any toks, Truth in_async_def, Any positions) {
@@ -147,7 +148,8 @@ void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
         return Parsed(*self.parser, tokens.source,
                       [&] { return ParseToks(*self.parser, tokens.toks(), in_async_def, places.view()); });
       },
-      nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"));
+      nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"),
+      "The tree of tokens: special cases first, then the grammar.");
   cls.def(
       "_ParseToksToNodeImpl",
       [](ParserObject& self, Any toks, Truth in_async_def, Any positions) {
@@ -162,7 +164,7 @@ void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
       [](ParserObject& self, Any toks, Truth in_async_def) {
         return ParseTokenListToNode(*self.parser, toks, in_async_def);
       },
-      nb::arg("toks"), nb::arg("in_async_def"));
+      nb::arg("toks"), nb::arg("in_async_def"), "The tree of tokens without positions; no special cases.");
   cls.def(
       "convert",
       [](ParserObject& self, Any type, Any value, Any context, Any children) {
@@ -170,7 +172,8 @@ void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
       },
       nb::arg("type"), nb::arg("value"), nb::arg("context"), nb::arg("children"));
   cls.def(
-      "DiscardNode", [](ParserObject& self, Any node) { self.parser->DiscardNode(NodeOrNull(node)); }, nb::arg("node"));
+      "DiscardNode", [](ParserObject& self, Any node) { self.parser->DiscardNode(NodeOrNull(node)); }, nb::arg("node"),
+      "Gives a tree back for reuse.");
   cls.def(
       "_AddTokenList",
       [](ParserObject& self, Any tok_list, Any context) {
@@ -256,7 +259,7 @@ void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
       nb::arg("raise_errors"));
   cls.def(
       "GetTypeParameterNodes", [](ParserObject& self, Any toks) { return GetTypeParameterNodes(*self.parser, toks); },
-      nb::arg("toks"));
+      nb::arg("toks"), "The type parameters that a line defines, whether or not the rest of it parses.");
 }
 
 void BindFields(nb::class_<ParserObject, AnalyzerBase>& cls) {
@@ -384,7 +387,7 @@ void BindParser(nb::module_& tarvex) {
         const Token* token = NextNonRemovedTokenInTuple(tokens.toks(), Int64Of(i));
         return token == nullptr ? nb::object(nb::none()) : StrOfToken(*token);
       },
-      nb::arg("toks"), nb::arg("i"));
+      nb::arg("toks"), nb::arg("i"), "The first token from `i` on that is neither a comment nor a backslash, or None.");
 }
 
 // Operations that the analyzer forwards to its parser.

@@ -58,7 +58,8 @@ void BindText(nb::module_& tarvex) {
             RequiredNode(node), {dotted_name_only, discard_simple_parens, literal_only, add_parens_if_operator}));
       },
       nb::arg("node"), nb::arg("dotted_name_only") = false, nb::arg("discard_simple_parens") = true,
-      nb::arg("literal_only") = false, nb::arg("add_parens_if_operator") = false);
+      nb::arg("literal_only") = false, nb::arg("add_parens_if_operator") = false,
+      "The node's text as UTF-8 bytes, or None where it has none in the mode asked for.");
   cls.def(
       "TextForAtomPlusTrailers",
       [](ConverterObject& self, Any atom, Any trailers, Truth dotted_name_only, Truth discard_simple_parens,

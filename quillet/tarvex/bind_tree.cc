@@ -389,9 +389,10 @@ void BindFactory(nb::module_& m) {
       [](FactoryObject& self, Any nodetype, Any text, Any context, Any children) {
         return ConvertSingleNode(*self.factory, nodetype, text, context, children);
       },
-      nb::arg("nodetype"), nb::arg("text"), nb::arg("context"), nb::arg("children"));
+      nb::arg("nodetype"), nb::arg("text"), nb::arg("context"), nb::arg("children"),
+      "The node for a reduced rule or a token: a new one, or the statement of a statement and its line end.");
   cls.def("NewNode", &NewNode, nb::arg("cls_info"), nb::arg("nodetype"), nb::arg("text"), nb::arg("context"),
-          nb::arg("children"));
+          nb::arg("children"), "A node of the record's class, off its free list.");
   cls.def(
       "NewKeywordNode",
       [](FactoryObject& self, Any text, Any context) {
@@ -415,21 +416,21 @@ void BindFactory(nb::module_& m) {
           return nb::object(nb::none());
         return Wrap(self.factory->CreateOperatorNode(pool.Intern(text.text()), CoreContext(context, &pool)), {});
       },
-      nb::arg("op_str"), nb::arg("context"));
+      nb::arg("op_str"), nb::arg("context"), "An operator's leaf, or None for text that is no operator.");
   cls.def(
       "DiscardNodes", [](FactoryObject& self, Any node) { self.factory->DiscardNodes(NodeOrNull(node)); },
-      nb::arg("node"));
+      nb::arg("node"), "Gives a whole tree back to the free lists.");
   cls.def(
       "RecursiveConvert",
       [](FactoryObject& self, Any raw_node) { return Wrap(RecursiveConvert(*self.factory, raw_node), {}); },
-      nb::arg("raw_node"));
+      nb::arg("raw_node"), "The tree of a raw node (type, value, context, children).");
 
   m.def(
       "__FinishedWithNode", [](Any node, Any depth) { FinishedWithNodeAtDepth(NodeOrNull(node), Int64Of(depth)); },
       nb::arg("node"), nb::arg("depth"));
   const auto finished = [](Any node) { FinishedWithNode(NodeOrNull(node)); };
-  m.def("FinishedWithNode", finished, nb::arg("node"));
-  m.def("NotCompiledFinishedWithNode", finished, nb::arg("node"));
+  m.def("FinishedWithNode", finished, nb::arg("node"), "Gives a whole tree back for reuse. Each tree goes back once.");
+  m.def("NotCompiledFinishedWithNode", finished, nb::arg("node"), "FinishedWithNode, for callers in host-level code.");
 }
 
 }  // namespace

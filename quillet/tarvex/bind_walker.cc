@@ -63,7 +63,7 @@ void BindFrame(nb::class_<WalkerObject>& cls) {
         Recording recording(&line);
         self.walker->Walk(root, &line.line());
       },
-      nb::arg("node"), nb::arg("logical"));
+      nb::arg("node"), nb::arg("logical"), "Records on `logical` what the tree says of names.");
   DefVisit<&CNodeWalker::ProcessNamesFound>(cls, "_ProcessNamesFound");
   DefVisit<&CNodeWalker::VisitChildren>(cls, "_VisitChildren");
   DefVisit<&CNodeWalker::VisitNode>(cls, "_VisitNode");
