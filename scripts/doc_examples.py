@@ -12,7 +12,8 @@ An example is a comment that names a view, a block of source and a block of outp
     ```
 
 The views: `records` (each record raw and decoded), `tree` (the parse tree), `analyze` (what the command
-line prints; the comment may name a file for it), `find` (what it answers of the name in the comment). The version is 3.12 where none is given.
+line prints; the comment may name a file for it), `find` (what it answers of the name in the comment).
+The version is 3.12 where none is given.
 
     scripts/doc_examples.py            names the examples that are stale; exit code 1 where there is one
     scripts/doc_examples.py --write    rewrites them

@@ -384,10 +384,11 @@ class _Texts(dict[str, int]):
         self._insert = f"INSERT INTO {table} VALUES (?, ?{', ?' if self._with_tail else ''})"
         self._empty = empty
         self._new: list[str] = []
-        self._next = connection.execute(f"SELECT max(id) FROM {table}").fetchone()[0] + 1
+        self._next: int = connection.execute(f"SELECT max(id) FROM {table}").fetchone()[0] + 1
 
     def __missing__(self, text: str) -> int:
-        number = self[text] = self._find_or_add(text)
+        number = self._find_or_add(text)
+        self[text] = number
         return number
 
     def _find_or_add(self, text: str) -> int:
