@@ -39,7 +39,7 @@ from quillet.index.store import (
 _GRAIN_NS = 2_000_000_000
 _UNTRUSTED = -1
 # A transaction takes about this much source: what an end at the worst moment loses.
-_BATCH_BYTES = 4 << 20
+_BATCH_BYTES = 1 << 20
 _BATCH_FILES = 512
 
 
