@@ -50,10 +50,11 @@ class SourceFile:
         if self.content is None:
             return []
         try:
-            source = to_utf8(self.content)
+            source = to_utf8(self.content).removeprefix(_BOM)
         except SourceEncodingError:
             return []
-        return _LINE_END.split(source.removeprefix(_BOM))
+        # By far the most files have one kind of line end, and a plain split is many times as fast.
+        return _LINE_END.split(source) if b"\r" in source else source.split(b"\n")
 
     def line(self, number: int) -> bytes:
         """A line counted from 1, empty where there is none."""
