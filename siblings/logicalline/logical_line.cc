@@ -120,8 +120,10 @@ void LogicalLine::MakeOwnStore() {
 
 namespace {
 
-// A place that only a host can have made up is not filled with blanks for ever.
-constexpr int64_t kMaxGap = 1 << 16;
+// The most blanks or line ends that take the place of what is not the line's own text. It is far from
+// what people write, and bounds the texts of the many errors that one physical line of broken code may
+// hold: each of them would be as long as all in front of it.
+constexpr int64_t kMaxGap = 1 << 10;
 
 // Text under construction, and the line and column at which it ends.
 class SpelledText {

@@ -537,6 +537,22 @@ TEST(LogicalLines, TextSpellsIndentationAndLinesWithinTokens) {
   EXPECT_EQ(TextFromTokens(LogicalLine()), "");
 }
 
+TEST(LogicalLines, TextKeepsItsColumnUpToALineThatNobodyWrites) {
+  const Cut cut(std::string(10000, ';'));
+  size_t total = 0;
+  LogicalLine line;
+  for (const LineRow& row : cut.rows) {
+    SetFromRow(line, cut.source, row);
+    const std::string text = TextFromTokens(line);
+    if (row.first_token <= 500) {
+      EXPECT_EQ(text, std::string(row.first_token, ' ') + ";");
+    }
+    total += text.size();
+  }
+  EXPECT_EQ(cut.rows.size(), 10000u);
+  EXPECT_LT(total, cut.rows.size() * 2000);
+}
+
 TEST(LogicalLines, TokenTypesAreIndexedAsTheHostsListIs) {
   const Cut cut("if 1: # c");
   LogicalLine line;
