@@ -264,8 +264,8 @@ def _star_in_signature_comment(s: Statement) -> list[Edit]:
     return [(*s.comment, " ")] if is_kind and s.comment else []
 
 
-def _bracketed_type_in_signature_comment(s: Statement) -> list[Edit]:
-    is_kind = _is_signature_comment(s) and re.search(r"[(,]\s*\(", _comment_text(s))
+def _brackets_in_signature_comment(s: Statement) -> list[Edit]:
+    is_kind = _is_signature_comment(s) and _comment_text(s).count("(") > 1
     return [(*s.comment, " ")] if is_kind and s.comment else []
 
 
@@ -296,7 +296,7 @@ KINDS = (
     Kind("string in an annotation that is no expression", _text_in_annotation),
     Kind("type comment behind a `def` that is no signature", _comment_that_is_no_signature),
     Kind("star in a signature comment", _star_in_signature_comment),
-    Kind("type in round brackets in a signature comment", _bracketed_type_in_signature_comment),
+    Kind("round brackets inside of a signature comment", _brackets_in_signature_comment),
     Kind("type comment that is no expression", _comment_that_is_no_expression),
 )
 

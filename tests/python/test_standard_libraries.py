@@ -38,7 +38,7 @@ ALLOWED = {
     "string in an annotation that is no expression": (3, 0),
     "type comment behind a `def` that is no signature": (2, 7),
     "star in a signature comment": (2, 7),
-    "type in round brackets in a signature comment": (2, 7),
+    "round brackets inside of a signature comment": (2, 7),
     "type comment that is no expression": (2, 7),
 }
 
@@ -136,7 +136,8 @@ EXAMPLES = [
     ("string in an annotation that is no expression", (3, 8), "def f(a: 'any text', b: 'more of it'): pass"),
     ("type comment behind a `def` that is no signature", (3, 8), "def f(a):  # type: ignore[override]"),
     ("star in a signature comment", (3, 8), "def f(*a):  # type: (*int) -> int"),
-    ("type in round brackets in a signature comment", (3, 8), "def f(a, b):  # type: ((A), B[(C)]) -> int"),
+    ("round brackets inside of a signature comment", (3, 8), "def f(a, b):  # type: ((A), B[(C)]) -> int"),
+    ("round brackets inside of a signature comment", (3, 8), "def f(a):  # type: (int) -> (str)"),
     ("type comment that is no expression", (3, 8), "x = 1  # type: any text"),
 ]
 
