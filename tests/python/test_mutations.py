@@ -74,10 +74,10 @@ LETTERS = "\0\t\n\r\"'\\\x7f\xe9\u20ac\U0001f40d"
 
 TOKEN = re.compile(r"\w+|\s+|'[^'\n]*'|\"[^\"\n]*\"|\W")
 
-#: What is reported, and nothing else: an expression is needed where a "..." stands or a comment's hint is a decorator.
+#: What is reported, and nothing else: an expression is needed where a "..." or a type comment's statement stands.
 NO_EXPRESSION = re.compile(
     r"(?:TypeError\('Expected CExpression, got CNode'\)|needs to be a CExpression; .*)\n  logical tokens: .*\.\.\."
-    r"|TypeError\('Expected CExpression, got CSingleDecorator'\)\n  logical tokens: .*type: *@",
+    r"|TypeError\('Expected CExpression, got C\w+'\)\n  logical tokens: .*#.*type:",
     re.DOTALL,
 )
 
