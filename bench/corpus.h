@@ -13,7 +13,7 @@ struct Corpus {
   std::string folder;
   std::vector<std::string> files;  // contents
   size_t bytes = 0;
-  size_t lines = 0;                // physical
+  size_t lines = 0;  // physical
 };
 
 // Read on first use; ends the process with a message where nothing is found.

@@ -1,8 +1,8 @@
 """Per-statement analysis of Python code: what each statement tells about names.
 
-`analyze` takes a whole source, `analyze_files` many files on all cores. `quillet.tarvex` is the engine below it, which takes one logical line at
-a time; `quillet.logicalline`, `quillet.optpgen`, `quillet.symbolinfo` and `quillet.strutils` are what it
-works with.
+`analyze` takes a whole source, `analyze_files` many files on all cores. `quillet.tarvex` is the engine
+below, which takes one logical line at a time; `quillet.logicalline`, `quillet.optpgen`,
+`quillet.symbolinfo` and `quillet.strutils` are what it works with.
 """
 
 from __future__ import annotations
