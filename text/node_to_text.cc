@@ -26,7 +26,7 @@ constexpr std::array<bool, 128> kHarmless = [] {
   for (int c = '0'; c <= '9'; ++c) table[c] = true;
   for (int c = 'a'; c <= 'z'; ++c) table[c] = true;
   for (int c = 'A'; c <= 'Z'; ++c) table[c] = true;
-  for (char c : {' ', '"', '\'', ',', '.', '_'}) table[static_cast<int>(c)] = true;
+  for (const unsigned char c : {' ', '"', '\'', ',', '.', '_'}) table[c] = true;
   return table;
 }();
 
