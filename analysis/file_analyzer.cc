@@ -8,7 +8,7 @@
 namespace quillet {
 
 FileAnalyzer::FileAnalyzer(const Options& options)
-    : options_(options), analyzer_(options), source_(SourceText::Copy(Text("", 0))) {}
+    : options_(options), analyzer_(options), source_(SourceText::Copy(Text(""))) {}
 
 CPGenAnalyzerImpl& FileAnalyzer::AnalyzerForSource() {
   if (options_.print_function_grammar_file.empty() || !ImportsPrintFunction(*source_, rows_)) return analyzer_;

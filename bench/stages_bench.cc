@@ -85,7 +85,7 @@ bool TokensInOrder(const SourceText& source) {
 }
 
 void Tokenize(benchmark::State& state) {
-  Ref<SourceText> source = SourceText::Copy(Text("", 0));
+  Ref<SourceText> source = SourceText::Copy(Text(""));
   for (const std::string& bytes : TheCorpus().files) {
     source->Assign(bytes);
     TokenizeOnly(*source, kVersion);
@@ -103,7 +103,7 @@ void Tokenize(benchmark::State& state) {
 BENCHMARK(Tokenize)->Unit(benchmark::kMillisecond);
 
 void Cut(benchmark::State& state) {
-  Ref<SourceText> source = SourceText::Copy(Text("", 0));
+  Ref<SourceText> source = SourceText::Copy(Text(""));
   std::vector<LineRow> rows;
   size_t index = 0;
   for (const std::string& bytes : TheCorpus().files) {

@@ -35,7 +35,7 @@ inline constexpr Text kClassInstanceSuffix = ":";
 inline constexpr Text kIterationSubscript = "[*]";
 
 // Names of scopes, as consumers of the records use them.
-inline constexpr Text kModuleScopeName{"", 0};
+inline constexpr Text kModuleScopeName = Text("");
 inline constexpr Text kDefLineScopeName = "<def-line>";
 inline constexpr Text kDotLineScopeName = ".<def-line>";
 inline constexpr Text kScopeIndexSep = "#";
