@@ -105,74 +105,56 @@ void FillArray(size_t length, std::unique_ptr<OwnedArray> owned, ArrowArray* arr
   array->private_data = owned.release();
 }
 
-// The strings of a dictionary.
-struct Dictionary {
-  std::vector<int64_t> offsets{0};
-  std::string bytes;
-
-  size_t size() const { return offsets.size() - 1; }
-  void Add(Text text) {
-    bytes.append(text);
-    offsets.push_back(static_cast<int64_t>(bytes.size()));
-  }
-};
-
-// The records of several files as columns. The first file's are taken as they are.
+// The records of several files as columns.
 struct Columns {
-  RecordTable table;
   std::vector<int32_t> path_indices;
+  std::vector<uint32_t> lines;
+  std::vector<uint32_t> columns;
+  std::vector<uint32_t> scope_indices;
+  TextList names;
+  std::vector<RecordKind> kind_indices;
+  TextList details;
   std::vector<uint8_t> parameter_bits;
-  Dictionary paths;
-  Dictionary scopes;
-  Dictionary kinds;
+  TextList paths;
+  TextList scopes;
+  TextList kinds;
 
-  void Add(RecordTable&& other, const std::string& path) {
-    const auto path_index = static_cast<int32_t>(paths.size());
-    const auto first_scope = static_cast<uint32_t>(scopes.size());
-    std::string shown;
-    AppendShown(path, shown);
-    paths.Add(shown);
-    for (const std::string& scope : other.scope_names) scopes.Add(scope);
-    path_indices.insert(path_indices.end(), other.size(), path_index);
-    if (table.size() == 0) {
-      table = std::move(other);
-      return;
-    }
-    const auto append = [](auto& to, const auto& from) { to.insert(to.end(), from.begin(), from.end()); };
-    append(table.lines, other.lines);
-    append(table.columns, other.columns);
-    append(table.kinds, other.kinds);
-    append(table.is_parameter, other.is_parameter);
-    for (const uint32_t scope : other.scopes) table.scopes.push_back(first_scope + scope);
-    AppendTexts(other.names, other.name_offsets, table.names, table.name_offsets);
-    AppendTexts(other.details, other.detail_offsets, table.details, table.detail_offsets);
-  }
-
-  void Finish() {
-    parameter_bits.assign((table.size() + 7) / 8, 0);
-    for (size_t i = 0; i < table.size(); ++i) {
-      if (table.is_parameter[i]) parameter_bits[i / 8] = static_cast<uint8_t>(parameter_bits[i / 8] | 1u << i % 8);
-    }
+  Columns() {
     for (const Text word : RecordKindWords()) kinds.Add(word);
   }
 
- private:
-  static void AppendTexts(const std::string& from, const std::vector<int64_t>& from_offsets, std::string& to,
-                          std::vector<int64_t>& to_offsets) {
-    const auto base = static_cast<int64_t>(to.size());
-    to += from;
-    for (size_t i = 1; i < from_offsets.size(); ++i) to_offsets.push_back(base + from_offsets[i]);
+  size_t size() const { return lines.size(); }
+
+  void Add(const RecordTable& table, const std::string& path) {
+    std::string shown;
+    AppendShown(path, shown);
+    path_indices.insert(path_indices.end(), table.size(), static_cast<int32_t>(paths.size()));
+    paths.Add(shown);
+    const auto first_scope = static_cast<uint32_t>(scopes.size());
+    for (size_t i = 0; i < table.scope_texts.size(); ++i) scopes.Add(table.scope_texts[i]);
+    for (const uint32_t scope : table.scopes) scope_indices.push_back(first_scope + scope);
+    const auto append = [](auto& to, const auto& from) { to.insert(to.end(), from.begin(), from.end()); };
+    append(lines, table.lines);
+    append(columns, table.columns);
+    append(kind_indices, table.kinds);
+    const size_t before = size() - table.size();
+    parameter_bits.resize((size() + 7) / 8);
+    for (size_t i = 0; i < table.size(); ++i) {
+      names.Add(table.NameAt(i));
+      details.Add(table.DetailAt(i));
+      const size_t bit = before + i;
+      if (table.is_parameter[i])
+        parameter_bits[bit / 8] = static_cast<uint8_t>(parameter_bits[bit / 8] | 1u << bit % 8);
+    }
   }
 };
 
-void FillTableArray(std::shared_ptr<Columns> columns, ArrowArray* array) {
-  columns->Finish();
-  const RecordTable& table = columns->table;
+void FillTableArray(const std::shared_ptr<const Columns>& columns, ArrowArray* array) {
   auto owned = std::make_unique<OwnedArray>();
   owned->buffers = {nullptr};  // no row is null
   owned->children.resize(kColumnCount);
   size_t next = 0;
-  const auto add = [&](std::vector<const void*> buffers, const Dictionary* dictionary = nullptr) {
+  const auto add = [&](std::vector<const void*> buffers, const TextList* dictionary = nullptr) {
     auto column = std::make_unique<OwnedArray>();
     column->buffers = {nullptr};
     column->buffers.insert(column->buffers.end(), buffers.begin(), buffers.end());
@@ -184,18 +166,18 @@ void FillTableArray(std::shared_ptr<Columns> columns, ArrowArray* array) {
       column->dictionary = std::make_unique<ArrowArray>();
       FillArray(dictionary->size(), std::move(strings), column->dictionary.get());
     }
-    FillArray(table.size(), std::move(column), &owned->children[next++]);
+    FillArray(columns->size(), std::move(column), &owned->children[next++]);
   };
   // In the order of kColumns.
   add({columns->path_indices.data()}, &columns->paths);
-  add({table.lines.data()});
-  add({table.columns.data()});
-  add({table.scopes.data()}, &columns->scopes);
-  add({table.name_offsets.data(), table.names.data()});
-  add({table.kinds.data()}, &columns->kinds);
-  add({table.detail_offsets.data(), table.details.data()});
+  add({columns->lines.data()});
+  add({columns->columns.data()});
+  add({columns->scope_indices.data()}, &columns->scopes);
+  add({columns->names.offsets.data(), columns->names.bytes.data()});
+  add({columns->kind_indices.data()}, &columns->kinds);
+  add({columns->details.offsets.data(), columns->details.bytes.data()});
   add({columns->parameter_bits.data()});
-  FillArray(table.size(), std::move(owned), array);
+  FillArray(columns->size(), std::move(owned), array);
 }
 
 // ---- the stream ----
@@ -234,12 +216,12 @@ int GetNext(ArrowArrayStream* stream, ArrowArray* out) {
   return Guarded(stream, [out](Stream& self) {
     auto columns = std::make_shared<Columns>();
     BatchResult result;
-    while (columns->table.size() < kBatchRows && self.source->Next(result)) {
-      if (result.table.size() != 0) columns->Add(std::move(result.table), self.source->PathOf(result));
+    while (columns->size() < kBatchRows && self.source->Next(result)) {
+      if (result.table.size() != 0) columns->Add(result.table, self.source->PathOf(result));
       result = {};
     }
     *out = {};
-    if (columns->table.size() != 0) FillTableArray(std::move(columns), out);
+    if (columns->size() != 0) FillTableArray(columns, out);
   });
 }
 

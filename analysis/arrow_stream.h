@@ -1,8 +1,8 @@
 // Records of many files as a stream of columns through the Arrow C data interface, which most readers of
 // columns take without a copy: pyarrow, polars, duckdb, pandas.
 //
-// A batch of the stream holds the records of whole files, as many as make a batch worth while; its
-// buffers are the columns themselves, and live until the reader releases them. Columns:
+// A batch of the stream holds the records of whole files, as many as make a batch worth while. Its
+// buffers live until the reader releases them. Columns:
 //   path          dictionary<int32, large_utf8>    name          large_utf8
 //   line, column  uint32                           kind          dictionary<int8, large_utf8>
 //   scope         dictionary<int32, large_utf8>    detail        large_utf8

@@ -106,7 +106,7 @@ class Worker {
     if (writer_ != nullptr)
       writer_->Write(input, file_, scopes_, placed_, result.output);
     else
-      result.table.Fill(file_, scopes_, placed_);
+      result.table = tables_.Make(file_, scopes_, placed_);
     return {};
   }
 
@@ -130,6 +130,7 @@ class Worker {
   FileAnalyzer file_;
   ScopeNames scopes_;
   PlacedRecords placed_;
+  RecordTableMaker tables_;
   std::unique_ptr<FileWriter> writer_;
   std::string bytes_;
 };
@@ -148,6 +149,12 @@ BatchAnalyzer::BatchAnalyzer(Options options, std::vector<BatchInput> inputs)
 BatchAnalyzer::~BatchAnalyzer() { Cancel(); }
 
 void BatchAnalyzer::Start() {
+  const std::lock_guard lock(mutex_);
+  if (!started_) StartThreads();
+}
+
+void BatchAnalyzer::StartThreads() {
+  started_ = true;
   const unsigned cores = std::max(std::thread::hardware_concurrency(), 1u);
   const size_t count = std::min<size_t>(options_.jobs == 0 ? cores : options_.jobs, inputs_.size());
   for (size_t i = 0; i < count; ++i) {
@@ -211,10 +218,7 @@ void BatchAnalyzer::Deliver(BatchResult&& result) {
 BatchAnalyzer::Wait BatchAnalyzer::Next(BatchResult& result, std::chrono::milliseconds patience) {
   {
     std::unique_lock lock(mutex_);
-    if (!started_) {
-      started_ = true;
-      if (!cancelled_) Start();
-    }
+    if (!started_) StartThreads();
     const auto is_over = [this] { return cancelled_ || next_to_hand_out_ >= inputs_.size(); };
     std::optional<BatchResult>& slot = waiting_[next_to_hand_out_ % waiting_.size()];
     if (!may_hand_out_.wait_for(lock, patience, [&] { return slot.has_value() || is_over(); })) return Wait::kTimeout;

@@ -87,6 +87,9 @@ class BatchAnalyzer {
 
   const std::vector<BatchInput>& inputs() const { return inputs_; }
 
+  // Sets the threads to work in front of the first Next, which does so otherwise.
+  void Start();
+
   enum class Wait { kResult, kEnd, kTimeout };
   // The next result in order. kEnd behind the last one and after Cancel. For one thread at a time.
   Wait Next(BatchResult& result, std::chrono::milliseconds patience);
@@ -97,7 +100,7 @@ class BatchAnalyzer {
   void Cancel();
 
  private:
-  void Start();
+  void StartThreads();
   void Work();
   // The next index for a thread; nothing at the end.
   std::optional<size_t> Take();

@@ -75,8 +75,67 @@ nb::object Checked(nb::object made) {
   return made;
 }
 
+// The texts of a list as str, each made when it is first asked for.
+class ShownTexts {
+ public:
+  explicit ShownTexts(const TextList& texts) : texts_(texts) {}
+
+  const nb::object& operator[](size_t i) {
+    if (shown_.empty()) shown_.resize(texts_.size());
+    nb::object& shown = shown_[i];
+    if (!shown.is_valid()) shown = Checked(ShownText(texts_[i]));
+    return shown;
+  }
+
+  nb::list All() {
+    nb::list list;
+    for (size_t i = 0; i < texts_.size(); ++i) list.append((*this)[i]);
+    return list;
+  }
+
+ private:
+  const TextList& texts_;
+  std::vector<nb::object> shown_;
+};
+
+// A tuple under construction. Its size and type are the caller's affair.
+class TupleFiller {
+ public:
+  TupleFiller(nb::handle type, Py_ssize_t size)
+      : tuple_(Checked(nb::steal(reinterpret_cast<PyTypeObject*>(type.ptr())
+                                     ->tp_alloc(reinterpret_cast<PyTypeObject*>(type.ptr()), size)))) {}
+
+  void Add(nb::object value) { PyTuple_SET_ITEM(tuple_.ptr(), next_++, Checked(std::move(value)).release().ptr()); }
+  void Add(size_t number) { Add(nb::steal(PyLong_FromSize_t(number))); }
+  nb::object Take() { return std::move(tuple_); }
+
+ private:
+  nb::object tuple_;
+  Py_ssize_t next_ = 0;
+};
+
+// The numbers that a database gave to the texts of a list: a list of int, one a text.
+class TextNumbers {
+ public:
+  TextNumbers(nb::handle list, const TextList& texts) : list_(list) {
+    if (!PyList_Check(list.ptr()) || nb::len(list) != texts.size())
+      ThrowError(ErrorKind::kValueError, "a list with a number a text is needed");
+  }
+  nb::object operator[](size_t i) const { return nb::borrow(PyList_GET_ITEM(list_.ptr(), static_cast<Py_ssize_t>(i))); }
+
+ private:
+  nb::handle list_;
+};
+
 struct FileResult {
   BatchResult result;
+  ShownTexts scopes{result.table.scope_texts};
+  ShownTexts names{result.table.name_texts};
+  ShownTexts details{result.table.detail_texts};
+
+  FileResult() = default;
+  FileResult(const FileResult&) = delete;
+  FileResult& operator=(const FileResult&) = delete;
 
   nb::list Messages(const std::vector<BatchResult::Message>& messages) const {
     nb::list list;
@@ -85,11 +144,11 @@ struct FileResult {
     return list;
   }
 
-  nb::list Definitions(nb::handle row_class) const {
+  nb::list Definitions(nb::handle row_class) {
     nb::list list;
     for (const RecordTable::Definition& definition : result.table.definitions) {
-      list.append(row_class(Checked(ShownText(result.table.scope_names[definition.scope])), WordOf(definition.kind),
-                            definition.line, definition.column, definition.first_line, definition.last_line));
+      list.append(row_class(scopes[definition.scope], WordOf(definition.kind), definition.line, definition.column,
+                            definition.first_line, definition.last_line));
     }
     return list;
   }
@@ -109,33 +168,59 @@ struct FileResult {
   }
 
   // Records as instances of a class that derives from tuple, with the host's own objects for kinds.
-  nb::list Rows(size_t begin, size_t end, nb::handle row_class, nb::tuple kinds) const {
+  nb::list Rows(size_t begin, size_t end, nb::handle row_class, nb::tuple kinds) {
     const RecordTable& table = result.table;
-    auto* type = reinterpret_cast<PyTypeObject*>(row_class.ptr());
-    if (!PyType_Check(row_class.ptr()) || !PyType_IsSubtype(type, &PyTuple_Type))
+    if (!PyType_Check(row_class.ptr()) ||
+        !PyType_IsSubtype(reinterpret_cast<PyTypeObject*>(row_class.ptr()), &PyTuple_Type))
       ThrowError(ErrorKind::kTypeError, "a class that derives from tuple is needed");
     if (kinds.size() != RecordKindWords().size()) ThrowError(ErrorKind::kValueError, "an object a kind is needed");
     end = std::min(end, table.size());
     begin = std::min(begin, end);
-    std::vector<nb::object> scopes(table.scope_names.size());
     nb::list rows;
     for (size_t i = begin; i < end; ++i) {
-      nb::object& scope = scopes[table.scopes[i]];
-      if (!scope.is_valid()) scope = Checked(ShownText(table.scope_names[table.scopes[i]]));
-      nb::object row = Checked(nb::steal(type->tp_alloc(type, 7)));
-      const auto set = [&row](Py_ssize_t at, nb::object value) {
-        PyTuple_SET_ITEM(row.ptr(), at, Checked(std::move(value)).release().ptr());
-      };
-      set(0, nb::steal(PyLong_FromUnsignedLong(table.lines[i])));
-      set(1, nb::steal(PyLong_FromUnsignedLong(table.columns[i])));
-      set(2, scope);
-      set(3, ShownText(table.NameAt(i)));
-      set(4, nb::borrow(kinds[static_cast<size_t>(table.kinds[i])]));
-      set(5, ShownText(table.DetailAt(i)));
-      set(6, nb::borrow(table.is_parameter[i] ? Py_True : Py_False));
-      rows.append(std::move(row));
+      TupleFiller row(row_class, 7);
+      row.Add(table.lines[i]);
+      row.Add(table.columns[i]);
+      row.Add(scopes[table.scopes[i]]);
+      row.Add(names[table.names[i]]);
+      row.Add(nb::borrow(kinds[static_cast<size_t>(table.kinds[i])]));
+      row.Add(details[table.details[i]]);
+      row.Add(nb::borrow(table.is_parameter[i] ? Py_True : Py_False));
+      rows.append(row.Take());
     }
     return rows;
+  }
+
+  // Records as rows of integers for a database that holds texts by numbers, `rows_per_tuple` in each
+  // tuple: what is left behind the last full one is in nobody's. A row has kDatabaseColumns, which are
+  // id, name, scope, line, column, kind, is_parameter, opens, detail; record i has the id first_id + i.
+  nb::list NumberedRows(size_t begin, size_t end, size_t rows_per_tuple, size_t first_id, nb::handle name_numbers,
+                        nb::handle scope_numbers, nb::handle detail_numbers) const {
+    constexpr size_t kDatabaseColumns = 9;
+    const RecordTable& table = result.table;
+    const TextNumbers name_number(name_numbers, table.name_texts);
+    const TextNumbers scope_number(scope_numbers, table.scope_texts);
+    const TextNumbers detail_number(detail_numbers, table.detail_texts);
+    if (rows_per_tuple == 0 || rows_per_tuple > 1024)
+      ThrowError(ErrorKind::kValueError, "a tuple holds from 1 to 1024 rows");
+    end = std::min(end, table.size());
+    nb::list tuples;
+    for (size_t i = begin; i < end && end - i >= rows_per_tuple;) {
+      TupleFiller tuple(&PyTuple_Type, static_cast<Py_ssize_t>(rows_per_tuple * kDatabaseColumns));
+      for (const size_t behind = i + rows_per_tuple; i < behind; ++i) {
+        tuple.Add(first_id + i);
+        tuple.Add(name_number[table.names[i]]);
+        tuple.Add(scope_number[table.scopes[i]]);
+        tuple.Add(table.lines[i]);
+        tuple.Add(table.columns[i]);
+        tuple.Add(static_cast<size_t>(table.kinds[i]));
+        tuple.Add(size_t{table.is_parameter[i]});
+        tuple.Add(static_cast<size_t>(table.opens[i]));
+        tuple.Add(detail_number[table.details[i]]);
+      }
+      tuples.append(tuple.Take());
+    }
+    return tuples;
   }
 };
 
@@ -175,6 +260,8 @@ class FileBatch {
   ~FileBatch() { Cancel(); }
   FileBatch(const FileBatch&) = delete;
   FileBatch& operator=(const FileBatch&) = delete;
+
+  void Start() { batch_->Start(); }
 
   // Python's own signals end the wait by their exceptions.
   nb::object Next() {
@@ -358,10 +445,18 @@ void BindBatch(nb::module_& tarvex) {
       .def("Definitions", &FileResult::Definitions, nb::arg("row_class"),
            "Classes, functions and type aliases: row_class(scope, kind, line, column, first_line, last_line).")
       .def("Rows", &FileResult::Rows, nb::arg("begin"), nb::arg("end"), nb::arg("row_class"), nb::arg("kinds"),
-           "Records from `begin` up to `end` as instances of a class that derives from tuple.");
+           "Records from `begin` up to `end` as instances of a class that derives from tuple.")
+      .def_prop_ro("name_texts", [](FileResult& self) { return self.names.All(); })
+      .def_prop_ro("scope_texts", [](FileResult& self) { return self.scopes.All(); })
+      .def_prop_ro("detail_texts", [](FileResult& self) { return self.details.All(); })
+      .def("NumberedRows", &FileResult::NumberedRows, nb::arg("begin"), nb::arg("end"), nb::arg("rows_per_tuple"),
+           nb::arg("first_id"), nb::arg("name_numbers"), nb::arg("scope_numbers"), nb::arg("detail_numbers"),
+           "Records as rows of integers, several in a tuple, with a database's numbers for the texts: id, name, "
+           "scope, line, column, kind, is_parameter, opens, detail.");
   nb::class_<FileBatch>(host, "Batch", "Files through the native path, on threads without the interpreter lock.")
       .def(nb::init<const Language&, nb::handle, unsigned, nb::object, nb::object>(), nb::arg("language"),
            nb::arg("inputs"), nb::arg("jobs"), nb::arg("decode"), nb::arg("format").none())
+      .def("Start", &FileBatch::Start, "Sets the threads to work in front of the first Next.")
       .def("Next", &FileBatch::Next, "The next file's result, in the order of the inputs; None at the end.")
       .def_prop_ro("problems", &FileBatch::Problems)
       .def(

@@ -53,8 +53,11 @@ BatchResult ResultOf(std::string source, Version version = kPy3) {
 std::string ShowRecord(const RecordTable& table, size_t i) {
   std::string shown = table.is_parameter[i] ? "arg " : "";
   shown += std::to_string(table.lines[i]) + ":" + std::to_string(table.columns[i]) + " ";
-  shown += table.scope_names[table.scopes[i]] + "|";
-  shown.append(table.NameAt(i)).append(" ").append(RecordKindWords()[static_cast<size_t>(table.kinds[i])]);
+  shown.append(table.ScopeAt(i))
+      .append("|")
+      .append(table.NameAt(i))
+      .append(" ")
+      .append(RecordKindWords()[static_cast<size_t>(table.kinds[i])]);
   if (!table.DetailAt(i).empty()) shown.append(" ").append(table.DetailAt(i));
   return shown;
 }
@@ -168,7 +171,7 @@ TEST(Scopes, DefinitionsAreListedWithTheirExtent) {
   ASSERT_EQ(result.table.definitions.size(), 3u);
   const auto shown = [&](size_t i) {
     const RecordTable::Definition& found = result.table.definitions[i];
-    return result.table.scope_names[found.scope] + " " + std::to_string(found.line) + ":" +
+    return std::string(result.table.scope_texts[found.scope]) + " " + std::to_string(found.line) + ":" +
            std::to_string(found.column) + " " + std::to_string(found.first_line) + "-" +
            std::to_string(found.last_line);
   };
@@ -182,8 +185,9 @@ TEST(Scopes, DeepAndLongNamesStayBounded) {
   for (size_t depth = 0; depth < 2000; ++depth) source += std::string(depth, ' ') + "def name(a):\n";
   const BatchResult result = ResultOf(source);
   EXPECT_EQ(result.table.definitions.size(), 2000u);
-  for (const std::string& name : result.table.scope_names) EXPECT_LE(name.size(), ScopeNames::kMaxNameSize);
-  EXPECT_EQ(ResultOf("class " + std::string(100'000, 'a') + ":\n  x = 1\n").table.scope_names, Strings{""});
+  const TextList& scopes = result.table.scope_texts;
+  for (size_t i = 0; i < scopes.size(); ++i) EXPECT_LE(scopes[i].size(), ScopeNames::kMaxNameSize);
+  EXPECT_EQ(ResultOf("class " + std::string(100'000, 'a') + ":\n  x = 1\n").table.scope_texts.size(), 1u);
 }
 
 TEST(Texts, ThoseOfAllRecordsGrowWithTheSourceAndNotItsSquare) {

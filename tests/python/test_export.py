@@ -219,6 +219,17 @@ def test_parquet_holds_the_records_or_says_what_to_install(shop: Path) -> None:
     rows = parquet.read_table(shop / "out.parquet").to_pylist()
     assert len(rows) == json.loads(run("stats", "--json", cwd=shop).stdout)["records"]
     assert {row["path"] for row in rows} == {"shop.py"}
+    assert not (shop / "out.parquet.part").exists()
+
+
+def test_parquet_names_what_it_cannot_read_or_write(shop: Path) -> None:
+    pytest.importorskip("pyarrow")
+    result = run("index", ".", "gone.py", "--format", "parquet", "-q", "-o", "out.parquet", cwd=shop)
+    assert result.returncode == 1
+    assert result.stderr == "quillet: gone.py: No such file or directory\nquillet: 1 file could not be read\n"
+    result = run("index", ".", "--format", "parquet", "-o", "missing/out.parquet", cwd=shop)
+    assert result.returncode == 1
+    assert result.stderr == "quillet: missing/out.parquet: No such file or directory\n"
 
 
 def test_an_export_that_cannot_be_written_is_told(shop: Path) -> None:

@@ -20,9 +20,9 @@ def run(settings: Settings, *, output: str | None, form: str, watch: bool, quiet
     if "-" in settings.paths:
         print("quillet: standard input has no place in an index; name files or folders", file=sys.stderr)
         return 2
-    if form == "parquet":
-        return _parquet(settings, output)
     try:
+        if form == "parquet":
+            return _parquet(settings, output or "quillet.parquet", quiet=quiet)
         index = output or (DEFAULT_NAME if settings.paths else find_index())
         outcome = _update(index, settings, quiet=quiet)
         if watch:
@@ -35,48 +35,42 @@ def run(settings: Settings, *, output: str | None, form: str, watch: bool, quiet
     return 1 if outcome.unread else 0
 
 
-def _parquet(settings: Settings, output: str | None) -> int:
-    """Indexes into a database that is not kept, and writes its records as Parquet."""
-    from tempfile import TemporaryDirectory
+def _parquet(settings: Settings, target: str, *, quiet: bool) -> int:
+    from quillet.index.parquet import write_parquet
 
-    from quillet.index.parquet import MissingPackage, write_parquet
-    from quillet.index.questions import Index
-
-    target = output or "quillet.parquet"
     if not settings.paths:
         print("quillet: name what to index: quillet index PATH... --format parquet", file=sys.stderr)
         return 2
-    try:
-        with TemporaryDirectory(prefix="quillet-") as folder:
-            path = os.path.join(folder, "index")
-            outcome = _update(path, settings, quiet=True)
-            with Index(path) as index:
-                write_parquet(index, target)
-    except (IndexProblem, MissingPackage) as problem:
-        print(f"quillet: {printable(str(problem))}", file=sys.stderr)
-        return 1
-    except OSError as error:
-        print(f"quillet: {printable(target)}: {error.strerror or error}", file=sys.stderr)
-        return 1
+    start = time.perf_counter()
+    outcome = write_parquet(settings, target, _reports(target))
+    _tell(target, settings, outcome, time.perf_counter() - start, quiet=quiet)
     return 1 if outcome.unread else 0
 
 
 def _update(index: str, settings: Settings, *, quiet: bool) -> Outcome:
     start = time.perf_counter()
-    outcome = update(index, settings, Reports(unread=_say_unread, waiting=lambda: _say_waiting(index)))
+    outcome = update(index, settings, _reports(index))
+    _tell(index, settings, outcome, time.perf_counter() - start, quiet=quiet)
+    return outcome
+
+
+def _reports(target: str) -> Reports:
+    return Reports(unread=_say_unread, waiting=lambda: _say_waiting(target))
+
+
+def _tell(target: str, settings: Settings, outcome: Outcome, spent: float, *, quiet: bool) -> None:
+    """Says what a run did."""
     if not quiet:
         parts = [f"{outcome.files} files", f"{outcome.records} records", f"{outcome.analysed} analysed"]
         if outcome.removed:
             parts.append(f"{outcome.removed} removed")
-        spent = time.perf_counter() - start
-        print(f"quillet: {printable(index)}: {', '.join(parts)} in {spent:.2f} s", file=sys.stderr)
+        print(f"quillet: {printable(target)}: {', '.join(parts)} in {spent:.2f} s", file=sys.stderr)
         if outcome.files == 0 and not outcome.unread:
             named = " ".join(printable(path) for path in settings.paths) or "."
             print(f"quillet: {named}: there are no Python files; name a folder that holds some", file=sys.stderr)
     if outcome.unread:
         noun = "file" if outcome.unread == 1 else "files"
         print(f"quillet: {outcome.unread} {noun} could not be read", file=sys.stderr)
-    return outcome
 
 
 def _say_unread(path: str, problem: str) -> None:

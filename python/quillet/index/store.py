@@ -42,7 +42,7 @@ KINDS = (
     "equal",
     "other",
 )
-# Whether a record's name is what a statement opens a scope for.
+# What a record's name opens a scope for, if any.
 CLASS = 1
 FUNCTION = 2
 KIND_NUMBER = {kind: number for number, kind in enumerate(KINDS)}
@@ -61,9 +61,8 @@ CREATE TABLE files (
   records INTEGER NOT NULL,
   problem TEXT
 );
-CREATE TABLE names (id INTEGER PRIMARY KEY, name TEXT NOT NULL UNIQUE, tail TEXT NOT NULL);
-CREATE INDEX names_by_tail ON names (tail);
-CREATE TABLE details (id INTEGER PRIMARY KEY, detail TEXT NOT NULL UNIQUE);
+CREATE TABLE names (id INTEGER PRIMARY KEY, name TEXT NOT NULL, tail TEXT NOT NULL);
+CREATE TABLE details (id INTEGER PRIMARY KEY, detail TEXT NOT NULL);
 CREATE TABLE records (
   id INTEGER PRIMARY KEY,
   name INTEGER NOT NULL,
@@ -91,7 +90,14 @@ CREATE VIEW facts AS
     JOIN kinds k ON k.id = r.kind
     JOIN details d ON d.id = r.detail;
 """
-RECORDS_BY_NAME = "CREATE INDEX IF NOT EXISTS records_by_name ON records (name, scope)"
+# A first run makes these last, when all rows can be sorted at once; they stay from then on.
+INDICES = (
+    "CREATE UNIQUE INDEX IF NOT EXISTS names_by_name ON names (name)",
+    "CREATE INDEX IF NOT EXISTS names_by_tail ON names (tail)",
+    "CREATE UNIQUE INDEX IF NOT EXISTS details_by_detail ON details (detail)",
+    "CREATE INDEX IF NOT EXISTS records_by_name ON records (name, scope)",
+)
+RECORD_COLUMNS = 9
 
 
 class IndexProblem(Exception):

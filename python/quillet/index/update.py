@@ -19,14 +19,14 @@ from contextlib import contextmanager
 from hashlib import blake2b
 from typing import NamedTuple
 
-from quillet.cli.files import find_files, problem_of
-from quillet.index.facts import FileFacts, facts_of_files
+from quillet._batch import FileAnalyses, FileAnalysis, FileRecords, TextNumbers, analyze_files
+from quillet.cli.files import find_files, problem_of, read_file
 from quillet.index.paths import full_path, is_below, stored_path
 from quillet.index.store import (
     FILE_SHIFT,
-    KIND_NUMBER,
+    INDICES,
     MAX_RECORDS,
-    RECORDS_BY_NAME,
+    RECORD_COLUMNS,
     IndexProblem,
     explained,
     open_to_read,
@@ -39,8 +39,15 @@ from quillet.index.store import (
 _GRAIN_NS = 2_000_000_000
 _UNTRUSTED = -1
 # A transaction takes about this much source: what an end at the worst moment loses.
-_BATCH_BYTES = 1 << 20
+_BATCH_BYTES = 1 << 22
 _BATCH_FILES = 512
+# Records that one statement writes: SQLite takes 999 variables everywhere.
+_ROWS_AT_ONCE = 64
+# The statements for that many records and for one, by the number of their variables.
+_ROW = f"({', '.join('?' * RECORD_COLUMNS)})"
+_INSERT_RECORDS = {
+    rows * RECORD_COLUMNS: f"INSERT INTO records VALUES {', '.join([_ROW] * rows)}" for rows in (1, _ROWS_AT_ONCE)
+}
 
 
 class Settings(NamedTuple):
@@ -83,6 +90,15 @@ class _Candidate(NamedTuple):
     stored: bytes
     size: int
     mtime_ns: int
+
+
+class _Changes(NamedTuple):
+    """What is to be done for a batch of files."""
+
+    changed: list[tuple[_Candidate, bytes]]  # with the hash of the content
+    analyses: FileAnalyses  # of those, in their order
+    touched: list[tuple[int, int, int]]  # size, time of change and number of files with the content they had
+    gone: list[int]  # the numbers of files that cannot be read any more
 
 
 def update(index: str, settings: Settings, reports: Reports) -> Outcome:
@@ -159,17 +175,23 @@ class _Run:
         self._known = {row[0]: _Known(*row[1:]) for row in rows}
         self._next_id = max((known.id for known in self._known.values()), default=0) + 1
         empty = connection.execute("SELECT max(id) FROM names").fetchone()[0] == 0
+        if not empty:
+            self._make_indices()
         self._names = _Texts(connection, "names", "name", empty=empty)
         self._details = _Texts(connection, "details", "detail", empty=empty)
         seen: set[bytes] = set()
-        for batch in self._batches(seen):
-            self._take(batch)
+        with _no_collection():
+            for changes in _one_ahead(self._changes(seen)):
+                self._take(changes)
         self._remove_what_is_gone(seen)
         self._prune()
-        # The first run makes it last, when the records can be sorted at once.
-        connection.execute(RECORDS_BY_NAME)
+        self._make_indices()
         files, records = connection.execute("SELECT count(*), coalesce(sum(records), 0) FROM files").fetchone()
         return Outcome(files, self._analysed, self._removed, self._unread, records)
+
+    def _make_indices(self) -> None:
+        for statement in INDICES:
+            self._connection.execute(statement)
 
     def _report(self, path: str, problem: str) -> None:
         self._unread += 1
@@ -218,41 +240,45 @@ class _Run:
             trusted = time.time_ns() - status.st_mtime_ns > _GRAIN_NS
             yield _Candidate(item.path, stored, status.st_size, status.st_mtime_ns if trusted else _UNTRUSTED)
 
-    def _take(self, batch: list[_Candidate]) -> None:
-        """Brings the index up to date with a batch of files, in one transaction."""
-        changed: list[tuple[_Candidate, bytes]] = []
-        sources: list[tuple[str, bytes]] = []
-        touched: list[tuple[int, int, int]] = []
-        gone: list[int] = []
-        for candidate in batch:
-            known = self._known.get(candidate.stored)
-            try:
-                with open(candidate.path, "rb") as file:
-                    source = file.read()
-            except OSError as error:
-                self._report(candidate.path, problem_of(error))
-                if known is not None:
-                    gone.append(known.id)
-                continue
-            digest = blake2b(source, digest_size=16).digest()
-            if known is None or known.hash != digest or known.made_by != self._made_by:
-                changed.append((candidate, digest))
-                sources.append((candidate.path, source))
-                continue
-            if known.problem is not None:
-                self._report(candidate.path, known.problem)
-            if (known.size, known.mtime_ns) != (candidate.size, candidate.mtime_ns):
-                touched.append((candidate.size, candidate.mtime_ns, known.id))
-        if not (changed or touched or gone):
-            return
-        facts = facts_of_files(sources, self._version, self._jobs)
-        with self._transaction() as connection, _no_collection():
-            connection.executemany("UPDATE files SET size = ?, mtime_ns = ? WHERE id = ?", touched)
-            self._remove(gone)
-            for (candidate, digest), found in zip(changed, facts, strict=True):
-                self._write(candidate, digest, found)
+    def _changes(self, seen: set[bytes]) -> Iterator[_Changes]:
+        """What there is to do for each batch of files, with the analysis under way."""
+        for batch in self._batches(seen):
+            changed: list[tuple[_Candidate, bytes]] = []
+            sources: list[tuple[str, bytes]] = []
+            touched: list[tuple[int, int, int]] = []
+            gone: list[int] = []
+            for candidate in batch:
+                known = self._known.get(candidate.stored)
+                try:
+                    source = read_file(candidate.path)
+                except OSError as error:
+                    self._report(candidate.path, problem_of(error))
+                    if known is not None:
+                        gone.append(known.id)
+                    continue
+                digest = blake2b(source, digest_size=16).digest()
+                if known is None or known.hash != digest or known.made_by != self._made_by:
+                    changed.append((candidate, digest))
+                    sources.append((candidate.path, source))
+                    continue
+                if known.problem is not None:
+                    self._report(candidate.path, known.problem)
+                if (known.size, known.mtime_ns) != (candidate.size, candidate.mtime_ns):
+                    touched.append((candidate.size, candidate.mtime_ns, known.id))
+            if changed or touched or gone:
+                analyses = analyze_files(sources, version=self._version, jobs=self._jobs)
+                analyses.start()
+                yield _Changes(changed, analyses, touched, gone)
 
-    def _write(self, candidate: _Candidate, digest: bytes, found: FileFacts) -> None:
+    def _take(self, changes: _Changes) -> None:
+        """Brings the index up to date with a batch of files, in one transaction."""
+        with changes.analyses, self._transaction() as connection:
+            connection.executemany("UPDATE files SET size = ?, mtime_ns = ? WHERE id = ?", changes.touched)
+            self._remove(changes.gone)
+            for (candidate, digest), analysis in zip(changes.changed, changes.analyses, strict=True):
+                self._write(candidate, digest, analysis)
+
+    def _write(self, candidate: _Candidate, digest: bytes, analysis: FileAnalysis) -> None:
         connection = self._connection
         known = self._known.get(candidate.stored)
         if known is None:
@@ -261,10 +287,11 @@ class _Run:
         else:
             number = known.id
             self._delete_rows(number)
-        problem = found.problem
-        if len(found.facts) >= MAX_RECORDS or len(found.errors) >= MAX_RECORDS:
+        records = analysis.records
+        errors = sorted([*analysis.errors, *analysis.reports])
+        problem = analysis.problem
+        if problem is None and (len(records) >= MAX_RECORDS or len(errors) >= MAX_RECORDS):
             problem = "the file is too large for the index"
-        facts = found.facts if problem is None else ()
         if problem is not None:
             self._report(candidate.path, problem)
         connection.execute(
@@ -276,34 +303,28 @@ class _Run:
                 candidate.mtime_ns,
                 digest,
                 self._made_by,
-                found.lines,
-                len(facts),
+                analysis.lines,
+                len(records) if problem is None else 0,
                 problem,
             ),
         )
         self._analysed += 1
-        first = number << FILE_SHIFT
-        names, details, kinds, opens = self._names, self._details, KIND_NUMBER, found.opens
-        rows = [
-            (
-                number,
-                names[name],
-                names[scope],
-                line,
-                column,
-                kinds[kind],
-                is_parameter,
-                opens.get((line, column), 0) if kind == "set" else 0,
-                details[detail],
-            )
-            for number, (line, column, scope, name, kind, detail, is_parameter) in enumerate(facts, first)
-        ]
+        if problem is None:
+            self._write_records(records, number << FILE_SHIFT)
+            numbered = ((number, *error) for number, error in enumerate(errors, number << FILE_SHIFT))
+            connection.executemany("INSERT INTO errors VALUES (?, ?, ?, ?)", numbered)
+
+    def _write_records(self, records: FileRecords, first_id: int) -> None:
+        texts = records.texts()
+        numbers = TextNumbers(
+            [self._names[text] for text in texts.names],
+            [self._names[text] for text in texts.scopes],
+            [self._details[text] for text in texts.details],
+        )
         self._names.write_new()
         self._details.write_new()
-        connection.executemany("INSERT INTO records VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?)", rows)
-        if problem is None:
-            errors = [(number, *error) for number, error in enumerate(found.errors, first)]
-            connection.executemany("INSERT INTO errors VALUES (?, ?, ?, ?)", errors)
+        for tuples in records.numbered(first_id, numbers, _ROWS_AT_ONCE):
+            self._connection.executemany(_INSERT_RECORDS[len(tuples[0])], tuples)
 
     def _remove_what_is_gone(self, seen: set[bytes]) -> None:
         roots = [os.path.abspath(path) for path in self._paths]
@@ -356,6 +377,17 @@ class _Run:
             self._connection.execute("ROLLBACK")
             raise
         self._connection.execute("COMMIT")
+
+
+def _one_ahead(batches: Iterator[_Changes]) -> Iterator[_Changes]:
+    """Gives each batch when the next one is under way."""
+    before = None
+    for changes in batches:
+        if before is not None:
+            yield before
+        before = changes
+    if before is not None:
+        yield before
 
 
 @contextmanager
