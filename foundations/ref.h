@@ -42,7 +42,7 @@ class Ref {
     return *this;
   }
   ~Ref() {
-    if (object_) object_->Release();
+    if (object_) object_->Release();  // NOLINT(clang-analyzer-cplusplus.NewDelete): it does not follow the count
   }
 
   T* get() const { return object_; }

@@ -168,7 +168,7 @@ struct FileResult {
   }
 
   // Records as instances of a class that derives from tuple, with the host's own objects for kinds.
-  nb::list Rows(size_t begin, size_t end, nb::handle row_class, nb::tuple kinds) {
+  nb::list Rows(size_t begin, size_t end, nb::handle row_class, const nb::tuple& kinds) {
     const RecordTable& table = result.table;
     if (!PyType_Check(row_class.ptr()) ||
         !PyType_IsSubtype(reinterpret_cast<PyTypeObject*>(row_class.ptr()), &PyTuple_Type))

@@ -32,8 +32,8 @@ void BindText(nb::module_& tarvex) {
   nb::class_<ConverterBase> base(tarvex, "CNodeToTextConverter", "Gives a node's text, or None.");
   base.def(nb::init<>());
   base.def(
-      "TextForNode", [](ConverterBase&, Any node, nb::args, nb::kwargs) { RefOrNull(node); }, nb::arg("node"),
-      nb::arg("args"), nb::arg("kwargs"));
+      "TextForNode", [](ConverterBase&, Any node, const nb::args&, const nb::kwargs&) { RefOrNull(node); },
+      nb::arg("node"), nb::arg("args"), nb::arg("kwargs"));
 
   nb::class_<ConverterObject, ConverterBase> cls(tarvex, "CNodeToTextConverterImpl",
                                                  "The short, stable text of a node, as UTF-8 bytes.");

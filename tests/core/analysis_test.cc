@@ -244,13 +244,6 @@ TEST_F(FlowWithHooks, AnErrorInAnEmbeddedLineCountsFromTheOuterLinesFirstLine) {
 
 // ---- embedded expressions: which there are ----
 
-struct Embedded {
-  std::string kind;
-  std::string tokens;
-  int32_t first_line;
-  friend bool operator==(const Embedded&, const Embedded&) = default;
-};
-
 std::string ShowTokens(TokenSpan toks) {
   std::string shown;
   for (const Token& token : toks) {

@@ -22,7 +22,6 @@ using testing::kPy2;
 using testing::kPy3;
 using testing::ReadNames;
 using testing::ReportedErrors;
-using testing::ShowError;
 using Names = std::vector<std::string>;
 
 CTypeHintWalker& HintWalker() { return AnalyzerFor(kPy3).type_hint_walker(); }

@@ -88,7 +88,7 @@ struct RawBuilder {
   void Drop(Node node) {
     std::vector<Node> todo{node};
     while (!todo.empty()) {
-      const Node next = todo.back();
+      Node next = todo.back();
       todo.pop_back();
       todo.insert(todo.end(), next->children.begin(), next->children.end());
       --counts->live;
