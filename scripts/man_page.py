@@ -12,7 +12,7 @@ from pathlib import Path
 
 import click
 
-from quillet.cli import main as command_line
+from quillet.cli.commands import group as command_line
 
 PAGE = Path(__file__).resolve().parent.parent / "docs" / "man" / "quillet.1"
 

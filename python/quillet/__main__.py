@@ -3,4 +3,4 @@
 from quillet.cli import main
 
 if __name__ == "__main__":
-    main(prog_name="quillet")
+    main()

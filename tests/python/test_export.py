@@ -248,7 +248,7 @@ def test_completion_names_the_command(tmp_path: Path, shell: str) -> None:
 def test_completion_offers_commands(tmp_path: Path) -> None:
     environment = {**ENVIRONMENT, "_QUILLET_COMPLETE": "bash_complete", "COMP_WORDS": "quillet o", "COMP_CWORD": "1"}
     result = subprocess.run(
-        [sys.executable, "-c", "from quillet.cli import main; main(prog_name='quillet')"],
+        [sys.executable, "-c", "from quillet.cli import main; main()"],
         env=environment,
         capture_output=True,
         text=True,
@@ -258,12 +258,12 @@ def test_completion_offers_commands(tmp_path: Path) -> None:
 
 
 def test_the_man_page_has_every_command_and_option() -> None:
-    from quillet.cli import main
+    from quillet.cli.commands import group
 
     page = (Path(__file__).resolve().parent.parent.parent / "docs" / "man" / "quillet.1").read_text()
     page = page.replace("\\-", "-")
-    assert len(main.commands) >= 10
-    for name, command in main.commands.items():
+    assert len(group.commands) >= 10
+    for name, command in group.commands.items():
         section = page.split(f".SS quillet {name} ")[1].split(".SS")[0]
         for option in (option for parameter in command.params for option in parameter.opts if option.startswith("-")):
             assert option in section, f"{name} {option}: scripts/man_page.py --write adds it"

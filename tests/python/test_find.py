@@ -9,6 +9,8 @@ from pathlib import Path
 import pytest
 
 from indexing import SHOP, found, make_index, run
+from quillet.cli.find_options import OPTIONS, plain_parameters
+from quillet.cli.index_commands import find
 from quillet.index.questions import match_of, scope_matches
 
 
@@ -193,6 +195,46 @@ def test_a_question_does_not_load_the_engine(shop: Path) -> None:
     code = (
         "import sys\nfrom quillet.cli import main\n"
         "try: main(['find', 'LIMIT'])\nexcept SystemExit: pass\n"
-        "assert 'quillet.index.questions' in sys.modules\nassert 'quillet.tarvex' not in sys.modules"
+        "assert 'quillet.index.questions' in sys.modules\nassert not {'quillet.tarvex', 'click'} & set(sys.modules)"
     )
     subprocess.run([sys.executable, "-c", code], cwd=shop, env=ENVIRONMENT, check=True, stdout=subprocess.DEVNULL)
+
+
+@pytest.mark.parametrize(
+    "arguments",
+    [
+        ["total"],
+        ["total", "--set", "--get"],
+        ["--call", "--import", "--param", "os.path.join", "--hint", "--return"],
+        ["--scope", "Shop", "-l", "add", "--json", "--match", "suffix"],
+        ["add", "--long", "--index", "other.index"],
+        ["--index", "a", "--index", "b", "add"],
+        ["test_*"],
+        [".total", "--scope", ""],
+        [""],
+    ],
+)
+def test_a_plain_question_is_read_as_click_reads_it(arguments: list[str]) -> None:
+    context = find.make_context("find", list(arguments))
+    assert plain_parameters(arguments) == context.params
+    assert set(context.params) == {"name", *(option.parameter for option in OPTIONS)}
+
+
+@pytest.mark.parametrize(
+    "arguments",
+    [
+        [],
+        ["--help"],
+        ["a", "b"],
+        ["a", "--no-such"],
+        ["a", "--scope"],
+        ["a", "--scope", "--json"],
+        ["a", "--scope=Shop"],
+        ["a", "--match", "regex"],
+        ["--", "a"],
+        ["a", "-lx"],
+        ["-"],
+    ],
+)
+def test_any_other_question_is_left_to_click(arguments: list[str]) -> None:
+    assert plain_parameters(arguments) is None

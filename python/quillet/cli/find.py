@@ -11,14 +11,34 @@ from collections.abc import Sequence
 from itertools import groupby
 from typing import TextIO
 
+from quillet.cli.find_options import ROLES
 from quillet.cli.show import Style, printable
 from quillet.cli.streams import quiet_output
-from quillet.index.questions import FileRow, Hit, Index, Query
+from quillet.index.questions import FileRow, Hit, Index, Query, match_of
 from quillet.index.source import SourceFile
 from quillet.index.store import IndexProblem, find_index
 
 # As much of a source line is shown, in characters.
 _WINDOW = 160
+
+
+def ask(
+    name: str,
+    *,
+    returns: bool,
+    scope: str | None,
+    match: str | None,
+    as_json: bool,
+    long: bool,
+    index: str | None,
+    **roles: bool,
+) -> int:
+    """Runs the command with the parameters of `find_options` and returns its exit code."""
+    if not name.strip("."):
+        return fail(ValueError("NAME is empty"))
+    wanted = tuple(role for role in ROLES if roles[f"role_{role}"])
+    query = Query(name, match or match_of(name), wanted, returns, scope)
+    return run(query, index=index, as_json=as_json, long=long)
 
 
 def run(query: Query, *, index: str | None, as_json: bool, long: bool) -> int:

@@ -6,18 +6,34 @@ As in the rest of the command line, what a command needs is imported when it run
 from __future__ import annotations
 
 import sys
-from collections.abc import Callable
+from collections.abc import Callable, Sequence
+from typing import Any
 
 import click
 
+from quillet.cli.find_options import INDEX_OPTION, OPTIONS, Option
 from quillet.cli.options import python_option
 
-_index_option = click.option(
-    "--index",
-    metavar="FILE",
-    type=click.Path(),
-    help="The index to ask; without it .quillet-index of this folder or the nearest one above.",
-)
+
+def _options(options: Sequence[Option]) -> Callable[[Callable[..., None]], Callable[..., None]]:
+    """A decorator that gives a command these options, in their order."""
+
+    def add(command: Callable[..., None]) -> Callable[..., None]:
+        for option in reversed(options):
+            settings: dict[str, Any] = {"help": option.help}
+            if option.choices:
+                settings["type"] = click.Choice(option.choices)
+            elif option.takes_value:
+                settings |= {"metavar": option.metavar, "type": click.Path() if option.metavar == "FILE" else str}
+            else:
+                settings["is_flag"] = True
+            command = click.option(*option.flags, option.parameter, **settings)(command)
+        return command
+
+    return add
+
+
+_index_option = _options([INDEX_OPTION])
 
 
 @click.command()
@@ -64,45 +80,10 @@ def index(
     sys.exit(run(settings, output=output, form=form, watch=watch, quiet=quiet))
 
 
-_ROLES = {
-    "set": "Where it is set (parameters: --param).",
-    "get": "Where it is read.",
-    "call": "Where it is called, with arguments by position alone.",
-    "import": "Where it is imported.",
-    "param": "Where it is a parameter.",
-    "hint": "Where it has a type hint.",
-}
-
-
-def _role_options(command: Callable[..., None]) -> Callable[..., None]:
-    for role, text in reversed(_ROLES.items()):
-        command = click.option(f"--{role}", f"role_{role}", is_flag=True, help=text)(command)
-    return command
-
-
 @click.command()
 @click.argument("name")
-@_role_options
-@click.option("--return", "returns", is_flag=True, help="What the functions of this name return and yield.")
-@click.option("--scope", metavar="SCOPE", help="Only in this class or function, such as Shop or Shop.add.")
-@click.option(
-    "--match",
-    type=click.Choice(["exact", "suffix", "glob"]),
-    help="How NAME is meant; without it by its form.",
-)
-@click.option("--json", "as_json", is_flag=True, help="A JSON object a record.")
-@click.option("-l", "--long", is_flag=True, help="Below each place what is said of the name there.")
-@_index_option
-def find(
-    name: str,
-    returns: bool,
-    scope: str | None,
-    match: str | None,
-    as_json: bool,
-    long: bool,
-    index: str | None,
-    **role_options: bool,
-) -> None:
+@_options(OPTIONS)
+def find(name: str, **parameters: Any) -> None:
     """Finds the places that say something of NAME, as path:line:column and the source line.
 
     NAME is a name or a dotted name as it stands in the source, .attr for anything that ends in it, or a
@@ -114,14 +95,9 @@ def find(
         quillet find 'test_*' --set --scope TestShop
         quillet find Shop.price --return --long
     """
-    from quillet.cli.find import run
-    from quillet.index.questions import Query, match_of
+    from quillet.cli.find import ask
 
-    if not name.strip("."):
-        raise click.UsageError("NAME is empty")
-    roles = tuple(role for role in _ROLES if role_options[f"role_{role}"])
-    query = Query(name, match or match_of(name), roles, returns, scope)
-    sys.exit(run(query, index=index, as_json=as_json, long=long))
+    sys.exit(ask(name, **parameters))
 
 
 @click.command()

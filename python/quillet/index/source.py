@@ -5,7 +5,6 @@ from __future__ import annotations
 import os
 import re
 from functools import cached_property
-from hashlib import blake2b
 from typing import TYPE_CHECKING
 
 from quillet._source import SourceEncodingError, to_utf8
@@ -42,7 +41,12 @@ class SourceFile:
             return True
         if (status.st_size, status.st_mtime_ns) == (self._row.size, self._row.mtime_ns):
             return False
-        return self.content is None or blake2b(self.content, digest_size=16).digest() != self._row.hash
+        if self.content is None:
+            return True
+        # Imported when a file was touched, since a question is to be answered at once.
+        from hashlib import blake2b
+
+        return blake2b(self.content, digest_size=16).digest() != self._row.hash
 
     @cached_property
     def lines(self) -> list[bytes]:

@@ -1,0 +1,70 @@
+"""The options of `quillet find`, once for click and once for a person in a hurry.
+
+click takes longer to load than the answer takes, so the plain form of a question (a name, known options
+spelt out) is read here. Everything else goes to click: help, mistakes, completion, `--option=value`.
+"""
+
+from __future__ import annotations
+
+from collections.abc import Sequence
+from typing import Any, NamedTuple
+
+
+class Option(NamedTuple):
+    """An option and the parameter that it sets: a flag, or with `metavar` or `choices` one that takes a value."""
+
+    flags: tuple[str, ...]
+    parameter: str
+    help: str
+    metavar: str = ""
+    choices: tuple[str, ...] = ()
+
+    @property
+    def takes_value(self) -> bool:
+        return bool(self.metavar or self.choices)
+
+
+ROLES = {
+    "set": "Where it is set (parameters: --param).",
+    "get": "Where it is read.",
+    "call": "Where it is called, with arguments by position alone.",
+    "import": "Where it is imported.",
+    "param": "Where it is a parameter.",
+    "hint": "Where it has a type hint.",
+}
+INDEX_OPTION = Option(
+    ("--index",),
+    "index",
+    "The index to ask; without it .quillet-index of this folder or the nearest one above.",
+    metavar="FILE",
+)
+OPTIONS = (
+    *(Option((f"--{role}",), f"role_{role}", text) for role, text in ROLES.items()),
+    Option(("--return",), "returns", "What the functions of this name return and yield."),
+    Option(("--scope",), "scope", "Only in this class or function, such as Shop or Shop.add.", metavar="SCOPE"),
+    Option(("--match",), "match", "How NAME is meant; without it by its form.", choices=("exact", "suffix", "glob")),
+    Option(("--json",), "as_json", "A JSON object a record."),
+    Option(("-l", "--long"), "long", "Below each place what is said of the name there."),
+    INDEX_OPTION,
+)
+_BY_FLAG = {flag: option for option in OPTIONS for flag in option.flags}
+
+
+def plain_parameters(arguments: Sequence[str]) -> dict[str, Any] | None:
+    """The parameters that click would find, or None where it has to look for itself."""
+    parameters: dict[str, Any] = {option.parameter: None if option.takes_value else False for option in OPTIONS}
+    rest = iter(arguments)
+    for argument in rest:
+        option = _BY_FLAG.get(argument)
+        if option is None:
+            if argument.startswith("-") or "name" in parameters:
+                return None
+            parameters["name"] = argument
+        elif option.takes_value:
+            value = next(rest, "-")
+            if value.startswith("-") or (option.choices and value not in option.choices):
+                return None
+            parameters[option.parameter] = value
+        else:
+            parameters[option.parameter] = True
+    return parameters if "name" in parameters else None
