@@ -62,9 +62,10 @@ def fail(problem: Exception) -> int:
 def show_hits(out: TextIO, index: Index, hits: Sequence[Hit], *, as_json: bool, long: bool) -> None:
     """Writes records by their places, each with its source line."""
     style = Style.of_stdout()
+    rows = index.files_of({hit.path for hit in hits})
     for stored, in_file in groupby(hits, key=lambda hit: hit.path):
         path = index.shown_path(stored)
-        source = open_source(index, index.file(index.full_path(stored)))
+        source = open_source(index, rows.get(stored))
         for _, records in groupby(in_file, key=lambda hit: (hit.line, hit.column)):
             group = list(records)
             if as_json:

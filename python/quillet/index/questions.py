@@ -8,7 +8,7 @@ from __future__ import annotations
 
 import os
 from collections.abc import Iterable, Iterator, Sequence
-from typing import Any, NamedTuple
+from typing import Any, NamedTuple, TypeVar
 
 from quillet.index.paths import full_path, stored_path
 from quillet.index.store import CLASS, FILE_SHIFT, FUNCTION, KIND_NUMBER, KINDS, explained, open_to_read, tail_of
@@ -23,6 +23,8 @@ ROLES = {
     "hint": "(r.kind = {hint})",
 }
 _VARIABLES = 500
+_Value = TypeVar("_Value")
+_FILE_COLUMNS = "id, path, size, mtime_ns, hash, lines, records, problem"
 _COLUMNS = "f.path, r.line, r.column, s.name, n.name, r.kind, d.detail, r.is_parameter, r.opens"
 _TABLES = (
     f"records r JOIN files f ON f.id = r.id >> {FILE_SHIFT} JOIN names n ON n.id = r.name"
@@ -73,6 +75,7 @@ class Index:
     def __init__(self, path: str) -> None:
         self.path = os.path.abspath(path)
         self.base = os.path.dirname(self.path)
+        self._working_folder = os.path.join(os.getcwd(), "")
         self._connection = open_to_read(path)
 
     def __enter__(self) -> Index:
@@ -116,8 +119,7 @@ class Index:
         return [row[0] for row in self._rows("SELECT id FROM names WHERE name GLOB ?", (pattern,))]
 
     def _records(self, names: Sequence[int], condition: str) -> Iterator[Hit]:
-        for start in range(0, len(names), _VARIABLES):
-            part = names[start : start + _VARIABLES]
+        for part in _parts(names):
             marks = ",".join("?" * len(part))
             yield from self._hits(f"SELECT {_COLUMNS} FROM {_TABLES} WHERE r.name IN ({marks}) AND {condition}", part)
 
@@ -135,8 +137,7 @@ class Index:
     def _returns(self, name: str, match: str) -> Iterator[Hit]:
         """What the functions of a name return and yield, and the hints for it."""
         scopes = self._names(name, "glob") if match == "glob" else self._names(name.lstrip("."), "suffix")
-        for start in range(0, len(scopes), _VARIABLES):
-            part = scopes[start : start + _VARIABLES]
+        for part in _parts(scopes):
             marks = ",".join("?" * len(part))
             yield from self._hits(
                 f"SELECT {_COLUMNS} FROM {_TABLES} WHERE r.scope IN ({marks})"
@@ -148,16 +149,21 @@ class Index:
 
     def files(self) -> list[FileRow]:
         """All files, by path."""
-        rows = self._rows("SELECT id, path, size, mtime_ns, hash, lines, records, problem FROM files ORDER BY path")
-        return [FileRow(*row) for row in rows]
+        return [FileRow(*row) for row in self._rows(f"SELECT {_FILE_COLUMNS} FROM files ORDER BY path")]
+
+    def files_of(self, stored: Iterable[bytes]) -> dict[bytes, FileRow]:
+        """The files of paths as the index keeps them, without those that it does not have."""
+        found = {}
+        for part in _parts(list(stored)):
+            marks = ",".join("?" * len(part))
+            for row in self._rows(f"SELECT {_FILE_COLUMNS} FROM files WHERE path IN ({marks})", part):
+                found[row[1]] = FileRow(*row)
+        return found
 
     def file(self, path: str) -> FileRow | None:
         """A file by a path as a person names it, or None where the index does not have it."""
-        rows = self._rows(
-            "SELECT id, path, size, mtime_ns, hash, lines, records, problem FROM files WHERE path = ?",
-            (stored_path(path, self.base),),
-        )
-        return FileRow(*rows[0]) if rows else None
+        stored = stored_path(path, self.base)
+        return self.files_of([stored]).get(stored)
 
     def records_of(self, file: FileRow) -> list[Hit]:
         """All records of a file, in the order in which they were found."""
@@ -218,8 +224,13 @@ class Index:
     def shown_path(self, stored: bytes) -> str:
         """A file's path for people: from the working folder where it lies below it."""
         path = self.full_path(stored)
-        relative = os.path.relpath(path)
-        return path if relative.split(os.sep, 1)[0] == ".." else relative
+        return path.removeprefix(self._working_folder)
+
+
+def _parts(values: Sequence[_Value]) -> Iterator[Sequence[_Value]]:
+    """As many values at a time as a statement takes."""
+    for start in range(0, len(values), _VARIABLES):
+        yield values[start : start + _VARIABLES]
 
 
 def match_of(name: str) -> str:
