@@ -180,6 +180,17 @@ TEST(Scopes, DefinitionsAreListedWithTheirExtent) {
   EXPECT_EQ(shown(2), "<no name> 9:1 9-9");
 }
 
+TEST(Scopes, ANameThatOpensOneIsMarked) {
+  const RecordTable table =
+      ResultOf("class A:\n  def f(self, g=A): pass\nasync def f(): pass\ntype T = f\nf = A\n").table;
+  Strings marked;
+  for (size_t i = 0; i < table.size(); ++i) {
+    if (table.opens[i] == RecordTable::Opens::kNothing) continue;
+    marked.push_back(ShowRecord(table, i) + (table.opens[i] == RecordTable::Opens::kClass ? " class" : " def"));
+  }
+  EXPECT_EQ(marked, (Strings{"1:7 |A set class", "2:7 A|f set def", "3:11 |f set def"}));
+}
+
 TEST(Scopes, DeepAndLongNamesStayBounded) {
   std::string source;
   for (size_t depth = 0; depth < 2000; ++depth) source += std::string(depth, ' ') + "def name(a):\n";
@@ -190,11 +201,20 @@ TEST(Scopes, DeepAndLongNamesStayBounded) {
   EXPECT_EQ(ResultOf("class " + std::string(100'000, 'a') + ":\n  x = 1\n").table.scope_texts.size(), 1u);
 }
 
+TEST(Texts, EachStandsInTheTableOnce) {
+  const RecordTable table = ResultOf("x = y\ndef x(y): pass\nx(y)\nz(y)\n").table;
+  Strings names, details;
+  for (size_t i = 0; i < table.name_texts.size(); ++i) names.emplace_back(table.name_texts[i]);
+  for (size_t i = 0; i < table.detail_texts.size(); ++i) details.emplace_back(table.detail_texts[i]);
+  EXPECT_EQ(names, (Strings{"x", "y", "z"}));
+  EXPECT_EQ(details, (Strings{"", "y", "(y)"}));
+}
+
 TEST(Texts, ThoseOfAllRecordsGrowWithTheSourceAndNotItsSquare) {
   std::string source = "x = y\nz = a";
   for (int i = 0; i < 20'000; ++i) source += ".a";
   const BatchResult result = ResultOf(source + "\n");
-  EXPECT_LT(result.table.names.size() + result.table.details.size(),
+  EXPECT_LT(result.table.name_texts.bytes.size() + result.table.detail_texts.bytes.size(),
             PlacedRecords::kSmallestBudget + PlacedRecords::kBudgetPerSourceByte * source.size() +
                 result.table.size() * (PlacedRecords::kCutSize + 8));
   EXPECT_GT(result.table.size(), 20'000u);
