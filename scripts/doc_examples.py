@@ -75,7 +75,7 @@ def analyze_view(source: str, version: tuple[int, int], file: str) -> str:
     """What `quillet analyze` prints."""
     inputs = [(file.encode(), source.encode(), None)]
     form = output_format("text", errors_only=False, style=Style(on=False))
-    return "".join(result.output.decode() for result in write_files(inputs, version=version, jobs=1, form=form))
+    return "".join(bytes(result).decode() for result in write_files(inputs, version=version, jobs=1, form=form))
 
 
 @contextmanager

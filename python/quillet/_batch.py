@@ -271,7 +271,7 @@ def analyze_files(
 def write_files(
     inputs: Iterable[BatchInput], *, version: tuple[int, ...] | None, jobs: int | None, form: tuple[object, ...]
 ) -> Generator[_host.FileResult, None, None]:
-    """Analyses files and writes what was found: each result has the `output` of a format.
+    """Analyses files and writes what was found: the buffer of each result is the text of a format.
 
     The formats are ("jsonl", errors_only) and ("text", errors_only, colours, width_of), where `width_of`
     gives the cells that a code point takes on a terminal.

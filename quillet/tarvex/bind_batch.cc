@@ -224,6 +224,14 @@ struct FileResult {
   }
 };
 
+// The buffer of a result is its output: what a format wrote, without a copy.
+int OutputBuffer(PyObject* self, Py_buffer* view, int flags) {
+  std::string& output = nb::inst_ptr<FileResult>(self)->result.output;
+  return PyBuffer_FillInfo(view, self, output.data(), static_cast<Py_ssize_t>(output.size()), 1, flags);
+}
+
+PyType_Slot file_result_slots[] = {{Py_bf_getbuffer, reinterpret_cast<void*>(OutputBuffer)}, {0, nullptr}};
+
 // Without the interpreter lock while this lives, whether the thread has it or not.
 class Unlocked {
  public:
@@ -429,7 +437,8 @@ void BindBatch(nb::module_& tarvex) {
   nb::list words;
   for (const Text word : RecordKindWords()) words.append(StrOf(word));
   host.attr("RECORD_KIND_WORDS") = nb::tuple(words);
-  nb::class_<FileResult>(host, "FileResult", "What became of a file of a batch.")
+  nb::class_<FileResult>(host, "FileResult", nb::type_slots(file_result_slots),
+                         "What became of a file of a batch. Its buffer is what a format wrote of it.")
       .def_prop_ro("index", [](const FileResult& self) { return self.result.index; })
       .def_prop_ro("problem",
                    [](const FileResult& self) {
@@ -441,7 +450,6 @@ void BindBatch(nb::module_& tarvex) {
       .def_prop_ro("errors", [](const FileResult& self) { return self.Messages(self.result.errors); })
       .def_prop_ro("reports", [](const FileResult& self) { return self.Messages(self.result.reports); })
       .def_prop_ro("record_count", [](const FileResult& self) { return self.result.table.size(); })
-      .def_prop_ro("output", [](const FileResult& self) { return BytesOf(self.result.output); })
       .def("Definitions", &FileResult::Definitions, nb::arg("row_class"),
            "Classes, functions and type aliases: row_class(scope, kind, line, column, first_line, last_line).")
       .def("Rows", &FileResult::Rows, nb::arg("begin"), nb::arg("end"), nb::arg("row_class"), nb::arg("kinds"),

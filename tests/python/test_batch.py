@@ -313,7 +313,7 @@ def test_a_phrase_is_the_same_for_one_record_and_for_a_file() -> None:
     form = output_format("text", errors_only=False, style=Style(on=False))
     [result] = write_files([(b"a.py", source.encode(), None)], version=(3, 12), jobs=1, form=form)
     phrases = [
-        line[4:].partition("  ")[2].strip() for line in result.output.decode().splitlines() if line[:4] == "    "
+        line[4:].partition("  ")[2].strip() for line in bytes(result).decode().splitlines() if line[:4] == "    "
     ]
     expected = [describe(record) for line in analyze(source, version=(3, 12)).lines for record in line.records]
     assert phrases == expected

@@ -40,7 +40,7 @@ def run(
     errors = 0
     with quiet_output() as out:
         write = _bytes_writer(out)
-        write(output_header(form, version))
+        write(memoryview(output_header(form, version)))
         found = list(find_files(paths, gitignore=gitignore))
         inputs = [_input_of(item, stdin_filename) for item in found]
         results = write_files(inputs, version=version, jobs=jobs, form=output_format(form, errors_only))
@@ -53,7 +53,7 @@ def run(
                 for _, _, message in result.reports:
                     _complain(out, path, message)
                 errors += len(result.errors)
-                write(result.output)
+                write(memoryview(result))
                 advance()
     if unread:
         print(f"quillet: {unread} {'file' if unread == 1 else 'files'} could not be read", file=sys.stderr)
@@ -74,13 +74,13 @@ def _complain(out: TextIO, path: str, reason: str) -> None:
     print(f"quillet: {printable(path)}: {printable(first_line)}", file=sys.stderr)
 
 
-def _bytes_writer(out: TextIO) -> Callable[[bytes], object]:
+def _bytes_writer(out: TextIO) -> Callable[[memoryview], object]:
     """Writes UTF-8 to a text stream: as it is where that is the stream's encoding."""
     if isinstance(out, io.TextIOWrapper) and out.encoding.lower().replace("_", "-") in ("utf-8", "utf8"):
         out.flush()
         binary = out.buffer
         return lambda data: binary.write(data)
-    return lambda data: out.write(data.decode("utf-8", "surrogatepass"))
+    return lambda data: out.write(str(data, "utf-8", "surrogatepass"))
 
 
 @contextmanager
