@@ -64,6 +64,11 @@ def test_the_command_is_installed() -> None:
     assert [script.load() for script in scripts] == [cli.main]
 
 
+def test_the_man_page_is_installed_beside_the_command() -> None:
+    files = importlib.metadata.files("quillet") or []
+    assert [path.name for path in files if path.name.startswith("quillet.1")] == ["quillet.1"]
+
+
 def test_every_public_name_is_there() -> None:
     assert all(hasattr(quillet, name) for name in quillet.__all__)
     with pytest.raises(AttributeError, match="no_such"):

@@ -317,12 +317,10 @@ class _Run:
     def _write_records(self, records: FileRecords, first_id: int) -> None:
         texts = records.texts()
         numbers = TextNumbers(
-            [self._names[text] for text in texts.names],
-            [self._names[text] for text in texts.scopes],
-            [self._details[text] for text in texts.details],
+            self._names.numbers_of(texts.names),
+            self._names.numbers_of(texts.scopes),
+            self._details.numbers_of(texts.details),
         )
-        self._names.write_new()
-        self._details.write_new()
         for tuples in records.numbered(first_id, numbers, _ROWS_AT_ONCE):
             self._connection.executemany(_INSERT_RECORDS[len(tuples[0])], tuples)
 
@@ -402,41 +400,38 @@ def _no_collection() -> Iterator[None]:
             gc.enable()
 
 
-class _Texts(dict[str, int]):
-    """The numbers of the texts of one table. New ones are kept until `write_new`.
+class _Texts:
+    """The numbers of the texts of one table.
 
     An index that was empty holds no text that this run did not write, so nothing need be looked up in it.
     """
 
     def __init__(self, connection: sqlite3.Connection, table: str, column: str, *, empty: bool) -> None:
-        super().__init__({"": 0})
         self._connection = connection
         self._select = f"SELECT id FROM {table} WHERE {column} = ?"
         self._with_tail = table == "names"
         self._insert = f"INSERT INTO {table} VALUES (?, ?{', ?' if self._with_tail else ''})"
         self._empty = empty
-        self._new: list[str] = []
+        self._numbers = {"": 0}
         self._next: int = connection.execute(f"SELECT max(id) FROM {table}").fetchone()[0] + 1
 
-    def __missing__(self, text: str) -> int:
-        number = self._find_or_add(text)
-        self[text] = number
-        return number
+    def numbers_of(self, texts: list[str]) -> list[int]:
+        """A number for each text; the table gets those that it does not have."""
+        numbers = self._numbers
+        unknown = [text for text in texts if text not in numbers]
+        if unknown:
+            self._learn(unknown)
+        return list(map(numbers.__getitem__, texts))
 
-    def _find_or_add(self, text: str) -> int:
+    def _learn(self, texts: list[str]) -> None:
         if not self._empty:
-            row = self._connection.execute(self._select, (text,)).fetchone()
-            if row is not None:
-                return int(row[0])
-        self._new.append(text)
-        self._next += 1
-        return self._next - 1
-
-    def write_new(self) -> None:
-        """Writes the texts that are new since the last call."""
-        numbered = enumerate(self._new, self._next - len(self._new))
-        if self._with_tail:
-            self._connection.executemany(self._insert, [(number, text, tail_of(text)) for number, text in numbered])
-        else:
-            self._connection.executemany(self._insert, numbered)
-        self._new = []
+            for text in texts:
+                row = self._connection.execute(self._select, (text,)).fetchone()
+                if row is not None:
+                    self._numbers[text] = row[0]
+        new = dict.fromkeys(text for text in texts if text not in self._numbers)
+        numbered = list(enumerate(new, self._next))
+        self._next += len(numbered)
+        self._numbers.update((text, number) for number, text in numbered)
+        rows = [(number, text, tail_of(text)) for number, text in numbered] if self._with_tail else numbered
+        self._connection.executemany(self._insert, rows)
