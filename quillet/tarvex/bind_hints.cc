@@ -66,18 +66,6 @@ nb::object& DispatchDict(DispatchObject& object) {
   return object.dispatch_dict;
 }
 
-void SetLogical(DispatchObject& self, Any value) {
-  if (value.is_none()) {
-    self.walker->fLogical = nullptr;
-    self.logical.reset();
-    return;
-  }
-  LineObject& line = LineOf(value);
-  line.BeginWriting();
-  self.walker->fLogical = &line.line();
-  self.logical = nb::borrow(value);
-}
-
 template <int32_t CDispatchWalker::*Field>
 void DefCount(nb::class_<DispatchObject>& cls, const char* name) {
   cls.def_prop_rw(
@@ -123,7 +111,8 @@ void BindDispatchWalker(nb::module_& m) {
       },
       nb::arg("dispatch_dict"));
   cls.def_prop_rw(
-      "_fLogical", [](DispatchObject& self) { return HostLineOf(self.walker->fLogical, self.logical); }, &SetLogical,
+      "_fLogical", [](DispatchObject& self) { return HostLineOf(self.walker->fLogical, self.logical); },
+      [](DispatchObject& self, Any value) { SetHostLine(value, self.walker->fLogical, self.logical); },
       nb::arg("value"));
   cls.def_prop_ro("_fDispatchDict", [](DispatchObject& self) { return DispatchDict(self); });
   DefCount<&CDispatchWalker::fVisitCount>(cls, "_fVisitCount");

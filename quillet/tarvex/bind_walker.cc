@@ -302,18 +302,7 @@ nb::object StoredNames(WalkerObject& self) {
 void BindFields(nb::class_<WalkerObject>& cls) {
   cls.def_prop_rw(
       "_fLogical", [](WalkerObject& self) { return HostLineOf(self.walker->fLogical, self.logical); },
-      [](WalkerObject& self, Any value) {
-        if (value.is_none()) {
-          self.walker->fLogical = nullptr;
-          self.logical.reset();
-          return;
-        }
-        LineObject& line = LineOf(value);
-        line.BeginWriting();
-        self.walker->fLogical = &line.line();
-        self.logical = nb::borrow(value);
-      },
-      nb::arg("value"));
+      [](WalkerObject& self, Any value) { SetHostLine(value, self.walker->fLogical, self.logical); }, nb::arg("value"));
   DefFlag<bool, &CNodeWalker::fLoadNameContext>(cls, "_fLoadNameContext");
   DefFlag<bool, &CNodeWalker::fStoreWithinSubExpr>(cls, "_fStoreWithinSubExpr");
   cls.def_prop_ro("_fLoadedNames", &LoadedNames);
@@ -337,6 +326,18 @@ void BindFields(nb::class_<WalkerObject>& cls) {
 
 nb::object NewWalkerObject(std::shared_ptr<CNodeWalker> walker) {
   return nb::cast(WalkerObject{std::move(walker), {}, {}});
+}
+
+void SetHostLine(nb::handle value, LogicalLine*& line, nb::object& handed_in) {
+  if (value.is_none()) {
+    line = nullptr;
+    handed_in.reset();
+    return;
+  }
+  LineObject& object = LineOf(value);
+  object.BeginWriting();
+  line = &object.line();
+  handed_in = nb::borrow(value);
 }
 
 nb::object HostLineOf(LogicalLine* line, const nb::object& handed_in) {

@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "tests/core/expect_error.h"
 #include "tests/core/parse_helper.h"
 #include "tree/arg_info.h"
 #include "tree/nodes.h"
@@ -13,6 +14,7 @@
 namespace quillet {
 namespace {
 
+using test::ExpectError;
 using test::Parse2;
 using test::Parse3;
 using test::ParserOf;
@@ -64,17 +66,6 @@ std::vector<std::string> Show(const ArgList& list) {
 }
 
 using Texts = std::vector<std::string>;
-
-template <class Fn>
-void ExpectError(ErrorKind kind, const std::string& message, Fn&& fn) {
-  try {
-    fn();
-    ADD_FAILURE() << "no error; expected " << HostExceptionName(kind) << ": " << message;
-  } catch (const Error& error) {
-    EXPECT_EQ(error.kind(), kind) << error.message();
-    EXPECT_EQ(error.message(), message);
-  }
-}
 
 // Nodes without records, made by hand.
 CNodeFactory& Factory() { return ParserOf(true).factory(); }

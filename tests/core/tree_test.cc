@@ -8,11 +8,14 @@
 #include <vector>
 
 #include "foundations/console.h"
+#include "tests/core/expect_error.h"
 #include "tree/factory.h"
 #include "tree/nodes.h"
 
 namespace quillet {
 namespace {
+
+using test::ExpectError;
 
 constexpr int32_t kFirstSymbol = 256;
 
@@ -39,17 +42,6 @@ KeywordSet Keywords(std::initializer_list<Text> words) {
 std::vector<std::string>& PrintedLines() {
   static std::vector<std::string> lines;
   return lines;
-}
-
-template <class Fn>
-void ExpectError(ErrorKind kind, const std::string& message, Fn&& fn) {
-  try {
-    fn();
-    ADD_FAILURE() << "no error; expected " << HostExceptionName(kind) << ": " << message;
-  } catch (const Error& error) {
-    EXPECT_EQ(error.kind(), kind) << error.message();
-    EXPECT_EQ(error.message(), message);
-  }
 }
 
 class TreeTest : public testing::Test {
