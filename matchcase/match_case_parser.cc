@@ -48,17 +48,17 @@ CNode* CMatchCaseStatementParser::ParseCaseStmt(TokenSpan toks, const PositionVi
 
 CNode* CMatchCaseStatementParser::ParseStmt(TokenSpan toks, const PositionView& positions,
                                             CNode* (CMatchCaseStatementParser::*impl)()) {
+  const Running running(this);
   struct Clear {
     CMatchCaseStatementParser* parser;
     ~Clear() { parser->ClearTokens(); }
   } clear{this};
-  SetTokens(toks, positions);
+  SetKeptTokens(toks, positions);
   return (this->*impl)();
 }
 
-void CMatchCaseStatementParser::SetTokens(TokenSpan toks, const PositionView& positions) {
-  toks_.clear();
-  positions_.clear();
+void CMatchCaseStatementParser::SetKeptTokens(TokenSpan toks, const PositionView& positions) {
+  ClearTokens();
   toks_.reserve(toks.size());
   positions_.reserve(toks.size());
   const size_t count = std::min(toks.size(), positions.size());
@@ -75,12 +75,28 @@ void CMatchCaseStatementParser::SetTokens(TokenSpan toks, const PositionView& po
   FindGroupEnds();
 }
 
+void CMatchCaseStatementParser::SetTokens(TokenSpan toks, const PositionView& positions) {
+  for (const Token& token : toks)
+    if (token.removed()) ThrowError(ErrorKind::kTypeError, "Expected str, got NoneType");
+  ClearTokens();
+  toks_.assign(toks.begin(), toks.end());
+  for (size_t i = 0; i < std::min(toks.size(), positions.size()); ++i) positions_.push_back(positions[i]);
+  FindGroupEnds();
+}
+
 void CMatchCaseStatementParser::ClearTokens() {
-  for (CNode* node : pending_) factory_->pool().Reclaim(node);
-  pending_.clear();
   toks_.clear();
   positions_.clear();
-  depth_ = 0;
+  ++change_count_;
+}
+
+void CMatchCaseStatementParser::ReclaimPending() {
+  for (CNode* node : pending_) factory_->pool().Reclaim(node);
+  pending_.clear();
+}
+
+void CMatchCaseStatementParser::CheckIdle() const {
+  if (is_running_) ThrowError(ErrorKind::kRuntimeError, "a match or case statement is being parsed");
 }
 
 // Works from the end: `place_of_depth_[d]` is the first index behind the current one in front of
@@ -107,13 +123,14 @@ void CMatchCaseStatementParser::FindGroupEnds() {
 template <class Matches>
 int64_t CMatchCaseStatementParser::FindNonNested(Matches matches, int64_t start, int64_t end) const {
   if (end <= start) return -1;
-  if (start < 0 || end > static_cast<int64_t>(toks_.size()))
-    ThrowError(ErrorKind::kIndexError, "tuple index out of range");
-  for (int64_t i = start; i < end;) {
+  if (start < 0) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
+  const int64_t stop = std::min(end, static_cast<int64_t>(toks_.size()));
+  for (int64_t i = start; i < stop;) {
     // The match comes before the bracket counts, so that a bracket can be searched for.
     if (matches(toks_[i])) return i;
     i = DepthChange(toks_[i]) == 0 ? i + 1 : group_end_[i];
   }
+  if (stop < end) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
   return -1;
 }
 
@@ -125,13 +142,21 @@ int64_t CMatchCaseStatementParser::FindCode(TokenCode code, int64_t start, int64
   return FindNonNested([code](const Token& token) { return token.code == code; }, start, end);
 }
 
-const Token& CMatchCaseStatementParser::At(int64_t i) const {
-  if (i < 0 || i >= static_cast<int64_t>(toks_.size())) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
-  return toks_[i];
+int64_t CMatchCaseStatementParser::PlaceOf(int64_t i) const {
+  const int64_t count = static_cast<int64_t>(toks_.size());
+  const int64_t place = i < 0 ? i + count : i;
+  if (place < 0 || place >= count) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
+  return place;
+}
+
+Context CMatchCaseStatementParser::ContextAt(int64_t i) const {
+  const size_t place = static_cast<size_t>(PlaceOf(i));
+  if (place >= positions_.size()) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
+  return Context::At(positions_[place]);
 }
 
 PositionView CMatchCaseStatementParser::SlicePositions(int64_t begin, int64_t end) const {
-  return PositionView(positions().subspan(begin, end - begin));
+  return PositionView(positions_).Slice(begin, end);
 }
 
 CNode* CMatchCaseStatementParser::ParseMatchStmtImpl() {
@@ -145,14 +170,20 @@ CNode* CMatchCaseStatementParser::ParseMatchStmtImpl() {
   // replaced tokens keep the positions of those they stand for.
   const size_t mark = Mark();
   Push(TokNode(0));
-  const Token first = toks_.front();
-  const Token last = toks_.back();
-  toks_.front() = kOpenParen;
-  toks_.back() = kCloseParen;
   const PositionView positions = SlicePositions(0, count);
-  CNode* subject = pgen_parser_->ParseToksToNodeImpl(toks_, true, &positions);
-  toks_.front() = first;
-  toks_.back() = last;
+  const auto parse_in_parens = [&] {
+    struct Restore {
+      Token& token;
+      Token written;
+      ~Restore() { token = written; }
+    };
+    const Restore first{toks_.front(), toks_.front()};
+    const Restore last{toks_.back(), toks_.back()};
+    toks_.front() = kOpenParen;
+    toks_.back() = kCloseParen;
+    return pgen_parser_->ParseToksToNodeImpl(toks_, true, &positions);
+  };
+  CNode* subject = parse_in_parens();
   if (subject == nullptr) ThrowError(ErrorKind::kAttributeError, "'NoneType' object has no attribute 'fChildren'");
   if (subject->ChildCount() == 3 && subject->ChildIs(0, tok::LPAR) && subject->ChildIs(2, tok::RPAR)) {
     CNode* inner = factory_->PopChild(subject, 1);
@@ -190,7 +221,7 @@ CNode* CMatchCaseStatementParser::ParseCaseStmtImpl() {
 
 CNode* CMatchCaseStatementParser::TokNode(int64_t tok_i) {
   const Token& token = At(tok_i);
-  const Context context = Context::At(positions_[tok_i]);
+  const Context context = ContextAt(tok_i);
   CNodeClassInfo* record = IsNameCode(token.code) && factory_->keywords().Contains(token.view(), token.code)
                                ? factory_->keyword_class_info()
                                : factory_->RecordForState(TypeOfCode(token.code));
@@ -199,7 +230,7 @@ CNode* CMatchCaseStatementParser::TokNode(int64_t tok_i) {
 
 ParseError CMatchCaseStatementParser::ParseExceptionAt(int64_t tok_i) const {
   const Token& token = At(tok_i);
-  return ParseError("Invalid syntax", 0, token.view(), Context::At(positions_[tok_i]));
+  return ParseError("Invalid syntax", 0, token.view(), ContextAt(tok_i));
 }
 
 }  // namespace quillet

@@ -6,8 +6,9 @@
 // pass. Patterns in more than kMaxPatternDepth brackets are a ParseError at the bracket that opens
 // the next level.
 //
-// Children wait on one shared list until their node is made; what is left on it when a statement
-// ends, in success or not, belongs to no tree and goes back to the pool.
+// Children wait on one shared list until their node is made; what is left on it when an operation
+// ends, in success or not, belongs to no tree and goes back to the pool. One operation runs at a time:
+// the tokens are the object's, and a host's code, which may run inside of a parse, could replace them.
 #pragma once
 
 #include <span>
@@ -30,11 +31,22 @@ class CMatchCaseStatementParser {
   CNode* ParseMatchStmt(TokenSpan toks, const PositionView& positions);
   CNode* ParseCaseStmt(TokenSpan toks, const PositionView& positions);
 
-  // ---- steps, callable on their own by a host between SetTokens and ClearTokens ----
-  // Copies the tokens without comments and continuations. TypeError for a removed token, IndexError
-  // for an empty one.
+  // ---- steps, callable on their own by a host between SetTokens and ClearTokens, inside of Run ----
+  // Copies the tokens as they are; there may be fewer positions. TypeError for a removed token.
   void SetTokens(TokenSpan toks, const PositionView& positions);
+  // Copies the tokens without comments and continuations. TypeError for a removed token, IndexError
+  // for an empty one and for one without a position.
+  void SetKeptTokens(TokenSpan toks, const PositionView& positions);
   void ClearTokens();
+  // Changes with the tokens: whoever set them sees by it whether they are still in place.
+  uint64_t change_count() const { return change_count_; }
+  // Runs steps; RuntimeError from inside of another operation. A token's index below 0 counts from the
+  // end, as it does for the host.
+  template <class Steps>
+  auto Run(Steps&& steps) {
+    const Running running(this);
+    return steps();
+  }
   TokenSpan toks() const { return toks_; }
   std::span<const Position> positions() const { return positions_; }
   int64_t NonNestedFindTokenIndex(Text tok, int64_t start, int64_t end) const;
@@ -52,9 +64,31 @@ class CMatchCaseStatementParser {
  private:
   // One more level of brackets, for as long as it lives; throws at the limit.
   class Level;
+  // An operation under way; gives back what it leaves pending.
+  class Running {
+   public:
+    explicit Running(CMatchCaseStatementParser* parser) : parser_(parser) {
+      parser->CheckIdle();
+      parser->is_running_ = true;
+    }
+    Running(const Running&) = delete;
+    Running& operator=(const Running&) = delete;
+    ~Running() {
+      parser_->ReclaimPending();
+      parser_->is_running_ = false;
+    }
 
+   private:
+    CMatchCaseStatementParser* parser_;
+  };
+
+  void CheckIdle() const;
+  void ReclaimPending();
   CNode* ParseStmt(TokenSpan toks, const PositionView& positions, CNode* (CMatchCaseStatementParser::*impl)());
-  const Token& At(int64_t i) const;
+  // Where an index of the host's or of the steps' points to; IndexError for nowhere.
+  int64_t PlaceOf(int64_t i) const;
+  const Token& At(int64_t i) const { return toks_[PlaceOf(i)]; }
+  Context ContextAt(int64_t i) const;
   bool Is(int64_t i, TokenCode code) const { return At(i).code == code; }
   int64_t FindCode(TokenCode code, int64_t start, int64_t end) const;
   template <class Matches>
@@ -82,7 +116,9 @@ class CMatchCaseStatementParser {
   std::vector<int32_t> group_end_;
   std::vector<int32_t> place_of_depth_;
   std::vector<CNode*> pending_;
+  uint64_t change_count_ = 0;
   int depth_ = 0;
+  bool is_running_ = false;
 };
 
 }  // namespace quillet

@@ -1,5 +1,9 @@
 // CMatchCaseStatementParser: the two entry points, and the steps between them for a host that sets
 // _fToks and _fPositions itself.
+#include <algorithm>
+#include <utility>
+#include <vector>
+
 #include "matchcase/match_case_parser.h"
 #include "parser/parser.h"
 #include "quillet/tarvex/bindings.h"
@@ -16,74 +20,185 @@ using Class = nb::class_<MatchcaseObject>;
 
 NodePool& PoolOf(MatchcaseObject& self) { return nb::cast<ParserObject&>(self.pgen_parser).parser->factory().pool(); }
 
-// The steps read the tokens as they stand: they are set once both halves are there.
-void PutTokens(MatchcaseObject& self) {
-  self.parser->ClearTokens();
-  if (!self.toks.is_valid() || !self.positions.is_valid()) return;
-  self.source = SourceOfTokens(self.toks);
-  const std::vector<Position> positions = PositionsOf(self.positions);
-  self.parser->SetTokens(self.source->tokens, PositionView(positions));
+// Tokens that a statement, or another object on the same parser, replaced meanwhile are gone.
+void Refresh(MatchcaseObject& self) {
+  if (self.change_count == self.parser->change_count()) return;
+  self.change_count = self.parser->change_count();
+  const nb::object toks = std::move(self.toks);  // let go of last: the host's code may run then
+  const nb::object positions = std::move(self.positions);
+  self.source = {};
 }
 
-template <nb::object MatchcaseObject::*Field>
-void SetField(MatchcaseObject& self, Any value) {
-  self.*Field = value.is_none() ? nb::object() : TupleOf(value);
-  PutTokens(self);
+void Put(MatchcaseObject& self, nb::object toks, nb::object positions) {
+  Ref<SourceText> source;
+  std::vector<Position> places;
+  if (toks.is_valid()) source = SourceOfTokens(toks);
+  if (positions.is_valid()) places = PositionsOf(positions);
+  self.parser->Run([&] {
+    if (source) {
+      self.parser->SetTokens(source->tokens, PositionView(places));
+    } else {
+      self.parser->ClearTokens();
+    }
+  });
+  self.change_count = self.parser->change_count();
+  std::swap(self.toks, toks);  // what was there is let go of last
+  std::swap(self.positions, positions);
+  std::swap(self.source, source);
 }
 
-template <nb::object MatchcaseObject::*Field>
-nb::object GetField(MatchcaseObject& self) {
-  return (self.*Field).is_valid() ? self.*Field : nb::object(nb::none());
+// A tuple, or null for None.
+nb::object TupleField(Any value) {
+  if (value.is_none()) return {};
+  if (!PyTuple_Check(value.ptr())) ThrowExpected("tuple", value);
+  return TupleOf(value);
 }
 
-template <CNode* (CMatchCaseStatementParser::*Operation)(TokenSpan, const PositionView&)>
-nb::object ParseStatement(MatchcaseObject& self, Any toks, Any positions) {
-  TokensArg tokens(toks);
-  PositionsArg places(positions);
-  PinSource(PoolOf(self), tokens.source);
-  return Wrap((self.parser.get()->*Operation)(tokens.toks(), places.Required()), tokens.source);
+nb::object FieldOrNone(MatchcaseObject& self, nb::object MatchcaseObject::*field) {
+  Refresh(self);
+  return (self.*field).is_valid() ? self.*field : nb::object(nb::none());
+}
+
+void RequireTokens(MatchcaseObject& self) {
+  Refresh(self);
+  if (!self.toks.is_valid()) ThrowError(ErrorKind::kTypeError, "'NoneType' object is not subscriptable");
+}
+
+// An index of the host's; one that no line has tokens for is brought to where sums stay in range.
+int64_t IndexOf(nb::handle object) {
+  constexpr int64_t kFar = int64_t{1} << 40;
+  return std::clamp(Int64Of(object), -kFar, kFar);
+}
+
+// Runs a step on the tokens in place; its arguments are converted by then, since that is the host's
+// code and may put others there.
+template <class Operation>
+nb::object Step(MatchcaseObject& self, Operation&& operation) {
+  RequireTokens(self);
+  if (!self.positions.is_valid()) ThrowError(ErrorKind::kTypeError, "'NoneType' object is not subscriptable");
+  const Ref<SourceText> source = self.source;
+  PinSource(PoolOf(self), source);
+  return Wrap(self.parser->Run(operation), source);
 }
 
 template <CNode* (CMatchCaseStatementParser::*Operation)()>
 nb::object ParseStep(MatchcaseObject& self) {
-  PinSource(PoolOf(self), self.source);
-  return Wrap((self.parser.get()->*Operation)(), self.source);
+  return Step(self, [&] { return (self.parser.get()->*Operation)(); });
 }
 
 template <CNode* (CMatchCaseStatementParser::*Operation)(int64_t, int64_t)>
 nb::object PatternStep(MatchcaseObject& self, Any start, Any end) {
-  PinSource(PoolOf(self), self.source);
-  return Wrap((self.parser.get()->*Operation)(Int64Of(start), Int64Of(end)), self.source);
+  const int64_t first = IndexOf(start);
+  const int64_t last = IndexOf(end);
+  return Step(self, [&] { return (self.parser.get()->*Operation)(first, last); });
 }
 
-// The two arguments themselves where nothing is dropped, tuples of what is left otherwise.
-nb::object RemoveSkipToks(MatchcaseObject& self, Any toks, Any positions) {
-  nb::object tok_tuple = TupleOf(toks);
-  nb::object place_tuple = TupleOf(positions);
-  Ref<SourceText> source = SourceOfTokens(tok_tuple);
-  const std::vector<Position> places = PositionsOf(place_tuple);
-  CMatchCaseStatementParser scratch(nb::cast<ParserObject&>(self.pgen_parser).parser.get());
-  scratch.SetTokens(source->tokens, PositionView(places));
-  const TokenSpan kept = scratch.toks();
-  if (kept.size() == source->tokens.size()) return nb::make_tuple(nb::borrow(toks), nb::borrow(positions));
-  nb::list kept_toks, kept_places;
-  size_t next = 0;
-  for (size_t i = 0; i < source->tokens.size() && next < kept.size(); ++i) {
-    if (source->tokens[i].text != kept[next].text) continue;
-    ++next;
-    kept_toks.append(nb::handle(PyTuple_GET_ITEM(tok_tuple.ptr(), i)));
-    kept_places.append(nb::handle(PyTuple_GET_ITEM(place_tuple.ptr(), i)));
+nb::object NodeForPattern(MatchcaseObject& self, Any start, Any end, Any allow_as) {
+  const int64_t first = IndexOf(start);
+  const int64_t last = IndexOf(end);
+  const int as = PyObject_IsTrue(allow_as.ptr());
+  if (as < 0) throw nb::python_error();
+  return Step(self, [&] { return self.parser->NodeForPattern(first, last, as != 0); });
+}
+
+int64_t NonNestedFindTokenIndex(MatchcaseObject& self, Any tok, Any start, Any end) {
+  const HostText wanted = HostText::FromStr(tok);
+  const int64_t first = IndexOf(start);
+  const int64_t last = IndexOf(end);
+  if (last > first) RequireTokens(self);
+  return self.parser->NonNestedFindTokenIndex(wanted.text(), first, last);
+}
+
+nb::object TokNode(MatchcaseObject& self, Any tok_i) {
+  const int64_t index = IndexOf(tok_i);
+  return Step(self, [&] { return self.parser->TokNode(index); });
+}
+
+nb::object ParseExceptionAt(MatchcaseObject& self, Any tok_i) {
+  const int64_t index = IndexOf(tok_i);
+  RequireTokens(self);
+  const ParseError error = self.parser->ParseExceptionAt(index);
+  return ExceptionFor(error);
+}
+
+struct KeptTokens {
+  nb::object toks;
+  nb::object positions;
+};
+
+nb::list FrontOf(nb::handle sequence, size_t count) {
+  return nb::list(nb::object(sequence[nb::slice(static_cast<Py_ssize_t>(count))]));
+}
+
+// The two arguments themselves where nothing is dropped, tuples of what is left otherwise. Whatever
+// can be indexed will do, and a position is looked at only behind a backslash.
+KeptTokens WithoutSkipped(nb::handle toks, nb::handle positions) {
+  const auto item = [](nb::handle sequence, size_t i) { return nb::object(sequence[nb::int_(i)]); };
+  const auto row = [&](size_t i) { return item(item(positions, i), 0); };
+  const auto begins_with = [](nb::handle first, const char* character) {
+    return PyUnicode_Check(first.ptr()) && PyUnicode_CompareWithASCIIString(first.ptr(), character) == 0;
+  };
+  nb::object kept_toks, kept_positions;  // lists from the first token on that is dropped
+  const size_t count = nb::len(toks);
+  for (size_t i = 0; i < count; ++i) {
+    const nb::object tok = item(toks, i);
+    const nb::object first = item(tok, 0);
+    if (begins_with(first, "#") || (begins_with(first, "\\") && i + 1 < count && row(i) < row(i + 1))) {
+      if (kept_toks.is_valid()) continue;
+      kept_toks = FrontOf(toks, i);
+      kept_positions = FrontOf(positions, i);
+    } else if (kept_toks.is_valid()) {
+      nb::borrow<nb::list>(kept_toks).append(tok);
+      nb::borrow<nb::list>(kept_positions).append(item(positions, i));
+    }
   }
-  return nb::make_tuple(nb::tuple(kept_toks), nb::tuple(kept_places));
+  if (!kept_toks.is_valid()) return {nb::borrow(toks), nb::borrow(positions)};
+  return {nb::tuple(kept_toks), nb::tuple(kept_positions)};
+}
+
+nb::object RemoveSkipToks(MatchcaseObject&, Any toks, Any positions) {
+  const KeptTokens kept = WithoutSkipped(toks, positions);
+  return nb::make_tuple(kept.toks, kept.positions);
+}
+
+template <CNode* (CMatchCaseStatementParser::*Operation)()>
+nb::object ParseStatement(MatchcaseObject& self, Any toks, Any positions) {
+  const KeptTokens kept = WithoutSkipped(toks, positions);
+  for (const nb::object& half : {kept.toks, kept.positions})
+    if (!PyTuple_Check(half.ptr())) ThrowExpected("tuple", half);
+  const Ref<SourceText> source = SourceOfTokens(TupleOf(kept.toks));
+  const std::vector<Position> places = PositionsOf(TupleOf(kept.positions));
+  PinSource(PoolOf(self), source);
+  CMatchCaseStatementParser& parser = *self.parser;
+  CNode* node = parser.Run([&] {
+    struct Clear {
+      CMatchCaseStatementParser& parser;
+      ~Clear() { parser.ClearTokens(); }
+    } clear{parser};
+    parser.SetTokens(source->tokens, PositionView(places));
+    return (parser.*Operation)();
+  });
+  return Wrap(node, source);
 }
 
 int Traverse(PyObject* self, visitproc visit, void* arg) {
   Py_VISIT(Py_TYPE(self));
-  if (nb::inst_ready(self)) Py_VISIT(nb::inst_ptr<MatchcaseObject>(self)->pgen_parser.ptr());
+  if (!nb::inst_ready(self)) return 0;
+  MatchcaseObject* object = nb::inst_ptr<MatchcaseObject>(self);
+  Py_VISIT(object->pgen_parser.ptr());
+  Py_VISIT(object->toks.ptr());
+  Py_VISIT(object->positions.ptr());
   return 0;
 }
 
-int Clear(PyObject*) { return 0; }  // the parser at the other end of the cycle lets go
+// The parser at the other end of a cycle lets go; of the tokens that the host set this has to.
+int Clear(PyObject* self) {
+  if (!nb::inst_ready(self)) return 0;
+  MatchcaseObject* object = nb::inst_ptr<MatchcaseObject>(self);
+  const nb::object toks = std::move(object->toks);
+  const nb::object positions = std::move(object->positions);
+  return 0;
+}
 
 const PyType_Slot kSlots[] = {
     {Py_tp_traverse, reinterpret_cast<void*>(Traverse)}, {Py_tp_clear, reinterpret_cast<void*>(Clear)}, {0, nullptr}};
@@ -113,31 +228,32 @@ void BindMatchcase(nb::module_& tarvex) {
   cls.def_prop_ro("_fPGenParser", [](MatchcaseObject& self) { return self.pgen_parser; });
   cls.def_prop_ro("_fNodeFactory",
                   [](MatchcaseObject& self) { return nb::object(self.pgen_parser.attr("_fNodeFactory")); });
-  cls.def_prop_rw("_fToks", &GetField<&MatchcaseObject::toks>, &SetField<&MatchcaseObject::toks>, nb::arg("value"));
-  cls.def_prop_rw("_fPositions", &GetField<&MatchcaseObject::positions>, &SetField<&MatchcaseObject::positions>,
-                  nb::arg("value"));
+  cls.def_prop_rw(
+      "_fToks", [](MatchcaseObject& self) { return FieldOrNone(self, &MatchcaseObject::toks); },
+      [](MatchcaseObject& self, Any value) {
+        nb::object toks = TupleField(value);
+        Refresh(self);
+        Put(self, std::move(toks), self.positions);
+      },
+      nb::arg("value"));
+  cls.def_prop_rw(
+      "_fPositions", [](MatchcaseObject& self) { return FieldOrNone(self, &MatchcaseObject::positions); },
+      [](MatchcaseObject& self, Any value) {
+        nb::object positions = TupleField(value);
+        Refresh(self);
+        Put(self, self.toks, std::move(positions));
+      },
+      nb::arg("value"));
 
-  cls.def("ParseMatchStmt", &ParseStatement<&CMatchCaseStatementParser::ParseMatchStmt>, nb::arg("toks"),
+  cls.def("ParseMatchStmt", &ParseStatement<&CMatchCaseStatementParser::ParseMatchStmtImpl>, nb::arg("toks"),
           nb::arg("positions"), "A CMatchStmt, or None for a line that is no such statement.");
-  cls.def("ParseCaseStmt", &ParseStatement<&CMatchCaseStatementParser::ParseCaseStmt>, nb::arg("toks"),
+  cls.def("ParseCaseStmt", &ParseStatement<&CMatchCaseStatementParser::ParseCaseStmtImpl>, nb::arg("toks"),
           nb::arg("positions"), "A CCaseStmt, or None for a line that is no such statement.");
   cls.def("_ParseMatchStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseMatchStmtImpl>);
   cls.def("_ParseCaseStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseCaseStmtImpl>);
   cls.def("_RemoveSkipToks", &RemoveSkipToks, nb::arg("toks"), nb::arg("positions"));
-  cls.def(
-      "_NonNestedFindTokenIndex",
-      [](MatchcaseObject& self, Any tok, Any start, Any end) {
-        const HostText wanted = HostText::FromStr(tok);
-        return self.parser->NonNestedFindTokenIndex(wanted.text(), Int64Of(start), Int64Of(end));
-      },
-      nb::arg("tok"), nb::arg("start"), nb::arg("end"));
-  cls.def(
-      "_NodeForPattern",
-      [](MatchcaseObject& self, Any start, Any end, Truth allow_as) {
-        PinSource(PoolOf(self), self.source);
-        return Wrap(self.parser->NodeForPattern(Int64Of(start), Int64Of(end), allow_as), self.source);
-      },
-      nb::arg("start"), nb::arg("end"), nb::arg("allow_as") = true);
+  cls.def("_NonNestedFindTokenIndex", &NonNestedFindTokenIndex, nb::arg("tok"), nb::arg("start"), nb::arg("end"));
+  cls.def("_NodeForPattern", &NodeForPattern, nb::arg("start"), nb::arg("end"), nb::arg("allow_as") = true);
   const auto def_step = [&cls](const char* name, auto operation) {
     cls.def(name, operation, nb::arg("start"), nb::arg("end"));
   };
@@ -146,20 +262,8 @@ void BindMatchcase(nb::module_& tarvex) {
   def_step("_NodeForClassPattern", &PatternStep<&CMatchCaseStatementParser::NodeForClassPattern>);
   def_step("_NodeForDottedNameValue", &PatternStep<&CMatchCaseStatementParser::NodeForDottedNameValue>);
   def_step("_NodeForNumberPattern", &PatternStep<&CMatchCaseStatementParser::NodeForNumberPattern>);
-  cls.def(
-      "_TokNode",
-      [](MatchcaseObject& self, Any tok_i) {
-        PinSource(PoolOf(self), self.source);
-        return Wrap(self.parser->TokNode(Int64Of(tok_i)), self.source);
-      },
-      nb::arg("tok_i"));
-  cls.def(
-      "_ParseExceptionAt",
-      [](MatchcaseObject& self, Any tok_i) {
-        const ParseError error = self.parser->ParseExceptionAt(Int64Of(tok_i));
-        return ExceptionFor(error);
-      },
-      nb::arg("tok_i"));
+  cls.def("_TokNode", &TokNode, nb::arg("tok_i"));
+  cls.def("_ParseExceptionAt", &ParseExceptionAt, nb::arg("tok_i"));
 }
 
 }  // namespace quillet::host

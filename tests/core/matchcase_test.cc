@@ -73,6 +73,16 @@ TEST(MatchStatement, HasTheSubjectWithoutTheBracketsItWasParsedIn) {
   for (const Case& c : cases) EXPECT_EQ(Parse(c.source), c.result) << c.source;
 }
 
+// What is found as the head's end need not be the token that becomes the closing bracket.
+TEST(MatchStatement, TheLastTokenIsReplacedWhateverItIs) {
+  EXPECT_EQ(ParseLine("match lambda: x:").tree, "CMatchStmt(match lambdef(lambda : x) :)");
+  EXPECT_EQ(ParseLine("match lambda: x:").contexts, "0:0 1 2 3 0:12");
+  // The colon stays inside of the brackets, and is rejected there.
+  EXPECT_EQ(Parse("match x: \\"), "error at token 2");
+  // A body makes it an annotation, which the regular parser reads.
+  EXPECT_EQ(Parse("match x: pass"), "error at token 1");
+}
+
 TEST(MatchStatement, LeavesMadeByHandCarryPositions) {
   EXPECT_EQ(ParseLine("match x:").contexts, "0:0 1 0:7");
   EXPECT_EQ(ParseLine("case x if y: z").contexts, "0:0 0:5 0 1 2 3 0:11 0");
@@ -314,7 +324,7 @@ TEST(Steps, SkippedTokensAreRemovedWithTheirPositions) {
   CMatchCaseStatementParser& parser = ParserFor(kPy3).match_case_parser();
   const Ref<SourceText> source = SourceText::Copy("case ( # c\n a, \\\n b): \\");
   TokenizeOnly(*source, kPy3);
-  parser.SetTokens(source->tokens, PositionView(source.get(), source->tokens, 0));
+  parser.SetKeptTokens(source->tokens, PositionView(source.get(), source->tokens, 0));
   std::string shown;
   for (size_t i = 0; i < parser.toks().size(); ++i) {
     shown += std::string(parser.toks()[i].view()) + "@" + std::to_string(parser.positions()[i].line) + " ";
@@ -332,7 +342,7 @@ TEST(Steps, RemovedAndEmptyTokensAreErrorsOfTheHostsKind) {
   const std::vector<Token> empty{Token{"", 0, tok::ERRORTOKEN}};
   const auto kind_of = [&](const std::vector<Token>& toks) {
     try {
-      parser.SetTokens(toks, PositionView(positions));
+      parser.SetKeptTokens(toks, PositionView(positions));
     } catch (const Error& error) {
       parser.ClearTokens();
       return error.kind();
@@ -341,6 +351,72 @@ TEST(Steps, RemovedAndEmptyTokensAreErrorsOfTheHostsKind) {
   };
   EXPECT_EQ(kind_of(removed), ErrorKind::kTypeError);
   EXPECT_EQ(kind_of(empty), ErrorKind::kIndexError);
+}
+
+TEST(Steps, AFailureLeavesTheTokensAsTheyWere) {
+  CMatchCaseStatementParser& parser = ParserFor(kPy3).match_case_parser();
+  const Ref<SourceText> source = SourceText::Copy("match x y:");
+  TokenizeOnly(*source, kPy3);
+  parser.SetTokens(source->tokens, PositionView(source.get(), source->tokens, 0));
+  EXPECT_THROW(parser.Run([&] { return parser.ParseMatchStmtImpl(); }), ParseError);
+  EXPECT_EQ(parser.toks().front().view(), "match");
+  EXPECT_EQ(parser.toks().back().view(), ":");
+  EXPECT_THROW(parser.Run([&] { return parser.ParseMatchStmtImpl(); }), ParseError);
+  parser.ClearTokens();
+}
+
+TEST(Steps, AFailureGivesBackWhatItMade) {
+  CMatchCaseStatementParser& parser = ParserFor(kPy3).match_case_parser();
+  const Ref<SourceText> source = SourceText::Copy("case [a, b, +]:");
+  TokenizeOnly(*source, kPy3);
+  parser.SetTokens(source->tokens, PositionView(source.get(), source->tokens, 0));
+  const auto fail = [&] { EXPECT_THROW(parser.Run([&] { return parser.NodeForPattern(1, 8); }), ParseError); };
+  fail();
+  const size_t count = ParserFor(kPy3).factory().pool().node_count();
+  for (int i = 0; i < 1000; ++i) fail();
+  EXPECT_EQ(ParserFor(kPy3).factory().pool().node_count(), count);
+  parser.ClearTokens();
+}
+
+TEST(Steps, OneOperationRunsAtATime) {
+  CMatchCaseStatementParser& parser = ParserFor(kPy3).match_case_parser();
+  const auto parse = [] { return Parse("match x:"); };
+  EXPECT_EQ(parser.Run([&] {
+    try {
+      parse();
+    } catch (const Error& error) {
+      return error.message();
+    }
+    return std::string();
+  }),
+            "a match or case statement is being parsed");
+  EXPECT_EQ(parse(), "CMatchStmt(match x :)");
+}
+
+TEST(Steps, TokensMayHaveFewerPositions) {
+  CMatchCaseStatementParser& parser = ParserFor(kPy3).match_case_parser();
+  const Ref<SourceText> source = SourceText::Copy("case x: # c");
+  TokenizeOnly(*source, kPy3);
+  const std::vector<Position> positions(1);
+  parser.SetTokens(source->tokens, PositionView(positions));
+  EXPECT_EQ(parser.toks().size(), 4u);
+  EXPECT_EQ(parser.ParseExceptionAt(-4).value, "case");
+  EXPECT_THROW(parser.ParseExceptionAt(1), Error);
+  EXPECT_THROW(parser.ParseExceptionAt(4), Error);
+  EXPECT_THROW(parser.ParseExceptionAt(-5), Error);
+  parser.ClearTokens();
+}
+
+TEST(Searching, ReadsNoFurtherThanTheTokenThatIsFound) {
+  CMatchCaseStatementParser& parser = ParserFor(kPy3).match_case_parser();
+  const Ref<SourceText> source = SourceText::Copy("match x:");
+  TokenizeOnly(*source, kPy3);
+  parser.SetTokens(source->tokens, PositionView(source.get(), source->tokens, 0));
+  EXPECT_EQ(parser.NonNestedFindTokenIndex("match", 0, 100), 0);
+  EXPECT_EQ(parser.NonNestedFindTokenIndex(":", 1, 100), 2);
+  EXPECT_THROW(parser.NonNestedFindTokenIndex("y", 0, 100), Error);
+  EXPECT_THROW(parser.NonNestedFindTokenIndex("y", 50, 100), Error);
+  parser.ClearTokens();
 }
 
 TEST(Steps, AnErrorNamesTheTokenAndItsPosition) {
