@@ -16,13 +16,15 @@ namespace quillet {
 
 namespace {
 
-CPGenParserImpl::Options ParserOptions(Version version, const std::string& grammar_file,
+CPGenParserImpl::Options ParserOptions(const CPGenAnalyzerImpl::Options& analyzer, const std::string& grammar_file,
                                        const std::vector<std::string>& keywords, bool py3_grammar) {
   CPGenParserImpl::Options options;
-  options.version = version;
+  options.version = analyzer.version;
   options.grammar_file = grammar_file;
   options.keywords = keywords;
   options.py3_grammar = py3_grammar;
+  options.token_names = analyzer.token_names;
+  options.kinds_by_state = analyzer.kinds_by_state;
   return options;
 }
 
@@ -39,8 +41,8 @@ std::string JoinedTokens(const LogicalLine& logical) {
   return joined;
 }
 
-// What a walk failed with, as the error to go on with. An exception of the host's that the host
-// does not describe is none of ours to replace.
+// What a walk failed with, as the error to go on with, or nothing where the host lets it pass. An
+// exception of the host's that the host does not describe is none of ours to replace.
 std::exception_ptr WrapWalkFailure(const std::exception_ptr& failure, const LogicalLine& logical) {
   try {
     std::rethrow_exception(failure);
@@ -50,9 +52,11 @@ std::exception_ptr WrapWalkFailure(const std::exception_ptr& failure, const Logi
   } catch (...) {
     if (TheConsole().describe_exception(failure).empty()) return failure;
   }
-  return std::make_exception_ptr(Error(ErrorKind::kValueError, "Could not analyze logical -- inner exception is " +
-                                                                   ReprOfException(failure) +
-                                                                   "\n  logical tokens: " + JoinedTokens(logical)));
+  const std::string message = "Could not analyze logical -- inner exception is " + ReprOfException(failure) +
+                              "\n  logical tokens: " + JoinedTokens(logical);
+  const auto replace_exception = TheConsole().replace_exception;
+  return replace_exception != nullptr ? replace_exception(message, failure)
+                                      : std::make_exception_ptr(Error(ErrorKind::kValueError, message));
 }
 
 const char* MessageForEmbedded(LineKind kind) {
@@ -70,12 +74,12 @@ const char* MessageForEmbedded(LineKind kind) {
 
 CPGenAnalyzerImpl::CPGenAnalyzerImpl(const Options& options)
     : logical_parser_(std::make_unique<CPGenParserImpl>(
-          ParserOptions(options.version, options.grammar_file, options.keywords, options.py3_grammar))),
+          ParserOptions(options, options.grammar_file, options.keywords, options.py3_grammar))),
       node_walker_(std::make_unique<CNodeWalker>(options.version)),
-      type_hint_walker_(std::make_unique<CTypeHintWalker>(
-          std::make_unique<CPGenParserImpl>(
-              ParserOptions(options.version, options.hint_grammar_file, options.hint_keywords, true)),
-          options.version, node_walker_.get())) {}
+      type_hint_walker_(
+          std::make_unique<CTypeHintWalker>(std::make_unique<CPGenParserImpl>(ParserOptions(
+                                                options, options.hint_grammar_file, options.hint_keywords, true)),
+                                            options.version, node_walker_.get())) {}
 
 std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeSingleLogical(LogicalLine& logical, bool in_async_def,
                                                                    bool first_in_def) {

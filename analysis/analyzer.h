@@ -28,6 +28,8 @@ class CPGenAnalyzerImpl {
     std::vector<std::string> keywords;
     std::vector<std::string> hint_keywords;
     bool py3_grammar = true;
+    TokenNames token_names = TokenNames::Default();
+    KindsByName kinds_by_state = KindsByStateName();
   };
 
   explicit CPGenAnalyzerImpl(const Options& options);

@@ -1,5 +1,6 @@
 // What the core asks of the process it runs in: to print a line, to report an exception that has
-// no other way out, and to describe an exception that is not the core's own.
+// no other way out, to describe an exception that is not the core's own, and to put another one in
+// its place.
 //
 // Without a host the lines go to stdout and stderr. The bindings install the host's own means at
 // import; they are functions, so that a thread without the interpreter lock may call them (the
@@ -20,6 +21,9 @@ struct Console {
   void (*report_exception)(const std::exception_ptr& exception, bool suppress_gui);
   // repr() of an exception that is not a quillet::Error; empty where it is unknown.
   std::string (*describe_exception)(const std::exception_ptr& exception);
+  // Raises a ValueError with this message from where the failure came from, and gives what was raised;
+  // null where the host lets it pass. Without a host there is none.
+  std::exception_ptr (*replace_exception)(const std::string& message, const std::exception_ptr& failure) = nullptr;
 };
 
 // The console of the calling thread where it has one of its own, and of the process otherwise.

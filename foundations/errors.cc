@@ -83,7 +83,8 @@ std::string ReprOfException(const std::exception_ptr& exception) {
   try {
     std::rethrow_exception(exception);
   } catch (const Error& error) {
-    return ReprOfError(error);
+    const std::string description = error.is_of_host() ? TheConsole().describe_exception(exception) : "";
+    return description.empty() ? ReprOfError(error) : description;
   } catch (const std::exception& other) {
     std::string description = TheConsole().describe_exception(exception);
     return description.empty() ? "Exception(" + ReprOfText(other.what()) + ")" : description;

@@ -37,6 +37,8 @@ class Error : public std::exception {
   ErrorKind kind() const { return kind_; }
   const std::string& message() const { return message_; }
   const char* what() const noexcept override { return message_.c_str(); }
+  // True for what stands for an exception of the host's, which can describe it.
+  virtual bool is_of_host() const { return false; }
 
  private:
   ErrorKind kind_;

@@ -3,6 +3,8 @@
 // "Not found" is the token count for the first two, so that callers test with one range check, and
 // -1 for the last. A token counts unless it was removed, is empty, or is a comment or a backslash;
 // only its first character is looked at.
+#include <algorithm>
+
 #include "foundations/errors.h"
 #include "parser/parser.h"
 
@@ -16,14 +18,14 @@ bool IsSignificant(const Token& token) { return token.length != 0 && token.text[
 
 int64_t CPGenParserImpl::FindNextNonSkipIndex(TokenSpan toks, int64_t tok_i) {
   const int64_t count = static_cast<int64_t>(toks.size());
-  for (int64_t i = std::max<int64_t>(tok_i + 1, 0); i < count; ++i)
+  for (int64_t i = tok_i < 0 ? std::max<int64_t>(tok_i + 1, 0) : std::min(tok_i, count) + 1; i < count; ++i)
     if (IsSignificant(toks[i])) return i;
   return count;
 }
 
 int64_t CPGenParserImpl::FindPrevNonSkipIndex(TokenSpan toks, int64_t tok_i) {
   const int64_t count = static_cast<int64_t>(toks.size());
-  for (int64_t i = std::min(tok_i, count) - 1; i >= 0; --i)
+  for (int64_t i = std::clamp<int64_t>(tok_i, 0, count) - 1; i >= 0; --i)
     if (IsSignificant(toks[i])) return i;
   return count;
 }
@@ -58,8 +60,11 @@ int64_t CPGenParserImpl::NonNestedFindTokenIndex(Text tok, TokenSpan toks, int64
 }
 
 const Token* NextNonRemovedTokenInTuple(TokenSpan toks, int64_t i) {
-  for (; i < static_cast<int64_t>(toks.size()); ++i) {
-    const Token& token = toks[i];
+  const int64_t count = static_cast<int64_t>(toks.size());
+  for (; i < count; ++i) {
+    // An index below 0 counts from the end, as it does for the host.
+    if (i < -count) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
+    const Token& token = toks[i < 0 ? i + count : i];
     if (token.removed()) ThrowError(ErrorKind::kTypeError, "'NoneType' object is not subscriptable");
     if (token.length == 0) ThrowError(ErrorKind::kIndexError, "string index out of range");
     if (token.text[0] != '\\' && token.text[0] != '#') return &token;

@@ -6,6 +6,7 @@
 #include "parser/parser.h"
 
 #include <algorithm>
+#include <limits>
 #include <string>
 
 #include "foundations/errors.h"
@@ -95,8 +96,8 @@ std::vector<Text> TokenNamesByNumber(const TokenNames& names, NodePool& pool) {
 std::span<const Text> Py3Keywords() { return kPy3KeywordList; }
 std::span<const Text> Py27Keywords() { return kPy27KeywordList; }
 
-std::vector<std::pair<Text, NodeKind>> KindsByStateName() {
-  std::vector<std::pair<Text, NodeKind>> kinds;
+KindsByName KindsByStateName() {
+  KindsByName kinds;
   for (const StateRow& row : kStateRows) kinds.emplace_back(row.state, row.kind);
   for (const RuleRow& row : kRuleRows) {
     const Text name = NameOfRule(row.rule);
@@ -109,10 +110,10 @@ std::vector<std::pair<Text, NodeKind>> KindsByStateName() {
   return kinds;
 }
 
-std::vector<NodeKind> BuildKindsForStates(const Grammar& grammar) {
+std::vector<NodeKind> BuildKindsForStates(const Grammar& grammar, const KindsByName& kinds_by_state) {
   std::vector<NodeKind> kinds(Grammar::kFirstSymbol + grammar.symbol_names.size(), NodeKind::kCNode);
   std::unordered_map<Text, NodeKind> by_name;
-  for (const auto& [name, kind] : KindsByStateName()) by_name[name] = kind;
+  for (const auto& [name, kind] : kinds_by_state) by_name[name] = kind;
   const auto bind = [&](size_t number, Text name) {
     const auto found = by_name.find(name);
     if (found != by_name.end()) kinds[number] = found->second;
@@ -132,7 +133,7 @@ CPGenParserImpl::CPGenParserImpl(const Options& options)
   const auto file_input = grammar_->symbol2number.find("file_input");
   if (file_input == grammar_->symbol2number.end()) ThrowError(ErrorKind::kKeyError, "file_input");
   file_input_number_ = file_input->second;
-  kinds_for_states_ = BuildKindsForStates(*grammar_);
+  kinds_for_states_ = BuildKindsForStates(*grammar_, options.kinds_by_state);
 
   Ref<NodePool> pool(new NodePool);
   const std::vector<Text> token_names = TokenNamesByNumber(options.token_names, *pool);
@@ -172,7 +173,10 @@ void CPGenParserImpl::BuildFeedTables() {
 }
 
 void CPGenParserImpl::RaiseParseError(int64_t context) const {
-  throw ParseError("syntax error", -1, kNoText, Context::Index(static_cast<int32_t>(context)));
+  constexpr int64_t kLeast = std::numeric_limits<int32_t>::min();
+  constexpr int64_t kMost = std::numeric_limits<int32_t>::max();
+  const auto index = static_cast<int32_t>(std::clamp(context, kLeast, kMost));
+  throw ParseError("syntax error", -1, kNoText, Context::Index(index));
 }
 
 }  // namespace quillet

@@ -29,6 +29,11 @@ namespace quillet {
 inline constexpr const char* kPy2DefaultGrammar = "Python-Grammar-2.7";
 inline constexpr const char* kPy3DefaultGrammar = "Python-Grammar-3.8";
 
+// The class of each state that has one of its own, by the state's name: the written-out table and the
+// rules of node_kinds.def.
+using KindsByName = std::vector<std::pair<std::string, NodeKind>>;
+KindsByName KindsByStateName();
+
 // The default keyword lists: those of Python 3 and of 2.7.
 std::span<const Text> Py3Keywords();
 std::span<const Text> Py27Keywords();
@@ -54,6 +59,7 @@ class CPGenParserImpl {
     std::vector<std::string> keywords;
     bool py3_grammar = true;
     TokenNames token_names = TokenNames::Default();
+    KindsByName kinds_by_state = KindsByStateName();
   };
 
   explicit CPGenParserImpl(const Options& options);
@@ -173,11 +179,8 @@ class CPGenParserImpl {
   int bound_depth_ = 0;
 };
 
-// The class for each state number up to the grammar's last symbol: the written-out table and the
-// rules of node_kinds.def; plain CNode for a state that neither names.
-std::vector<NodeKind> BuildKindsForStates(const Grammar& grammar);
-// The same by name, for hosts: (state name, kind).
-std::vector<std::pair<Text, NodeKind>> KindsByStateName();
+// The class for each state number up to the grammar's last symbol; plain CNode for a state without a name.
+std::vector<NodeKind> BuildKindsForStates(const Grammar& grammar, const KindsByName& kinds_by_state);
 
 // The first token from `i` on whose first character is neither "\\" nor "#"; null at the end.
 // TypeError for a removed token on the way, IndexError for an empty one.

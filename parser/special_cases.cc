@@ -78,9 +78,15 @@ CNode* CPGenParserImpl::SpecialCases(TokenRun run, bool in_async_def, const Posi
     case word::kWith:
       return ParenthesizedWith(run, in_async_def, positions, first_i);
     case word::kMatch:
-      return match_case_parser_->ParseMatchStmt(run.toks, own_positions());
     case word::kCase:
-      return match_case_parser_->ParseCaseStmt(run.toks, own_positions());
+      try {
+        return run.toks[first_i].code == word::kMatch ? match_case_parser_->ParseMatchStmt(run.toks, own_positions())
+                                                      : match_case_parser_->ParseCaseStmt(run.toks, own_positions());
+      } catch (ParseError& error) {
+        // That parser counts from the front of the run; positions and what a host raised stand as they are.
+        if (error.context.IsIndex() && !error.is_of_host()) error.context.value += run.base;
+        throw;
+      }
     case word::kExcept:
       return ExceptStar(run, in_async_def, positions, first_i);
     case word::kType:
@@ -128,6 +134,7 @@ CNode* CPGenParserImpl::ExceptStar(TokenRun run, bool in_async_def, const Positi
 
 CNode* CPGenParserImpl::WithTypeParameter(TokenRun run, bool in_async_def, const PositionView& positions,
                                           int64_t tok_i) {
+  if (tok_i < 0 || tok_i >= run.count()) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
   const bool is_type_stmt = run.toks[tok_i].code == word::kType;
   const int64_t name_i = FindNextNonSkipIndex(run.toks, tok_i);
   if (name_i >= run.count() || !IsNameCode(run.toks[name_i].code)) return nullptr;
@@ -221,6 +228,7 @@ CNode* CPGenParserImpl::TypeParameterBound(TokenRun run, bool in_async_def, cons
   } nesting(bound_depth_);
   try {
     if (bound_depth_ > kMaxBoundDepth) RaiseParseError(run.IndexOf(colon_i));
+    end = std::min(end, run.count());
     const TokenRun bound{run.toks.subspan(colon_i + 1, end - colon_i - 1), run.IndexOf(colon_i + 1)};
     const size_t position_end = std::min(positions->size(), static_cast<size_t>(run.IndexOf(end)));
     return ParseRun(bound, in_async_def, positions->First(position_end));

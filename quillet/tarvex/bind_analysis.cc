@@ -20,10 +20,17 @@ void InitAnalyzer(AnalyzerObject* self, Any version_triple, Any grammar_file, An
   new (self) AnalyzerObject();
   try {
     CPGenAnalyzerImpl::Options options;
-    options.version = VersionOf(version_triple);
     options.grammar_file = ResolveGrammarFile(grammar_file);
     options.hint_grammar_file = ResolveGrammarFile(hint_grammar_file);
-    options.keywords = KeywordList(keyword_seq, self->keywords);
+    options.token_names = HostTokenNames();
+    options.kinds_by_state = HostKindsByState();
+    try {
+      options.version = VersionOf(version_triple);
+      options.keywords = KeywordList(keyword_seq, self->keywords);
+    } catch (...) {
+      CheckGrammarFile(options.grammar_file, options.token_names);
+      throw;
+    }
     nb::object hint_keywords;
     options.hint_keywords = KeywordList(nb::none(), hint_keywords);
     options.py3_grammar = py3_grammar;
@@ -85,20 +92,6 @@ void InspectEmbedded(AnalyzerObject& self, Any logical, Any node, Truth in_async
 }
 
 // ---- syntax errors ----
-
-// The context of an error: an index, of which only whether it lies in the line matters, or a pair.
-Context ErrorContext(nb::handle context) {
-  if (PyTuple_Check(context.ptr())) {
-    auto [line, column] = UnpackPair(context);
-    return Context::At({Int32Of(line), Int32Of(column)});
-  }
-  if (!PyIndex_Check(context.ptr())) ThrowExpected("int", context);
-  const Py_ssize_t index = PyNumber_AsSsize_t(context.ptr(), nullptr);
-  if (index == -1 && PyErr_Occurred()) throw nb::python_error();
-  constexpr Py_ssize_t least = std::numeric_limits<int32_t>::min();
-  constexpr Py_ssize_t most = std::numeric_limits<int32_t>::max();
-  return Context::Index(static_cast<int32_t>(index < least ? least : index > most ? most : index));
-}
 
 nb::object SyntaxErrorFor(Any msg, Any logical, Any context, Any pos_info_in_tok) {
   const HostText message = HostText::FromStr(msg);

@@ -1,6 +1,10 @@
 // CLogicalLine and the operations of the sibling module logicalline.
+#include <algorithm>
 #include <array>
 #include <cstring>
+#include <memory>
+#include <utility>
+#include <vector>
 
 #include "quillet/tarvex/bindings.h"
 #include "quillet/tarvex/convert.h"
@@ -85,6 +89,22 @@ PyObject* PairOf(const Record& row) {
   return pair;
 }
 
+// What lines gave up while the core was waiting for the host in the middle of an operation, which may
+// still read it. It is let go of when the next such thing comes up with the core at rest.
+std::vector<std::shared_ptr<const void>>& Retired() {
+  static auto* retired = new std::vector<std::shared_ptr<const void>>;  // outlives the last lines
+  return *retired;
+}
+
+template <class T>
+void Retire(T&& given_up) {
+  if (HostCall::IsUnderWay()) {
+    Retired().push_back(std::make_shared<const std::decay_t<T>>(std::forward<T>(given_up)));
+  } else {
+    Retired().clear();
+  }
+}
+
 // The half of a host's pair as bytes that the core may keep a moment.
 Text BytesOfHalf(nb::handle half, HostText& keep) {
   keep = HostText::FromBytes(half);
@@ -154,7 +174,7 @@ void LineObject::SetToks(nb::handle sequence) {
   // Records may refer to the old source, and so may positions.
   if (!line_->has_stored_positions()) SetPositions(GetPositions());
   MoveToOwnStore();
-  line_->source = source;
+  Retire(std::exchange(line_->source, source));
   line_->toks = source->tokens;
   line_->no_embedded = false;
   if (!token_count_is_set_) line_->token_count = static_cast<int32_t>(source->tokens.size());
@@ -199,7 +219,7 @@ nb::object LineObject::GetPositions() {
 
 void LineObject::SetPositions(nb::handle sequence) {
   nb::object tuple = TupleOf(sequence);
-  line_->SetPositions(PositionsOf(tuple));
+  Retire(line_->SetPositions(PositionsOf(tuple)));
   positions_ = std::move(tuple);
 }
 
@@ -263,6 +283,7 @@ bool LineObject::IsAtEndOfStore() const {
 void LineObject::MoveToOwnStore() {
   const bool is_empty = line_->type_equivs().empty() && line_->arg_type_equivs().empty();
   if (is_empty && !writes_to_shared_) {
+    Retire(std::move(shared_));
     shared_.reset();  // the line makes a store of its own at its first record
     return;
   }
@@ -276,7 +297,7 @@ void LineObject::MoveToOwnStore() {
   for (const Record& row : kept) line_->DirectAppend(copy(row.name()), copy(row.info()));
   for (const Record& row : kept_args) line_->DirectAppendArg(copy(row.name()), copy(row.info()));
   // The store is private now, so the line is at its end for good.
-  shared_ = std::move(own);
+  Retire(std::exchange(shared_, std::move(own)));
   writes_to_shared_ = true;
 }
 
@@ -349,6 +370,11 @@ void LineObject::BuiltinAppendArg(Text name, Text info) {
 void LineObject::BuiltinClearDerivedInfo() {
   equivs_ = {};
   arg_equivs_ = {};
+  if (HostCall::IsUnderWay() && !writes_to_shared_) {
+    // What the core has in hand may stand among the texts of the line's own store.
+    if (!shared_) shared_ = std::make_shared<SharedStore>();
+    writes_to_shared_ = true;
+  }
   if (writes_to_shared_) {
     line_->WriteTo(&shared_->store);
   } else {
@@ -444,7 +470,9 @@ void LineObject::CopyTypeEquivs(LogicalLine& from, LogicalLine& to) {
     }
     Extend(equivs_, from.type_equivs());
     nb::object list = equivs_.list;
-    for (Py_ssize_t i = 0; i < PyList_GET_SIZE(list.ptr()); ++i) {
+    // A list that grows meanwhile (it may be that of the line that is copied to) is read to its old end.
+    const Py_ssize_t count = PyList_GET_SIZE(list.ptr());
+    for (Py_ssize_t i = 0; i < std::min(count, PyList_GET_SIZE(list.ptr())); ++i) {
       auto [name, equiv] = UnpackPair(PyList_GET_ITEM(list.ptr(), i));
       HostText keep_name, keep_equiv;
       const Text name_text = BytesOfHalf(name, keep_name);

@@ -67,14 +67,41 @@ nb::object NewEngine(ParserObject& self, nb::handle converter) {
       .attr("CreateParser")(GrammarOf(self), converter, nb::arg("promotesinglechild") = true);
 }
 
+nb::object EngineOf(nb::handle self) {
+  auto& object = nb::cast<ParserObject&>(self);
+  if (!object.engine.is_valid()) object.engine = NewEngine(object, self);
+  return object.engine;
+}
+
+// Has a parser feed an engine while this lives.
+class FeedingEngine {
+ public:
+  FeedingEngine(ParserObject& object, ExternalEngine& engine) : object_(object) {
+    object_.parser->set_external_engine(&engine);
+  }
+  ~FeedingEngine() { object_.parser->set_external_engine(object_.external.get()); }
+  FeedingEngine(const FeedingEngine&) = delete;
+  FeedingEngine& operator=(const FeedingEngine&) = delete;
+
+ private:
+  ParserObject& object_;
+};
+
 void InitParser(nb::pointer_and_handle<ParserObject> self, Any version_triple, Any grammar_file, Any keyword_seq,
                 Truth py3_grammar) {
   auto* object = new (self.p) ParserObject();
   try {
     CPGenParserImpl::Options options;
-    options.version = VersionOf(version_triple);
     options.grammar_file = ResolveGrammarFile(grammar_file);
-    options.keywords = KeywordList(keyword_seq, object->keywords);
+    options.token_names = HostTokenNames();
+    options.kinds_by_state = HostKindsByState();
+    try {
+      options.version = VersionOf(version_triple);
+      options.keywords = KeywordList(keyword_seq, object->keywords);
+    } catch (...) {
+      CheckGrammarFile(options.grammar_file, options.token_names);
+      throw;
+    }
     options.py3_grammar = py3_grammar;
     object->version_triple = nb::borrow(version_triple);
     object->parser = std::make_shared<CPGenParserImpl>(options);
@@ -101,7 +128,8 @@ nb::object Parsed(CPGenParserImpl& parser, const Ref<SourceText>& source, Parse&
 
 nb::object ParseToNode(CPGenParserImpl& parser, nb::handle logical, bool in_async_def) {
   LogicalLine& line = LineOf(logical).line();
-  return Parsed(parser, line.source, [&] { return parser.ParseToNode(line, in_async_def); });
+  const Ref<SourceText> source = line.source;  // an override of convert may put another one in its place
+  return Parsed(parser, source, [&] { return parser.ParseToNode(line, in_async_def); });
 }
 
 CNode* ParseToks(CPGenParserImpl& parser, TokenSpan toks, bool in_async_def, const PositionView* positions) {
@@ -176,11 +204,15 @@ void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
       "Gives a tree back for reuse.");
   cls.def(
       "_AddTokenList",
-      [](ParserObject& self, Any tok_list, Any context) {
+      [](nb::handle self, Any tok_list, Any context) {
+        auto& object = nb::cast<ParserObject&>(self);
         TokensArg tokens(tok_list);
         const int32_t index = Int32Of(context);
-        PinSource(self.parser->factory().pool(), tokens.source);
-        self.parser->AddTokenList(tokens.toks(), index);
+        PinSource(object.parser->factory().pool(), tokens.source);
+        // To the engine that the host sets up and finishes.
+        HostEngine engine(object, EngineOf(self));
+        const FeedingEngine feeding(object, engine);
+        object.parser->AddTokenList(tokens.toks(), index);
       },
       nb::arg("tok_list"), nb::arg("context"));
   cls.def(
@@ -267,11 +299,7 @@ void BindFields(nb::class_<ParserObject, AnalyzerBase>& cls) {
   cls.def_prop_ro("_fPy3Grammar", [](ParserObject& self) { return self.parser->py3_grammar(); });
   cls.def_prop_ro("_fFileInputNumber", [](ParserObject& self) { return self.parser->file_input_number(); });
   cls.def_prop_ro("_fKeywords", [](ParserObject& self) { return self.keywords; });
-  cls.def_prop_ro("_fParser", [](nb::handle self) {
-    auto& object = nb::cast<ParserObject&>(self);
-    if (!object.engine.is_valid()) object.engine = NewEngine(object, self);
-    return object.engine;
-  });
+  cls.def_prop_ro("_fParser", &EngineOf);
   cls.def_prop_ro("_fNodeFactory", [](ParserObject& self) { return MadeOnce(self.node_factory, &MakeFactory, self); });
   cls.def_prop_ro("_fClsForStateList",
                   [](ParserObject& self) { return MadeOnce(self.cls_for_state_list, &MakeClsForStateList, self); });
@@ -324,6 +352,30 @@ std::string ResolveGrammarFile(nb::handle grammar_file) {
   return std::string(HostText::FromBytes(bytes).text());
 }
 
+TokenNames HostTokenNames() {
+  constexpr Text kPrefix = "kTokenId_";
+  TokenNames names = TokenNames::Default();
+  for (auto [key, value] : nb::borrow<nb::dict>(nb::module_::import_("quillet._fastaccess").attr("__dict__"))) {
+    const HostText name = HostText::FromStr(key);
+    if (name.text().starts_with(kPrefix))
+      names.name2number[std::string(name.text().substr(kPrefix.size()))] = Int32Of(value);
+  }
+  return names;
+}
+
+KindsByName HostKindsByState() {
+  KindsByName kinds;
+  const nb::object table = nb::type<ParserObject>().attr("kClsForState");
+  if (!PyDict_Check(table.ptr())) ThrowExpected("dict", table);
+  for (auto [name, cls] : nb::borrow<nb::dict>(table)) {
+    const NodeKind kind = cls.is_none() ? NodeKind::kCExpression : KindOfClass(cls);
+    kinds.emplace_back(std::string(HostText::FromStr(name).text()), kind);
+  }
+  return kinds;
+}
+
+void CheckGrammarFile(const std::string& path, const TokenNames& names) { Grammar::Load(path, names); }
+
 std::vector<std::string> KeywordList(nb::handle keyword_seq, nb::object& dict) {
   nb::object sequence =
       keyword_seq.is_none() ? nb::object(nb::module_::import_("keyword").attr("kwlist")) : nb::borrow(keyword_seq);
@@ -367,8 +419,7 @@ void BindParser(nb::module_& tarvex) {
                                                "Analyses a logical line with a parser built on grammar tables.");
   base.def(nb::init<>());
   base.def(
-      "AnalyzeSingleLogical",
-      [](AnalyzerBase&, nb::handle, nb::handle, nb::handle) { ThrowError(ErrorKind::kNotImplementedError, ""); },
+      "AnalyzeSingleLogical", [](AnalyzerBase&, Any, Any, Any) { ThrowError(ErrorKind::kNotImplementedError, ""); },
       nb::arg("logical"), nb::arg("in_async_def"), nb::arg("first_in_def") = false);
 
   nb::class_<ParserObject, AnalyzerBase> cls(tarvex, "CPGenParserImpl", nb::type_slots(kParserSlots),

@@ -16,6 +16,7 @@ namespace {
 
 void PrintWithHost(Text line) {
   nb::gil_scoped_acquire lock;
+  const HostCall under_way;
   nb::module_::import_("builtins").attr("print")(StrOf(line));
 }
 
@@ -43,14 +44,20 @@ class Handling {
 
 void ReportToHost(const std::exception_ptr& exception, bool suppress_gui) {
   nb::gil_scoped_acquire lock;
+  const HostCall under_way;
   Handling handling(exception);
   nb::module_::import_("quillet.reflect").attr("ReportCurrentException")(nb::arg("suppress_gui") = suppress_gui);
 }
 
 std::string DescribeByHost(const std::exception_ptr& exception) {
   nb::gil_scoped_acquire lock;
+  const HostCall under_way;
   try {
     std::rethrow_exception(exception);
+  } catch (const HostRuntimeError& error) {
+    return nb::repr(error.original->value()).c_str();
+  } catch (const HostParseError& error) {
+    return nb::repr(error.original->value()).c_str();
   } catch (nb::python_error& error) {
     // What does not derive from Exception ends more than a walk; the core leaves it as it is.
     if (!error.matches(PyExc_Exception)) return {};
@@ -62,6 +69,32 @@ std::string DescribeByHost(const std::exception_ptr& exception) {
   }
 }
 
+nb::object TracebackOf(const std::exception_ptr& exception) {
+  nb::object traceback;
+  try {
+    std::rethrow_exception(exception);
+  } catch (const HostRuntimeError& error) {
+    traceback = error.original->traceback();
+  } catch (nb::python_error& error) {
+    traceback = error.traceback();
+  } catch (...) {  // of the core, which has no lines of the host's
+  }
+  return traceback.is_valid() ? traceback : nb::none();
+}
+
+std::exception_ptr ReplaceByHost(const std::string& message, const std::exception_ptr& failure) {
+  nb::gil_scoped_acquire lock;
+  try {
+    CallingHost([&] {
+      const nb::object error = nb::handle(PyExc_ValueError)(StrOf(message));
+      nb::module_::import_("quillet.reflect").attr("RaiseWithTraceback")(error, TracebackOf(failure));
+    });
+    return nullptr;
+  } catch (...) {
+    return std::current_exception();
+  }
+}
+
 }  // namespace
 
 void InstallConsole() {
@@ -70,6 +103,7 @@ void InstallConsole() {
   console.print_line = PrintWithHost;
   console.report_exception = ReportToHost;
   console.describe_exception = DescribeByHost;
+  console.replace_exception = ReplaceByHost;
 }
 
 }  // namespace quillet::host

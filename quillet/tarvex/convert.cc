@@ -1,9 +1,12 @@
 // See convert.h.
 #include "quillet/tarvex/convert.h"
 
+#include <algorithm>
 #include <array>
 #include <limits>
 #include <unordered_map>
+
+#include "quillet/tarvex/line_object.h"
 
 namespace quillet::host {
 namespace {
@@ -129,8 +132,9 @@ Version VersionOf(nb::handle object) {
   if (!PyTuple_Check(object.ptr())) ThrowExpected("tuple", object);
   Version version{{0, 0, 0}, 0};
   const Py_ssize_t size = PyTuple_GET_SIZE(object.ptr());
+  // The third part is never looked at: what a version has is told by the first two.
   for (Py_ssize_t i = 0; i < size && i < 3; ++i)
-    version.parts[version.count++] = Int32Of(PyTuple_GET_ITEM(object.ptr(), i));
+    version.parts[version.count++] = i < 2 ? Int32Of(PyTuple_GET_ITEM(object.ptr(), i)) : 0;
   return version;
 }
 
@@ -200,6 +204,19 @@ nb::object HostContext(Context context) {
     return found == Foreign().objects.end() ? nb::none() : found->second;
   }
   return nb::make_tuple(context.value, context.col);
+}
+
+Context ErrorContext(nb::handle object) {
+  if (PyTuple_Check(object.ptr())) {
+    auto [line, column] = UnpackPair(object);
+    return Context::At({Int32Of(line), Int32Of(column)});
+  }
+  if (!PyIndex_Check(object.ptr())) ThrowExpected("int", object);
+  const Py_ssize_t index = PyNumber_AsSsize_t(object.ptr(), nullptr);
+  if (index == -1 && PyErr_Occurred()) throw nb::python_error();
+  constexpr Py_ssize_t kLeast = std::numeric_limits<int32_t>::min();
+  constexpr Py_ssize_t kMost = std::numeric_limits<int32_t>::max();
+  return Context::Index(static_cast<int32_t>(std::clamp(index, kLeast, kMost)));
 }
 
 Context CoreContext(nb::handle object, NodePool* pool) {

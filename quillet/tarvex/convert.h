@@ -89,6 +89,8 @@ nb::object HostContext(Context context);
 // The same the other way. An object that is none of these is kept in a table until the pool's node
 // lets go of it; without a pool it is a TypeError.
 Context CoreContext(nb::handle object, NodePool* pool);
+// The context of an error: an index, of which only whether it lies in the line matters, or a pair.
+Context ErrorContext(nb::handle object);
 
 }  // namespace quillet::host
 

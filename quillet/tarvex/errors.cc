@@ -76,6 +76,8 @@ void SetError(PyObject* cls, const std::string& message) {
 void SetNativeError(const std::exception_ptr& exception, void*) {
   try {
     std::rethrow_exception(exception);
+  } catch (const HostParseError& error) {
+    error.original->restore();
   } catch (const ParseError& error) {
     nb::object object = ExceptionFor(error);
     PyErr_SetObject(g_parse_error, object.ptr());
@@ -90,12 +92,14 @@ void SetNativeError(const std::exception_ptr& exception, void*) {
   }
 }
 
-Context CoreContextOrNone(nb::handle context) {
+Context ErrorContextOrNone(nb::handle context) {
   // An error's context that the core has no form for points nowhere; the core only reads it to
   // place the error.
   try {
-    return CoreContext(context, nullptr);
+    return ErrorContext(context);
   } catch (const Error&) {
+    return Context::None();
+  } catch (nb::python_error&) {
     return Context::None();
   }
 }
@@ -117,9 +121,10 @@ nb::object ExceptionFor(const ParseError& error) {
 
 void RethrowForCore(nb::python_error& error) {
   if (error.matches(g_parse_error)) {
-    nb::handle value = error.value();
-    nb::object context = nb::getattr(value, "context", nb::none());
-    throw ParseError(nb::str(value).c_str(), -1, kNoText, CoreContextOrNone(context));
+    const nb::object context = nb::getattr(error.value(), "context", nb::none());
+    std::string message = nb::str(error.value()).c_str();
+    throw HostParseError(std::move(message), ErrorContextOrNone(context),
+                         std::make_shared<nb::python_error>(std::move(error)));
   }
   if (error.matches(PyExc_SyntaxError)) {
     ForgetHostSyntaxError();

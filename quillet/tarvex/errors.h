@@ -24,21 +24,46 @@ nb::handle ParseErrorClass();
 nb::object ExceptionFor(const SyntaxError& error);
 nb::object ExceptionFor(const ParseError& error);
 
-// A RuntimeError of the host's on its way through the core, which catches walk limits by kind.
-// Whoever lets it out to the host raises the original.
+// A RuntimeError of the host's on its way through the core, which catches walk limits by kind, and a
+// ParseError, which it places. Whoever lets one out to the host raises the original.
 class HostRuntimeError : public Error {
  public:
   HostRuntimeError(std::string message, std::shared_ptr<nb::python_error> raised)
       : Error(ErrorKind::kRuntimeError, std::move(message)), original(std::move(raised)) {}
+  bool is_of_host() const override { return true; }
+  std::shared_ptr<nb::python_error> original;
+};
+
+class HostParseError : public ParseError {
+ public:
+  HostParseError(std::string message, Context where, std::shared_ptr<nb::python_error> raised)
+      : ParseError(std::move(message), -1, kNoText, where), original(std::move(raised)) {}
+  bool is_of_host() const override { return true; }
   std::shared_ptr<nb::python_error> original;
 };
 
 // Throws what the core shall see of an exception that a host's operation raised.
 [[noreturn]] void RethrowForCore(nb::python_error& error);
 
+// While one lives, the core waits for the host in the middle of an operation: what it works on must
+// outlive whatever the host's code does to the objects that hold it. Guarded by the interpreter lock.
+class HostCall {
+ public:
+  HostCall() { ++count_; }
+  ~HostCall() { --count_; }
+  HostCall(const HostCall&) = delete;
+  HostCall& operator=(const HostCall&) = delete;
+
+  static bool IsUnderWay() { return count_ > 0; }
+
+ private:
+  static inline int count_ = 0;
+};
+
 // Runs `call`, which enters the host.
 template <class Call>
 auto CallingHost(Call&& call) {
+  const HostCall under_way;
   try {
     return call();
   } catch (nb::python_error& error) {

@@ -54,6 +54,15 @@ std::string ResolveGrammarFile(nb::handle grammar_file);
 // The keywords of a sequence; None is the host's own list. `dict` becomes the set as the host sees it.
 std::vector<std::string> KeywordList(nb::handle keyword_seq, nb::object& dict);
 
+// What a parser reads of the host when it is made: the names of the tokens that _fastaccess declares, and
+// the class of each state as CPGenParserImpl.kClsForState has it.
+TokenNames HostTokenNames();
+KindsByName HostKindsByState();
+
+// Throws what is wrong with a grammar file, which comes before anything that is wrong with the other
+// arguments of a parser.
+void CheckGrammarFile(const std::string& path, const TokenNames& names);
+
 // A parser object around a parser that something else owns.
 nb::object NewParserObject(std::shared_ptr<CPGenParserImpl> parser, nb::object version_triple, nb::object keywords);
 

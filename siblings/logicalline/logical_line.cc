@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <iterator>
+#include <utility>
 
 namespace quillet {
 
@@ -54,9 +55,9 @@ PositionView LogicalLine::positions() const {
   return PositionView(source.get(), toks, first_line);
 }
 
-void LogicalLine::SetPositions(std::vector<Position> positions) {
-  stored_positions_ = std::move(positions);
+std::vector<Position> LogicalLine::SetPositions(std::vector<Position> positions) {
   has_stored_positions_ = true;
+  return std::exchange(stored_positions_, std::move(positions));
 }
 
 void LogicalLine::UseSourcePositions() {
@@ -90,14 +91,20 @@ void LogicalLine::AppendArgTypeEquiv(Text name, Text info) {
 void LogicalLine::CopyTypeEquivsTo(LogicalLine& to) {
   if (hooks) [[unlikely]]
     return hooks->CopyTypeEquivs(*this, to);
-  // By index: with a shared store the rows move as the other line's grow.
-  for (size_t i = 0; i < type_equivs().size(); ++i) {
-    const Record record = type_equivs()[i];
+  const auto copy = [&to](const Record& record) {
     // A name that stands in the source is kept as a view, which tells its place.
     const bool in_source = to.source && to.source->Holds(record.name_text);
     to.AppendStableTypeEquiv(in_source ? record.name() : to.texts().Copy(record.name()),
                              to.texts().Copy(record.info()));
+  };
+  if (to.hooks) [[unlikely]] {
+    // The host's code may clear this line meanwhile.
+    const std::vector<Record> rows(type_equivs().begin(), type_equivs().end());
+    for (const Record& record : rows) copy(record);
+    return;
   }
+  // By index: with a shared store the rows move as the other line's grow.
+  for (size_t i = 0; i < type_equivs().size(); ++i) copy(Record(type_equivs()[i]));
 }
 
 // Rows behind this line's own belong to another line by now and stay; its own are then merely let go.

@@ -99,8 +99,9 @@ class LogicalLine {
 
   // Positions of the tokens relative to first_line.
   PositionView positions() const;
-  // Positions of the host's own; replaces those worked out from the source.
-  void SetPositions(std::vector<Position> positions);
+  // Positions of the host's own; replaces those worked out from the source. Gives the host's that were
+  // there before, which a PositionView may still be on.
+  std::vector<Position> SetPositions(std::vector<Position> positions);
   // Back to those worked out from the source.
   void UseSourcePositions();
   bool has_stored_positions() const { return has_stored_positions_; }

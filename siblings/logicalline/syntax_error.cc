@@ -11,23 +11,30 @@
 namespace quillet {
 namespace {
 
-Position PositionAt(const PositionView& positions, int64_t index) {
+// Wide enough for sums of what a host may state.
+struct WidePosition {
+  int64_t line = 0;
+  int64_t col = 0;
+};
+
+WidePosition PositionAt(const PositionView& positions, int64_t index) {
   const auto size = static_cast<int64_t>(positions.size());
   if (index < 0) index += size;
   if (index < 0 || index >= size) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
-  return positions[static_cast<size_t>(index)];
+  const Position position = positions[static_cast<size_t>(index)];
+  return {position.line, position.col};
 }
 
-Position BasePosition(const LogicalLine& logical, Context context) {
-  if (context.IsPosition()) return context.position();
+WidePosition BasePosition(const LogicalLine& logical, Context context) {
+  if (context.IsPosition()) return {context.value, context.col};
   if (!context.IsIndex()) ThrowError(ErrorKind::kTypeError, "an error's context must be an int or a tuple");
   if (context.value < logical.token_count) return PositionAt(logical.positions(), context.value);
 
-  Position position = PositionAt(logical.positions(), -1);
+  WidePosition position = PositionAt(logical.positions(), -1);
   if (logical.toks.empty()) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
   const Token& last = logical.toks.back();
   if (last.removed()) ThrowError(ErrorKind::kTypeError, "the last token of the line was removed");
-  position.col += static_cast<int32_t>(last.length);
+  position.col += last.length;
   return position;
 }
 
@@ -35,7 +42,7 @@ Position BasePosition(const LogicalLine& logical, Context context) {
 
 SyntaxError CreateSyntaxError(std::string message, const LogicalLine& logical, Context context,
                               const Position* in_token) {
-  Position position;
+  WidePosition position;
   if (logical.token_count != 0) {
     position = BasePosition(logical, context);
     if (in_token != nullptr) {
@@ -44,8 +51,7 @@ SyntaxError CreateSyntaxError(std::string message, const LogicalLine& logical, C
       position.line += in_token->line;
     }
   }
-  return SyntaxError(std::move(message), "<string>", int64_t{position.line} + 1, int64_t{position.col} + 1,
-                     TextFromTokens(logical));
+  return SyntaxError(std::move(message), "<string>", position.line + 1, position.col + 1, TextFromTokens(logical));
 }
 
 }  // namespace quillet

@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import logging
+from types import TracebackType
 
 import pytest
 
@@ -226,6 +227,34 @@ def test_any_other_failure_is_reported_and_gives_none(error: BaseException, monk
     assert sys.exc_info() == (None, None, None)
 
 
+def test_a_failure_is_raised_again_from_where_it_came(monkeypatch: pytest.MonkeyPatch) -> None:
+    raised = []
+
+    def raise_with(exc: BaseException, tb: TracebackType | None) -> None:
+        raised.append((exc, tb))
+
+    monkeypatch.setattr(reflect, "RaiseWithTraceback", raise_with)
+    # The call returns, and so the analysis goes on.
+    assert analyzer()._InspectSingleLogical(raising(KeyError("k")), False) is True
+    ((error, trace),) = raised
+    assert isinstance(error, ValueError)
+    assert "inner exception is KeyError('k')" in str(error)
+    assert trace is not None
+    assert trace.tb_frame.f_code.co_name == "AppendTypeEquiv"
+
+
+def test_what_is_raised_in_the_place_of_a_failure_is_what_leaves(monkeypatch: pytest.MonkeyPatch) -> None:
+    mine = LookupError("mine")
+
+    def raise_with(exc: BaseException, tb: TracebackType | None) -> None:
+        raise mine
+
+    monkeypatch.setattr(reflect, "RaiseWithTraceback", raise_with)
+    with pytest.raises(LookupError) as caught:
+        analyzer()._InspectSingleLogical(raising(KeyError("k")), False)
+    assert caught.value is mine
+
+
 def test_a_report_goes_to_the_logger(caplog: pytest.LogCaptureFixture) -> None:
     with caplog.at_level(logging.WARNING, "quillet"):
         assert analyzer().AnalyzeSingleLogical(raising(KeyError("k")), False) is None
@@ -252,6 +281,40 @@ def test_a_syntax_error_of_the_host_is_returned_itself() -> None:
 def test_a_runtime_error_of_the_host_ends_the_walk_with_a_printed_line(capsys: pytest.CaptureFixture[str]) -> None:
     assert analyzer().AnalyzeSingleLogical(raising(RuntimeError("enough")), False) is None
     assert capsys.readouterr().out == "RuntimeError raised in CNodeWalker.Walk: RuntimeError('enough')\n"
+
+
+class Enough(RuntimeError):
+    """A limit of the host's own."""
+
+
+@pytest.mark.parametrize("error", [Enough("q", 1), RecursionError("deep"), NotImplementedError("not yet")])
+def test_a_printed_line_shows_the_exception_that_was_raised(
+    error: RuntimeError, capsys: pytest.CaptureFixture[str]
+) -> None:
+    assert analyzer().AnalyzeSingleLogical(raising(error), False) is None
+    assert capsys.readouterr().out == f"RuntimeError raised in CNodeWalker.Walk: {error!r}\n"
+
+
+class Moody(ParseError):
+    """A parse error of the host's own."""
+
+
+@pytest.mark.parametrize(
+    ("context", "place"), [(1, (1, 3)), (True, (1, 3)), (2**40, (1, 6)), ((0, 4), (1, 5)), ((2, 0), (3, 1))]
+)
+def test_a_parse_error_of_the_host_is_placed_by_its_context(context: object, place: tuple[int, int]) -> None:
+    class Line(CLogicalLine):
+        cleared = False
+
+        def ClearDerivedInfo(self) -> None:
+            if not self.cleared:
+                self.cleared = True
+                raise Moody("mine", None, None, context)
+
+    line = Line(kAssignment, ("x", "=", "1"), ((0, 0), (0, 2), (0, 4)))
+    error = analyzer().AnalyzeSingleLogical(line, False)
+    assert isinstance(error, SyntaxError)
+    assert (error.lineno, error.offset) == place
 
 
 def test_a_failing_report_leaves_as_an_exception(monkeypatch: pytest.MonkeyPatch) -> None:
@@ -289,6 +352,89 @@ def test_the_exception_being_handled_stays_current() -> None:
     assert handled
 
 
+def test_a_parse_error_that_a_handler_raises_leaves_as_it_is() -> None:
+    class Line(CLogicalLine):
+        cleared = 0
+
+        def ClearDerivedInfo(self) -> None:
+            self.cleared += 1
+            if self.cleared == 2:
+                raise mine
+
+    mine = Moody("mine", None, None, 0)
+    with pytest.raises(Moody) as caught:
+        analyzer().AnalyzeSingleLogical(Line(kAssignment, ("x", "="), ((0, 0), (0, 2))), False)
+    assert caught.value is mine
+
+
+# ---- a host that changes a line under the analysis ----
+
+LONG = "#" + "x" * 200_000
+
+
+class Fickle(CLogicalLine):
+    """A line that loses its tokens, its positions and its records at every record."""
+
+    def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+        super().AppendTypeEquiv(name, equiv)
+        self.fToks = ("q",)
+        self.fPositions = ()
+
+    AppendArgTypeEquiv = AppendTypeEquiv
+
+
+@pytest.mark.parametrize(
+    "toks",
+    [
+        ("del", "alpha", ",", "beta", ",", "gamma"),
+        ("from", "alpha", "import", "beta", ",", "gamma"),
+        ("def", "alpha", "(", "beta", ",", "# type: int", "gamma", ")", ":", "# type: (...) -> int"),
+        ("for", "alpha", "in", "beta", ":", "# type: int"),
+    ],
+)
+def test_tokens_that_a_host_replaces_meanwhile_are_read_to_the_end(toks: tuple[str, ...]) -> None:
+    line = Fickle(toks=(*toks, LONG), positions=tuple((0, i) for i in range(len(toks) + 1)))
+    assert analyzer().AnalyzeSingleLogical(line, False) is None
+    assert line.fToks == ("q",)
+    names = {name.decode() for name, _ in line.fTypeEquivs or []}
+    assert names
+    assert names <= {"alpha", "beta", "gamma", "int", "return"}
+
+
+def test_an_embedded_line_may_lose_its_tokens_too() -> None:
+    toks = ("del", "alpha", ",", "beta", LONG)
+    embedded = Fickle(toks=toks, positions=tuple((0, i) for i in range(5)))
+    line = WithEmbedded("x = 1", (embedded,))
+    assert analyzer().AnalyzeSingleLogical(line, False) is None
+    assert {name for name, _ in line.fTypeEquivs} == {b"x", b"alpha", b"beta"}
+
+
+def test_records_that_are_cleared_while_they_are_copied_are_copied_as_they_were() -> None:
+    class Outer(WithEmbedded):
+        def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+            super().AppendTypeEquiv(name, equiv)
+            if name == b"aaaaa":
+                embedded.ClearDerivedInfo()
+                embedded.AppendTypeEquiv(b"Z" * 100, b"W" * 100)
+
+    embedded = CLogicalLine(toks=("aaaaa", ",", "bbbbb"), positions=((0, 0), (0, 5), (0, 7)))
+    line = Outer("x = 1", (embedded,))
+    assert analyzer().AnalyzeSingleLogical(line, False) is None
+    assert line.fTypeEquivs[-2:] == [(b"aaaaa", kGetPrefix), (b"bbbbb", kGetPrefix)]
+
+
+def test_a_line_that_is_its_own_embedded_line_is_copied_once() -> None:
+    class Line(CLogicalLine):
+        def GetExpLogicals(self) -> tuple[CLogicalLine, ...]:
+            assert self.fTypeEquivs
+            return (self,)
+
+    line = Line(kAssignment, ("x", "=", "y"), ((0, 0), (0, 2), (0, 4)))
+    assert analyzer().AnalyzeSingleLogical(line, False) is None
+    once = [(b"x", kSetPrefix), (b"x", b"y"), (b"y", kGetPrefix)]
+    assert line.fTypeEquivs == once * 4
+
+
 def test_inspecting_raises_what_analysing_returns() -> None:
     with pytest.raises(ParseError) as caught:
         analyzer()._InspectSingleLogical(line_of("x = = y"), False)
@@ -297,9 +443,10 @@ def test_inspecting_raises_what_analysing_returns() -> None:
 
 
 def test_the_interface_is_abstract_and_dispatches_to_an_override() -> None:
-    with pytest.raises(NotImplementedError) as caught:
-        CPGenAnalyzer().AnalyzeSingleLogical(line_of("x"), False)
-    assert caught.value.args == ()
+    for logical in (line_of("x"), None):
+        with pytest.raises(NotImplementedError) as caught:
+            CPGenAnalyzer().AnalyzeSingleLogical(logical, False)
+        assert caught.value.args == ()
 
     class Mine(CPGenAnalyzer):
         def AnalyzeSingleLogical(self, logical: CLogicalLine, in_async_def: bool, first_in_def: bool = False) -> None:

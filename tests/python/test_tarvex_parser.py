@@ -14,12 +14,14 @@ from quillet.logicalline import CLogicalLine
 from quillet.optpgen import ParseError
 from quillet.tarvex import (
     CAtom,
+    CExpression,
     CIfStmt,
     CMatchCaseStatementParser,
     CNameLiteral,
     CNode,
     CNodeFactory,
     CPGenAnalyzer,
+    CPGenAnalyzerImpl,
     CPGenParserImpl,
     CSingleDecorator,
     NextNonRemovedTokenInTuple,
@@ -88,6 +90,36 @@ def test_each_state_has_a_class() -> None:
     assert classes[4] is CNode
     assert CPGenParserImpl.kClsForState["decorator"] is CSingleDecorator
     assert CPGenParserImpl.kClsForState["NAME"] is CNameLiteral
+
+
+def test_the_class_of_a_state_is_read_at_construction(monkeypatch: pytest.MonkeyPatch) -> None:
+    monkeypatch.setitem(CPGenParserImpl.kClsForState, "suite", CAtom)
+    monkeypatch.setitem(CPGenParserImpl.kClsForState, "comp_op", None)
+    mine = CPGenParserImpl((3, 8))
+    numbers = mine._fGrammar.symbol2number
+    assert mine._fClsForStateList[numbers["suite"]] is CAtom
+    assert mine._fClsForStateList[numbers["comp_op"]] is CExpression
+    assert CPGenAnalyzerImpl((3, 8))._fLogicalParser._fClsForStateList == mine._fClsForStateList
+
+
+def test_tokens_that_the_sibling_declares_may_stand_in_a_grammar(
+    tmp_path: Path, monkeypatch: pytest.MonkeyPatch
+) -> None:
+    path = tmp_path / "grammar"
+    path.write_text("file_input: (NAME | FOO) ENDMARKER\n")
+    with pytest.raises(ValueError, match="FOO"):
+        CPGenParserImpl((3, 8), str(path))
+    monkeypatch.setattr(_fastaccess, "kTokenId_FOO", 150, raising=False)
+    mine = CPGenParserImpl((3, 8), str(path))
+    assert 150 in {label[0] for label in mine._fGrammar.labels}
+
+
+@pytest.mark.parametrize(("version", "keywords"), [([3, 8], None), ((3, 8), 5)])
+def test_a_bad_grammar_file_is_told_before_a_bad_version_or_keyword(version: object, keywords: object) -> None:
+    with pytest.raises(OSError, match="nonexistent"):
+        CPGenParserImpl(version, "/nonexistent", keywords)
+    with pytest.raises(TypeError):
+        CPGenParserImpl(version, keyword_seq=keywords)
 
 
 def test_keywords_are_text_or_bytes() -> None:
@@ -278,6 +310,8 @@ def test_tokens_are_text_or_none(bad: object) -> None:
         (("a", "# c", "\\", None, "", "b"), 0, 5, 6),
         (("a", "# c", "\\", None, "", "b"), 5, 6, 0),
         (("a", "b"), 99, 2, 1),
+        (("a", "b"), 2**63 - 1, 2, 1),
+        (("a", "b"), -(2**63), 0, 2),
         ((), -1, 0, 0),
     ],
 )
@@ -313,6 +347,10 @@ def test_the_next_token_that_counts() -> None:
         NextNonRemovedTokenInTuple((None, "a"), 0)
     with pytest.raises(IndexError, match="string index out of range"):
         NextNonRemovedTokenInTuple(("", "a"), 0)
+    assert NextNonRemovedTokenInTuple(("a", "b"), -1) == "b"
+    assert NextNonRemovedTokenInTuple(("a", "b"), 2**40) is None
+    with pytest.raises(IndexError, match="tuple index out of range"):
+        NextNonRemovedTokenInTuple(("a", "b"), -3)
 
 
 def test_raising_a_parse_error_by_hand() -> None:
@@ -385,6 +423,21 @@ def test_names_of_type_parameters_of_a_line_that_may_not_parse() -> None:
         names(("def", "f", "[", "T", ":", "int", "]"))
 
 
+@pytest.mark.parametrize("tok_i", [0, 1, 10**7, -(10**7)])
+def test_a_special_case_begins_at_a_token(tok_i: int) -> None:
+    with pytest.raises(IndexError, match="tuple index out of range"):
+        parser()._ParseSpecialCaseWithTypeParameter([], False, [], tok_i)
+
+
+@pytest.mark.parametrize("end", [3, 100, 10**7])
+def test_a_bound_ends_with_the_tokens(end: int) -> None:
+    toks = ["T", ":", "int"]
+    node = parser()._CreateSingleTypeParameterNode(toks, False, [(0, 0)] * 3, 0, end, True)
+    assert shape(node) == ("CTypeParameter", "T", ":", "int")
+    bare = parser()._CreateSingleTypeParameterNode(toks[:2], False, [(0, 0)] * 2, 0, end, True)
+    assert shape(bare) == ("CTypeParameter", "T")
+
+
 # ---- a converter of the host's ----
 
 
@@ -405,7 +458,30 @@ def test_a_subclass_may_override_convert() -> None:
     mine.DiscardNode(node)
     with pytest.raises(ParseError) as caught:
         mine.ParseToNode(line_of("x = = 1"), False)
-    assert caught.value.context == 2
+    error = caught.value
+    assert (error.msg, error.type, error.value, error.context) == ("bad input", 22, "=", 2)
+    assert str(error) == "bad input: type=22, value='=', context=2"
+
+
+def test_tokens_may_change_under_a_converter_of_the_host() -> None:
+    class Changing(CPGenParserImpl):
+        def convert(self, number: int, value: str | None, context: object, children: list[CNode] | None) -> CNode:
+            line.fToks = ("q",)
+            line.fPositions = ()
+            return super().convert(number, value, context, children)
+
+    toks = ("f", "(", *("\\", "a", ",") * 1000, ")", "#" + "x" * 200_000)
+    line = CLogicalLine(toks=toks, positions=tuple((i, i) for i in range(len(toks))))
+    node = Changing((3, 8)).ParseToNode(line, False)
+    assert shape(node) == shape(parser().ParseToNode(line_of(f"f({'a,' * 1000})"), False))
+
+
+def test_the_host_may_feed_the_engine_itself() -> None:
+    mine = CPGenParserImpl((3, 8))
+    mine._fParser.setup(mine._fFileInputNumber)
+    mine._AddTokenList(["x", "\n"], 0)
+    mine._fParser.addtoken(0, "", 1)
+    assert shape(mine._fParser.finish()) == ("CNode", "x", "")
 
 
 def test_an_error_in_convert_leaves_the_parse() -> None:
