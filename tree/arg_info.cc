@@ -16,6 +16,9 @@ Text StarPrefix(TokenCode code) {
   return code == tok::DOUBLESTAR ? Text("**") : kNoText;
 }
 
+// More than any source nests, and little memory for a tree that a host closed to a ring.
+constexpr size_t kMaxNestedLists = size_t{1} << 18;
+
 std::string ReprOfTextOf(const CNode* node) { return node->IsLeaf() ? ReprOfText(node->fText()) : "None"; }
 
 // One list of parameters while it is read.
@@ -47,7 +50,7 @@ struct Level {
     if (!isa<CNameLiteral>(node)) {
       std::string what = "(";
       what += ReprOfNode(node) + ", " + ReprOfTextOf(node) + ")";
-      ThrowError(ErrorKind::kAssertionError, std::move(what));
+      throw NotANameError(std::move(what), node);
     }
     current.name = node;
     entries.emplace_back(current);
@@ -145,6 +148,7 @@ void GetDefiningArgInfoList(CNode* node, ArgList& out) {
   while (true) {
     if (nested == nullptr) nested = level.ReadOn();
     if (nested != nullptr) {
+      if (around.size() == kMaxNestedLists) ThrowTooDeep();
       around.push_back(std::move(level));
       level = Level();
       nested = level.Enter(nested);
@@ -201,11 +205,18 @@ UsedArgList GetUsedArgInfoList(CNode* node) {
   return list;
 }
 
-int64_t GetTokenEndIndex(const CNode* node) {
+const CNode* LastLeaf(const CNode* node) {
+  DescentBound bound;
   while (node->child_count != 0) {
+    bound.Step();
     node = node->LastChild();
     if (node == nullptr) ThrowNoAttribute("GetChildCount");
   }
+  return node;
+}
+
+int64_t GetTokenEndIndex(const CNode* node) {
+  node = LastLeaf(node);
   if (!node->fContext.IsIndex()) {
     ThrowError(ErrorKind::kTypeError, node->fContext.IsNone()
                                           ? "unsupported operand type(s) for +: 'NoneType' and 'int'"

@@ -8,6 +8,7 @@
 #include <utility>
 #include <vector>
 
+#include "foundations/errors.h"
 #include "tree/node.h"
 
 namespace quillet {
@@ -52,6 +53,14 @@ struct ArgEntry {
 using ArgList = std::vector<ArgEntry>;      // of GetDefiningArgInfoList
 using UsedArgList = std::vector<CArgInfo>;  // of GetUsedArgInfoList
 
+// What stands for a parameter and is no name: an AssertionError that knows the node.
+class NotANameError : public Error {
+ public:
+  NotANameError(std::string message, CNode* not_a_name)
+      : Error(ErrorKind::kAssertionError, std::move(message)), node(not_a_name) {}
+  CNode* node;
+};
+
 // Parameters of the node after `def name` or `lambda`. AssertionError for shapes that no grammar
 // gives.
 ArgList GetDefiningArgInfoList(CNode* node);
@@ -61,6 +70,8 @@ void GetDefiningArgInfoList(CNode* node, ArgList& out);
 UsedArgList GetUsedArgInfoList(CNode* node);
 // The same into a list that is reused.
 void GetUsedArgInfoList(CNode* node, UsedArgList& out);
+// The node itself, or its last child's last leaf.
+const CNode* LastLeaf(const CNode* node);
 // The token index just past the node. TypeError where its last leaf has no token index.
 int64_t GetTokenEndIndex(const CNode* node);
 
@@ -83,10 +94,13 @@ AsNameParts SplitSingleModuleNameAs(CNode* node);
 // Calls `fn(AsNameParts)` for each entry of ProcessAsNamesList.
 template <class Fn>
 void ForEachAsName(CNode* node, Fn&& fn) {
+  if (node == nullptr) [[unlikely]]
+    ThrowNoAttribute("fText");
   // A bare name, one `a as b` or one `a.b` stands alone; only a list has a comma in second place.
   if (node->ChildCount() < 2 || !node->ChildIs(1, tok::COMMA)) return fn(SplitSingleModuleNameAs(node));
   for (CNode* child : node->fChildren()) {
-    if (child == nullptr) ThrowNoAttribute("fText");
+    if (child == nullptr) [[unlikely]]
+      ThrowNoAttribute("fText");
     if (child->code != tok::COMMA) fn(SplitSingleModuleNameAs(child));
   }
 }

@@ -34,7 +34,9 @@ SubExprView CExpression::GetSubExprView() const {
 // the innermost list display is the one element, or there are none.
 SubExprView CAtom::GetSubExprView() const {
   SubExprView view;
+  DescentBound bound;
   for (const CAtom* atom = this; atom != nullptr;) {
+    bound.Step();
     const Text bracket = atom->GetInitialBracket();
     if (atom->child_count != 3 || (bracket != "(" && bracket != "[") || !atom->IsLiteral()) break;
     CNode* inner = atom->children[1];
@@ -118,7 +120,9 @@ Text CFactorExpr::GetUnaryOperator() const {
 
 const CCompForNode* CCompForNode::Flat() const {
   const CCompForNode* node = this;
+  DescentBound bound;
   while (node->IsAsync() && node->child_count == 2 && isa<CCompForNode>(node->children[1])) {
+    bound.Step();
     node = static_cast<const CCompForNode*>(node->children[1]);
   }
   return node;

@@ -7,9 +7,20 @@
 
 namespace quillet {
 
+namespace {
+
+// A name has one level. A host's tree may have more, but not without end.
+constexpr uint32_t kMaxNameDepth = 10'000;
+
+}  // namespace
+
 void AppendTextForImportName(NodeSpan nodes, std::string& out) {
-  // The lists that are not read to their end yet; a name has one level, a host's tree may have more.
-  std::vector<NodeSpan> around;
+  struct Unread {
+    NodeSpan nodes;
+    uint32_t depth;
+  };
+  std::vector<Unread> around;
+  uint32_t depth = 0;
   while (true) {
     while (!nodes.empty()) {
       const CNode* node = nodes.front();
@@ -18,12 +29,14 @@ void AppendTextForImportName(NodeSpan nodes, std::string& out) {
       if (node->IsLeaf()) {
         out += node->fText();
       } else if (node->child_count != 0) {
-        if (!nodes.empty()) around.push_back(nodes);
+        if (!nodes.empty()) around.push_back({nodes, depth});
+        if (++depth > kMaxNameDepth) ThrowTooDeep();
         nodes = node->fChildren();
       }
     }
     if (around.empty()) return;
-    nodes = around.back();
+    nodes = around.back().nodes;
+    depth = around.back().depth;
     around.pop_back();
   }
 }
@@ -44,6 +57,8 @@ int32_t GetMatchingChildToken(const CNode* node, Text text) {
 }
 
 AsNameParts SplitSingleModuleNameAs(CNode* node) {
+  if (node == nullptr) [[unlikely]]
+    ThrowNoAttribute("fText");
   if (node->child_count == 3 && node->ChildIs(1, word::kAs)) return {node->children[0], node->GetChildText(2)};
   return {node, kNoText};
 }

@@ -110,7 +110,9 @@ bool IsGenExpression(const CAtom* node) {
 }
 
 bool IsTupleLiteralNode(const CNode* node) {
+  DescentBound bound;
   while (const auto* atom = dyn_cast<CAtom>(node)) {
+    bound.Step();
     if (atom->GetInitialBracket() != "(") return false;
     if (atom->child_count == 2) return true;
     Assert(atom->child_count == 3, "");
@@ -120,7 +122,9 @@ bool IsTupleLiteralNode(const CNode* node) {
 }
 
 CNode* DropSimpleParens(CNode* node) {
+  DescentBound bound;
   while (isa<CAtom>(node) && node->child_count == 3 && node->ChildIs(0, tok::LPAR)) {
+    bound.Step();
     CNode* inner = node->children[1];
     // A tuple or generator expression is no simple parenthesis.
     if (isa<CTestListStarExpr>(inner) || isa<CCompForNode>(inner)) break;

@@ -20,6 +20,8 @@ void ThrowWrongClass(NodeKind wanted, const CNode* node) {
              std::string("Expected ") + NameOfNodeKind(wanted) + ", got " + NameOfNodeKind(node->kind));
 }
 
+void ThrowTooDeep() { ThrowError(ErrorKind::kRecursionError, "maximum recursion depth exceeded"); }
+
 Text CNode::GetStateName() const { return fClsInfo != nullptr ? fClsInfo->fName : Text(NameOfNodeKind(kind)); }
 
 bool CNode::DoesChildTextMatch(Text wanted) const {

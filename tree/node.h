@@ -47,6 +47,22 @@ constexpr int64_t EverySecond(int64_t index, int64_t offset) {
 [[noreturn]] void ThrowNoSuchChild(const CNode* node);                  // IndexError, or TypeError without children
 [[noreturn]] void ThrowWrongClass(NodeKind wanted, const CNode* node);  // TypeError
 
+[[noreturn]] void ThrowTooDeep();  // RecursionError
+
+// Counts the steps of a descent from child to child that takes no machine stack. It ends for any tree
+// but one that a host closed to a ring, and that ends in RecursionError.
+class DescentBound {
+ public:
+  void Step() {
+    if (++steps_ > kMost) [[unlikely]]
+      ThrowTooDeep();
+  }
+
+ private:
+  static constexpr uint32_t kMost = uint32_t{1} << 22;  // brackets of a source of 8 MiB, and none else
+  uint32_t steps_ = 0;
+};
+
 struct alignas(64) CNode {
   CNodeClassInfo* fClsInfo = nullptr;
   CNode* fNextFree = nullptr;
