@@ -40,9 +40,10 @@ NodePool::~NodePool() {
     for (size_t i = 0; i < slab.used; ++i) {
       CNode* node = slab.node(i);
       ReleaseContext(node->fContext);
-      if (node->child_capacity > kKeptCapacity) FreeChildren(node);
+      if (node->child_capacity > kKeptCapacity) delete[] node->children;
     }
   }
+  FreeRetiredArrays();
 }
 
 CNodeClassInfo* NodePool::NewClassInfo(NodeKind kind, int32_t node_type, Text name) {
@@ -106,11 +107,21 @@ void NodePool::GrowChildren(CNode* node, uint32_t count) {
   node->child_capacity = capacity;
 }
 
+void NodePool::FreeArray(CNode** array, uint32_t capacity) {
+  if (capacity > kKeptCapacity) {
+    delete[] array;
+  } else if (capacity != 0) {
+    free_arrays_[SizeClass(capacity)].push_back(array);
+  }
+}
+
 void NodePool::FreeChildren(CNode* node) {
-  if (node->child_capacity > kKeptCapacity) {
-    delete[] node->children;
-  } else if (node->child_capacity != 0) {
-    free_arrays_[SizeClass(node->child_capacity)].push_back(node->children);
+  if (node->child_capacity != 0 && is_core_waiting != nullptr && is_core_waiting()) {
+    retired_arrays_.push_back({node->children, node->child_capacity});
+    something_waits_ = true;
+  } else {
+    FreeRetiredArrays();
+    FreeArray(node->children, node->child_capacity);
   }
   node->children = nullptr;
   node->child_capacity = 0;
@@ -150,20 +161,31 @@ void NodePool::ReclaimNow(CNode* root) {
     for (CNode* child : node->fChildren()) {
       if (child != nullptr) pending_.push_back(child);
     }
-    ClearChildren(node);
-    WipeLeafFields(node);
+    // A host may have joined nodes of several pools to one tree.
+    node->pool->ClearChildren(node);
+    node->pool->WipeLeafFields(node);
     if (CNodeClassInfo* cls_info = node->fClsInfo) {
       node->fNextFree = cls_info->fFirstFree;
       cls_info->fFirstFree = node;
     } else {
-      KeepForReuse(node);
+      node->pool->KeepForReuse(node);
     }
   }
   if (pending_.capacity() > kKeptPending) std::vector<CNode*>().swap(pending_);
 }
 
+void NodePool::FreeRetiredArrays() {
+  for (const auto& [array, capacity] : retired_arrays_) FreeArray(array, capacity);
+  retired_arrays_.clear();
+}
+
 void NodePool::ReclaimAllWaiting() {
   something_waits_ = false;
+  if (is_core_waiting == nullptr || !is_core_waiting()) {
+    FreeRetiredArrays();
+  } else {
+    something_waits_ = !retired_arrays_.empty();
+  }
   for (CNode* node : std::exchange(unseen_, {})) {
     node->given_back = false;
     KeepForReuse(node);

@@ -65,8 +65,9 @@ class NodePool : public RefCounted {
   }
   // Replaces the context; a host's object that was the old one is released.
   void SetContext(CNode* node, Context context) {
-    ReleaseContext(node->fContext);
+    const Context old = node->fContext;
     node->fContext = context;
+    ReleaseContext(old);  // last, since it may run code of the host's that looks at the node
   }
   void ReleaseContext(Context context) {
     if (context.IsForeign() && release_foreign != nullptr) [[unlikely]]
@@ -110,6 +111,11 @@ class NodePool : public RefCounted {
   // Called for a node's context that is an object of the host's when the node lets go of it.
   void (*release_foreign)(int32_t number) = nullptr;
 
+  // Tells whether the core waits for the host in the middle of an operation. An array of children
+  // that a host's change or discard puts out of use then stays as it is until the core is done with
+  // it. Null: there is no host.
+  static inline bool (*is_core_waiting)() = nullptr;
+
   size_t node_count() const { return node_count_; }
 
  private:
@@ -128,6 +134,8 @@ class NodePool : public RefCounted {
   CNode** NewChildArray(uint32_t capacity);
   void ReclaimNow(CNode* root);
   void ReclaimAllWaiting();
+  void FreeArray(CNode** array, uint32_t capacity);
+  void FreeRetiredArrays();
   std::byte* NewNodeStorage();
 
   std::vector<Slab> slabs_;
@@ -137,6 +145,12 @@ class NodePool : public RefCounted {
   std::vector<std::unique_ptr<CNode*[]>> child_blocks_;
   size_t child_block_used_ = 0;                      // entries handed out of the newest block
   std::array<std::vector<CNode**>, 4> free_arrays_;  // outgrown arrays of 2, 4, 8 and 16 entries
+
+  struct RetiredArray {
+    CNode** array;
+    uint32_t capacity;
+  };
+  std::vector<RetiredArray> retired_arrays_;  // see is_core_waiting
 
   bool something_waits_ = false;
   std::vector<CNode*> abandoned_;  // roots of trees to reclaim

@@ -293,7 +293,13 @@ void BindFreeOperations(nb::module_& m) {
       [](Any node) {
         Source source;
         CNode* root = ArgumentAs<CNode>(node, source);
-        return WrapArgList(GetDefiningArgInfoList(root), source);
+        try {
+          return WrapArgList(GetDefiningArgInfoList(root), source);
+        } catch (const NotANameError& error) {
+          nb::object what = nb::make_tuple(Wrap(error.node, source), StrOf(error.node->fText()));
+          PyErr_SetObject(PyExc_AssertionError, nb::make_tuple(what).ptr());
+          throw nb::python_error();
+        }
       },
       nb::arg("node"),
       "The parameters of the node behind `def name` or `lambda`: a list of CArgInfo, nested for tuple parameters.");
@@ -309,11 +315,17 @@ void BindFreeOperations(nb::module_& m) {
       "GetTokenEndIndex",
       [](Any node) {
         Source source;
-        return GetTokenEndIndex(ArgumentAs<CNode>(node, source));
+        const CNode* leaf = LastLeaf(ArgumentAs<CNode>(node, source));
+        if (leaf->fContext.IsIndex()) return GetTokenEndIndex(leaf);
+        // Whatever a host put there, as far as one can be added to it.
+        nb::object end = nb::steal(PyNumber_Add(HostContext(leaf->fContext).ptr(), nb::int_(1).ptr()));
+        if (!end.is_valid()) throw nb::python_error();
+        return Int64Of(end);
       },
       nb::arg("node"), "The token index just past a node.");
   m.def(
-      "_TextForImportName", [](Any nodes) { return StrOf(TextForImportName(NodesOf(nodes))); }, nb::arg("nodes"));
+      "_TextForImportName", [](Any nodes) { return StrOf(TextForImportName(NodesOf(nodes, NodeKind::kCNode, true))); },
+      nb::arg("nodes"));
   m.def(
       "_ProcessAsNamesList",
       [](Any node) {

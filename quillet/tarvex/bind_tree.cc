@@ -78,6 +78,16 @@ void SetText(NodeRef& self, nb::handle value) {
   node->code = IsNone(stored) ? tok::REMOVED : CodeOfText(stored);
 }
 
+// The child at a place of a held list; null for an absent one and past the end.
+NodeRef* HeldChild(nb::handle list, int64_t index) {
+  const int64_t count = PyList_GET_SIZE(list.ptr());
+  if (index >= count) return nullptr;
+  if (index < 0) index += count;
+  if (index < 0) ThrowError(ErrorKind::kIndexError, "list index out of range");
+  nb::handle item = PyList_GET_ITEM(list.ptr(), index);
+  return item.is_none() ? nullptr : &CheckedRef(item);
+}
+
 void BindNodeCore(nb::class_<NodeHandle<CNode>>& cls) {
   using Handle = NodeHandle<CNode>;
   cls.def_prop_rw(
@@ -94,28 +104,36 @@ void BindNodeCore(nb::class_<NodeHandle<CNode>>& cls) {
       },
       nb::arg("value"));
   cls.def_prop_ro("fClsInfo", [](Handle& self) { return WrapClassInfo(self.node()->fClsInfo); });
-  cls.def_prop_ro("fNextFree", [](Handle& self) { return Wrap(self.node()->fNextFree, {}); });
+  cls.def_prop_ro("fNextFree", [](Handle& self) { return WrapNeighbour(self.node()->fNextFree); });
 
+  // Where the host holds the list of children, that list is what it expects to be read.
   const auto count = [](Handle& self) {
-    self.Synchronise();
-    return self.node()->GetChildCount();
+    nb::object held = self.HeldChildren();
+    return held.is_valid() ? int64_t{PyList_GET_SIZE(held.ptr())} : self.node()->GetChildCount();
   };
   const auto child_text = [](Handle& self, Any index) {
-    self.Synchronise();
-    return StrOf(self.node()->GetChildText(Int64Of(index)));
+    const int64_t place = Int64Of(index);
+    nb::object held = self.HeldChildren();
+    if (!held.is_valid()) return StrOf(self.node()->GetChildText(place));
+    NodeRef* child = HeldChild(held, place);
+    if (child == nullptr && place < PyList_GET_SIZE(held.ptr())) ThrowNoAttribute("fText");
+    return child == nullptr ? nb::object(nb::none()) : StrOf(child->node()->fText());
   };
   cls.def("GetChildCount", count).def("_GetChildCount", count);
   cls.def("GetChildText", child_text, nb::arg("index")).def("_GetChildText", child_text, nb::arg("index"));
   cls.def(
       "GetChild",
       [](Handle& self, Any index) {
-        self.Synchronise();
-        return Wrap(self.node()->GetChild(Int32Of(index)), self.source());
+        const int32_t place = Int32Of(index);
+        nb::object held = self.HeldChildren();
+        if (!held.is_valid()) return Wrap(self.node()->GetChild(place), self.source());
+        NodeRef* child = HeldChild(held, place);
+        return Wrap(child == nullptr ? nullptr : child->node(), self.source());
       },
       nb::arg("index"));
   cls.def("GetStateName", [](nb::handle self) {
     // A class of the host's own goes by its own name.
-    CNode* node = RefOf(self).node();
+    CNode* node = CheckedRef(self).node();
     return node->fClsInfo == nullptr ? nb::object(nb::handle((PyObject*)Py_TYPE(self.ptr())).attr("__name__"))
                                      : StrOf(node->GetStateName());
   });
@@ -128,7 +146,7 @@ void BindNodeCore(nb::class_<NodeHandle<CNode>>& cls) {
       },
       nb::arg("text"));
   cls.def("__repr__", [](nb::handle self) {
-    CNode* node = RefOf(self).node();
+    CNode* node = CheckedRef(self).node();
     nb::object state = node->fClsInfo == nullptr
                            ? nb::object(nb::handle((PyObject*)Py_TYPE(self.ptr())).attr("__name__"))
                            : StrOf(node->GetStateName());
@@ -182,7 +200,7 @@ void BindRecords(nb::module_& m) {
     arg.def_prop_rw(
         name, [field](ArgInfoObject& self) { return self.*field; },
         [field](ArgInfoObject& self, Any value) {
-          RefOrNull(value);
+          if (!value.is_none()) CheckedRef(value);
           self.*field = nb::borrow(value);
         },
         nb::arg("value"));
@@ -290,6 +308,33 @@ Text NodeText(NodePool& pool, nb::handle text) {
   return pool.Intern(HostText::FromStr(text, true).text());
 }
 
+// Makes a node with a context of the host's, which belongs to the node afterwards, and is let go of
+// where there is none.
+template <class Make>
+CNode* WithContext(NodePool& pool, nb::handle context, Make&& make) {
+  const Context owned = CoreContext(context, &pool);
+  try {
+    return make(owned);
+  } catch (...) {
+    pool.ReleaseContext(owned);
+    throw;
+  }
+}
+
+// ConvertSingleNode of the factory with text and context of the host's.
+CNode* ConvertNode(CNodeFactory& factory, int32_t type, nb::handle text, nb::handle context, CNode* const* children,
+                   uint32_t child_count) {
+  if (!text.is_none() && !PyUnicode_Check(text.ptr())) {
+    // What fails before the text is looked at.
+    Assert(children == nullptr || child_count >= 2, "");
+    if (type != tok::AWAIT && type != tok::ASYNC) factory.RecordForState(type);
+  }
+  const Text node_text = NodeText(factory.pool(), text);
+  return WithContext(factory.pool(), context, [&](Context owned) {
+    return factory.ConvertSingleNode(type, node_text, owned, children, child_count);
+  });
+}
+
 // Children of the host's list, which becomes the node's.
 struct HostChildren {
   std::vector<CNode*> nodes;
@@ -313,21 +358,25 @@ struct HostChildren {
 // A node that was made from the host's list of children keeps that list.
 nb::object WrapWithChildren(CNode* node, nb::handle children) {
   nb::object wrapper = Wrap(node, {});
-  if (!children.is_none()) RefOf(wrapper).SetChildren(children);
+  if (!children.is_none()) CheckedRef(wrapper).SetChildren(children);
   return wrapper;
 }
 
 nb::object NewNode(FactoryObject& self, Any cls_info, Any nodetype, Any text, Any context, Any children) {
   Int32Of(nodetype);
   CNodeClassInfo* info = InfoOrNull(cls_info);
+  const Text node_text = NodeText(info == nullptr ? self.factory->pool() : *info->pool, text);
   if (info == nullptr) ThrowNoAttribute("fFirstFree");
-  const Text node_text = NodeText(*info->pool, text);
   HostChildren nodes(children);
-  CNode* node = self.factory->NewNode(info, node_text, CoreContext(context, info->pool), nodes.data(), nodes.count());
+  CNode* node = WithContext(*info->pool, context, [&](Context owned) {
+    return self.factory->NewNode(info, node_text, owned, nodes.data(), nodes.count());
+  });
   return WrapWithChildren(node, children);
 }
 
-CNode* ConvertRaw(CNodeFactory& factory, nb::handle raw_node) {
+// A number among the items may be an object of the host's whose conversion changes any list, so
+// what is read here is held.
+CNode* ConvertRaw(CNodeFactory& factory, nb::object raw_node) {
   if (!PyTuple_Check(raw_node.ptr())) ThrowExpected("tuple", raw_node);
   const Py_ssize_t size = PyTuple_GET_SIZE(raw_node.ptr());
   if (size != 4) {
@@ -347,7 +396,7 @@ CNode* ConvertRaw(CNodeFactory& factory, nb::handle raw_node) {
     if (Py_EnterRecursiveCall(" in RecursiveConvert")) throw nb::python_error();
     try {
       for (Py_ssize_t i = 0; i < PyList_GET_SIZE(children.ptr()); ++i)
-        converted.push_back(ConvertRaw(factory, PyList_GET_ITEM(children.ptr(), i)));
+        converted.push_back(ConvertRaw(factory, nb::borrow(PyList_GET_ITEM(children.ptr(), i))));
       Py_LeaveRecursiveCall();
     } catch (...) {
       Py_LeaveRecursiveCall();
@@ -356,11 +405,9 @@ CNode* ConvertRaw(CNodeFactory& factory, nb::handle raw_node) {
     }
   }
   try {
-    NodePool& pool = factory.pool();
     static CNode* const none[1] = {nullptr};
     CNode* const* data = children.is_none() ? nullptr : converted.empty() ? none : converted.data();
-    return factory.ConvertSingleNode(type, NodeText(pool, item(1)), CoreContext(item(2), &pool), data,
-                                     static_cast<uint32_t>(converted.size()));
+    return ConvertNode(factory, type, item(1), item(2), data, static_cast<uint32_t>(converted.size()));
   } catch (...) {
     for (CNode* node : converted) factory.pool().Reclaim(node);
     throw;
@@ -374,7 +421,7 @@ void BindFactory(nb::module_& m) {
   info.def_prop_ro("fCls", [](ClassInfoObject& self) { return nb::borrow(ClassOfInfo(self.info)); });
   info.def_prop_ro("fNodeType", [](ClassInfoObject& self) { return self.info->fNodeType; });
   info.def_prop_ro("fName", [](ClassInfoObject& self) { return StrOf(self.info->fName); });
-  info.def_prop_ro("fFirstFree", [](ClassInfoObject& self) { return Wrap(self.info->fFirstFree, {}); });
+  info.def_prop_ro("fFirstFree", [](ClassInfoObject& self) { return WrapNeighbour(self.info->fFirstFree); });
 
   nb::class_<FactoryObject> cls(m, "CNodeFactory", "Makes nodes from what a parser reduces, and takes them back.");
   cls.def("__init__", &InitFactory, nb::arg("gram"), nb::arg("cls_for_nodetype"), nb::arg("keywords"),
@@ -396,15 +443,19 @@ void BindFactory(nb::module_& m) {
   cls.def(
       "NewKeywordNode",
       [](FactoryObject& self, Any text, Any context) {
-        NodePool& pool = self.factory->pool();
-        return Wrap(self.factory->NewKeywordNode(NodeText(pool, text), CoreContext(context, &pool)), {});
+        const Text node_text = NodeText(self.factory->pool(), text);
+        return Wrap(WithContext(self.factory->pool(), context,
+                                [&](Context owned) { return self.factory->NewKeywordNode(node_text, owned); }),
+                    {});
       },
       nb::arg("text"), nb::arg("context"));
   cls.def(
       "NewNameNode",
       [](FactoryObject& self, Any text, Any context) {
-        NodePool& pool = self.factory->pool();
-        return Wrap(self.factory->NewNameNode(NodeText(pool, text), CoreContext(context, &pool)), {});
+        const Text node_text = NodeText(self.factory->pool(), text);
+        return Wrap(WithContext(self.factory->pool(), context,
+                                [&](Context owned) { return self.factory->NewNameNode(node_text, owned); }),
+                    {});
       },
       nb::arg("text"), nb::arg("context"));
   cls.def(
@@ -414,7 +465,9 @@ void BindFactory(nb::module_& m) {
         const HostText text = HostText::FromStr(op_str, true);
         if (IsNone(text.text()) || !self.factory->op_text2number().contains(std::string(text.text())))
           return nb::object(nb::none());
-        return Wrap(self.factory->CreateOperatorNode(pool.Intern(text.text()), CoreContext(context, &pool)), {});
+        const Text op = pool.Intern(text.text());
+        return Wrap(
+            WithContext(pool, context, [&](Context owned) { return self.factory->CreateOperatorNode(op, owned); }), {});
       },
       nb::arg("op_str"), nb::arg("context"), "An operator's leaf, or None for text that is no operator.");
   cls.def(
@@ -551,15 +604,15 @@ nb::object NewFactoryObject(std::shared_ptr<CNodeFactory> factory, nb::object ke
   return nb::cast(FactoryObject{std::move(factory), std::move(keywords), {}, {}});
 }
 
-CNode* RecursiveConvert(CNodeFactory& factory, nb::handle raw_node) { return ConvertRaw(factory, raw_node); }
+CNode* RecursiveConvert(CNodeFactory& factory, nb::handle raw_node) {
+  return ConvertRaw(factory, nb::borrow(raw_node));
+}
 
 nb::object ConvertSingleNode(CNodeFactory& factory, nb::handle nodetype, nb::handle text, nb::handle context,
                              nb::handle children) {
   const int32_t type = Int32Of(nodetype);
-  NodePool& pool = factory.pool();
   HostChildren nodes(children);
-  CNode* node =
-      factory.ConvertSingleNode(type, NodeText(pool, text), CoreContext(context, &pool), nodes.data(), nodes.count());
+  CNode* node = ConvertNode(factory, type, text, context, nodes.data(), nodes.count());
   if (nodes.has_list && node == nodes.nodes[0]) {
     // The rule and its line end are gone; what is left of the host's list is the statement.
     if (PyList_SetSlice(children.ptr(), 1, 2, nullptr) < 0) throw nb::python_error();

@@ -6,8 +6,13 @@
 // memory that they may show alone.
 //
 // A node's list of children is made when the host reads it, and is the host's from then on: what it
-// changes in the list reaches the node on entry to the next operation, and a list whose node was
-// changed by the core meanwhile is let go. A list that nobody else holds goes, too.
+// changes in the list reaches the node on entry to the next operation that may read the node, and a
+// list whose node was changed by the core meanwhile is let go. A list that nobody else holds goes,
+// too. An operation brings the lists below the node it is given up to date and no others, so that a
+// host may hold all lists of a huge tree while it walks it.
+//
+// A host may join nodes of several pools to one tree. A pool then keeps the pools of its nodes'
+// children for as long as a wrapper may reach it, through any number of pools.
 //
 // A wrapper held past its tree's discard may show other content; it never shows freed memory. Texts
 // of a pool's nodes stand in sources that come and go, so while wrappers exist the pool pins each
@@ -53,6 +58,9 @@ class NodeRef {
   // ---- fChildren as the host has it ----
   nb::object GetChildren();
   void SetChildren(nb::handle list);  // a list or None
+  // The list of this node's children that the host holds, a null object where it holds none. To be
+  // read in place of the node's children, which may lag behind.
+  nb::object HeldChildren();
   // Takes over what the host changed in its list of this node's children.
   void Synchronise();
 
@@ -80,6 +88,8 @@ struct NodeHandle;
 
 // The wrapper of a node, whose texts stand in `source`; None for null.
 nb::object Wrap(CNode* node, const Ref<SourceText>& source);
+// The same for a node that a free list leads to, which need not be in a tree or in use.
+nb::object WrapNeighbour(CNode* node);
 nb::object WrapList(std::span<CNode* const> nodes, const Ref<SourceText>& source);
 nb::object WrapClassInfo(CNodeClassInfo* info);
 nb::object WrapArg(const CArgInfo& arg, const Ref<SourceText>& source);
@@ -98,8 +108,10 @@ bool IsNodeClass(nb::handle cls);
 
 // ---- nodes from the host ----
 
-// TypeError "Expected CNode, got ..." (or the class wanted). Brings all lists of children up to
-// date, since the operation that follows may read the whole tree.
+// The handle of a wrapper; TypeError "Expected CNode, got ..." (or the class wanted) for anything else.
+NodeRef& CheckedRef(nb::handle object, NodeKind wanted = NodeKind::kCNode);
+// The same for an operation that reads nodes. Brings the lists of children below the
+// node up to date, since the operation that follows may read the whole tree.
 NodeRef& RefOf(nb::handle object, NodeKind wanted = NodeKind::kCNode);
 // The same with None for null.
 NodeRef* RefOrNull(nb::handle object, NodeKind wanted = NodeKind::kCNode);

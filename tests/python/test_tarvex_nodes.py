@@ -208,8 +208,15 @@ def test_a_list_of_children_is_kept_and_read_again() -> None:
     given[0] = None
     assert node.GetChild(0) is None
     given.append(1)
+    assert node.GetChildCount() == 3
+    assert node.GetChild(1) is c
+    for read in (node.GetChild, node.GetChildText):
+        with pytest.raises(TypeError, match="Expected CNode, got int"):
+            read(2)
     with pytest.raises(TypeError, match="Expected CNode, got int"):
-        node.GetChildCount()
+        tarvex.FinishedWithNode(node)
+    with pytest.raises(IndexError):
+        node.GetChild(-4)
     given.pop()
     node.fChildren = None
     assert node.fChildren is None
