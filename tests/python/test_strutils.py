@@ -36,8 +36,15 @@ def test_adjust_steps_over_a_two_byte_letter(kind):
 def test_adjust_reads_nothing_outside_the_text():
     assert strutils.AdjustUtf8Pos("aé ", 0, 100, 1000) == 4
     assert strutils.AdjustUtf8Pos("aé ", 1000, -1, 1000) == 3
+    assert strutils.AdjustUtf8Pos("aé ", 2**62, -2, 4) == 1
     assert strutils.AdjustUtf8Pos("", 0, -1, 0) == -1
     assert strutils.AdjustUtf8Pos("aé ", 4, 0, 4) == 4
+
+
+def test_adjust_counts_what_stands_behind_the_end_going_backward():
+    assert strutils.AdjustUtf8Pos(b"abcdef", 5, -1, 3) == 4
+    assert strutils.AdjustUtf8Pos(b"abc", 4, -1, 3) == 2
+    assert strutils.AdjustUtf8Pos("aé ", 3, -1, 0) == 1
 
 
 @pytest.mark.parametrize("kind", KINDS_OF_TEXT)
