@@ -22,15 +22,19 @@ void CDispatchWalker::PrintIfRuntimeError(const Error& error) {
   PrintLine("RuntimeError raised in CNodeWalker.Walk: " + error.message());
 }
 
+void CDispatchWalker::ThrowTooManyVisits() {
+  ThrowError(ErrorKind::kRuntimeError, "Maximum number of calls to _VisitNode exceeded");
+}
+
+void CDispatchWalker::ThrowTooDeep() {
+  ThrowError(ErrorKind::kRuntimeError, "Maximum recurse count in _VisitNode exceeded");
+}
+
 void CDispatchWalker::VisitNode(CNode* node) {
-  if (++fVisitCount > fMaxVisits) {
-    ThrowError(ErrorKind::kRuntimeError, "Maximum number of calls to _VisitNode exceeded");
-  }
+  if (++fVisitCount > fMaxVisits) ThrowTooManyVisits();
   fNodeStack.push_back(node);
   // The node stays on the stack; the end of the walk cleans up.
-  if (static_cast<int64_t>(fNodeStack.size()) > fMaxRecurseCount) {
-    ThrowError(ErrorKind::kRuntimeError, "Maximum recurse count in _VisitNode exceeded");
-  }
+  if (static_cast<int64_t>(fNodeStack.size()) > fMaxRecurseCount) ThrowTooDeep();
   struct Pop {
     std::vector<CNode*>& stack;
     ~Pop() {
@@ -39,8 +43,8 @@ void CDispatchWalker::VisitNode(CNode* node) {
   } pop{fNodeStack};
 
   bool descend;
-  if (host_visit) [[unlikely]] {
-    descend = host_visit(node);
+  if (host_visits != nullptr) [[unlikely]] {
+    descend = host_visits->Visit(node);
   } else {
     const Entry entry = node != nullptr ? table_[static_cast<size_t>(node->kind)] : Entry{};
     descend = entry.action == Action::kDescend || (entry.action == Action::kVisit && entry.visit(*this, node));

@@ -9,7 +9,6 @@
 
 #include <array>
 #include <cstdint>
-#include <functional>
 #include <vector>
 
 #include "siblings/logicalline/logical_line.h"
@@ -22,8 +21,17 @@ class CDispatchWalker {
   enum class Action : uint8_t { kDescend, kPrune, kVisit };
   using Visit = bool (*)(CDispatchWalker& walker, CNode* node);
 
-  // The table by exact class. A host's callables come through `host_visit`, which then decides for
-  // every node: it returns whether the children are to be walked.
+  // Visits of a host's. While a walker has them they decide for every node, in place of the table.
+  class HostVisits {
+   public:
+    // Whether the children of the node, which may be null, are to be walked.
+    virtual bool Visit(CNode* node) = 0;
+
+   protected:
+    ~HostVisits() = default;
+  };
+
+  // The table by exact class.
   struct Entry {
     Action action = Action::kDescend;
     Visit visit = nullptr;
@@ -40,7 +48,7 @@ class CDispatchWalker {
   virtual void Walk(CNode* node, LogicalLine* logical, bool first_in_def);
   void VisitNode(CNode* node);
 
-  std::function<bool(CNode*)> host_visit;
+  HostVisits* host_visits = nullptr;  // not owned
 
   LogicalLine* fLogical = nullptr;
   int32_t fVisitCount = 0;
@@ -50,6 +58,9 @@ class CDispatchWalker {
   std::vector<CNode*> fNodeStack;
 
  protected:
+  [[noreturn]] static void ThrowTooManyVisits();
+  [[noreturn]] static void ThrowTooDeep();
+
   // The frame of a walk: refuses a second one, prints what a RuntimeError says, and leaves the walker
   // idle whatever happens.
   template <class Visits>

@@ -19,6 +19,8 @@ namespace quillet {
 namespace {
 
 constexpr Text kTypeMark = "type:";
+// Trees deeper than this are those that a host tied to themselves.
+constexpr int kMaxTreeDepth = 10'000'000;
 // Tuples within tuples are unpacked together with their hints to this depth.
 constexpr int kMaxTargetDepth = 400;
 
@@ -104,6 +106,14 @@ CTypeHintWalker::CTypeHintWalker(std::unique_ptr<CPGenParserImpl> hint_parser, V
       general_node_walker_(general_node_walker) {}
 
 void CTypeHintWalker::Walk(CNode* node, LogicalLine* logical, bool first_in_def) {
+  WalkTree(node, logical, first_in_def, /*is_of_line=*/true);
+}
+
+void CTypeHintWalker::WalkAnyTree(CNode* node, LogicalLine* logical, bool first_in_def) {
+  WalkTree(node, logical, first_in_def, /*is_of_line=*/false);
+}
+
+void CTypeHintWalker::WalkTree(CNode* node, LogicalLine* logical, bool first_in_def, bool is_of_line) {
   struct Reset {
     int32_t& count;
     ~Reset() { count = 0; }
@@ -112,10 +122,11 @@ void CTypeHintWalker::Walk(CNode* node, LogicalLine* logical, bool first_in_def)
     if (token.code == tok::COMMENT && token.view().find(kTypeMark) != Text::npos) ++fCommentHintCount;
 
   if (node != nullptr) {
-    const bool is_small = logical->toks.size() + kInventedTokens <= static_cast<size_t>(fMaxRecurseCount) &&
+    const bool is_small = is_of_line &&
+                          logical->toks.size() + kInventedTokens <= static_cast<size_t>(fMaxRecurseCount) &&
                           fMaxVisits >= 4 * fMaxRecurseCount;
     if (!is_small) return CDispatchWalker::Walk(node, logical, first_in_def);
-    return RunWalk(logical, [&] { VisitStatements(node); });
+    return RunWalk(logical, [&] { VisitStatements(node, 1); });
   }
   if (fCommentHintCount == 0) return;
 
@@ -131,13 +142,18 @@ void CTypeHintWalker::Walk(CNode* node, LogicalLine* logical, bool first_in_def)
     ProcessFuncdefComment(hint, comment.tok_i, nullptr, false);
 }
 
-void CTypeHintWalker::VisitStatements(CNode* node) {
+void CTypeHintWalker::VisitStatements(CNode* node, int32_t depth) {
+  // A parser that a host drives may have made a tree out of all proportion to the line after all.
+  if (++fVisitCount > fMaxVisits) [[unlikely]]
+    ThrowTooManyVisits();
+  if (depth > fMaxRecurseCount) [[unlikely]]
+    ThrowTooDeep();
   const Entry& entry = kStatementsOnly[static_cast<size_t>(node->kind)];
   if (entry.action == Action::kPrune) return;
   if (entry.action == Action::kVisit && !entry.visit(*this, node)) return;
   for (CNode* child : node->fChildren()) {
     if (child == nullptr) ThrowError(ErrorKind::kAttributeError, "'NoneType' object has no attribute 'fChildren'");
-    if (!child->IsLeaf()) VisitStatements(child);
+    if (!child->IsLeaf()) VisitStatements(child, depth + 1);
   }
 }
 
@@ -250,7 +266,8 @@ CTypeHintWalker::Comment CTypeHintWalker::FindComment(int64_t row, LogicalLine* 
 
 std::pair<int64_t, int64_t> CTypeHintWalker::GetRowRange(CNode* node) const {
   const auto edge_leaf = [](CNode* at, bool is_last) {
-    while (!at->IsLeaf()) {
+    for (int depth = 0; !at->IsLeaf(); ++depth) {
+      if (depth > kMaxTreeDepth) ThrowError(ErrorKind::kRecursionError, "maximum recursion depth exceeded");
       CNode* child = is_last ? at->ChildAt(-1) : at->ChildAt(0);
       if (child == nullptr) ThrowError(ErrorKind::kAttributeError, "'NoneType' object has no attribute 'fText'");
       at = child;

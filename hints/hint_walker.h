@@ -29,7 +29,10 @@ class CTypeHintWalker : public CDispatchWalker {
   // `general_node_walker` may be null; it is not owned.
   CTypeHintWalker(std::unique_ptr<CPGenParserImpl> hint_parser, Version version, CNodeWalker* general_node_walker);
 
+  // For the tree that was parsed from the line.
   void Walk(CNode* node, LogicalLine* logical, bool first_in_def) override;
+  // For a tree of a host's, which the line says nothing of: always visits every node.
+  void WalkAnyTree(CNode* node, LogicalLine* logical, bool first_in_def);
 
   // ---- comments (hint_walker.cc) ----
   struct Comment {
@@ -79,6 +82,8 @@ class CTypeHintWalker : public CDispatchWalker {
   int32_t fCommentHintCount = 0;
   CPGenParserImpl& hint_parser() const { return *hint_parser_; }
   CNodeWalker* general_node_walker() const { return general_node_walker_; }
+  CNodeToTextConverter& name_conv() { return name_conv_; }
+  CNodeToTextConverter& hint_conv() { return hint_conv_; }
 
  private:
   // A signature's tokens and, for each, its offset in the hint.
@@ -89,8 +94,9 @@ class CTypeHintWalker : public CDispatchWalker {
   // `text` is kSignatureFront, the hint and a colon; the tokens are views into it.
   static Signature RewriteSignature(Text text);
 
+  void WalkTree(CNode* node, LogicalLine* logical, bool first_in_def, bool is_of_line);
   // Walks a tree that cannot reach a limit: statements alone, none of their expressions.
-  void VisitStatements(CNode* node);
+  void VisitStatements(CNode* node, int32_t depth);
 
   LogicalLine& RequireLogical() const;
   CNodeWalker& RequireGeneralWalker() const;

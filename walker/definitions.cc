@@ -61,18 +61,17 @@ void CNodeWalker::ProcessDefiningArg(const CArgInfo& arg) {
   // The bare star of keyword-only parameters.
   if (arg.name == nullptr) return;
   Assert(arg.name->IsLeaf(), "the name of a parameter has no text");
-  LogicalLine& logical = RequireLogical();
   const Text name = Keep(arg.name->fText());
-  logical.AppendStableArgTypeEquiv(name, kSetPrefix);
+  AddStableArgInfo(name, kSetPrefix);
 
   if (arg.value != nullptr) {
     if (const Text equiv = TypeEquivForNode(arg.value); !IsNone(equiv)) {
-      logical.AppendStableArgTypeEquiv(name, Keep(equiv));
+      AddStableArgInfo(name, Keep(equiv));
     }
   } else if (arg.prefix == "*") {
-    logical.AppendStableArgTypeEquiv(name, kTupleInstanceName);
+    AddStableArgInfo(name, kTupleInstanceName);
   } else if (arg.prefix == "**") {
-    logical.AppendStableArgTypeEquiv(name, kDictInstanceName);
+    AddStableArgInfo(name, kDictInstanceName);
   }
   // Defaults and annotations belong to the enclosing scope.
   if (arg.value != nullptr) VisitNode(arg.value);

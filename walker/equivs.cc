@@ -15,6 +15,8 @@ namespace {
 
 // In bytes, without the trailer; a longer operator expression is not worth its place on the line.
 constexpr size_t kMaxOperatorText = 120;
+// Parentheses nested deeper are those of a tree that a host tied to itself.
+constexpr int kMaxParentheses = 10'000'000;
 
 constexpr Text kNoneLiteral = ":l:None: None";
 constexpr Text kTrueLiteral = ":l:bool: True";
@@ -50,7 +52,9 @@ Text CNodeWalker::TypeEquivForNode(CNode* node, Text extra_trailer) {
   // parentheses either, so the question is asked once.
   if (auto* atom = dyn_cast<CAtom>(node); atom != nullptr && atom->GetInitialBracket() == "(") {
     if (IsTupleLiteralNode(node)) return has_trailer ? kNoText : LiteralInfo("tuple", fToText.TextForNode(node));
+    int depth = 0;
     do {
+      if (++depth > kMaxParentheses) ThrowError(ErrorKind::kRecursionError, "maximum recursion depth exceeded");
       Assert(node->ChildCount() == 3, "parentheses that hold neither a tuple nor an expression");
       node = node->ChildAt(1);
       if (node == nullptr) ThrowNoAttribute("fText");

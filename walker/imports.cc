@@ -3,6 +3,9 @@
 //
 // import a.b.c binds a alone, and its record says so; import a.b.c as d tells d the whole name.
 
+#include <string>
+#include <utility>
+
 #include "siblings/symbolinfo/symbolinfo.h"
 #include "walker/walker.h"
 
@@ -50,14 +53,18 @@ void CNodeWalker::VisitImportNames(CImportNamesStmt* node) {
 }
 
 void CNodeWalker::VisitFromImport(CFromImportStmt* node) {
-  std::string& from = equiv_buffer_;
+  // A host that sees a record may ask the walker for anything, so the text is out of the way of that;
+  // its memory is used again.
+  std::string from = std::move(from_buffer_);
   from.assign(kFromImportPrefix);
   AppendTextForImportName(node->FromNodes(), from);
   from.append(" ");
   if (node->GetImportStar()) {
     // Which names are bound is not known here.
     from.append("*");
-    return AddStableTypeEquiv("*", Keep(from));
+    AddStableTypeEquiv("*", Keep(from));
+    from_buffer_ = std::move(from);
+    return;
   }
   ForEachAsName(node->GetNamesNode(), [&](const AsNameParts& parts) {
     const Text imported = ImportedName(parts.module);
@@ -68,6 +75,7 @@ void CNodeWalker::VisitFromImport(CFromImportStmt* node) {
     AddStableTypeEquiv(name, Keep(scratch_));
     if (has_as_name) AddImportAsName(name);
   });
+  from_buffer_ = std::move(from);
 }
 
 }  // namespace quillet

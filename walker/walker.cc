@@ -27,9 +27,13 @@ CNodeWalker::CNodeWalker(Version version)
     : fPy3(version.AtLeast(3, 0)), fToText(fIncludeExprText, fIncludeExprText, fIncludeExprText) {}
 
 void CNodeWalker::Walk(CNode* node, LogicalLine* logical) {
-  if (fLogical != nullptr) ThrowError(ErrorKind::kValueError, "Only one logical may be walked at a time");
+  if (fLogical != nullptr || operations_ != 0) [[unlikely]]
+    ThrowError(ErrorKind::kValueError, "Only one logical may be walked at a time");
   if (node == nullptr) return;
+  operations_ = 1;
   fLogical = logical;
+  // Names left over from operations by name are the walker's own.
+  direct_ = own_texts_used_ ? nullptr : logical;
   fLoadNameContext = true;
   fStoreWithinSubExpr = false;
   if (const SourceText* source = logical != nullptr ? logical->source.get() : nullptr) {
@@ -50,8 +54,22 @@ void CNodeWalker::Walk(CNode* node, LogicalLine* logical) {
   }
 }
 
+void CNodeWalker::SetLogical(LogicalLine* logical) {
+  fLogical = logical;
+  direct_ = nullptr;
+  source_begin_ = 0;
+  source_size_ = 0;
+  if (operations_ == 0 && own_texts_used_ && fLoadedNames.empty() && fStoredNames.empty()) {
+    own_texts_used_ = false;
+    own_texts_.Reset();
+    composed_size_ = 0;
+  }
+}
+
 void CNodeWalker::EndWalk() {
   fLogical = nullptr;
+  direct_ = nullptr;
+  operations_ = 0;
   fVisitCount = 0;
   fRecurseCount = 0;
   fLoadedNames.Clear();
@@ -69,32 +87,32 @@ void CNodeWalker::ProcessNamesFound(CNode* node) {
   // What an import names is defined by its visit and must not read as a use.
   if (isa<CImportNamesStmt>(node) || isa<CFromImportStmt>(node)) return;
   if (fLoadedNames.empty() && fStoredNames.empty()) return;
-  LogicalLine& logical = RequireLogical();
+  RequireLogical();
   for (const NameSet::Name& name : fLoadedNames.names()) {
     Assert(name.data != nullptr, "a name that was read has no text");
   }
-  if (logical.hooks == nullptr) {
+  if (direct_ != nullptr && direct_->hooks == nullptr) {
     const NameSet::Name* const names = fLoadedNames.names().data();
-    logical.DirectAppendRows(fLoadedNames.size(), [names](size_t i) {
+    direct_->DirectAppendRows(fLoadedNames.size(), [names](size_t i) {
       return Record{names[i].data, kGetPrefix.data(), static_cast<uint32_t>(names[i].size), kPrefixLen};
     });
   } else {
     // A hook may call back and add names.
-    for (size_t i = 0; i < fLoadedNames.size(); ++i) logical.AppendStableTypeEquiv(fLoadedNames[i], kGetPrefix);
+    for (size_t i = 0; i < fLoadedNames.size(); ++i) AddStableTypeEquiv(fLoadedNames[i], kGetPrefix);
   }
   for (size_t i = 0; i < fStoredNames.size(); ++i) {
     const Text name = fStoredNames.name(i);
     Assert(!IsNone(name), "a name that was stored has no text");
-    const StoreList::Store* store = &fStoredNames.first(i);
+    StoreList::Store store = fStoredNames.first(i);
     while (true) {
       constexpr size_t kMaxDigits = 11;
       CountComposed(kPrefixLen + kMaxDigits);
       char* const info = Texts().Allocate(kPrefixLen + kMaxDigits);
       kWithinExprPrefix.copy(info, kPrefixLen);
-      const char* end = std::to_chars(info + kPrefixLen, info + kPrefixLen + kMaxDigits, store->place).ptr;
+      const char* end = std::to_chars(info + kPrefixLen, info + kPrefixLen + kMaxDigits, store.place).ptr;
       AddStableTypeEquiv(name, {info, static_cast<size_t>(end - info)});
-      if (store->next == StoreList::kEnd) break;
-      store = &fStoredNames.at(store->next);
+      if (store.next == StoreList::kEnd) break;
+      store = fStoredNames.at(store.next);
     }
   }
 }
@@ -122,23 +140,19 @@ void CNodeWalker::ThrowTooMuchText() {
 // ---- recorders ----
 
 void CNodeWalker::AddTypeEquiv(Text name, Text equiv) {
-  LogicalLine& logical = RequireLogical();
-  logical.AppendStableTypeEquiv(Keep(name), Keep(equiv));
+  if (direct_ == nullptr) [[unlikely]]
+    return RequireLogical().AppendTypeEquiv(name, equiv);
+  direct_->AppendStableTypeEquiv(Keep(name), Keep(equiv));
 }
 
 void CNodeWalker::AddArgInfoBytes(Text name, Text info) {
-  LogicalLine& logical = RequireLogical();
-  logical.AppendStableArgTypeEquiv(Keep(name), Keep(info));
+  if (direct_ == nullptr) [[unlikely]]
+    return RequireLogical().AppendArgTypeEquiv(name, info);
+  direct_->AppendStableArgTypeEquiv(Keep(name), Keep(info));
 }
 
-void CNodeWalker::AddNameDefined(Text name) {
-  LogicalLine& logical = RequireLogical();
-  logical.AppendStableTypeEquiv(Keep(name), kSetPrefix);
-}
+void CNodeWalker::AddNameDefined(Text name) { AddTypeEquiv(name, kSetPrefix); }
 
-void CNodeWalker::AddArgNameDefined(Text name) {
-  LogicalLine& logical = RequireLogical();
-  logical.AppendStableArgTypeEquiv(Keep(name), kSetPrefix);
-}
+void CNodeWalker::AddArgNameDefined(Text name) { AddArgInfoBytes(name, kSetPrefix); }
 
 }  // namespace quillet

@@ -48,6 +48,24 @@ class CNodeWalker {
   // a walk is running.
   void Walk(CNode* node, LogicalLine* logical);
 
+  // ---- the line, as a host hands it in ----
+  // For operations by name between walks, or to send what follows in a walk to another line. Nobody
+  // knows how long such a line lives, nor what it does with its records meanwhile, so from here to the
+  // end of the next walk records are copied to it and names that were collected stay with the walker.
+  void SetLogical(LogicalLine* logical);
+  // While one lives, an operation that the host called by name is at work: no walk may begin, since
+  // its end lets go of the texts that the operation has in hand.
+  class Operation {
+   public:
+    explicit Operation(CNodeWalker& walker) : walker_(walker) { ++walker_.operations_; }
+    ~Operation() { --walker_.operations_; }
+    Operation(const Operation&) = delete;
+    Operation& operator=(const Operation&) = delete;
+
+   private:
+    CNodeWalker& walker_;
+  };
+
   // ---- frame (walker.cc, dispatch.cc) ----
   void ProcessNamesFound(CNode* node);
   void VisitChildren(CNode* node);
@@ -171,8 +189,8 @@ class CNodeWalker {
   Text KeepCopy(Text text);
   // Where such copies go: to the line, or, where a host's hooks take the records, to the walker.
   TextArena& Texts() {
-    if (fLogical != nullptr && fLogical->hooks == nullptr) [[likely]]
-      return fLogical->texts();
+    if (direct_ != nullptr && direct_->hooks == nullptr) [[likely]]
+      return direct_->texts();
     own_texts_used_ = true;
     return own_texts_;
   }
@@ -183,7 +201,16 @@ class CNodeWalker {
   }
   [[noreturn]] void ThrowTooMuchText();
   // For texts that Keep gave, or that are static.
-  void AddStableTypeEquiv(Text name, Text equiv) { RequireLogical().AppendStableTypeEquiv(name, equiv); }
+  void AddStableTypeEquiv(Text name, Text equiv) {
+    if (direct_ == nullptr) [[unlikely]]
+      return RequireLogical().AppendTypeEquiv(name, equiv);
+    direct_->AppendStableTypeEquiv(name, equiv);
+  }
+  void AddStableArgInfo(Text name, Text info) {
+    if (direct_ == nullptr) [[unlikely]]
+      return RequireLogical().AppendArgTypeEquiv(name, info);
+    direct_->AppendStableArgTypeEquiv(name, info);
+  }
   // Records that the kept name is defined.
   void AddKeptNameDefined(Text name) { AddStableTypeEquiv(name, kSetPrefix); }
 
@@ -231,7 +258,9 @@ class CNodeWalker {
 
   void VisitPatternAtDepth(CNode* node, int depth);
 
-  uintptr_t source_begin_ = 0;  // address of the line's source, during a walk
+  LogicalLine* direct_ = nullptr;  // fLogical during a walk, unless the host set that: takes texts uncopied
+  int32_t operations_ = 0;         // walks and operations by name that are under way
+  uintptr_t source_begin_ = 0;     // address of the line's source, during a walk
   size_t source_size_ = 0;
   size_t composed_size_ = 0;
   TextArena own_texts_;
@@ -240,6 +269,7 @@ class CNodeWalker {
   std::string equiv_buffer_;  // what TypeEquivForNode composes
   std::string scratch_;       // an info text on its way to its record
   std::string name_buffer_;   // the name of an import
+  std::string from_buffer_;   // the front of the infos of a from-import
   ListStack<UsedArgList> used_lists_;
   ListStack<ArgList> defining_lists_;
 };

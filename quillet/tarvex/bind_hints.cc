@@ -14,44 +14,6 @@ namespace {
 
 // ---- the dispatch walker ----
 
-// What the host's dict says of a node: whether its children are to be walked.
-bool VisitByDict(DispatchObject& object, nb::handle self, const Ref<SourceText>& source, CNode* node) {
-  nb::handle cls = node == nullptr ? nb::handle((PyObject*)Py_TYPE(Py_None)) : ClassOfNode(node);
-  if (object.dispatch_dict.is_none()) {
-    PyErr_SetString(PyExc_AttributeError, "'NoneType' object has no attribute 'get'");
-    throw nb::python_error();
-  }
-  nb::object visit = nb::borrow(PyDict_GetItemWithError(object.dispatch_dict.ptr(), cls.ptr()));
-  if (!visit.is_valid()) {
-    if (PyErr_Occurred()) throw nb::python_error();
-    return true;
-  }
-  if (visit.ptr() == Py_False) return false;
-  if (visit.is_none()) return true;
-  nb::object result = visit(self, Wrap(node, source));
-  // The host may have changed the children of the node.
-  if (node != nullptr) RefOrNull(Wrap(node, source));
-  const int truth = PyObject_IsTrue(result.ptr());
-  if (truth < 0) throw nb::python_error();
-  return truth != 0;
-}
-
-// Lets a walk of the host's go by its dict while it lives.
-class DictVisits {
- public:
-  DictVisits(DispatchObject& object, nb::handle self, const Ref<SourceText>& source) : walker_(*object.walker) {
-    walker_.host_visit = [&object, self, source](CNode* node) {
-      return CallingHost([&] { return VisitByDict(object, self, source, node); });
-    };
-  }
-  ~DictVisits() { walker_.host_visit = nullptr; }
-  DictVisits(const DictVisits&) = delete;
-  DictVisits& operator=(const DictVisits&) = delete;
-
- private:
-  CDispatchWalker& walker_;
-};
-
 nb::object& DispatchDict(DispatchObject& object) {
   if (!object.dispatch_dict.is_valid()) {
     nb::handle cls = nb::type<HintWalkerObject>();
@@ -66,6 +28,73 @@ nb::object& DispatchDict(DispatchObject& object) {
   return object.dispatch_dict;
 }
 
+// What the host's dict says of a node: whether its children are to be walked.
+bool VisitByDict(DispatchObject& object, nb::handle self, const Ref<SourceText>& source, CNode* node) {
+  nb::handle cls = node == nullptr ? nb::handle((PyObject*)Py_TYPE(Py_None)) : ClassOfNode(node);
+  nb::object& dict = DispatchDict(object);
+  if (dict.is_none()) {
+    PyErr_SetString(PyExc_AttributeError, "'NoneType' object has no attribute 'get'");
+    throw nb::python_error();
+  }
+  nb::object visit = nb::borrow(PyDict_GetItemWithError(dict.ptr(), cls.ptr()));
+  if (!visit.is_valid()) {
+    if (PyErr_Occurred()) throw nb::python_error();
+    return true;
+  }
+  if (visit.ptr() == Py_False) return false;
+  if (visit.is_none()) return true;
+  nb::object result = visit(self, Wrap(node, source));
+  // The host may have changed the children of the node.
+  if (node != nullptr) RefOrNull(Wrap(node, source));
+  const int truth = PyObject_IsTrue(result.ptr());
+  if (truth < 0) throw nb::python_error();
+  return truth != 0;
+}
+
+// Lets a walk of the host's go by its dict while it lives. A visit may begin the next, of nodes of
+// another source, in the middle of this one.
+class DictVisits final : public CDispatchWalker::HostVisits {
+ public:
+  DictVisits(DispatchObject& object, nb::handle self, Ref<SourceText> source)
+      : object_(object),
+        self_(self),
+        source_(std::move(source)),
+        outer_(std::exchange(object.walker->host_visits, this)) {}
+  ~DictVisits() { object_.walker->host_visits = outer_; }
+  DictVisits(const DictVisits&) = delete;
+  DictVisits& operator=(const DictVisits&) = delete;
+
+  bool Visit(CNode* node) override {
+    return CallingHost([&] { return VisitByDict(object_, self_, source_, node); });
+  }
+
+ private:
+  DispatchObject& object_;
+  nb::handle self_;
+  Ref<SourceText> source_;
+  CDispatchWalker::HostVisits* outer_;
+};
+
+// Around a walk of the host's: the object keeps the line as long as the walk is on it, so that visits
+// see the host's own line.
+class WalkOfHost {
+ public:
+  WalkOfHost(DispatchObject& object, nb::handle logical)
+      : object_(object), outer_(std::exchange(object.handed_in.line, nb::borrow(logical))) {}
+  ~WalkOfHost() {
+    // The end of a walk leaves the walker without a line, whatever the host handed in meanwhile; only
+    // where there was nothing to walk it keeps what it had.
+    object_.handed_in.Replace(object_.walker->fLogical == nullptr ? nb::object() : std::exchange(outer_, {}));
+    object_.handed_in.LetGo(std::move(outer_));
+  }
+  WalkOfHost(const WalkOfHost&) = delete;
+  WalkOfHost& operator=(const WalkOfHost&) = delete;
+
+ private:
+  DispatchObject& object_;
+  nb::object outer_;
+};
+
 template <int32_t CDispatchWalker::*Field>
 void DefCount(nb::class_<DispatchObject>& cls, const char* name) {
   cls.def_prop_rw(
@@ -73,26 +102,38 @@ void DefCount(nb::class_<DispatchObject>& cls, const char* name) {
       [](DispatchObject& self, Any value) { (*self.walker).*Field = Int32Of(value); });
 }
 
+// Tested before anything of the walker changes.
+void RefuseSecondWalk(const DispatchObject& object) {
+  if (object.walker->fLogical != nullptr)
+    ThrowError(ErrorKind::kValueError, "Only one logical may be walked at a time");
+}
+
 void WalkByDict(nb::handle self, Any node, Any logical, Truth first_in_def) {
   auto& object = nb::cast<DispatchObject&>(self);
   NodeRef* root = RefOrNull(node);
   LineObject& line = LineOf(logical);
-  if (object.walker->fLogical != nullptr) return object.walker->Walk(nullptr, nullptr, first_in_def);  // raises
-  Recording recording(&line);
-  object.logical = nb::borrow(logical);
-  DictVisits visits(object, self, SourceOf(root));
-  object.walker->Walk(root == nullptr ? nullptr : root->node(), &line.line(), first_in_def);
+  RefuseSecondWalk(object);
+  const WalkOfHost walk(object, logical);
+  const Recording recording(&line);
+  const DictVisits visits(object, self, SourceOf(root));
+  // The operation of this class, also for a walker of a class that is derived from it.
+  object.walker->CDispatchWalker::Walk(root == nullptr ? nullptr : root->node(), &line.line(), first_in_def);
 }
 
 int Traverse(PyObject* self, visitproc visit, void* arg) {
   Py_VISIT(Py_TYPE(self));
   if (!nb::inst_ready(self)) return 0;
-  Py_VISIT(nb::inst_ptr<DispatchObject>(self)->dispatch_dict.ptr());
-  return 0;
+  auto& object = *nb::inst_ptr<DispatchObject>(self);
+  Py_VISIT(object.dispatch_dict.ptr());
+  return object.handed_in.Traverse(visit, arg);
 }
 
 int Clear(PyObject* self) {
-  nb::object dict = std::move(nb::inst_ptr<DispatchObject>(self)->dispatch_dict);
+  if (!nb::inst_ready(self)) return 0;
+  auto& object = *nb::inst_ptr<DispatchObject>(self);
+  if (object.handed_in.line.is_valid()) object.walker->fLogical = nullptr;
+  object.handed_in.Replace({});
+  nb::object dict = std::exchange(object.dispatch_dict, nb::none());
   return 0;
 }
 
@@ -111,8 +152,10 @@ void BindDispatchWalker(nb::module_& m) {
       },
       nb::arg("dispatch_dict"));
   cls.def_prop_rw(
-      "_fLogical", [](DispatchObject& self) { return HostLineOf(self.walker->fLogical, self.logical); },
-      [](DispatchObject& self, Any value) { SetHostLine(value, self.walker->fLogical, self.logical); },
+      "_fLogical", [](DispatchObject& self) { return HostLineOf(self.walker->fLogical, self.handed_in); },
+      [](DispatchObject& self, Any value) {
+        self.handed_in.HandIn(value, [&self](LogicalLine* line) { self.walker->fLogical = line; });
+      },
       nb::arg("value"));
   cls.def_prop_ro("_fDispatchDict", [](DispatchObject& self) { return DispatchDict(self); });
   DefCount<&CDispatchWalker::fVisitCount>(cls, "_fVisitCount");
@@ -126,7 +169,7 @@ void BindDispatchWalker(nb::module_& m) {
       [](nb::handle self, Any node) {
         auto& object = nb::cast<DispatchObject&>(self);
         NodeRef* root = RefOrNull(node);
-        DictVisits visits(object, self, SourceOf(root));
+        const DictVisits visits(object, self, SourceOf(root));
         object.walker->VisitNode(root == nullptr ? nullptr : root->node());
       },
       nb::arg("node"));
@@ -167,9 +210,9 @@ nb::object WrapHintTree(HintWalkerObject& self, CNode* node) {
   return wrapper;
 }
 
-template <bool (CTypeHintWalker::*Operation)(CNode*)>
+template <class Statement, bool (CTypeHintWalker::*Operation)(CNode*)>
 bool VisitStatement(HintWalkerObject& self, Any node) {
-  CNode* root = RefOf(node).node();
+  CNode* root = RefOf(node, NodeKindRange<Statement>::kFirst).node();
   Recording recording(self.walker->fLogical);
   return (self.hints().*Operation)(root);
 }
@@ -229,12 +272,14 @@ void BindHintComments(HintClass& cls) {
 }
 
 void BindHintStatements(HintClass& cls) {
-  cls.def("_VisitExprStmt", &VisitStatement<&CTypeHintWalker::VisitExprStmt>, nb::arg("node"));
-  cls.def("_VisitForStmt", &VisitStatement<&CTypeHintWalker::VisitForStmt>, nb::arg("node"));
-  cls.def("_VisitWithStmt", &VisitStatement<&CTypeHintWalker::VisitWithStmt>, nb::arg("node"));
+  cls.def("_VisitExprStmt", &VisitStatement<CExprStmt, &CTypeHintWalker::VisitExprStmt>, nb::arg("node"));
+  cls.def("_VisitForStmt", &VisitStatement<CForStmt, &CTypeHintWalker::VisitForStmt>, nb::arg("node"));
+  cls.def("_VisitWithStmt", &VisitStatement<CWithStmt, &CTypeHintWalker::VisitWithStmt>, nb::arg("node"));
   cls.def(
       "_VisitFuncdefStmt",
-      [](HintWalkerObject& self, Any node) { VisitStatement<&CTypeHintWalker::VisitFuncdefStmt>(self, node); },
+      [](HintWalkerObject& self, Any node) {
+        VisitStatement<CFuncdefStmt, &CTypeHintWalker::VisitFuncdefStmt>(self, node);
+      },
       nb::arg("node"));
   cls.def(
       "_ProcessTarget",
@@ -311,8 +356,40 @@ void BindSignatures(HintClass& cls) {
       nb::arg("hint"), nb::arg("tok_i"));
 }
 
+template <nb::object HintWalkerObject::*Made, CNodeToTextConverter& (CTypeHintWalker::*Converter)()>
+void DefConverter(HintClass& cls, const char* name) {
+  cls.def_prop_ro(name, [](HintWalkerObject& self) {
+    if (!(self.*Made).is_valid()) {
+      CNodeToTextConverter* converter = &(self.hints().*Converter)();
+      self.*Made = NewConverterObject(std::shared_ptr<CNodeToTextConverter>(self.walker, converter));
+    }
+    return self.*Made;
+  });
+}
+
+int TraverseHintWalker(PyObject* self, visitproc visit, void* arg) {
+  if (const int result = Traverse(self, visit, arg); result != 0 || !nb::inst_ready(self)) return result;
+  auto& object = *nb::inst_ptr<HintWalkerObject>(self);
+  // Never cleared: the core has its address. A walker's cycle goes by its line or its dict.
+  Py_VISIT(object.general_node_walker.ptr());
+  Py_VISIT(object.hint_parser.ptr());
+  return 0;
+}
+
+int ClearHintWalker(PyObject* self) {
+  Clear(self);
+  if (!nb::inst_ready(self)) return 0;
+  nb::object parser = std::exchange(nb::inst_ptr<HintWalkerObject>(self)->hint_parser, {});
+  return 0;
+}
+
+const PyType_Slot kHintSlots[] = {{Py_tp_traverse, reinterpret_cast<void*>(TraverseHintWalker)},
+                                  {Py_tp_clear, reinterpret_cast<void*>(ClearHintWalker)},
+                                  {0, nullptr}};
+
 void BindHintWalker(nb::module_& m) {
-  HintClass cls(m, "CTypeHintWalker", "Finds type information in a statement and records it on its logical line.");
+  HintClass cls(m, "CTypeHintWalker", nb::type_slots(kHintSlots),
+                "Finds type information in a statement and records it on its logical line.");
   cls.def("__init__", &InitHintWalker, nb::arg("version_triple"), nb::arg("grammar_file"),
           nb::arg("general_node_walker"));
   cls.def_prop_rw(
@@ -327,15 +404,18 @@ void BindHintWalker(nb::module_& m) {
     }
     return self.hint_parser;
   });
+  DefConverter<&HintWalkerObject::name_conv, &CTypeHintWalker::name_conv>(cls, "_fNameConv");
+  DefConverter<&HintWalkerObject::hint_conv, &CTypeHintWalker::hint_conv>(cls, "_fHintConv");
   cls.def_prop_ro("_fGeneralNodeWalker", [](HintWalkerObject& self) { return self.general_node_walker; });
   cls.def(
       "Walk",
       [](HintWalkerObject& self, Any node, Any logical, Truth first_in_def) {
         CNode* root = NodeOrNull(node);
         LineObject& line = LineOf(logical);
-        Recording recording(&line);
-        self.logical = nb::borrow(logical);
-        self.walker->Walk(root, &line.line(), first_in_def);
+        if (root != nullptr) RefuseSecondWalk(self);
+        const WalkOfHost walk(self, logical);
+        const Recording recording(&line);
+        self.hints().WalkAnyTree(root, &line.line(), first_in_def);
       },
       nb::arg("node"), nb::arg("logical"), nb::arg("first_in_def"));
   cls.def(

@@ -13,6 +13,13 @@
 namespace quillet::host {
 namespace {
 
+// Around an operation that the host calls by name.
+struct OperationByName {
+  explicit OperationByName(WalkerObject& self) : recording(self.walker->fLogical), under_way(*self.walker) {}
+  Recording recording;
+  CNodeWalker::Operation under_way;
+};
+
 // ---- operations on one node ----
 
 template <auto Operation>
@@ -21,7 +28,7 @@ template <class T, void (CNodeWalker::*Operation)(T*)>
 struct Visit<Operation> {
   static void Call(WalkerObject& self, Any node) {
     NodeRef& ref = RefOf(node, NodeKindRange<T>::kFirst);
-    Recording recording(self.walker->fLogical);
+    const OperationByName operation(self);
     (self.walker.get()->*Operation)(static_cast<T*>(ref.node()));
   }
 };
@@ -40,7 +47,7 @@ template <void (CNodeWalker::*Operation)(Text)>
 void RecordName(WalkerObject& self, Any name) {
   HostText keep;
   const Text text = TextArgument(name, keep, false);
-  Recording recording(self.walker->fLogical);
+  const OperationByName operation(self);
   (self.walker.get()->*Operation)(text);
 }
 
@@ -49,7 +56,7 @@ void RecordPair(WalkerObject& self, Any name, Any info) {
   HostText keep_name, keep_info;
   const Text name_text = TextArgument(name, keep_name, false);
   const Text info_text = TextArgument(info, keep_info, false);
-  Recording recording(self.walker->fLogical);
+  const OperationByName operation(self);
   (self.walker.get()->*Operation)(name_text, info_text);
 }
 
@@ -60,7 +67,14 @@ void BindFrame(nb::class_<WalkerObject>& cls) {
         CNode* root = NodeOrNull(node);
         if (root == nullptr) return self.walker->Walk(nullptr, nullptr);
         LineObject& line = LineOf(logical);
-        Recording recording(&line);
+        // Where the host hands in a line meanwhile, the end of the walk takes it back.
+        struct AtEnd {
+          WalkerObject& self;
+          ~AtEnd() {
+            if (self.walker->fLogical == nullptr) self.handed_in.Replace({});
+          }
+        } at_end{self};
+        const Recording recording(&line);
         self.walker->Walk(root, &line.line());
       },
       nb::arg("node"), nb::arg("logical"), "Records on `logical` what the tree says of names.");
@@ -86,7 +100,7 @@ void BindNames(nb::class_<WalkerObject>& cls) {
       "_VisitStoreContextNode",
       [](WalkerObject& self, Any node, Truth within_sub_expr) {
         NodeRef& ref = RefOf(node);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->VisitStoreContextNode(ref.node(), within_sub_expr);
       },
       nb::arg("node"), nb::arg("within_sub_expr") = false);
@@ -100,7 +114,7 @@ void BindNames(nb::class_<WalkerObject>& cls) {
         std::vector<CNode*> trailers;
         if (!all_trailers.is_none()) trailers = NodesOf(all_trailers, NodeKind::kCTrailer);
         const int64_t index = Int64Of(trailer_i);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->VisitNameLiteral(ref.node(), atom, trailers, index, !all_trailers.is_none());
       },
       nb::arg("node"), nb::arg("atom_node"), nb::arg("all_trailers"), nb::arg("trailer_i"));
@@ -113,7 +127,7 @@ void BindNames(nb::class_<WalkerObject>& cls) {
       [](WalkerObject& self, Any atom_node, Any all_trailers) {
         NodeRef& atom = RefOf(atom_node);
         const std::vector<CNode*> trailers = NodesOf(all_trailers, NodeKind::kCTrailer);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->VisitAtomPlusTrailers(atom.node(), trailers);
       },
       nb::arg("atom_node"), nb::arg("all_trailers"));
@@ -133,7 +147,7 @@ void BindDefinitions(nb::class_<WalkerObject>& cls) {
       "_ProcessDefiningArgList",
       [](WalkerObject& self, Any arg_list) {
         const ArgList args = ArgListOf(arg_list);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->ProcessDefiningArgList(args);
       },
       nb::arg("arg_list"));
@@ -141,7 +155,7 @@ void BindDefinitions(nb::class_<WalkerObject>& cls) {
       "_ProcessLambdaDefiningArgList",
       [](WalkerObject& self, Any arg_list) {
         const ArgList args = ArgListOf(arg_list);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->ProcessLambdaDefiningArgList(args);
       },
       nb::arg("arg_list"));
@@ -169,7 +183,7 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
         CNode* value = NodeOrNull(rhs);
         HostText keep;
         const Text trailer = TextArgument(extra_trailer, keep);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->ProcessTargets(target.node(), value, trailer);
       },
       nb::arg("lhs"), nb::arg("rhs"), nb::arg("extra_trailer") = nb::none());
@@ -179,7 +193,7 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
         NodeRef& atom_ref = RefOf(atom);
         const std::vector<CNode*> trailers = NodesOf(prev_trailers, NodeKind::kCTrailer);
         CNode* args = RefOf(arglist).node();
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->VisitCall(atom_ref.node(), trailers, args);
       },
       nb::arg("atom"), nb::arg("prev_trailers"), nb::arg("arglist"));
@@ -189,7 +203,7 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
         HostText keep;
         const Text name = TextArgument(func_name, keep);
         const UsedArgList args = UsedArgsOf(arg_list);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->ProcessFunctionCall(name, args);
       },
       nb::arg("func_name"), nb::arg("arg_list"));
@@ -197,7 +211,7 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
       "_ProcessIsInstanceCall",
       [](WalkerObject& self, Any arg_list) {
         const UsedArgList args = UsedArgsOf(arg_list);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->ProcessIsInstanceCall(args);
       },
       nb::arg("arg_list"));
@@ -211,7 +225,7 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
         CNode* equiv = NodeOrNull(equiv_node);
         HostText keep;
         const Text trailer = TextArgument(extra_trailer, keep);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->AppendEquivNode(name.node(), equiv, trailer);
       },
       nb::arg("name_node"), nb::arg("equiv_node"), nb::arg("extra_trailer") = nb::none());
@@ -221,7 +235,7 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
         NodeRef& name = RefOf(name_node);
         CNode* equiv = NodeOrNull(equiv_node);
         const int64_t index = Int64Of(subscript);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->AppendSubscriptedEquivNode(name.node(), equiv, index);
       },
       nb::arg("name_node"), nb::arg("equiv_node"), nb::arg("subscript"));
@@ -231,7 +245,7 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
         NodeRef& name = RefOf(name_node);
         HostText keep;
         const Text text = TextArgument(istr, keep, false);
-        Recording recording(self.walker->fLogical);
+        const OperationByName operation(self);
         self.walker->AddNodeInfoStr(name.node(), text);
       },
       nb::arg("name_node"), nb::arg("istr"));
@@ -255,6 +269,23 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
   cls.def("_AddNameDefined", &RecordName<&CNodeWalker::AddNameDefined>, nb::arg("name"));
   cls.def("_AddArgNameDefined", &RecordName<&CNodeWalker::AddArgNameDefined>, nb::arg("name"));
 }
+
+int Traverse(PyObject* self, visitproc visit, void* arg) {
+  Py_VISIT(Py_TYPE(self));
+  if (!nb::inst_ready(self)) return 0;
+  return nb::inst_ptr<WalkerObject>(self)->handed_in.Traverse(visit, arg);
+}
+
+int Clear(PyObject* self) {
+  if (!nb::inst_ready(self)) return 0;
+  auto& object = *nb::inst_ptr<WalkerObject>(self);
+  if (object.handed_in.line.is_valid()) object.walker->SetLogical(nullptr);
+  object.handed_in.Replace({});
+  return 0;
+}
+
+const PyType_Slot kSlots[] = {
+    {Py_tp_traverse, reinterpret_cast<void*>(Traverse)}, {Py_tp_clear, reinterpret_cast<void*>(Clear)}, {0, nullptr}};
 
 template <class Value, Value CNodeWalker::*Field>
 void DefFlag(nb::class_<WalkerObject>& cls, const char* name) {
@@ -301,8 +332,11 @@ nb::object StoredNames(WalkerObject& self) {
 
 void BindFields(nb::class_<WalkerObject>& cls) {
   cls.def_prop_rw(
-      "_fLogical", [](WalkerObject& self) { return HostLineOf(self.walker->fLogical, self.logical); },
-      [](WalkerObject& self, Any value) { SetHostLine(value, self.walker->fLogical, self.logical); }, nb::arg("value"));
+      "_fLogical", [](WalkerObject& self) { return HostLineOf(self.walker->fLogical, self.handed_in); },
+      [](WalkerObject& self, Any value) {
+        self.handed_in.HandIn(value, [&self](LogicalLine* line) { self.walker->SetLogical(line); });
+      },
+      nb::arg("value"));
   DefFlag<bool, &CNodeWalker::fLoadNameContext>(cls, "_fLoadNameContext");
   DefFlag<bool, &CNodeWalker::fStoreWithinSubExpr>(cls, "_fStoreWithinSubExpr");
   cls.def_prop_ro("_fLoadedNames", &LoadedNames);
@@ -328,27 +362,16 @@ nb::object NewWalkerObject(std::shared_ptr<CNodeWalker> walker) {
   return nb::cast(WalkerObject{std::move(walker), {}, {}});
 }
 
-void SetHostLine(nb::handle value, LogicalLine*& line, nb::object& handed_in) {
-  if (value.is_none()) {
-    line = nullptr;
-    handed_in.reset();
-    return;
-  }
-  LineObject& object = LineOf(value);
-  object.BeginWriting();
-  line = &object.line();
-  handed_in = nb::borrow(value);
-}
-
-nb::object HostLineOf(LogicalLine* line, const nb::object& handed_in) {
+nb::object HostLineOf(LogicalLine* line, const HandedInLine& handed_in) {
   if (line == nullptr) return nb::none();
-  if (handed_in.is_valid() && &LineOf(handed_in).line() == line) return handed_in;
+  if (handed_in.line.is_valid() && &LineOf(handed_in.line).line() == line) return handed_in.line;
   auto* object = dynamic_cast<LineObject*>(line->hooks);
   return object == nullptr ? nb::object(nb::none()) : nb::borrow(object->self());
 }
 
 void BindWalker(nb::module_& tarvex) {
-  nb::class_<WalkerObject> cls(tarvex, "CNodeWalker", "Turns a statement's tree into records on its logical line.");
+  nb::class_<WalkerObject> cls(tarvex, "CNodeWalker", nb::type_slots(kSlots),
+                               "Turns a statement's tree into records on its logical line.");
   cls.def(
       "__init__",
       [](WalkerObject* self, Any version_triple) {

@@ -5,19 +5,22 @@
 
 #include "hints/hint_walker.h"
 #include "quillet/tarvex/bindings.h"
+#include "quillet/tarvex/walker_object.h"
 
 namespace quillet::host {
 
 struct DispatchObject {
   std::shared_ptr<CDispatchWalker> walker;
   nb::object dispatch_dict;  // the host's dict, or made when read
-  nb::object logical;        // the line that the host handed in
+  HandedInLine handed_in;    // during a walk of the host's its line
 };
 
 struct HintWalkerObject : DispatchObject {
   CTypeHintWalker& hints() const { return static_cast<CTypeHintWalker&>(*walker); }
   nb::object general_node_walker;  // a CNodeWalker object or None; keeps the walker alive
-  nb::object hint_parser;          // made when read
+  nb::object hint_parser;          // made when read, as are the converters
+  nb::object name_conv;
+  nb::object hint_conv;
   nb::object version_triple;
 };
 

@@ -44,6 +44,17 @@ bool VisitAndStop(CDispatchWalker&, CNode* node) {
   return false;
 }
 
+// Visits of a host's, by a function.
+template <class Function>
+class Visits final : public CDispatchWalker::HostVisits {
+ public:
+  explicit Visits(Function function) : function_(std::move(function)) {}
+  bool Visit(CNode* node) override { return function_(node); }
+
+ private:
+  Function function_;
+};
+
 Names WalkBy(Text text, NodeKind kind, CDispatchWalker::Entry entry) {
   Visited().clear();
   CDispatchWalker::Table table;
@@ -76,10 +87,11 @@ TEST(DispatchWalker, SubclassesHaveNoPartInAnEntryOfTheirBase) {
 TEST(DispatchWalker, AHostDecidesForEveryNode) {
   CDispatchWalker walker(CDispatchWalker::Table{});
   Names seen;
-  walker.host_visit = [&](CNode* node) {
+  Visits visits([&](CNode* node) {
     seen.push_back(testing::ShowTree(node));
     return !isa<CTrailer>(node);
-  };
+  });
+  walker.host_visits = &visits;
   const testing::ParsedLine line("f(a)");
   walker.Walk(line.root(), &line.line(), false);
   EXPECT_EQ(seen, (Names{"atom_expr(f trailer(( a )))", "f", "trailer(( a ))"}));
@@ -88,10 +100,11 @@ TEST(DispatchWalker, AHostDecidesForEveryNode) {
 TEST(DispatchWalker, TheStackHoldsTheAncestors) {
   CDispatchWalker walker(CDispatchWalker::Table{});
   size_t deepest = 0;
-  walker.host_visit = [&](CNode*) {
+  Visits visits([&](CNode*) {
     deepest = std::max(deepest, walker.fNodeStack.size());
     return true;
-  };
+  });
+  walker.host_visits = &visits;
   const testing::ParsedLine line("f(a)");
   walker.Walk(line.root(), &line.line(), false);
   EXPECT_EQ(deepest, 3u);
@@ -149,9 +162,9 @@ TEST(DispatchWalker, ASecondWalkIsRefusedAndDoesNotDisturbTheFirst) {
   CDispatchWalker walker(CDispatchWalker::Table{});
   const testing::ParsedLine line("f(a)");
   std::string refusal;
-  int visits = 0;
-  walker.host_visit = [&](CNode*) {
-    if (++visits == 1) {
+  int visit_count = 0;
+  Visits visits([&](CNode*) {
+    if (++visit_count == 1) {
       try {
         walker.Walk(line.root(), &line.line(), false);
       } catch (const Error& error) {
@@ -159,20 +172,22 @@ TEST(DispatchWalker, ASecondWalkIsRefusedAndDoesNotDisturbTheFirst) {
       }
     }
     return true;
-  };
+  });
+  walker.host_visits = &visits;
   walker.Walk(line.root(), &line.line(), false);
   EXPECT_EQ(refusal, "Only one logical may be walked at a time");
-  EXPECT_EQ(visits, 6);
+  EXPECT_EQ(visit_count, 6);
 }
 
 TEST(DispatchWalker, AnExceptionOfAVisitPassesAndLeavesTheWalkerIdle) {
   CDispatchWalker walker(CDispatchWalker::Table{});
   const testing::ParsedLine line("f(a)");
   bool fail = true;
-  walker.host_visit = [&](CNode* node) -> bool {
+  Visits visits([&](CNode* node) -> bool {
     if (fail && isa<CTrailer>(node)) ThrowError(ErrorKind::kKeyError, "k");
     return true;
-  };
+  });
+  walker.host_visits = &visits;
   EXPECT_THROW(walker.Walk(line.root(), &line.line(), false), Error);
   EXPECT_EQ(walker.fLogical, nullptr);
   EXPECT_EQ(walker.fVisitCount, 0);
@@ -504,6 +519,30 @@ TEST(HintWalk, ATreeTooDeepPrintsItsLineAndTheAnalysisGoesOn) {
   EXPECT_EQ(Analyze(source).error, "");
   EXPECT_EQ(capture.PrintedLines().size(), 2u);  // one of each walker
   EXPECT_TRUE(capture.PrintedLines()[1].ends_with("Maximum recurse count in _VisitNode exceeded"));
+}
+
+// An engine of a host's may make a tree that the line says nothing of.
+TEST(HintWalk, ATreeLargerThanItsLineReachesTheLimits) {
+  const ConsoleCapture capture;
+  LogicalLine line;
+  HintWalker().Walk(Chain(40).root(), &line, false);
+  EXPECT_EQ(capture.PrintedLines(), Names{});
+  HintWalker().Walk(Chain(100000).root(), &line, false);
+  const Ref<NodePool> pool(new NodePool);
+  CNode* knot = pool->Construct(NodeKind::kCNode, nullptr);
+  CNode** children = pool->ResizeChildren(knot, 300);
+  CNode* bush = pool->Construct(NodeKind::kCNode, nullptr);
+  CNode** twigs = pool->ResizeChildren(bush, 300);
+  for (uint32_t i = 0; i < 300; ++i) {
+    children[i] = bush;
+    twigs[i] = pool->Construct(NodeKind::kCNode, nullptr);
+    pool->ResizeChildren(twigs[i], 1)[0] = pool->Construct(NodeKind::kCNode, nullptr);
+  }
+  HintWalker().Walk(knot, &line, false);
+  EXPECT_EQ(capture.PrintedLines(),
+            (Names{"RuntimeError raised in CNodeWalker.Walk: Maximum recurse count in _VisitNode exceeded",
+                   "RuntimeError raised in CNodeWalker.Walk: Maximum number of calls to _VisitNode exceeded"}));
+  EXPECT_EQ(HintWalker().fVisitCount, 0);
 }
 
 TEST(HintWalk, DeeplyNestedTuplesEndInALimit) {

@@ -4,10 +4,11 @@ from __future__ import annotations
 
 import gc
 import weakref
+from collections.abc import Callable
 
 import pytest
 
-from lines import analyzer, expression, line_of, parse, records
+from lines import analyzer, expression, line_of, parse, parser, records
 from quillet.logicalline import CLogicalLine
 from quillet.symbolinfo import kTypeHintPrefix
 from quillet.tarvex import (
@@ -17,7 +18,9 @@ from quillet.tarvex import (
     CFuncdefStmt,
     CNameLiteral,
     CNode,
+    CNodeToTextConverterImpl,
     CNodeWalker,
+    CTrailer,
     CTypeHintWalker,
     kPy3DefaultGrammar,
 )
@@ -120,6 +123,80 @@ def test_the_visits_of_a_walk(capsys: pytest.CaptureFixture[str]) -> None:
     assert capsys.readouterr().out == ""
 
 
+def test_a_visit_may_visit_the_children_by_itself() -> None:
+    seen: list[str | None] = []
+
+    def visit_children(walker: CDispatchWalker, node: CNode) -> bool:
+        for child in node.fChildren or []:
+            walker._VisitNode(child)
+        return False
+
+    walker = CDispatchWalker({CNameLiteral: lambda walker, node: seen.append(node.fText), CTrailer: visit_children})
+    walker.Walk(parse("f(a, b)(c)"), CLogicalLine(), False)
+    assert seen == ["f", "a", "b", "c"]
+
+
+def test_a_visit_may_visit_the_nodes_of_another_source() -> None:
+    seen: list[str | None] = []
+
+    def visit(walker: CDispatchWalker, node: CNode) -> None:
+        if not seen:
+            seen.append(None)
+            other = parser().ParseToNode(line_of("other_a.other_b"), False)
+            walker._VisitNode(other)
+            parser().DiscardNode(other)
+        seen.append(node.fText)
+
+    CDispatchWalker({CNameLiteral: visit}).Walk(parse("first(second)"), CLogicalLine(), False)
+    assert seen == [None, "other_a", "other_b", "first", "second"]
+
+
+@pytest.mark.parametrize(
+    "make",
+    [lambda: CDispatchWalker({}), lambda: CTypeHintWalker(V3, kPy3DefaultGrammar, None)],
+    ids=["dispatch", "hints"],
+)
+def test_a_walk_lets_go_of_its_line(make: Callable[[], CDispatchWalker]) -> None:
+    class Line(CLogicalLine):
+        pass
+
+    walker, line = make(), Line()
+    walker.Walk(expression("x"), line, False)
+    assert walker._fLogical is None
+    gone = weakref.ref(line)
+    del line
+    assert gone() is None
+
+    line = Line()
+    line.walker = walker
+    walker._fLogical = line
+    gone = weakref.ref(line)
+    del line, walker
+    gc.collect()
+    assert gone() is None
+
+
+def test_a_line_that_a_visit_hands_in_is_taken_back_at_the_end() -> None:
+    class Line(CLogicalLine):
+        pass
+
+    gone: list[weakref.ref[CLogicalLine]] = []
+
+    def visit(walker: CDispatchWalker, node: CNode) -> None:
+        line = Line()
+        gone.append(weakref.ref(line))
+        walker._fLogical = line
+        assert walker._fLogical is line
+        assert [ref() for ref in gone] != [None] * len(gone)
+
+    walker = CDispatchWalker({CNameLiteral: visit})
+    walker.Walk(parse("f(a)"), CLogicalLine(), False)
+    assert walker._fLogical is None
+    walker.Walk(parse("f()"), CLogicalLine(), False)
+    gc.collect()
+    assert [ref() for ref in gone] == [None] * 3
+
+
 def test_what_a_visit_raises() -> None:
     def fail(walker: CDispatchWalker, node: CNode) -> None:
         raise LookupError("here")
@@ -219,6 +296,13 @@ def test_construction_of_a_hint_walker() -> None:
     assert walker._fGeneralNodeWalker is general
     assert walker._fCommentHintCount == 0
     assert walker._fHintParser is walker._fHintParser
+    for converter in ("_fNameConv", "_fHintConv"):
+        assert isinstance(getattr(walker, converter), CNodeToTextConverterImpl)
+        assert getattr(walker, converter) is getattr(walker, converter)
+        with pytest.raises(AttributeError):
+            setattr(walker, converter, CNodeToTextConverterImpl())
+    assert walker._fNameConv.TextForNode(expression("a[b]")) == b"a[]"
+    assert walker._fHintConv.TextForNode(expression("a['b']")) == b"a['b']"
     assert walker._fDispatchDict[CNameLiteral] is False
     assert walker._fDispatchDict[CFuncdefStmt] is CTypeHintWalker._VisitFuncdefStmt
     assert CTypeHintWalker(V3, kPy3DefaultGrammar, None)._fGeneralNodeWalker is None
@@ -343,3 +427,119 @@ def test_a_host_walks_hints_by_itself() -> None:
     walker.Walk(parse("x: int = 1"), line, False)
     assert line.fTypeEquivs == [(b"x", hint("int"))]
     assert type(parse("x: int = 1")) is CExprStmt
+
+
+def test_the_base_operations_go_by_the_dict_of_a_hint_walker(capsys: pytest.CaptureFixture[str]) -> None:
+    walker, line = walker_on("x: int = 1")
+    CDispatchWalker._VisitNode(walker, parse("x: int = 1"))
+    assert line.fTypeEquivs == [(b"x", hint("int"))]
+    walker._fLogical = None
+    line = line_of("y: int = 1")
+    CDispatchWalker.Walk(CTypeHintWalker(V3, kPy3DefaultGrammar, None), parse("y: int = 1"), line, False)
+    assert line.fTypeEquivs == [(b"y", hint("int"))]
+    CDispatchWalker.Walk(walker, nested(100000), line_of("x"), False)
+    assert capsys.readouterr().out.endswith("Maximum recurse count in _VisitNode exceeded\n")
+
+
+def nested(depth: int) -> CNode:
+    node = CNode()
+    for _ in range(depth - 1):
+        outer = CNode()
+        outer.fChildren = [node]
+        node = outer
+    return node
+
+
+def wide(visits: int) -> CNode:
+    node = CNode()
+    node.fChildren = [CNode() for _ in range(visits - 1)]
+    return node
+
+
+def knot() -> CNode:
+    node = CNode()
+    node.fChildren = [node, node]
+    return node
+
+
+@pytest.mark.parametrize(
+    ("tree", "message"),
+    [
+        (lambda: nested(40), None),
+        (lambda: nested(41), "Maximum recurse count in _VisitNode exceeded"),
+        (lambda: nested(200000), "Maximum recurse count in _VisitNode exceeded"),
+        (knot, "Maximum recurse count in _VisitNode exceeded"),
+        (lambda: wide(10000), None),
+        (lambda: wide(10001), "Maximum number of calls to _VisitNode exceeded"),
+    ],
+)
+def test_the_limits_of_a_walk_for_hints(
+    tree: Callable[[], CNode], message: str | None, capsys: pytest.CaptureFixture[str]
+) -> None:
+    walker = CTypeHintWalker(V3, kPy3DefaultGrammar, None)
+    walker.Walk(tree(), line_of("x"), False)
+    expected = "" if message is None else f"RuntimeError raised in CNodeWalker.Walk: {message}\n"
+    assert capsys.readouterr().out == expected
+    assert (walker._fLogical, walker._fVisitCount, walker._fNodeStack) == (None, 0, [])
+
+
+def test_a_refused_walk_leaves_the_line_that_was_handed_in() -> None:
+    class Line(CLogicalLine):
+        pass
+
+    for make in (lambda: CDispatchWalker({}), lambda: CTypeHintWalker(V3, kPy3DefaultGrammar, None)):
+        walker, line = make(), Line()
+        walker._fLogical = line
+        kept = weakref.ref(line)
+        del line
+        with pytest.raises(ValueError, match=r"^Only one logical may be walked at a time$"):
+            walker.Walk(expression("x"), CLogicalLine(), False)
+        gc.collect()
+        assert walker._fLogical is kept()
+        assert walker._fLogical is not None
+    assert isinstance(walker, CTypeHintWalker)
+    walker._AddSymInfo("a", "b", False)
+    assert walker._fLogical.fTypeEquivs == [(b"a", b"b")]
+    walker.Walk(None, CLogicalLine(), True)
+    assert walker._fLogical is kept()
+    walker._fLogical = None
+
+
+@pytest.mark.parametrize(
+    ("operation", "wanted"),
+    [
+        ("_VisitExprStmt", "CExprStmt"),
+        ("_VisitForStmt", "CForStmt"),
+        ("_VisitWithStmt", "CWithStmt"),
+        ("_VisitFuncdefStmt", "CFuncdefStmt"),
+    ],
+)
+def test_visits_of_statements_are_typed(operation: str, wanted: str) -> None:
+    walker, _ = walker_on("x = 1  # type: int")
+    with pytest.raises(TypeError, match=f"^Expected {wanted}, got CClassdefStmt$"):
+        getattr(walker, operation)(parse("class C(a):"))
+    with pytest.raises(TypeError, match=f"^Expected {wanted}, got NoneType$"):
+        getattr(walker, operation)(None)
+
+
+def test_rows_of_a_tree_without_an_end() -> None:
+    walker, _ = walker_on("x")
+    with pytest.raises(RecursionError, match=r"^maximum recursion depth exceeded$"):
+        walker._GetRowRange(knot())
+
+
+def test_annotations_need_no_signature() -> None:
+    def used_nodes(walker: CTypeHintWalker) -> list[str]:
+        """The classes of which the parser of hints ever made a node."""
+        return [info.fName for info in walker._fHintParser._fNodeFactory._fClassInfoList if info.fFirstFree is not None]
+
+    walker = CTypeHintWalker(V3, kPy3DefaultGrammar, CNodeWalker(V3))
+    line = line_of("def f(a: int, *b: str) -> bool:")
+    walker.Walk(parse("def f(a: int, *b: str) -> bool:"), line, False)
+    assert line.fArgTypeEquivs == [(b"a", hint("int")), (b"b", hint("str")), (b"return", hint("bool"))]
+    assert line.fTypeEquivs is None
+    assert used_nodes(walker) == []
+    line = line_of("def f(a: int):  # type: (str) -> bool")
+    line.AppendArgTypeEquiv(b"a", b":s:")
+    walker.Walk(parse("def f(a: int):  # type: (str) -> bool"), line, False)
+    assert used_nodes(walker) != []

@@ -2,6 +2,9 @@
 
 from __future__ import annotations
 
+import gc
+import weakref
+
 import pytest
 
 from lines import expression, line_of, parse, parser
@@ -221,3 +224,164 @@ def test_records_of_a_walk_join_a_list_that_the_host_holds() -> None:
     CNodeWalker(V3).Walk(parse("x"), line)
     assert held == [(b"first", b"info"), (b"x", kGetPrefix)]
     assert line.fTypeEquivs is held
+
+
+# ---- a host that is called back in the middle of a walk ----
+
+
+def names_of(line: CLogicalLine) -> list[str]:
+    return [name.decode() for name, _ in line.fTypeEquivs or []]
+
+
+def test_a_line_that_is_handed_in_during_a_walk_gets_the_rest() -> None:
+    walker = CNodeWalker(V3)
+    other = line_of("m = 1")
+
+    class Line(CLogicalLine):
+        def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+            walker._fLogical = other
+
+    names = [f"a_name_of_its_own_{i}" for i in range(40)]
+    line = Line()
+    line.fToks = line_of("global " + ", ".join(names)).fToks
+    node = parser().ParseToNode(line, False)
+    walker.Walk(node, line)
+    parser().DiscardNode(node)
+    del line, node, Line
+    gc.collect()
+    assert [len(line_of(f"{'z' * length} = 1").fToks) for length in range(1, 400)] == [3] * 399
+    assert names_of(other) == names[1:]
+    assert walker._fLogical is None
+
+
+def test_reads_of_one_line_are_recorded_on_another() -> None:
+    walker = CNodeWalker(V3)
+    other = line_of("m = 1")
+
+    class Line(CLogicalLine):
+        def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+            walker._fLogical = other
+
+    line = Line()
+    line.fToks = line_of("target = [first . second for third in fourth]").fToks
+    walker.Walk(parser().ParseToNode(line, False), line)
+    del line, Line
+    gc.collect()
+    assert sorted(set(names_of(other))) == ["first", "first.second", "fourth", "target", "third"]
+
+
+def test_a_line_that_was_replaced_stays_while_it_is_worked_on() -> None:
+    walker = CNodeWalker(V3)
+    gone: list[weakref.ref[CLogicalLine]] = []
+    seen: list[bool] = []
+
+    class Line(CLogicalLine):
+        def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+            line = Line()
+            gone.append(weakref.ref(line))
+            walker._fLogical = line
+            seen.extend(ref() is not None for ref in gone)
+
+    line = Line()
+    walker.Walk(parse("global a, b, c, d"), line)
+    assert seen == [True] * 10
+    gc.collect()
+    assert [ref() for ref in gone] == [None] * 4
+
+
+def test_no_walk_begins_while_an_operation_is_under_way() -> None:
+    walker = CNodeWalker(V3)
+    refused: list[str] = []
+
+    class Line(CLogicalLine):
+        def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+            walker._fLogical = None
+            with pytest.raises(ValueError, match=r"^Only one logical may be walked at a time$"):
+                walker.Walk(expression("y"), CLogicalLine())
+            refused.append(name.decode())
+            walker._fLogical = self
+
+    walker.Walk(parse("[a for b in c]"), Line())
+    assert refused == ["a", "c", "b"]
+    refused.clear()
+    walker._fLogical = Line()
+    walker._VisitNode(parse("x = 1"))
+    assert refused == ["x", "x"]
+    walker._fLogical = None
+    assert walk("x", walker) == [(b"x", kGetPrefix)]
+
+
+def test_names_of_operations_by_name_outlive_the_line() -> None:
+    walker = CNodeWalker(V3)
+    names = [f"a_name_of_some_length_{i}" for i in range(20)]
+    walker._fLogical = line_of("x")
+    for name in names:
+        walker._VisitNode(expression(name))
+    walker._VisitStoreContextNode(expression("a_stored_name_of_some_length"), True)
+    walker._fLogical = None
+    gc.collect()
+    assert [len(line_of(f"{'z' * length} = 1").fToks) for length in range(1, 400)] == [3] * 399
+    assert list(walker._fLoadedNames) == names
+    line = line_of("other")
+    walker.Walk(expression("other"), line)
+    walker.Walk(expression("again"), line_of("again"))
+    assert names_of(line) == [*names, "other", "a_stored_name_of_some_length"]
+
+
+def test_stores_that_join_while_stores_are_recorded() -> None:
+    walker = CNodeWalker(V3)
+    added = iter(range(200))
+
+    class Line(CLogicalLine):
+        def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+            super().AppendTypeEquiv(name, equiv)
+            if equiv.startswith(b":w:"):
+                for i in added:
+                    walker._VisitStoreContextNode(expression(f"added_{i}"), True)
+
+    line = Line()
+    walker.Walk(parse("[x for x in y for x in z]"), line)
+    stores = [name.decode() for name, info in line.fTypeEquivs or [] if info.startswith(b":w:")]
+    assert stores == ["x", "x", *(f"added_{i}" for i in range(200))]
+
+
+def test_questions_between_the_records_of_an_import() -> None:
+    walker = CNodeWalker(V3)
+    questions = [expression("'a text' + b + c"), expression("[1, 2]"), expression("f(d.e)")]
+
+    class Line(CLogicalLine):
+        def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+            super().AppendTypeEquiv(name, equiv)
+            for question in questions:
+                walker._TypeEquivForNode(question)
+                walker._fToText.TextForNode(question)
+            walker._VisitFromImport(inner)
+
+    text = "from a.b import c as d, e, f"
+    inner = parse("from q import *")
+    line = Line()
+    asked = Line.AppendTypeEquiv
+
+    def ask_once(self: CLogicalLine, name: bytes, equiv: bytes) -> None:
+        Line.AppendTypeEquiv = CLogicalLine.AppendTypeEquiv
+        asked(self, name, equiv)
+        Line.AppendTypeEquiv = ask_once
+
+    Line.AppendTypeEquiv = ask_once
+    walker.Walk(parse(text), line)
+    recorded = [record for record in line.fTypeEquivs or [] if record[0] != b"*"]
+    assert recorded == walk(text)
+    assert len(line.fTypeEquivs or []) == 2 * len(recorded)
+
+
+def test_a_walker_and_its_line_are_collected_together() -> None:
+    class Line(CLogicalLine):
+        pass
+
+    line = Line()
+    line.walker = walker = CNodeWalker(V3)
+    walker._fLogical = line
+    gone = weakref.ref(line)
+    del line, walker
+    gc.collect()
+    assert gone() is None
