@@ -29,6 +29,10 @@ nb::object NewConverterObject(std::shared_ptr<CNodeToTextConverter> converter) {
 }
 
 void BindText(nb::module_& tarvex) {
+  PyObject* const literal_names = PyFrozenSet_New(nb::make_tuple("None", "True", "False").ptr());
+  if (literal_names == nullptr) throw nb::python_error();
+  tarvex.attr("kLiteralNameTexts") = nb::steal(literal_names);
+
   nb::class_<ConverterBase> base(tarvex, "CNodeToTextConverter", "Gives a node's text, or None.");
   base.def(nb::init<>());
   base.def(

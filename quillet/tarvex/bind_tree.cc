@@ -62,7 +62,6 @@ template <class T>
 void InitNode(nb::pointer_and_handle<NodeHandle<T>> self, Any cls_info) {
   constexpr NodeKind kind = NodeKindRange<T>::kFirst;
   CNodeClassInfo* info = InfoOrNull(cls_info);
-  if (info != nullptr && info->kind != kind) ThrowError(ErrorKind::kTypeError, "the record is one of another class");
   CNode* node = info == nullptr ? NewBareNode(kind) : info->pool->Construct(kind, info);
   auto* handle = new (self.p) NodeHandle<T>();
   handle->Attach(self.h.ptr(), node, {});

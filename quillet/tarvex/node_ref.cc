@@ -373,8 +373,9 @@ void ConstructHandle(void* storage) {
 }
 
 nb::object NewWrapper(CNode* node, Ref<SourceText> source) {
-  nb::object instance =
-      nb::inst_alloc(node->fClsInfo == nullptr ? ClassOfKind(node->kind) : ClassOfInfo(node->fClsInfo));
+  // A host may have made the node of another class than that of its record.
+  const bool is_of_class_of_record = node->fClsInfo != nullptr && node->fClsInfo->kind == node->kind;
+  nb::object instance = nb::inst_alloc(is_of_class_of_record ? ClassOfInfo(node->fClsInfo) : ClassOfKind(node->kind));
   switch (node->kind) {
 #define QUILLET_NODE(name, base)                         \
   case NodeKind::k##name:                                \
@@ -485,10 +486,16 @@ NodeRef* RefOrNull(nb::handle object, NodeKind wanted) { return object.is_none()
 
 std::vector<CNode*> NodesOf(nb::handle list, NodeKind wanted, bool none) {
   if (!PyList_Check(list.ptr()) && !PyTuple_Check(list.ptr())) ThrowExpected("list", list);
-  std::vector<CNode*> nodes;
-  for (nb::handle item : list) {
-    nodes.push_back(none && item.is_none() ? nullptr : RefOf(item, wanted).node());
+  const auto is_absent = [none](nb::handle item) { return none && item.is_none(); };
+  const auto count = [list] { return PySequence_Fast_GET_SIZE(list.ptr()); };
+  const auto item = [list](Py_ssize_t i) { return nb::handle(PySequence_Fast_GET_ITEM(list.ptr(), i)); };
+  for (Py_ssize_t i = 0; i < count(); ++i) {
+    if (!is_absent(item(i))) RefOf(item(i), wanted);
   }
+  // Nothing of the host's runs from here on, so that the list still holds all that is returned.
+  std::vector<CNode*> nodes;
+  for (Py_ssize_t i = 0; i < count(); ++i)
+    nodes.push_back(is_absent(item(i)) ? nullptr : CheckedRef(item(i), wanted).node());
   return nodes;
 }
 

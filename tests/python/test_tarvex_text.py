@@ -5,7 +5,7 @@ from __future__ import annotations
 import pytest
 
 from lines import expression
-from quillet.tarvex import CNode, CNodeToTextConverter, CNodeToTextConverterImpl, CTrailer
+from quillet.tarvex import CNode, CNodeToTextConverter, CNodeToTextConverterImpl, CTrailer, kLiteralNameTexts
 
 PLAIN = CNodeToTextConverterImpl()
 ALL = CNodeToTextConverterImpl(True, True, True)
@@ -87,3 +87,9 @@ def test_failures() -> None:
     with pytest.raises(TypeError, match="Expected CStringLiteral, got"):
         PLAIN._TextForStringLiteral(expression("a"))
     assert STRINGS._TextForStringLiteral(expression("'a'")) == b"'a'"
+
+
+def test_the_names_that_are_literals() -> None:
+    assert type(kLiteralNameTexts) is frozenset
+    assert kLiteralNameTexts == {"None", "True", "False"}
+    assert all(PLAIN.TextForNode(expression(name), literal_only=True) for name in kLiteralNameTexts)

@@ -342,6 +342,23 @@ def test_what_a_factory_looks_at_first() -> None:
         factory().ConvertSingleNode(55, 5, None, None)
 
 
+def test_a_node_may_be_of_another_class_than_its_record() -> None:
+    info = CNodeClassInfo(CAtom, 300, "atom")
+    node = CNode(info)
+    assert node.fClsInfo is info
+    assert node.GetStateName() == "atom"
+    parent = CNode()
+    parent.fChildren = [node]
+    del node
+    shown = parent.fChildren[0]
+    assert type(shown) is CNode
+    FinishedWithNode(shown)
+    parent.fChildren = None
+    again = factory().NewNode(info, 300, None, None, [leaf("["), leaf("]")])
+    assert again is shown
+    assert type(factory().NewNode(info, 300, None, None, None)) is CAtom
+
+
 # ---- small ----
 
 
