@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <chrono>
 #include <cstdio>
 #include <fstream>
@@ -110,6 +111,20 @@ TEST(ParserConstruction, StatesThatNoTableNamesArePlainNodes) {
   EXPECT_EQ(kinds[static_cast<size_t>(grammar.symbol2number.at("if_stmt"))], NodeKind::kCIfStmt);
 }
 
+// A class may name a rule that only one of the grammars has.
+TEST(ParserConstruction, ARuleThatTheGrammarLacksChangesNothing) {
+  const auto has_class = [](Version version, NodeKind kind) {
+    const auto& kinds = ParserFor(version).kinds_for_states();
+    return std::find(kinds.begin(), kinds.end(), kind) != kinds.end();
+  };
+  EXPECT_TRUE(ParserFor(kPy2).grammar().symbol2number.contains("listmaker"));
+  EXPECT_TRUE(has_class(kPy2, NodeKind::kCListmakerNode));
+  EXPECT_FALSE(ParserFor(kPy3).grammar().symbol2number.contains("listmaker"));
+  EXPECT_FALSE(has_class(kPy3, NodeKind::kCListmakerNode));
+  EXPECT_EQ(Parse2("[a, b]"), "atom([ listmaker(a , b) ])");
+  EXPECT_EQ(Parse3("[a, b]"), "atom([ testlist_comp(a , b) ])");
+}
+
 TEST(ParserConstruction, StatesAreNamedAfterTokensAndSymbols) {
   const CNodeFactory& factory = ParserFor(kPy3).factory();
   EXPECT_EQ(factory.class_info(tok::NAME)->fName, "NAME");
@@ -200,6 +215,12 @@ TEST(Feeding, RejectionsPointAtTheTokenOrBehindTheLast) {
       {"case 1 2:", "error at 0:7"},
   };
   for (const Case& c : cases) EXPECT_EQ(Parse3(c.source), c.result) << c.source;
+}
+
+TEST(Feeding, AnArgumentListHasNoEmptyPlaces) {
+  EXPECT_EQ(Parse3("f(a,)"), "atom_expr(f trailer(( arglist(a ,) )))");
+  EXPECT_EQ(Parse3("f(a,,)"), "error at 4");
+  EXPECT_EQ(Parse2("f(a,,)"), "error at 4");
 }
 
 TEST(Feeding, CommentsAndContinuationsAreDropped) {
@@ -406,6 +427,14 @@ TEST(SpecialCases, ABoundIsParsedInItsPlace) {
   EXPECT_EQ(Parse3("def f[T: a, U: (](): pass"), "error at 2");
   // Behind the last token of the bound.
   EXPECT_EQ(Parse3("def f[T: a, U: +](): pass"), "error at 10");
+}
+
+TEST(SpecialCases, ARejectionInAMatchThatIsABoundPointsIntoTheBound) {
+  EXPECT_EQ(Parse3("match x y:"), "error at 2");
+  EXPECT_EQ(Parse3("class C[T: match x y:]: pass"), "error at 7");
+  EXPECT_EQ(Parse3("class C[T: def f[U: match x y:]: pass]: pass"), "error at 12");
+  // A pattern's has a position, which is that of the source anyhow.
+  EXPECT_EQ(Parse3("class C[T: case 1 2:]: pass"), "error at 0:18");
 }
 
 TEST(SpecialCases, BadTypeParametersAreRejectedWhereTheyStopMakingSense) {

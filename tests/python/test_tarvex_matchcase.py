@@ -219,11 +219,11 @@ def test_tokens_are_kept_as_they_are() -> None:
     assert one._fPositions is places
     assert (one._TokNode(2).fText, one._TokNode(2).fContext) == ("c", (1, 0))
     with pytest.raises(TypeError, match="Expected tuple, got list"):
-        one._fToks = ["a"]  # type: ignore[assignment]
+        one._fToks = ["a"]
     with pytest.raises(TypeError, match="Expected tuple, got list"):
-        one._fPositions = [(0, 0)]  # type: ignore[assignment]
+        one._fPositions = [(0, 0)]
     with pytest.raises(TypeError, match="Expected str, got NoneType"):
-        one._fToks = ("a", None)  # type: ignore[assignment]
+        one._fToks = ("a", None)
     assert one._fToks is toks
 
 
@@ -285,7 +285,7 @@ def test_an_error_of_a_truth_value_is_the_hosts() -> None:
             raise KeyError("odd")
 
     with pytest.raises(KeyError, match="odd"):
-        with_tokens("case x:")._NodeForPattern(1, 2, Odd())  # type: ignore[arg-type]
+        with_tokens("case x:")._NodeForPattern(1, 2, Odd())
 
 
 def test_an_index_may_replace_the_tokens() -> None:
@@ -297,7 +297,7 @@ def test_an_index_may_replace_the_tokens() -> None:
             one._fToks, one._fPositions = other.fToks, other.fPositions
             return 1
 
-    assert shape(one._NodeForPattern(Replacing(), 4)) == (  # type: ignore[arg-type]
+    assert shape(one._NodeForPattern(Replacing(), 4)) == (
         "CPatternNode",
         "c" * 40,
         "as",
