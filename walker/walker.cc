@@ -141,15 +141,19 @@ void CNodeWalker::ThrowTooMuchText() {
 
 void CNodeWalker::AddTypeEquiv(Text name, Text equiv) {
   if (direct_ == nullptr) [[unlikely]]
-    return RequireLogical().AppendTypeEquiv(name, equiv);
+    return CopyTypeEquiv(name, equiv);
   direct_->AppendStableTypeEquiv(Keep(name), Keep(equiv));
 }
 
 void CNodeWalker::AddArgInfoBytes(Text name, Text info) {
   if (direct_ == nullptr) [[unlikely]]
-    return RequireLogical().AppendArgTypeEquiv(name, info);
+    return CopyArgInfo(name, info);
   direct_->AppendStableArgTypeEquiv(Keep(name), Keep(info));
 }
+
+void CNodeWalker::CopyTypeEquiv(Text name, Text equiv) { RequireLogical().AppendTypeEquiv(name, equiv); }
+
+void CNodeWalker::CopyArgInfo(Text name, Text info) { RequireLogical().AppendArgTypeEquiv(name, info); }
 
 void CNodeWalker::AddNameDefined(Text name) { AddTypeEquiv(name, kSetPrefix); }
 

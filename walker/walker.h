@@ -203,14 +203,17 @@ class CNodeWalker {
   // For texts that Keep gave, or that are static.
   void AddStableTypeEquiv(Text name, Text equiv) {
     if (direct_ == nullptr) [[unlikely]]
-      return RequireLogical().AppendTypeEquiv(name, equiv);
+      return CopyTypeEquiv(name, equiv);
     direct_->AppendStableTypeEquiv(name, equiv);
   }
   void AddStableArgInfo(Text name, Text info) {
     if (direct_ == nullptr) [[unlikely]]
-      return RequireLogical().AppendArgTypeEquiv(name, info);
+      return CopyArgInfo(name, info);
     direct_->AppendStableArgTypeEquiv(name, info);
   }
+  // To a line that the host handed in.
+  void CopyTypeEquiv(Text name, Text equiv);
+  void CopyArgInfo(Text name, Text info);
   // Records that the kept name is defined.
   void AddKeptNameDefined(Text name) { AddStableTypeEquiv(name, kSetPrefix); }
 
