@@ -16,8 +16,8 @@ Text StarPrefix(TokenCode code) {
   return code == tok::DOUBLESTAR ? Text("**") : kNoText;
 }
 
-// More than any source nests, and little memory for a tree that a host closed to a ring.
-constexpr size_t kMaxNestedLists = size_t{1} << 18;
+// More than a source nests, and memory that a tree which a host closed to a ring may take.
+constexpr size_t kMaxNestedLists = size_t{1} << 20;
 
 std::string ReprOfTextOf(const CNode* node) { return node->IsLeaf() ? ReprOfText(node->fText()) : "None"; }
 

@@ -10,7 +10,7 @@ namespace quillet {
 namespace {
 
 // A name has one level. A host's tree may have more, but not without end.
-constexpr uint32_t kMaxNameDepth = 10'000;
+constexpr uint32_t kMaxNameDepth = 250'000;
 
 }  // namespace
 

@@ -116,8 +116,8 @@ void NodePool::FreeArray(CNode** array, uint32_t capacity) {
 }
 
 void NodePool::FreeChildren(CNode* node) {
-  if (node->child_capacity != 0 && is_core_waiting != nullptr && is_core_waiting()) {
-    retired_arrays_.push_back({node->children, node->child_capacity});
+  if (is_core_waiting != nullptr && is_core_waiting()) {
+    if (node->child_capacity != 0) retired_arrays_.push_back({node->children, node->child_capacity});
     something_waits_ = true;
   } else {
     FreeRetiredArrays();

@@ -2,6 +2,7 @@
 // for each token number, then one for each node class.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <initializer_list>
 #include <string>
 #include <unordered_map>
@@ -519,6 +520,47 @@ TEST_F(TreeTest, ReclaimLeavesNothingOfATree) {
   EXPECT_TRUE(IsNone(name->fText()));
   EXPECT_EQ(factory_.NewBare<CMatchStmt>(), bare);
   pool_->Reclaim(nullptr);
+}
+
+TEST_F(TreeTest, ReclaimGivesEachNodeBackToThePoolItIsFrom) {
+  Ref<NodePool> other(new NodePool);
+  CNode* foreign = other->Construct(NodeKind::kCPatternNode, nullptr);
+  other->ResizeChildren(foreign, 20)[0] = Name("a");
+  std::fill_n(foreign->children + 1, 19, nullptr);
+  CNode* bare = factory_.NewBare<CPatternNode>();
+  CNode* children[] = {foreign, nullptr};
+  factory_.SetChildren(bare, children);
+  pool_->Reclaim(bare);
+  EXPECT_EQ(factory_.NewBare<CMatchStmt>(), bare);
+  EXPECT_NE(static_cast<CNode*>(factory_.NewBare<CMatchStmt>()), foreign);
+  EXPECT_EQ(other->Construct(NodeKind::kCMatchStmt, nullptr), foreign);
+}
+
+TEST_F(TreeTest, ArraysOfChildrenAreNotUsedAgainWhileTheCoreWaits) {
+  CNode* node = factory_.NewBare<CPatternNode>();
+  CNode* children[] = {Name("a"), Name("b")};
+  factory_.SetChildren(node, children);
+  const std::span<CNode* const> before = node->fChildren();
+  NodePool::is_core_waiting = [] { return true; };
+  pool_->ResizeChildren(node, 20);
+  std::fill_n(node->children, 20, nullptr);
+  const std::span<CNode* const> grown = node->fChildren();
+  pool_->ClearChildren(node);
+  factory_.SetChildren(factory_.NewBare<CPatternNode>(), std::span<CNode* const>(children, 1));
+  EXPECT_EQ(before[0], children[0]);
+  EXPECT_EQ(before[1], children[1]);
+  EXPECT_EQ(grown[19], nullptr);
+  CNode* other = factory_.NewBare<CPatternNode>();
+  factory_.SetChildren(other, children);
+  EXPECT_NE(other->children, before.data());
+  NodePool::is_core_waiting = nullptr;
+  // The next array that goes takes them along.
+  pool_->ResizeChildren(other, 20);
+  CNode* last = factory_.NewBare<CPatternNode>();
+  factory_.SetChildren(last, children);
+  CNode* another = factory_.NewBare<CPatternNode>();
+  factory_.SetChildren(another, children);
+  EXPECT_TRUE(last->children == before.data() || another->children == before.data());
 }
 
 TEST_F(TreeTest, ReclaimWaitsWhileTheHostLooks) {

@@ -10,6 +10,7 @@ import pytest
 
 from lines import analyzer, expression, line_of, parser
 from quillet import tarvex
+from quillet.logicalline import CLogicalLine
 from quillet.tarvex import (
     CAtom,
     CCompForNode,
@@ -234,6 +235,24 @@ def test_a_change_far_down_in_a_wide_tree_reaches_an_operation_on_the_root() -> 
     text = CNodeToTextConverterImpl(True).TextForNode(root, discard_simple_parens=False)
     assert b"changed" in text
     assert b"x250" not in text
+
+
+def test_a_list_that_grows_while_its_tree_is_walked() -> None:
+    root = expression("f(" + ", ".join(f"a{i}(b{i})" for i in range(40)) + ")")
+    held = root.fChildren[1].fChildren[1].fChildren
+    seen: list[bytes] = []
+
+    class Line(CLogicalLine):
+        def AppendTypeEquiv(self, name: bytes, equiv: bytes) -> None:
+            seen.append(name)
+            if len(seen) == 3:
+                held.extend(held * 3)
+                tarvex.IsTupleLiteralNode(root)
+            super().AppendTypeEquiv(name, equiv)
+
+    analyzer()._fNodeWalker.Walk(root, Line(toks=("x",), positions=((0, 0),)))
+    assert b"a39" in seen
+    assert len(root.fChildren[1].fChildren[1].fChildren) == 4 * 79
 
 
 # ---- rings ----
