@@ -436,6 +436,7 @@ void NodeRef::SetChildren(nb::handle list) {
   CNode* self = node();
   if (!list.is_none() && !PyList_Check(list.ptr())) ThrowExpected("list", list);
   NodeRegistry& registry = NodeRegistry::Get();
+  registry.DropSomeUnheld();
   if (list.is_none()) {
     pool_->ClearChildren(self);
     registry.DropList(self);

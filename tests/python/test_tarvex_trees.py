@@ -53,6 +53,13 @@ def in_parentheses(node: CNode, cls: type[CNode] = CAtom) -> CNode:
     return outer
 
 
+def let_unheld_lists_go() -> None:
+    """Lists of children that nobody holds go a few at a time, with the operations that follow."""
+    gc.collect()
+    for _ in range(3000):
+        CNode().fChildren  # noqa: B018
+
+
 # ---- absent children ----
 
 
@@ -127,10 +134,9 @@ def test_pools_that_keep_each_other_go_when_no_wrapper_is_left() -> None:
         first.fContext = context
         return weakref.ref(context)
 
-    # Lists that nobody else holds go with the next operations, and rings of pools some time after them.
+    # Rings of pools go some time after the lists.
     contexts = [make() for _ in range(200)]
-    for _ in range(200):
-        CNode().fChildren  # noqa: B018
+    let_unheld_lists_go()
     gc.collect()
     assert sum(context() is not None for context in contexts) < 20
 
@@ -142,13 +148,11 @@ def test_a_chain_of_pools_goes_with_its_root() -> None:
     last.fContext = context
     root = of_own_record(of_own_record(of_own_record(last)))
     del context, last
-    for _ in range(20):
-        CNode().fChildren  # noqa: B018
+    let_unheld_lists_go()
     assert gone() is not None
     assert root.fChildren[0].fChildren[0].fChildren[0].fContext is gone()
     del root
-    for _ in range(20):
-        CNode().fChildren  # noqa: B018
+    let_unheld_lists_go()
     assert gone() is None
 
 
@@ -162,8 +166,7 @@ def test_a_node_on_a_free_list_shows_no_children_that_are_gone() -> None:
             FinishedWithNode(node)  # the node is on the list, and its children are as they were
 
     fill()
-    for _ in range(20):
-        CNode().fChildren  # noqa: B018
+    let_unheld_lists_go()
     gc.collect()
     assert info.fFirstFree is not None
     assert info.fFirstFree.fChildren is None
