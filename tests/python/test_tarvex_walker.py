@@ -233,6 +233,12 @@ def names_of(line: CLogicalLine) -> list[str]:
     return [name.decode() for name, _ in line.fTypeEquivs or []]
 
 
+def use_memory_again() -> None:
+    """Lines of many lengths: their texts come where those of lines that are gone have been."""
+    lines = [line_of(f"{'z' * length} = 1") for length in range(1, 2000, 3)]
+    assert all(len(line.fToks) == 3 for line in lines)
+
+
 def test_a_line_that_is_handed_in_during_a_walk_gets_the_rest() -> None:
     walker = CNodeWalker(V3)
     other = line_of("m = 1")
@@ -249,7 +255,7 @@ def test_a_line_that_is_handed_in_during_a_walk_gets_the_rest() -> None:
     parser().DiscardNode(node)
     del line, node, Line
     gc.collect()
-    assert [len(line_of(f"{'z' * length} = 1").fToks) for length in range(1, 400)] == [3] * 399
+    use_memory_again()
     assert names_of(other) == names[1:]
     assert walker._fLogical is None
 
@@ -320,7 +326,7 @@ def test_names_of_operations_by_name_outlive_the_line() -> None:
     walker._VisitStoreContextNode(expression("a_stored_name_of_some_length"), True)
     walker._fLogical = None
     gc.collect()
-    assert [len(line_of(f"{'z' * length} = 1").fToks) for length in range(1, 400)] == [3] * 399
+    use_memory_again()
     assert list(walker._fLoadedNames) == names
     line = line_of("other")
     walker.Walk(expression("other"), line)
@@ -385,3 +391,12 @@ def test_a_walker_and_its_line_are_collected_together() -> None:
     del line, walker
     gc.collect()
     assert gone() is None
+
+
+def test_the_equivalent_of_a_tree_without_an_end() -> None:
+    node = expression("(x)")
+    children = node.fChildren
+    assert children is not None
+    children[1] = node
+    with pytest.raises(RecursionError, match=r"^maximum recursion depth exceeded$"):
+        CNodeWalker(V3)._TypeEquivForNode(node)
