@@ -113,13 +113,27 @@ void CTypeHintWalker::WalkAnyTree(CNode* node, LogicalLine* logical, bool first_
   WalkTree(node, logical, first_in_def, /*is_of_line=*/false);
 }
 
+void CTypeHintWalker::CountCommentHints(LogicalLine& logical) {
+  const auto holds_mark = [](const Token& token) { return token.view().find(kTypeMark) != Text::npos; };
+  std::vector<int32_t> types;
+  if (logical.hooks != nullptr && logical.hooks->GetHostTokTypes(logical, types)) [[unlikely]] {
+    for (size_t i = 0; i < types.size(); ++i) {
+      if (types[i] != tok::COMMENT) continue;
+      if (i >= logical.toks.size()) ThrowError(ErrorKind::kIndexError, "tuple index out of range");
+      if (logical.toks[i].removed()) ThrowError(ErrorKind::kTypeError, "argument of type 'NoneType' is not iterable");
+      fCommentHintCount += holds_mark(logical.toks[i]);
+    }
+    return;
+  }
+  for (const Token& token : logical.toks) fCommentHintCount += token.code == tok::COMMENT && holds_mark(token);
+}
+
 void CTypeHintWalker::WalkTree(CNode* node, LogicalLine* logical, bool first_in_def, bool is_of_line) {
   struct Reset {
     int32_t& count;
     ~Reset() { count = 0; }
   } reset{fCommentHintCount};
-  for (const Token& token : logical->toks)
-    if (token.code == tok::COMMENT && token.view().find(kTypeMark) != Text::npos) ++fCommentHintCount;
+  CountCommentHints(*logical);
 
   if (node != nullptr) {
     const bool is_small = is_of_line &&

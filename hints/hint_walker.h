@@ -94,6 +94,8 @@ class CTypeHintWalker : public CDispatchWalker {
   // `text` is kSignatureFront, the hint and a colon; the tokens are views into it.
   static Signature RewriteSignature(Text text);
 
+  // The comments that may hold a hint, into fCommentHintCount.
+  void CountCommentHints(LogicalLine& logical);
   void WalkTree(CNode* node, LogicalLine* logical, bool first_in_def, bool is_of_line);
   // Walks a tree that cannot reach a limit: statements alone, none of their expressions.
   void VisitStatements(CNode* node, int32_t depth);

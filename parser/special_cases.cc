@@ -166,6 +166,7 @@ CNode* CPGenParserImpl::WithTypeParameter(TokenRun run, bool in_async_def, const
 NodeList CPGenParserImpl::TypeParameters(TokenRun run, bool in_async_def, const PositionView* positions, int64_t start,
                                          int64_t end, bool raise_errors) {
   OwnedNodes nodes(factory_->pool());
+  if (start >= end) return nodes.Release();
   for (int64_t i = start + 1; i < end;) {
     const int64_t comma_i = NonNestedFindTokenIndex(",", run.toks, i, end);
     const int64_t param_end = comma_i >= 0 ? comma_i : end;

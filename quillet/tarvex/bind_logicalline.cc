@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <array>
 #include <cstring>
+#include <limits>
 #include <memory>
 #include <utility>
 #include <vector>
@@ -494,6 +495,18 @@ bool LineObject::GetHostArgRecords(LogicalLine& line, std::vector<std::pair<std:
       pairs.emplace_back(name_text, info_text);
     }
   });
+  return true;
+}
+
+bool LineObject::GetHostTokTypes(LogicalLine&, std::vector<int32_t>& types) {
+  if (!has_host_tok_types_) return false;
+  for (Py_ssize_t i = 0; i < PyList_GET_SIZE(tok_types_.ptr()); ++i) {
+    PyObject* type = PyList_GET_ITEM(tok_types_.ptr(), i);
+    int overflow = 0;
+    const long number = PyLong_Check(type) ? PyLong_AsLongAndOverflow(type, &overflow) : -1;
+    const bool is_type = overflow == 0 && number >= 0 && number <= std::numeric_limits<int32_t>::max();
+    types.push_back(is_type ? static_cast<int32_t>(number) : -1);
+  }
   return true;
 }
 

@@ -7,6 +7,7 @@
 #pragma once
 
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -56,10 +57,16 @@ struct Any : nb::handle {};
 int32_t Int32Of(nb::handle object);
 int64_t Int64Of(nb::handle object);
 
-// An argument that is taken by its truth value.
+// An argument that is taken by its truth value. Where asking for that failed, using it fails.
 struct Truth {
   bool value = false;
-  operator bool() const { return value; }  // NOLINT(google-explicit-constructor): stands for a bool
+  std::shared_ptr<nb::python_error> failure = nullptr;
+
+  operator bool() const {  // NOLINT(google-explicit-constructor): stands for a bool
+    if (failure) [[unlikely]]
+      throw nb::python_error(*failure);
+    return value;
+  }
 };
 
 // A version as the host writes it; TypeError for anything but a tuple.
@@ -119,11 +126,9 @@ struct type_caster<quillet::host::Truth> {
 
   bool from_python(handle src, uint8_t, cleanup_list*) noexcept {
     const int truth = PyObject_IsTrue(src.ptr());
-    if (truth < 0) {
-      PyErr_Clear();
-      return false;
-    }
-    value.value = truth != 0;
+    value.value = truth > 0;
+    // A caster cannot throw, and what it refuses would be a TypeError.
+    if (truth < 0) value.failure = std::make_shared<python_error>();
     return true;
   }
   static handle from_cpp(quillet::host::Truth src, rv_policy, cleanup_list*) noexcept {

@@ -87,6 +87,7 @@ class LineObject final : public LineHooks {
   EmbeddedLines GetExpLogicals(LogicalLine& line) override;
   void CopyTypeEquivs(LogicalLine& from, LogicalLine& to) override;
   bool GetHostArgRecords(LogicalLine& line, std::vector<std::pair<std::string, std::string>>& pairs) override;
+  bool GetHostTokTypes(LogicalLine& line, std::vector<int32_t>& types) override;
 
  private:
   // A record list of the host's: `list` is None or a list; the first `made` rows are in it.

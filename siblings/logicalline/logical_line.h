@@ -77,6 +77,8 @@ class LineHooks {
   virtual void CopyTypeEquivs(LogicalLine& from, LogicalLine& to) = 0;
   // The host's list of argument records, where it put one of its own; false without one.
   virtual bool GetHostArgRecords(LogicalLine& line, std::vector<std::pair<std::string, std::string>>& pairs) = 0;
+  // The host's list of token types, where it put one of its own (-1 for what is no type); false without one.
+  virtual bool GetHostTokTypes(LogicalLine& line, std::vector<int32_t>& types) = 0;
 };
 
 class LogicalLine {

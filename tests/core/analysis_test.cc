@@ -107,6 +107,7 @@ class FailingHooks : public LineHooks {
     for (const Record& record : from.type_equivs()) to.AppendTypeEquiv(record.name(), record.info());
   }
   bool GetHostArgRecords(LogicalLine&, std::vector<std::pair<std::string, std::string>>&) override { return false; }
+  bool GetHostTokTypes(LogicalLine&, std::vector<int32_t>&) override { return false; }
 };
 
 class FlowWithHooks : public ::testing::Test {

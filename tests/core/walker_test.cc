@@ -152,6 +152,7 @@ class Hooks : public LineHooks {
   EmbeddedLines GetExpLogicals(LogicalLine&) override { return {}; }
   void CopyTypeEquivs(LogicalLine&, LogicalLine&) override {}
   bool GetHostArgRecords(LogicalLine&, std::vector<std::pair<std::string, std::string>>&) override { return false; }
+  bool GetHostTokTypes(LogicalLine&, std::vector<int32_t>&) override { return false; }
 
   std::function<void()> on_record;
   Records records;

@@ -317,6 +317,16 @@ def test_a_parse_error_of_the_host_is_placed_by_its_context(context: object, pla
     assert (error.lineno, error.offset) == place
 
 
+def test_an_argument_without_a_truth_value_fails_as_it_says() -> None:
+    class Undecided:
+        def __bool__(self) -> bool:
+            raise LookupError("neither")
+
+    line = line_of("x")
+    with pytest.raises(LookupError, match="neither"):
+        analyzer().AnalyzeSingleLogical(line, Undecided())
+
+
 def test_a_failing_report_leaves_as_an_exception(monkeypatch: pytest.MonkeyPatch) -> None:
     def report(suppress_gui: bool) -> None:
         raise LookupError("no reporter")

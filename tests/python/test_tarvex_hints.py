@@ -543,3 +543,20 @@ def test_annotations_need_no_signature() -> None:
     line.AppendArgTypeEquiv(b"a", b":s:")
     walker.Walk(parse("def f(a: int):  # type: (str) -> bool"), line, False)
     assert used_nodes(walker) != []
+
+
+@pytest.mark.parametrize(
+    ("tok_types", "hints"),
+    [
+        (None, [(b"x", b":h:int")]),
+        ([1, 22, 2, 202], [(b"x", b":h:int")]),
+        ([1, 22, 2, 2], []),
+        ([], []),
+        ([1, 22, 2, None, "202"], []),
+    ],
+)
+def test_a_comment_is_what_the_list_of_types_says(tok_types: list[object] | None, hints: list[object]) -> None:
+    places = [(0, 0), (0, 2), (0, 4), (0, 7)]
+    line = CLogicalLine(toks=["x", "=", "1", "# type: int"], positions=places, tok_types=tok_types)
+    assert analyzer().AnalyzeSingleLogical(line, False) is None
+    assert [pair for pair in line.fTypeEquivs if pair[1].startswith(b":h:")] == hints
