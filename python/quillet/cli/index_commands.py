@@ -48,7 +48,13 @@ _index_option = _options([INDEX_OPTION])
     help="sqlite to ask and to update, parquet (needs pyarrow) for data tools.",
 )
 @python_option
-@click.option("-j", "--jobs", type=click.IntRange(1), metavar="N", help="Threads; without it one a core.")
+@click.option(
+    "-j",
+    "--jobs",
+    type=click.IntRange(1),
+    metavar="N",
+    help="Threads that analyse; without it one a core, less the one that writes.",
+)
 @click.option("--no-gitignore/--gitignore", default=None, help="Index what .gitignore files exclude, too.")
 @click.option("--watch", is_flag=True, help="Go on, and update the index when a file changes.")
 @click.option("-q", "--quiet", is_flag=True, help="Say nothing of what was done.")

@@ -19,7 +19,14 @@ from contextlib import contextmanager
 from hashlib import blake2b
 from typing import NamedTuple
 
-from quillet._batch import FileAnalyses, FileAnalysis, FileRecords, TextNumbers, analyze_files
+from quillet._batch import (
+    FileAnalyses,
+    FileAnalysis,
+    FileRecords,
+    TextNumbers,
+    analyze_files,
+    available_cores,
+)
 from quillet.cli.files import find_files, problem_of, read_file
 from quillet.index.paths import full_path, is_below, stored_path
 from quillet.index.store import (
@@ -142,7 +149,8 @@ class _Run:
         self._connection = connection
         self._base = base
         self._reports = reports
-        self._jobs = settings.jobs
+        # One core is busy with the database.
+        self._jobs = settings.jobs or max(available_cores() - 1, 1)
         self._unread = 0
         self._analysed = 0
         self._removed = 0
