@@ -57,7 +57,8 @@ struct Context {
 
   static constexpr Context None() { return {}; }
   static constexpr Context Index(int32_t index) { return {index, kIndexTag}; }
-  static constexpr Context At(Position pos) { return {pos.line, pos.col}; }
+  // A column below 0, which only a host can state, counts as 0: below it are the tags.
+  static constexpr Context At(Position pos) { return {pos.line, pos.col < 0 ? 0 : pos.col}; }
   static constexpr Context Foreign(int32_t number) { return {number, kForeignTag}; }
 
   constexpr bool IsNone() const { return col == kNoneTag; }

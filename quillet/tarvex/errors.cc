@@ -2,6 +2,7 @@
 #include "quillet/tarvex/errors.h"
 
 #include <string>
+#include <typeinfo>
 
 #include "quillet/tarvex/convert.h"
 
@@ -89,6 +90,9 @@ void SetNativeError(const std::exception_ptr& exception, void*) {
     error.original->restore();
   } catch (const Error& error) {
     SetError(BuiltinFor(error.kind()), error.message());
+  } catch (const std::bad_cast&) {
+    // An instance of a host's class whose __init__ did not call that of its base.
+    PyErr_SetString(PyExc_TypeError, "the object was not initialised");
   }
 }
 

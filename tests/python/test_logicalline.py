@@ -219,6 +219,7 @@ def test_a_subclass_that_overrides_nothing_behaves_as_its_base() -> None:
     assert line.fTypeEquivs == [(b"x", b":g:")]
 
 
+@pytest.mark.filterwarnings("ignore:nanobind. attempted to access an uninitialized instance:RuntimeWarning")
 def test_an_uninitialised_line_is_a_type_error() -> None:
     class Line(CLogicalLine):
         def __init__(self) -> None:

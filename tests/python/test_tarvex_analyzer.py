@@ -300,7 +300,8 @@ class Moody(ParseError):
 
 
 @pytest.mark.parametrize(
-    ("context", "place"), [(1, (1, 3)), (True, (1, 3)), (2**40, (1, 6)), ((0, 4), (1, 5)), ((2, 0), (3, 1))]
+    ("context", "place"),
+    [(1, (1, 3)), (True, (1, 3)), (2**40, (1, 6)), ((0, 4), (1, 5)), ((2, 0), (3, 1)), ((1, -2), (2, 1))],
 )
 def test_a_parse_error_of_the_host_is_placed_by_its_context(context: object, place: tuple[int, int]) -> None:
     class Line(CLogicalLine):

@@ -508,6 +508,18 @@ def test_every_token_type_has_its_name() -> None:
     assert numbers["BACKSLASH"] == 203
 
 
+@pytest.mark.filterwarnings("ignore:nanobind. attempted to access an uninitialized instance:RuntimeWarning")
+def test_a_parser_that_was_not_initialised_is_a_type_error() -> None:
+    class Forgetful(CPGenParserImpl):
+        def __init__(self) -> None:
+            pass
+
+    mine = Forgetful()
+    for name in ("_fParser", "_fMatchCaseStatementParser", "_fGrammar"):
+        with pytest.raises(TypeError):
+            getattr(mine, name)
+
+
 def test_a_line_parses_as_its_tokens() -> None:
     line = CLogicalLine(toks=("x", "=", "1"), positions=((0, 0), (0, 2), (0, 4)))
     assert shape(parser().ParseToNode(line, False)) == ("CExprStmt", "x", "=", "1")
