@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <array>
 #include <limits>
+#include <optional>
 #include <unordered_map>
 
 #include "quillet/tarvex/line_object.h"
@@ -126,6 +127,23 @@ int32_t Int32Of(nb::handle object) {
     throw nb::python_error();
   }
   return static_cast<int32_t>(value);
+}
+
+namespace {
+
+std::optional<nb::python_error>& TruthFailure() {
+  static auto* failure = new std::optional<nb::python_error>;  // outlives the interpreter's last objects
+  return *failure;
+}
+
+}  // namespace
+
+void KeepTruthFailure() { TruthFailure().emplace(); }
+
+void ThrowTruthFailure() {
+  nb::python_error failure = std::move(*TruthFailure());
+  TruthFailure().reset();
+  throw failure;
 }
 
 Version VersionOf(nb::handle object) {

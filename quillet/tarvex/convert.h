@@ -7,7 +7,6 @@
 #pragma once
 
 #include <cstdint>
-#include <memory>
 #include <string>
 #include <vector>
 
@@ -57,15 +56,19 @@ struct Any : nb::handle {};
 int32_t Int32Of(nb::handle object);
 int64_t Int64Of(nb::handle object);
 
-// An argument that is taken by its truth value. Where asking for that failed, using it fails.
+// Keeps the host's error that is set, until ThrowTruthFailure.
+void KeepTruthFailure();
+[[noreturn]] void ThrowTruthFailure();
+
+// An argument that is taken by its truth value. Where asking for that failed, using it fails: a caster
+// cannot throw, and what it refuses would be a TypeError.
 struct Truth {
-  bool value = false;
-  std::shared_ptr<nb::python_error> failure = nullptr;
+  int8_t value = 0;  // -1 where asking failed
 
   operator bool() const {  // NOLINT(google-explicit-constructor): stands for a bool
-    if (failure) [[unlikely]]
-      throw nb::python_error(*failure);
-    return value;
+    if (value < 0) [[unlikely]]
+      ThrowTruthFailure();
+    return value > 0;
   }
 };
 
@@ -126,9 +129,8 @@ struct type_caster<quillet::host::Truth> {
 
   bool from_python(handle src, uint8_t, cleanup_list*) noexcept {
     const int truth = PyObject_IsTrue(src.ptr());
-    value.value = truth > 0;
-    // A caster cannot throw, and what it refuses would be a TypeError.
-    if (truth < 0) value.failure = std::make_shared<python_error>();
+    value.value = static_cast<int8_t>(truth);
+    if (truth < 0) quillet::host::KeepTruthFailure();
     return true;
   }
   static handle from_cpp(quillet::host::Truth src, rv_policy, cleanup_list*) noexcept {
