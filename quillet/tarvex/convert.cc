@@ -143,7 +143,7 @@ void KeepTruthFailure() { TruthFailure().emplace(); }
 void ThrowTruthFailure() {
   nb::python_error failure = std::move(*TruthFailure());
   TruthFailure().reset();
-  throw failure;
+  throw nb::python_error(std::move(failure));
 }
 
 Version VersionOf(nb::handle object) {
