@@ -9,6 +9,7 @@
 // walk limit): a call into the host is made through CallingHost.
 #pragma once
 
+#include <atomic>
 #include <memory>
 #include <utility>
 
@@ -46,18 +47,19 @@ class HostParseError : public ParseError {
 [[noreturn]] void RethrowForCore(nb::python_error& error);
 
 // While one lives, the core waits for the host in the middle of an operation: what it works on must
-// outlive whatever the host's code does to the objects that hold it. Guarded by the interpreter lock.
+// outlive whatever the host's code does to the objects that hold it. Changed with the interpreter lock
+// held, and read without it by threads that have no host, which may then keep memory a little longer.
 class HostCall {
  public:
-  HostCall() { ++count_; }
-  ~HostCall() { --count_; }
+  HostCall() { count_.fetch_add(1, std::memory_order_relaxed); }
+  ~HostCall() { count_.fetch_sub(1, std::memory_order_relaxed); }
   HostCall(const HostCall&) = delete;
   HostCall& operator=(const HostCall&) = delete;
 
-  static bool IsUnderWay() { return count_ > 0; }
+  static bool IsUnderWay() { return count_.load(std::memory_order_relaxed) > 0; }
 
  private:
-  static inline int count_ = 0;
+  static inline std::atomic<int> count_{0};
 };
 
 // Runs `call`, which enters the host.
