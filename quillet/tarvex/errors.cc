@@ -1,6 +1,7 @@
 // See errors.h. The table from kinds to builtins is here, and the class optpgen.ParseError.
 #include "quillet/tarvex/errors.h"
 
+#include <cstring>
 #include <string>
 #include <typeinfo>
 
@@ -168,7 +169,10 @@ void SetHostError(const std::exception_ptr& exception) {
 }
 
 void ThrowExpected(const char* want, nb::handle got) {
-  PyErr_Format(PyExc_TypeError, "Expected %s, got %.200s", want, Py_TYPE(got.ptr())->tp_name);
+  const char* name = Py_TYPE(got.ptr())->tp_name;
+  // A bound class has its module's name in front with some versions of the interpreter only.
+  if (const char* dot = std::strrchr(name, '.'); dot != nullptr && nb::type_check(got.type())) name = dot + 1;
+  PyErr_Format(PyExc_TypeError, "Expected %s, got %.200s", want, name);
   throw nb::python_error();
 }
 
