@@ -20,17 +20,8 @@ void InitAnalyzer(AnalyzerObject* self, Any version_triple, Any grammar_file, An
   new (self) AnalyzerObject();
   try {
     CPGenAnalyzerImpl::Options options;
-    options.grammar_file = ResolveGrammarFile(grammar_file);
+    ReadOptions(options, version_triple, grammar_file, keyword_seq, self->keywords);
     options.hint_grammar_file = ResolveGrammarFile(hint_grammar_file);
-    options.token_names = HostTokenNames();
-    options.kinds_by_state = HostKindsByState();
-    try {
-      options.version = VersionOf(version_triple);
-      options.keywords = KeywordList(keyword_seq, self->keywords);
-    } catch (...) {
-      CheckGrammarFile(options.grammar_file, options.token_names);
-      throw;
-    }
     nb::object hint_keywords;
     options.hint_keywords = KeywordList(nb::none(), hint_keywords);
     options.py3_grammar = py3_grammar;

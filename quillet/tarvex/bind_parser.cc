@@ -92,16 +92,7 @@ void InitParser(nb::pointer_and_handle<ParserObject> self, Any version_triple, A
   auto* object = new (self.p) ParserObject();
   try {
     CPGenParserImpl::Options options;
-    options.grammar_file = ResolveGrammarFile(grammar_file);
-    options.token_names = HostTokenNames();
-    options.kinds_by_state = HostKindsByState();
-    try {
-      options.version = VersionOf(version_triple);
-      options.keywords = KeywordList(keyword_seq, object->keywords);
-    } catch (...) {
-      CheckGrammarFile(options.grammar_file, options.token_names);
-      throw;
-    }
+    ReadOptions(options, version_triple, grammar_file, keyword_seq, object->keywords);
     options.py3_grammar = py3_grammar;
     object->version_triple = nb::borrow(version_triple);
     object->parser = std::make_shared<CPGenParserImpl>(options);
@@ -373,8 +364,6 @@ KindsByName HostKindsByState() {
   }
   return kinds;
 }
-
-void CheckGrammarFile(const std::string& path, const TokenNames& names) { Grammar::Load(path, names); }
 
 std::vector<std::string> KeywordList(nb::handle keyword_seq, nb::object& dict) {
   nb::object sequence =

@@ -9,6 +9,7 @@
 #include "analysis/analyzer.h"
 #include "parser/parser.h"
 #include "quillet/tarvex/bindings.h"
+#include "quillet/tarvex/convert.h"
 #include "quillet/tarvex/optpgen_host.h"
 
 namespace quillet::host {
@@ -59,9 +60,22 @@ std::vector<std::string> KeywordList(nb::handle keyword_seq, nb::object& dict);
 TokenNames HostTokenNames();
 KindsByName HostKindsByState();
 
-// Throws what is wrong with a grammar file, which comes before anything that is wrong with the other
-// arguments of a parser.
-void CheckGrammarFile(const std::string& path, const TokenNames& names);
+// Reads what parsers and analyzers are both made of; `keywords` becomes the set as the host sees it. What
+// is wrong with the grammar file is told before anything that is wrong with the others.
+template <class Options>
+void ReadOptions(Options& options, nb::handle version_triple, nb::handle grammar_file, nb::handle keyword_seq,
+                 nb::object& keywords) {
+  options.grammar_file = ResolveGrammarFile(grammar_file);
+  options.token_names = HostTokenNames();
+  options.kinds_by_state = HostKindsByState();
+  try {
+    options.version = VersionOf(version_triple);
+    options.keywords = KeywordList(keyword_seq, keywords);
+  } catch (...) {
+    Grammar::Load(options.grammar_file, options.token_names);
+    throw;
+  }
+}
 
 // A parser object around a parser that something else owns.
 nb::object NewParserObject(std::shared_ptr<CPGenParserImpl> parser, nb::object version_triple, nb::object keywords);
