@@ -44,6 +44,28 @@ def expression(text: str, version: tuple[int, ...] = (3, 8, 0)) -> CNode:
     return node
 
 
+def nested(depth: int) -> CNode:
+    """A leaf name under `depth` - 1 plain nodes."""
+    node = expression("x")
+    for _ in range(depth - 1):
+        outer = CNode()
+        outer.fChildren = [node]
+        node = outer
+    return node
+
+
+def wide(visits: int) -> CNode:
+    """A tree of `visits` nodes."""
+    node = CNode()
+    leaves = []
+    for _ in range(visits - 2):
+        leaf = CNode()
+        leaf.fText = ","
+        leaves.append(leaf)
+    node.fChildren = [*leaves, expression("x")]
+    return node
+
+
 def shape(node: CNode | None) -> object:
     """A tree as nested tuples: the text of a leaf, the class name and the children of an inner node."""
     if node is None:

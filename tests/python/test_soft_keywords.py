@@ -10,7 +10,6 @@ import ast
 import os
 import random
 import re
-import sys
 import sysconfig
 import warnings
 from collections.abc import Iterator
@@ -26,8 +25,6 @@ FULL = os.environ.get("QUILLET_FULL") == "1"
 MADE = 200_000 if FULL else 15_000
 WORDS = ("match", "case")
 BEGINS_WITH_WORD = re.compile(rb"^[ \t\f]*(?:match|case)\b", re.MULTILINE)
-
-needs_statements = pytest.mark.skipif(sys.version_info < (3, 10), reason="the host has no match statement")
 
 
 def kind_of_line(logical: CLogicalLine) -> str:
@@ -79,7 +76,6 @@ def heads_of(patterns: list[tuple[int, int]], lines: list[tuple[int, int]]) -> s
     return {max(begin for begin in lines if begin <= pattern) for pattern in patterns}
 
 
-@needs_statements
 def test_lines_of_the_library_are_what_the_host_takes_them_for(capsys: pytest.CaptureFixture[str]) -> None:
     counts = dict.fromkeys((kMatch, kCase, kUnknown), 0)
     for path, source in files_with_the_words():
@@ -322,7 +318,6 @@ CASES = [
 ]
 
 
-@needs_statements
 @pytest.mark.parametrize("word", WORDS)
 @pytest.mark.parametrize("form", ORDINARY)
 def test_ordinary_statements_stay_ordinary(form: str, word: str) -> None:
@@ -331,7 +326,6 @@ def test_ordinary_statements_stay_ordinary(form: str, word: str) -> None:
     assert kind_of(text) == kUnknown
 
 
-@needs_statements
 @pytest.mark.parametrize(("kind", "texts"), [(kMatch, MATCHES), (kCase, CASES)], ids=WORDS)
 def test_statements_are_found(kind: str, texts: list[str]) -> None:
     wrong = [text for text in texts if kind not in kinds_by_host(text)]
@@ -344,7 +338,6 @@ def test_statements_are_found(kind: str, texts: list[str]) -> None:
 EITHER = [("case [x]: y", kCase), ("case[x]: y", kUnknown), ("case [x]: y = 1", kCase), ("case[x]: y = 1", kUnknown)]
 
 
-@needs_statements
 @pytest.mark.parametrize(("text", "kind"), EITHER)
 def test_what_could_be_either_is_taken_as_it_is_written(text: str, kind: str) -> None:
     assert kinds_by_host(text) == {kCase, kUnknown}
@@ -395,7 +388,6 @@ def could_be_either(text: str) -> bool:
     return isinstance(target, ast.Subscript) and isinstance(target.value, ast.Name) and text.startswith("case [")
 
 
-@needs_statements
 def test_made_statements_are_what_the_host_takes_them_for(capsys: pytest.CaptureFixture[str]) -> None:
     draw = random.Random(20)
     counts = dict.fromkeys((kMatch, kCase, kUnknown), 0)

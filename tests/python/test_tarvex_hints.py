@@ -8,7 +8,7 @@ from collections.abc import Callable
 
 import pytest
 
-from lines import analyzer, expression, line_of, parse, parser, records
+from lines import analyzer, expression, line_of, nested, parse, parser, records, wide
 from quillet.logicalline import CLogicalLine
 from quillet.symbolinfo import kTypeHintPrefix
 from quillet.tarvex import (
@@ -439,21 +439,6 @@ def test_the_base_operations_go_by_the_dict_of_a_hint_walker(capsys: pytest.Capt
     assert line.fTypeEquivs == [(b"y", hint("int"))]
     CDispatchWalker.Walk(walker, nested(100000), line_of("x"), False)
     assert capsys.readouterr().out.endswith("Maximum recurse count in _VisitNode exceeded\n")
-
-
-def nested(depth: int) -> CNode:
-    node = CNode()
-    for _ in range(depth - 1):
-        outer = CNode()
-        outer.fChildren = [node]
-        node = outer
-    return node
-
-
-def wide(visits: int) -> CNode:
-    node = CNode()
-    node.fChildren = [CNode() for _ in range(visits - 1)]
-    return node
 
 
 def knot() -> CNode:

@@ -7,10 +7,10 @@ import weakref
 
 import pytest
 
-from lines import expression, line_of, parse, parser
+from lines import expression, line_of, nested, parse, parser, wide
 from quillet.logicalline import CLogicalLine
 from quillet.symbolinfo import kGetPrefix, kSetPrefix
-from quillet.tarvex import CAtomExpr, CNode, CNodeToTextConverterImpl, CNodeWalker
+from quillet.tarvex import CAtomExpr, CNodeToTextConverterImpl, CNodeWalker
 
 V3 = (3, 8, 0)
 
@@ -21,28 +21,6 @@ def walk(text: str, walker: CNodeWalker | None = None) -> list[tuple[bytes, byte
     (walker or CNodeWalker(V3)).Walk(node, line)
     parser().DiscardNode(node)
     return line.fTypeEquivs or []
-
-
-def nested(depth: int) -> CNode:
-    """A leaf name under `depth` - 1 plain nodes."""
-    node = expression("x")
-    for _ in range(depth - 1):
-        outer = CNode()
-        outer.fChildren = [node]
-        node = outer
-    return node
-
-
-def wide(visits: int) -> CNode:
-    """A tree of `visits` nodes."""
-    node = CNode()
-    leaves = []
-    for _ in range(visits - 2):
-        leaf = CNode()
-        leaf.fText = ","
-        leaves.append(leaf)
-    node.fChildren = [*leaves, expression("x")]
-    return node
 
 
 @pytest.mark.parametrize(
