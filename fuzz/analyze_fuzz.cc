@@ -15,8 +15,8 @@
 
 #include "analysis/analyzer.h"
 #include "foundations/console.h"
-#include "siblings/logicalline/cutter.h"
-#include "tests/core/verify_trees.h"
+#include "lines/cutter.h"
+#include "tests/core/support/verify_trees.h"
 
 namespace quillet {
 namespace {

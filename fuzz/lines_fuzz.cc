@@ -9,9 +9,9 @@
 #include <string>
 #include <vector>
 
-#include "siblings/logicalline/cutter.h"
-#include "siblings/logicalline/scopes.h"
-#include "tests/core/verify_tokens.h"
+#include "lines/cutter.h"
+#include "lines/scopes.h"
+#include "tests/core/support/verify_tokens.h"
 
 namespace {
 

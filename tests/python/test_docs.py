@@ -72,7 +72,7 @@ def test_every_record_kind_is_documented() -> None:
 
 
 def test_every_prefix_that_the_walkers_write_is_documented() -> None:
-    rows = (ROOT / "siblings/symbolinfo/kinds.def").read_text().split("// What consumers")[0]
+    rows = (ROOT / "core/vocabulary/kinds.def").read_text().split("// What consumers")[0]
     names = re.findall(r"^QUILLET_INFO_KIND\((\w+),", rows, re.MULTILINE)
     text = (ROOT / "docs" / "records.md").read_text()
     assert [name for name in names if f"`k{name}Prefix`" not in text] == []

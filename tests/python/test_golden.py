@@ -64,7 +64,7 @@ def shown_in_trees() -> set[str]:
 
 
 def test_every_node_class_that_a_parse_makes_is_in_a_golden_file() -> None:
-    rows = (ROOT / "tree" / "node_kinds.def").read_text()
+    rows = (ROOT / "core/tree/node_kinds.def").read_text()
     classes = set(re.findall(r"^QUILLET_NODE(?:_BASE)?\((\w+),", rows, re.MULTILINE))
     assert len(classes) > 50
     assert classes - shown_in_trees() == NEVER_MADE
@@ -72,7 +72,7 @@ def test_every_node_class_that_a_parse_makes_is_in_a_golden_file() -> None:
 
 def test_every_record_kind_that_the_walkers_write_is_in_a_golden_file() -> None:
     text = "".join(path.read_text() for path in FILES)
-    rows = (ROOT / "siblings/symbolinfo/kinds.def").read_text().split("// What consumers")[0]
+    rows = (ROOT / "core/vocabulary/kinds.def").read_text().split("// What consumers")[0]
     kinds = re.findall(r"^QUILLET_INFO_KIND\(\w+, '(.)'\)", rows, re.MULTILINE)
     assert len(kinds) == 13
     assert [kind for kind in kinds if not re.search(rf"^\S+ +:{re.escape(kind)}:", text, re.MULTILINE)] == []

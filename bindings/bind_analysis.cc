@@ -1,0 +1,179 @@
+// CPGenAnalyzerImpl and CreateSyntaxError.
+#include <limits>
+
+#include "analysis/analyzer.h"
+#include "bindings/bindings.h"
+#include "bindings/convert.h"
+#include "bindings/errors.h"
+#include "bindings/hints_object.h"
+#include "bindings/line_object.h"
+#include "bindings/node_ref.h"
+#include "bindings/parser_object.h"
+#include "bindings/walker_object.h"
+#include "lines/syntax_error.h"
+
+namespace quillet::host {
+namespace {
+
+void InitAnalyzer(AnalyzerObject* self, Any version_triple, Any grammar_file, Any keyword_seq, Truth py3_grammar,
+                  Any hint_grammar_file) {
+  new (self) AnalyzerObject();
+  try {
+    CPGenAnalyzerImpl::Options options;
+    ReadOptions(options, version_triple, grammar_file, keyword_seq, self->keywords);
+    options.hint_grammar_file = ResolveGrammarFile(hint_grammar_file);
+    nb::object hint_keywords;
+    options.hint_keywords = KeywordList(nb::none(), hint_keywords);
+    options.py3_grammar = py3_grammar;
+    self->version_triple = nb::borrow(version_triple);
+    self->analyzer = std::make_shared<CPGenAnalyzerImpl>(options);
+  } catch (...) {
+    self->~AnalyzerObject();
+    throw;
+  }
+}
+
+// While the host holds wrappers of an analyzer's nodes, what an analysis leaves in nodes must stay
+// readable: texts of the line's source, and those of hints, which stand with the line's records.
+class Retained {
+ public:
+  Retained(CPGenAnalyzerImpl& analyzer, const Ref<SourceText>& source)
+      : hint_pool_(analyzer.type_hint_walker().hint_parser().factory().pool()) {
+    PinSource(analyzer.logical_parser().factory().pool(), source);
+  }
+  ~Retained() { RehomeTexts(hint_pool_); }
+  Retained(const Retained&) = delete;
+  Retained& operator=(const Retained&) = delete;
+
+ private:
+  NodePool& hint_pool_;
+};
+
+nb::object Analyze(AnalyzerObject& self, Any logical, Truth in_async_def, Truth first_in_def) {
+  LineObject& object = LineOf(logical);
+  LogicalLine& line = object.line();
+  if (line.parsed) return nb::none();
+  object.BeginAnalysis();
+  std::optional<SyntaxError> error;
+  {
+    const Retained retained(*self.analyzer, line.source);
+    error = self.analyzer->AnalyzeSingleLogical(line, in_async_def, first_in_def);
+  }
+  object.EndWriting();
+  if (!error) [[likely]] {
+    return nb::none();
+  }
+  nb::object raised = TakeHostSyntaxError(*error);
+  return raised.is_valid() ? raised : ExceptionFor(*error);
+}
+
+bool Inspect(AnalyzerObject& self, Any logical, Truth in_async_def, Truth in_embedded_expression, Truth first_in_def) {
+  LineObject& object = LineOf(logical);
+  Recording recording(&object);
+  const Retained retained(*self.analyzer, object.line().source);
+  return self.analyzer->InspectSingleLogical(object.line(), in_async_def, in_embedded_expression, first_in_def);
+}
+
+void InspectEmbedded(AnalyzerObject& self, Any logical, Any node, Truth in_async_def, Truth first_in_def) {
+  LineObject& object = LineOf(logical);
+  RefOrNull(node);
+  Recording recording(&object);
+  const Retained retained(*self.analyzer, object.line().source);
+  self.analyzer->InspectEmbeddedExpressions(object.line(), in_async_def, first_in_def);
+}
+
+// ---- syntax errors ----
+
+nb::object SyntaxErrorFor(Any msg, Any logical, Any context, Any pos_info_in_tok) {
+  const HostText message = HostText::FromStr(msg);
+  Position in_token;
+  if (!pos_info_in_tok.is_none()) {
+    in_token.line = Int32Of(nb::object(pos_info_in_tok.attr("lineno")));
+    in_token.col = Int32Of(nb::object(pos_info_in_tok.attr("utf8_col")));
+  }
+  const Position* place = pos_info_in_tok.is_none() ? nullptr : &in_token;
+  if (LineObject* object = InstanceOf<LineObject>(logical)) {
+    LogicalLine& line = object->line();
+    const Context where = line.token_count == 0 ? Context::Index(0) : ErrorContext(context);
+    return ExceptionFor(CreateSyntaxError(std::string(message.text()), line, where, place));
+  }
+  // Any object with the three fields.
+  LogicalLine line;
+  line.token_count = Int32Of(nb::object(logical.attr("fTokenCount")));
+  Context where = Context::Index(0);
+  if (line.token_count != 0) {
+    where = ErrorContext(context);
+    if (where.IsIndex()) {
+      line.source = SourceOfTokens(TupleOf(nb::object(logical.attr("fToks"))));
+      line.toks = line.source->tokens;
+      line.SetPositions(PositionsOf(TupleOf(nb::object(logical.attr("fPositions")))));
+    }
+  }
+  SyntaxError error = CreateSyntaxError(std::string(message.text()), line, where, place);
+  nb::object text = nb::module_::import_("quillet.logicalinspect").attr("TextFromTokens")(logical);
+  error.text = HostText::FromStr(text).text();
+  return ExceptionFor(error);
+}
+
+}  // namespace
+
+void BindAnalysis(nb::module_& tarvex) {
+  nb::class_<AnalyzerObject, AnalyzerBase> cls(
+      tarvex, "CPGenAnalyzerImpl", "Analyses logical lines, one at a time; one analyzer serves one thread.");
+  cls.def("__init__", &InitAnalyzer, nb::arg("version_triple"), nb::arg("grammar_file") = kPy3DefaultGrammar,
+          nb::arg("keyword_seq") = nb::none(), nb::arg("py3_grammar") = true,
+          nb::arg("hint_grammar_file") = kPy3DefaultGrammar);
+  cls.def("AnalyzeSingleLogical", &Analyze, nb::arg("logical"), nb::arg("in_async_def"),
+          nb::arg("first_in_def") = false,
+          "Analyses a line once and gives the exception that describes a failure, or None.");
+  cls.def("_InspectSingleLogical", &Inspect, nb::arg("logical"), nb::arg("in_async_def"),
+          nb::arg("in_embedded_expression") = false, nb::arg("first_in_def") = false,
+          "Parses and walks a line; raises what AnalyzeSingleLogical returns.");
+  cls.def("_InspectEmbeddedExpressions", &InspectEmbedded, nb::arg("logical"), nb::arg("node"), nb::arg("in_async_def"),
+          nb::arg("first_in_def"), "Inspects the line's embedded expressions and copies their records up.");
+  cls.def(
+      "ParseToNode",
+      [](AnalyzerObject& self, Any logical, Truth in_async_def) {
+        return ForwardParseToNode(self.analyzer->logical_parser(), logical, in_async_def);
+      },
+      nb::arg("logical"), nb::arg("in_async_def"));
+  cls.def(
+      "ParseTokenListToNode",
+      [](AnalyzerObject& self, Any logical, Truth in_async_def) {
+        return ForwardParseTokenListToNode(self.analyzer->logical_parser(), logical, in_async_def);
+      },
+      nb::arg("logical"), nb::arg("in_async_def"));
+  cls.def(
+      "GetTypeParameterNodes",
+      [](AnalyzerObject& self, Any toks) {
+        return ForwardGetTypeParameterNodes(self.analyzer->logical_parser(), toks);
+      },
+      nb::arg("toks"));
+  cls.def_prop_ro("_fLogicalParser", [](AnalyzerObject& self) {
+    if (!self.logical_parser.is_valid()) {
+      self.logical_parser =
+          NewParserObject(std::shared_ptr<CPGenParserImpl>(self.analyzer, &self.analyzer->logical_parser()),
+                          self.version_triple, self.keywords);
+    }
+    return self.logical_parser;
+  });
+  cls.def_prop_ro("_fNodeWalker", [](AnalyzerObject& self) {
+    if (!self.node_walker.is_valid())
+      self.node_walker = NewWalkerObject(std::shared_ptr<CNodeWalker>(self.analyzer, &self.analyzer->node_walker()));
+    return self.node_walker;
+  });
+  cls.def_prop_ro("_fTypeHintWalker", [](nb::handle self) {
+    auto& object = nb::cast<AnalyzerObject&>(self);
+    if (!object.type_hint_walker.is_valid()) {
+      object.type_hint_walker =
+          NewHintWalkerObject(std::shared_ptr<CTypeHintWalker>(object.analyzer, &object.analyzer->type_hint_walker()),
+                              nb::object(self.attr("_fNodeWalker")), object.version_triple);
+    }
+    return object.type_hint_walker;
+  });
+
+  tarvex.def("CreateSyntaxError", &SyntaxErrorFor, nb::arg("msg"), nb::arg("logical"), nb::arg("context"),
+             nb::arg("pos_info_in_tok") = nb::none(), "The SyntaxError for a place in a logical line.");
+}
+
+}  // namespace quillet::host

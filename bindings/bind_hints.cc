@@ -1,0 +1,450 @@
+// CDispatchWalker, over a dict of the host's callables, and CTypeHintWalker.
+#include "bindings/bindings.h"
+#include "bindings/convert.h"
+#include "bindings/errors.h"
+#include "bindings/hints_object.h"
+#include "bindings/line_object.h"
+#include "bindings/node_ref.h"
+#include "bindings/parser_object.h"
+#include "bindings/walker_object.h"
+#include "hints/hint_walker.h"
+
+namespace quillet::host {
+namespace {
+
+// ---- the dispatch walker ----
+
+nb::object& DispatchDict(DispatchObject& object) {
+  if (!object.dispatch_dict.is_valid()) {
+    nb::handle cls = nb::type<HintWalkerObject>();
+    nb::dict dict;
+    dict[ClassOfKind(NodeKind::kCFuncdefStmt)] = cls.attr("_VisitFuncdefStmt");
+    dict[ClassOfKind(NodeKind::kCExprStmt)] = cls.attr("_VisitExprStmt");
+    dict[ClassOfKind(NodeKind::kCForStmt)] = cls.attr("_VisitForStmt");
+    dict[ClassOfKind(NodeKind::kCWithStmt)] = cls.attr("_VisitWithStmt");
+    dict[ClassOfKind(NodeKind::kCNameLiteral)] = nb::handle(Py_False);
+    object.dispatch_dict = dict;
+  }
+  return object.dispatch_dict;
+}
+
+// What the host's dict says of a node: whether its children are to be walked.
+bool VisitByDict(DispatchObject& object, nb::handle self, const Ref<SourceText>& source, CNode* node) {
+  nb::handle cls = node == nullptr ? nb::handle((PyObject*)Py_TYPE(Py_None)) : ClassOfNode(node);
+  nb::object& dict = DispatchDict(object);
+  if (dict.is_none()) {
+    PyErr_SetString(PyExc_AttributeError, "'NoneType' object has no attribute 'get'");
+    throw nb::python_error();
+  }
+  nb::object visit = nb::borrow(PyDict_GetItemWithError(dict.ptr(), cls.ptr()));
+  if (!visit.is_valid()) {
+    if (PyErr_Occurred()) throw nb::python_error();
+    return true;
+  }
+  if (visit.ptr() == Py_False) return false;
+  if (visit.is_none()) return true;
+  nb::object result = visit(self, Wrap(node, source));
+  // The host may have changed the children of the node.
+  if (node != nullptr) RefOrNull(Wrap(node, source));
+  const int truth = PyObject_IsTrue(result.ptr());
+  if (truth < 0) throw nb::python_error();
+  return truth != 0;
+}
+
+// Lets a walk of the host's go by its dict while it lives. A visit may begin the next, of nodes of
+// another source, in the middle of this one.
+class DictVisits final : public CDispatchWalker::HostVisits {
+ public:
+  DictVisits(DispatchObject& object, nb::handle self, Ref<SourceText> source)
+      : object_(object),
+        self_(self),
+        source_(std::move(source)),
+        outer_(std::exchange(object.walker->host_visits, this)) {}
+  ~DictVisits() { object_.walker->host_visits = outer_; }
+  DictVisits(const DictVisits&) = delete;
+  DictVisits& operator=(const DictVisits&) = delete;
+
+  bool Visit(CNode* node) override {
+    return CallingHost([&] { return VisitByDict(object_, self_, source_, node); });
+  }
+
+ private:
+  DispatchObject& object_;
+  nb::handle self_;
+  Ref<SourceText> source_;
+  CDispatchWalker::HostVisits* outer_;
+};
+
+// Around a walk of the host's: the object keeps the line as long as the walk is on it, so that visits
+// see the host's own line.
+class WalkOfHost {
+ public:
+  WalkOfHost(DispatchObject& object, nb::handle logical)
+      : object_(object), outer_(std::exchange(object.handed_in.line, nb::borrow(logical))) {}
+  ~WalkOfHost() {
+    // The end of a walk leaves the walker without a line, whatever the host handed in meanwhile; only
+    // where there was nothing to walk it keeps what it had.
+    object_.handed_in.Replace(object_.walker->fLogical == nullptr ? nb::object() : std::exchange(outer_, {}));
+    object_.handed_in.LetGo(std::move(outer_));
+  }
+  WalkOfHost(const WalkOfHost&) = delete;
+  WalkOfHost& operator=(const WalkOfHost&) = delete;
+
+ private:
+  DispatchObject& object_;
+  nb::object outer_;
+};
+
+template <int32_t CDispatchWalker::*Field>
+void DefCount(nb::class_<DispatchObject>& cls, const char* name) {
+  cls.def_prop_rw(
+      name, [](DispatchObject& self) { return (*self.walker).*Field; },
+      [](DispatchObject& self, Any value) { (*self.walker).*Field = Int32Of(value); });
+}
+
+// Tested before anything of the walker changes.
+void RefuseSecondWalk(const DispatchObject& object) {
+  if (object.walker->fLogical != nullptr)
+    ThrowError(ErrorKind::kValueError, "Only one logical may be walked at a time");
+}
+
+void WalkByDict(nb::handle self, Any node, Any logical, Truth first_in_def) {
+  auto& object = nb::cast<DispatchObject&>(self);
+  NodeRef* root = RefOrNull(node);
+  LineObject& line = LineOf(logical);
+  RefuseSecondWalk(object);
+  const WalkOfHost walk(object, logical);
+  const Recording recording(&line);
+  const DictVisits visits(object, self, SourceOf(root));
+  // The operation of this class, also for a walker of a class that is derived from it.
+  object.walker->CDispatchWalker::Walk(root == nullptr ? nullptr : root->node(), &line.line(), first_in_def);
+}
+
+int Traverse(PyObject* self, visitproc visit, void* arg) {
+  Py_VISIT(Py_TYPE(self));
+  if (!nb::inst_ready(self)) return 0;
+  auto& object = *nb::inst_ptr<DispatchObject>(self);
+  Py_VISIT(object.dispatch_dict.ptr());
+  return object.handed_in.Traverse(visit, arg);
+}
+
+int Clear(PyObject* self) {
+  if (!nb::inst_ready(self)) return 0;
+  auto& object = *nb::inst_ptr<DispatchObject>(self);
+  if (object.handed_in.line.is_valid()) object.walker->fLogical = nullptr;
+  object.handed_in.Replace({});
+  nb::object dict = std::exchange(object.dispatch_dict, nb::none());
+  return 0;
+}
+
+const PyType_Slot kSlots[] = {
+    {Py_tp_traverse, reinterpret_cast<void*>(Traverse)}, {Py_tp_clear, reinterpret_cast<void*>(Clear)}, {0, nullptr}};
+
+void BindDispatchWalker(nb::module_& m) {
+  nb::class_<DispatchObject> cls(m, "CDispatchWalker", nb::type_slots(kSlots),
+                                 "Walks a tree by a dict from node class to visit.");
+  cls.def(
+      "__init__",
+      [](DispatchObject* self, Any dispatch_dict) {
+        if (!dispatch_dict.is_none() && !PyDict_Check(dispatch_dict.ptr())) ThrowExpected("dict", dispatch_dict);
+        new (self)
+            DispatchObject{std::make_shared<CDispatchWalker>(CDispatchWalker::Table{}), nb::borrow(dispatch_dict), {}};
+      },
+      nb::arg("dispatch_dict"));
+  cls.def_prop_rw(
+      "_fLogical", [](DispatchObject& self) { return HostLineOf(self.walker->fLogical, self.handed_in); },
+      [](DispatchObject& self, Any value) {
+        self.handed_in.HandIn(value, [&self](LogicalLine* line) { self.walker->fLogical = line; });
+      },
+      nb::arg("value"));
+  cls.def_prop_ro("_fDispatchDict", [](DispatchObject& self) { return DispatchDict(self); });
+  DefCount<&CDispatchWalker::fVisitCount>(cls, "_fVisitCount");
+  DefCount<&CDispatchWalker::fRecurseCount>(cls, "_fRecurseCount");
+  DefCount<&CDispatchWalker::fMaxVisits>(cls, "_fMaxVisits");
+  DefCount<&CDispatchWalker::fMaxRecurseCount>(cls, "_fMaxRecurseCount");
+  cls.def_prop_ro("_fNodeStack", [](DispatchObject& self) { return WrapList(self.walker->fNodeStack, {}); });
+  cls.def("Walk", &WalkByDict, nb::arg("node"), nb::arg("logical"), nb::arg("first_in_def"));
+  cls.def(
+      "_VisitNode",
+      [](nb::handle self, Any node) {
+        auto& object = nb::cast<DispatchObject&>(self);
+        NodeRef* root = RefOrNull(node);
+        const DictVisits visits(object, self, SourceOf(root));
+        object.walker->VisitNode(root == nullptr ? nullptr : root->node());
+      },
+      nb::arg("node"));
+}
+
+// ---- the hint walker ----
+
+using HintClass = nb::class_<HintWalkerObject, DispatchObject>;
+
+void InitHintWalker(HintWalkerObject* self, Any version_triple, Any grammar_file, Any general_node_walker) {
+  new (self) HintWalkerObject();
+  try {
+    CPGenParserImpl::Options options;
+    options.version = VersionOf(version_triple);
+    options.grammar_file = ResolveGrammarFile(grammar_file);
+    nb::object keywords;
+    options.keywords = KeywordList(nb::none(), keywords);
+    CNodeWalker* general = nullptr;
+    if (!general_node_walker.is_none()) {
+      WalkerObject* walker = InstanceOf<WalkerObject>(general_node_walker);
+      if (walker == nullptr) ThrowExpected("CNodeWalker", general_node_walker);
+      general = walker->walker.get();
+    }
+    self->walker =
+        std::make_shared<CTypeHintWalker>(std::make_unique<CPGenParserImpl>(options), options.version, general);
+    self->general_node_walker = nb::borrow(general_node_walker);
+    self->version_triple = nb::borrow(version_triple);
+  } catch (...) {
+    self->~HintWalkerObject();
+    throw;
+  }
+}
+
+// The trees of hints have texts that stand with the records of the line being walked.
+nb::object WrapHintTree(HintWalkerObject& self, CNode* node) {
+  nb::object wrapper = Wrap(node, {});
+  RehomeTexts(self.hints().hint_parser().factory().pool());
+  return wrapper;
+}
+
+template <class Statement, bool (CTypeHintWalker::*Operation)(CNode*)>
+bool VisitStatement(HintWalkerObject& self, Any node) {
+  CNode* root = RefOf(node, NodeKindRange<Statement>::kFirst).node();
+  Recording recording(self.walker->fLogical);
+  return (self.hints().*Operation)(root);
+}
+
+nb::object TextAndIndex(nb::object text, int32_t tok_i) { return nb::make_tuple(std::move(text), tok_i); }
+
+void BindHintComments(HintClass& cls) {
+  cls.def(
+      "_FindEndingTypeComment",
+      [](HintWalkerObject& self, Any node) {
+        const CTypeHintWalker::Hint hint = self.hints().FindEndingTypeComment(RefOf(node).node());
+        return TextAndIndex(hint.found ? StrOf(hint.text) : nb::object(nb::none()), hint.tok_i);
+      },
+      nb::arg("node"));
+  cls.def(
+      "_GetHintFromComment",
+      [](HintWalkerObject&, Any comment) {
+        const HostText text = HostText::FromStr(comment);
+        std::string hint;
+        return CTypeHintWalker::GetHintFromComment(text.text(), hint) ? StrOf(hint) : nb::object(nb::none());
+      },
+      nb::arg("comment"));
+  cls.def(
+      "_GetRowRange",
+      [](HintWalkerObject& self, Any node) {
+        const auto [first, end] = self.hints().GetRowRange(RefOf(node).node());
+        return nb::make_tuple(first, end);
+      },
+      nb::arg("node"));
+  cls.def(
+      "_FindComment",
+      [](HintWalkerObject& self, Any row, Any logical) {
+        LogicalLine* line = logical.is_none() ? nullptr : &LineOf(logical).line();
+        const CTypeHintWalker::Comment comment = self.hints().FindComment(Int64Of(row), line);
+        return TextAndIndex(StrOf(comment.text), comment.tok_i);
+      },
+      nb::arg("row"), nb::arg("logical") = nb::none());
+  cls.def(
+      "_IsDottedName",
+      [](HintWalkerObject&, Any text) { return CTypeHintWalker::IsDottedName(HostText::FromStr(text).text()); },
+      nb::arg("text"));
+  cls.def(
+      "_ParseHint",
+      [](HintWalkerObject& self, Any hint, Any tok_i, Truth call_general_node_walker) {
+        const HostText text = HostText::FromStr(hint);
+        const int32_t index = Int32Of(tok_i);
+        Recording recording(self.walker->fLogical);
+        return WrapHintTree(self, self.hints().ParseHint(text.text(), index, call_general_node_walker));
+      },
+      nb::arg("hint"), nb::arg("tok_i"), nb::arg("call_general_node_walker"));
+  cls.def(
+      "_RaiseHintSyntaxError",
+      [](HintWalkerObject& self, Any tok_i, Any offset) {
+        self.hints().RaiseHintSyntaxError(Int32Of(tok_i), Int64Of(offset));
+      },
+      nb::arg("tok_i"), nb::arg("utf8_offset_in_hint"));
+}
+
+void BindHintStatements(HintClass& cls) {
+  cls.def("_VisitExprStmt", &VisitStatement<CExprStmt, &CTypeHintWalker::VisitExprStmt>, nb::arg("node"));
+  cls.def("_VisitForStmt", &VisitStatement<CForStmt, &CTypeHintWalker::VisitForStmt>, nb::arg("node"));
+  cls.def("_VisitWithStmt", &VisitStatement<CWithStmt, &CTypeHintWalker::VisitWithStmt>, nb::arg("node"));
+  cls.def(
+      "_VisitFuncdefStmt",
+      [](HintWalkerObject& self, Any node) {
+        VisitStatement<CFuncdefStmt, &CTypeHintWalker::VisitFuncdefStmt>(self, node);
+      },
+      nb::arg("node"));
+  cls.def(
+      "_ProcessTarget",
+      [](HintWalkerObject& self, Any node, Any target) {
+        CNode* statement = RefOf(node).node();
+        CNode* target_node = NodeOrNull(target, NodeKind::kCExpression);
+        Recording recording(self.walker->fLogical);
+        self.hints().ProcessTarget(statement, target_node);
+      },
+      nb::arg("node"), nb::arg("target"));
+  cls.def(
+      "_ProcessNameAndHintNodes",
+      [](HintWalkerObject& self, Any name_node, Any hint_node, Truth is_arg) {
+        CNode* name = NodeOrNull(name_node, NodeKind::kCExpression);
+        CNode* hint = NodeOrNull(hint_node, NodeKind::kCExpression);
+        Recording recording(self.walker->fLogical);
+        self.hints().ProcessNameAndHintNodes(name, hint, is_arg);
+      },
+      nb::arg("name_node"), nb::arg("hint_node"), nb::arg("is_arg"));
+  cls.def(
+      "_GetHintInfoStr",
+      [](HintWalkerObject& self, Any node) {
+        std::string info;
+        return self.hints().GetHintInfoStr(NodeOrNull(node), info) ? BytesOf(info) : nb::object(nb::none());
+      },
+      nb::arg("node"));
+  cls.def(
+      "_AddSymInfo",
+      [](HintWalkerObject& self, Any name, Any istr, Truth is_arg) {
+        const HostText name_text = HostText::FromStrOrBytes(name);
+        const HostText info_text = HostText::FromStrOrBytes(istr);
+        Recording recording(self.walker->fLogical);
+        self.hints().AddSymInfo(name_text.text(), info_text.text(), is_arg);
+      },
+      nb::arg("name"), nb::arg("istr"), nb::arg("is_arg"));
+}
+
+void BindSignatures(HintClass& cls) {
+  cls.def(
+      "_RewriteFuncdefCommentHint",
+      [](HintWalkerObject&, Any hint) {
+        const HostText text = HostText::FromStr(hint);
+        const CTypeHintWalker::RewrittenHint rewritten = CTypeHintWalker::RewriteFuncdefCommentHint(text.text());
+        nb::list tokens, offsets;
+        for (const std::string& token : rewritten.tokens) tokens.append(StrOf(token));
+        for (int64_t offset : rewritten.utf8_offsets) offsets.append(offset);
+        return nb::make_tuple(tokens, offsets);
+      },
+      nb::arg("hint"));
+  cls.def(
+      "_ProcessFuncdefComment",
+      [](HintWalkerObject& self, Any hint, Any tok_i, Any funcdef_logical, Truth is_arg) {
+        const HostText text = HostText::FromStr(hint);
+        const int32_t index = Int32Of(tok_i);
+        LogicalLine* line = funcdef_logical.is_none() ? nullptr : &LineOf(funcdef_logical).line();
+        Recording recording(self.walker->fLogical);
+        self.hints().ProcessFuncdefComment(text.text(), index, line, is_arg);
+      },
+      nb::arg("hint"), nb::arg("tok_i"), nb::arg("funcdef_logical"), nb::arg("is_arg"));
+  cls.def(
+      "_ProcessArgSpecificComment",
+      [](HintWalkerObject& self, Any arg) {
+        const CArgInfo info = ArgOf(arg);
+        Recording recording(self.walker->fLogical);
+        self.hints().ProcessArgSpecificComment(info);
+      },
+      nb::arg("arg"));
+  cls.def(
+      "_ParseFuncdefCommentHint",
+      [](HintWalkerObject& self, Any hint, Any tok_i) {
+        const HostText text = HostText::FromStr(hint);
+        return WrapHintTree(self, self.hints().ParseFuncdefCommentHint(text.text(), Int32Of(tok_i)));
+      },
+      nb::arg("hint"), nb::arg("tok_i"));
+}
+
+template <nb::object HintWalkerObject::*Made, CNodeToTextConverter& (CTypeHintWalker::*Converter)()>
+void DefConverter(HintClass& cls, const char* name) {
+  cls.def_prop_ro(name, [](HintWalkerObject& self) {
+    if (!(self.*Made).is_valid()) {
+      CNodeToTextConverter* converter = &(self.hints().*Converter)();
+      self.*Made = NewConverterObject(std::shared_ptr<CNodeToTextConverter>(self.walker, converter));
+    }
+    return self.*Made;
+  });
+}
+
+int TraverseHintWalker(PyObject* self, visitproc visit, void* arg) {
+  if (const int result = Traverse(self, visit, arg); result != 0 || !nb::inst_ready(self)) return result;
+  auto& object = *nb::inst_ptr<HintWalkerObject>(self);
+  // Never cleared: the core has its address. A walker's cycle goes by its line or its dict.
+  Py_VISIT(object.general_node_walker.ptr());
+  Py_VISIT(object.hint_parser.ptr());
+  return 0;
+}
+
+int ClearHintWalker(PyObject* self) {
+  Clear(self);
+  if (!nb::inst_ready(self)) return 0;
+  nb::object parser = std::exchange(nb::inst_ptr<HintWalkerObject>(self)->hint_parser, {});
+  return 0;
+}
+
+const PyType_Slot kHintSlots[] = {{Py_tp_traverse, reinterpret_cast<void*>(TraverseHintWalker)},
+                                  {Py_tp_clear, reinterpret_cast<void*>(ClearHintWalker)},
+                                  {0, nullptr}};
+
+void BindHintWalker(nb::module_& m) {
+  HintClass cls(m, "CTypeHintWalker", nb::type_slots(kHintSlots),
+                "Finds type information in a statement and records it on its logical line.");
+  cls.def("__init__", &InitHintWalker, nb::arg("version_triple"), nb::arg("grammar_file"),
+          nb::arg("general_node_walker"));
+  cls.def_prop_rw(
+      "_fCommentHintCount", [](HintWalkerObject& self) { return self.hints().fCommentHintCount; },
+      [](HintWalkerObject& self, Any value) { self.hints().fCommentHintCount = Int32Of(value); });
+  cls.def_prop_ro("_fHintParser", [](HintWalkerObject& self) {
+    if (!self.hint_parser.is_valid()) {
+      nb::object keywords;
+      KeywordList(nb::none(), keywords);
+      self.hint_parser = NewParserObject(std::shared_ptr<CPGenParserImpl>(self.walker, &self.hints().hint_parser()),
+                                         self.version_triple, std::move(keywords));
+    }
+    return self.hint_parser;
+  });
+  DefConverter<&HintWalkerObject::name_conv, &CTypeHintWalker::name_conv>(cls, "_fNameConv");
+  DefConverter<&HintWalkerObject::hint_conv, &CTypeHintWalker::hint_conv>(cls, "_fHintConv");
+  cls.def_prop_ro("_fGeneralNodeWalker", [](HintWalkerObject& self) { return self.general_node_walker; });
+  cls.def(
+      "Walk",
+      [](HintWalkerObject& self, Any node, Any logical, Truth first_in_def) {
+        CNode* root = NodeOrNull(node);
+        LineObject& line = LineOf(logical);
+        if (root != nullptr) RefuseSecondWalk(self);
+        const WalkOfHost walk(self, logical);
+        const Recording recording(&line);
+        self.hints().WalkAnyTree(root, &line.line(), first_in_def);
+      },
+      nb::arg("node"), nb::arg("logical"), nb::arg("first_in_def"));
+  cls.def(
+      "_VisitNode",
+      [](HintWalkerObject& self, Any node) {
+        CNode* root = NodeOrNull(node);
+        Recording recording(self.walker->fLogical);
+        self.walker->VisitNode(root);
+      },
+      nb::arg("node"));
+  BindHintComments(cls);
+  BindHintStatements(cls);
+  BindSignatures(cls);
+}
+
+}  // namespace
+
+nb::object NewHintWalkerObject(std::shared_ptr<CTypeHintWalker> walker, nb::object general_node_walker,
+                               nb::object version_triple) {
+  HintWalkerObject object;
+  object.walker = std::move(walker);
+  object.general_node_walker = std::move(general_node_walker);
+  object.version_triple = std::move(version_triple);
+  return nb::cast(std::move(object));
+}
+
+void BindHints(nb::module_& tarvex) {
+  BindDispatchWalker(tarvex);
+  BindHintWalker(tarvex);
+}
+
+}  // namespace quillet::host

@@ -1,0 +1,57 @@
+// CPGenAnalyzerImpl: the place where a call enters. One logical line in; its records, or the one
+// error that describes why there are none, out.
+//
+// It owns the statement parser and the two walkers. Nothing survives from one line to the next but
+// grammar tables, free lists and walker settings. One thread at a time per analyzer; analyzers
+// share nothing.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "foundations/errors.h"
+#include "hints/hint_walker.h"
+#include "lines/logical_line.h"
+#include "parser/parser.h"
+#include "walker/walker.h"
+
+namespace quillet {
+
+class CPGenAnalyzerImpl {
+ public:
+  struct Options {
+    Version version;
+    std::string grammar_file;  // absolute paths
+    std::string hint_grammar_file;
+    std::vector<std::string> keywords;
+    std::vector<std::string> hint_keywords;
+    bool py3_grammar = true;
+    TokenNames token_names = TokenNames::Default();
+    KindsByName kinds_by_state = KindsByStateName();
+  };
+
+  explicit CPGenAnalyzerImpl(const Options& options);
+
+  // Analyses a line once. The error that describes a failure, or nothing: success, a line that was
+  // analysed before, or a failure that is no syntax error, which is reported to the console. Only
+  // what a hook or the report raises leaves as an exception.
+  std::optional<SyntaxError> AnalyzeSingleLogical(LogicalLine& logical, bool in_async_def, bool first_in_def = false);
+
+  // True; throws ParseError, SyntaxError, or ValueError for anything else that went wrong.
+  bool InspectSingleLogical(LogicalLine& logical, bool in_async_def, bool in_embedded_expression = false,
+                            bool first_in_def = false);
+  void InspectEmbeddedExpressions(LogicalLine& logical, bool in_async_def, bool first_in_def);
+
+  CPGenParserImpl& logical_parser() const { return *logical_parser_; }
+  CNodeWalker& node_walker() const { return *node_walker_; }
+  CTypeHintWalker& type_hint_walker() const { return *type_hint_walker_; }
+
+ private:
+  std::unique_ptr<CPGenParserImpl> logical_parser_;
+  std::unique_ptr<CNodeWalker> node_walker_;
+  std::unique_ptr<CTypeHintWalker> type_hint_walker_;
+};
+
+}  // namespace quillet

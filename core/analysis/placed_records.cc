@@ -1,0 +1,196 @@
+// One row after another: place, scope, and the info string taken apart.
+#include "analysis/placed_records.h"
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+
+#include "foundations/shown_text.h"
+#include "foundations/utf8.h"
+#include "vocabulary/symbolinfo.h"
+
+namespace quillet {
+
+namespace {
+
+constexpr Text kWords[] = {
+#define QUILLET_RECORD_KIND(identifier, word) word,
+#include "analysis/record_kinds.def"
+};
+
+constexpr Text kEllipsis = "\xE2\x80\xA6";
+constexpr Text kYieldFrom = "from ";
+
+constexpr std::array<RecordKind, 256> kKindOfByte = [] {
+  std::array<RecordKind, 256> kinds{};
+  kinds.fill(RecordKind::kOther);
+  kinds[kSetKind] = RecordKind::kSet;
+  kinds[kGetKind] = RecordKind::kGet;
+  kinds[kWithinExprKind] = RecordKind::kWithinExpr;
+  kinds[kCalledKind] = RecordKind::kCalled;
+  kinds[kImportKind] = RecordKind::kImport;
+  kinds[kFromImportKind] = RecordKind::kFromImport;
+  kinds[kImportAsNameKind] = RecordKind::kImportAs;
+  kinds[kGlobalKind] = RecordKind::kGlobal;
+  kinds[kNonlocalKind] = RecordKind::kNonlocal;
+  kinds[kTypeParameterKind] = RecordKind::kTypeParameter;
+  kinds[kExpressionEquivKind] = RecordKind::kExpression;
+  kinds[kTypedLiteralKind] = RecordKind::kLiteral;
+  kinds[kTypeHintKind] = RecordKind::kHint;
+  return kinds;
+}();
+
+Text WithoutInstanceSuffix(Text text) {
+  if (text.ends_with(kClassInstanceSuffix)) text.remove_suffix(kClassInstanceSuffix.size());
+  return text;
+}
+
+// The index of a name that is an argument's place; false for any other name.
+bool ArgIndexOf(Text name, size_t& index) {
+  if (!name.starts_with(kArgPrefix)) return false;
+  name.remove_prefix(kPrefixLen);
+  return std::from_chars(name.data(), name.data() + name.size(), index).ec == std::errc();
+}
+
+void DecodeInfoString(Text info, PlacedRecord& placed) {
+  const char byte = GetInfoBytesKind(info);
+  if (byte == kPlainEquivKind && !info.starts_with(":=")) {
+    placed.kind = info.ends_with(kClassInstanceSuffix) ? RecordKind::kInstance : RecordKind::kEqual;
+    placed.detail = WithoutInstanceSuffix(info);
+    return;
+  }
+  placed.kind = kKindOfByte[static_cast<uint8_t>(byte)];
+  placed.detail = placed.kind == RecordKind::kOther ? info : info.substr(std::min<size_t>(kPrefixLen, info.size()));
+  if (placed.kind == RecordKind::kLiteral) placed.detail = WithoutInstanceSuffix(placed.detail);
+}
+
+}  // namespace
+
+std::span<const Text> RecordKindWords() { return kWords; }
+
+void PlacedRecords::Begin(const FileAnalyzer& file, const ScopeNames& scopes) {
+  file_ = &file;
+  scopes_ = &scopes;
+  budget_ = std::max(kSmallestBudget, kBudgetPerSourceByte * file.source().size());
+  has_odd_bytes_ = !IsWellFormedUtf8(file.source().text());
+  texts_.Reset();
+}
+
+std::span<const PlacedRecord> PlacedRecords::OfRow(size_t row) {
+  placed_.clear();
+  spelled_at_ = 0;
+  const FileAnalyzer::LineResult& result = file_->results()[row];
+  const RecordStore& store = file_->store();
+  in_signature_ = result.first_in_def && file_->rows()[row].kind == LineKind::kComment && FindSignature(row);
+  for (uint32_t i = result.record_begin; i < result.record_end; ++i) Add(row, store.rows[i], false);
+  for (uint32_t i = result.arg_record_begin; i < result.arg_record_end; ++i) Add(row, store.arg_rows[i], true);
+  return placed_;
+}
+
+void PlacedRecords::Add(size_t row, const Record& record, bool is_parameter) {
+  PlacedRecord& placed = placed_.emplace_back();
+  Text name = record.name();
+  placed.scope = scopes_->scopes()[scopes_->ScopeOf(row, record, is_parameter)].name;
+  placed.is_parameter = is_parameter;
+  SetPlace(file_->rows()[row], name, placed);
+  Decode(record.info(), placed);
+  if (in_signature_ && placed.kind == RecordKind::kHint) placed.is_parameter = true;
+  if (name.starts_with(kArgPrefix)) [[unlikely]]
+    name = ShownArgument(name);
+  placed.name = Shown(Cut(name));
+  placed.detail = Shown(Cut(placed.detail));
+}
+
+void PlacedRecords::SetPlace(const LineRow& row, Text name, PlacedRecord& placed) {
+  const SourceText& source = file_->source();
+  const char* at = name.data();
+  if (name.empty() || !source.Holds(at)) at = PlaceOfCopy(row, name);
+  const Position position = source.PositionFrom(static_cast<int32_t>(row.first_line), at);
+  placed.line = static_cast<uint32_t>(position.line) + 1;
+  placed.column = static_cast<uint32_t>(position.col) + 1;
+}
+
+// Copies come in the order of their tokens, so the search goes on where the last one was found, and
+// gives up after a while.
+const char* PlacedRecords::PlaceOfCopy(const LineRow& row, Text name) {
+  constexpr uint32_t kMaxTokensSearched = 500;
+  const TokenSpan toks = TokenSpan(file_->source().tokens).subspan(row.first_token, row.token_count);
+  const Text root = RootOfName(name);
+  const auto count = static_cast<uint32_t>(toks.size());
+  for (uint32_t i = 0; i < std::min(count, kMaxTokensSearched); ++i) {
+    const uint32_t token = (spelled_at_ + i) % count;
+    if (toks[token].view() != root) continue;
+    spelled_at_ = token;
+    return toks[token].text;
+  }
+  const auto first = std::find_if(toks.begin(), toks.end(), [](const Token& tok) { return !IsSkipCode(tok.code); });
+  return (first != toks.end() ? *first : toks.front()).text;
+}
+
+void PlacedRecords::Decode(Text info, PlacedRecord& placed) {
+  // What `yield from` yields from is itself an info string behind the word. Nothing else begins with
+  // the word and a blank, since `from` is no name.
+  if (!info.starts_with(kYieldFrom)) return DecodeInfoString(info, placed);
+  DecodeInfoString(info.substr(kYieldFrom.size()), placed);
+  const Text inner = placed.detail;
+  if (!inner.empty() && inner.data() == info.data() + kYieldFrom.size()) {
+    placed.detail = info.substr(0, kYieldFrom.size() + inner.size());
+    return;
+  }
+  buffer_.assign(inner.empty() ? kYieldFrom.substr(0, kYieldFrom.size() - 1) : kYieldFrom).append(inner);
+  placed.detail = texts_.Copy(buffer_);
+}
+
+// ---- signature comments ----
+
+// A method's comment may leave out the object itself: then there is one type less than parameters.
+bool PlacedRecords::FindSignature(size_t row) {
+  parameters_.clear();
+  const ScopeNames::Scope& scope = scopes_->scopes()[scopes_->ScopeOfRow(row)];
+  if (scope.kind != ScopeNames::ScopeKind::kFunction) return false;
+  const RecordStore& store = file_->store();
+  const FileAnalyzer::LineResult& head = file_->results()[scope.row];
+  for (uint32_t i = head.arg_record_begin; i < head.arg_record_end; ++i) {
+    if (store.arg_rows[i].info() == kSetPrefix) parameters_.push_back(store.arg_rows[i].name());
+  }
+  size_t type_count = 0;
+  const FileAnalyzer::LineResult& comment = file_->results()[row];
+  for (uint32_t i = comment.record_begin; i < comment.record_end; ++i) {
+    size_t index;
+    if (ArgIndexOf(store.rows[i].name(), index)) type_count = std::max(type_count, index + 1);
+  }
+  const bool is_method = scopes_->scopes()[scope.parent].kind == ScopeNames::ScopeKind::kClass;
+  if (is_method && type_count + 1 == parameters_.size()) parameters_.erase(parameters_.begin());
+  return true;
+}
+
+Text PlacedRecords::ShownArgument(Text name) {
+  size_t index;
+  if (in_signature_ && ArgIndexOf(name, index) && index < parameters_.size()) return parameters_[index];
+  buffer_.assign("<argument ").append(name.substr(kPrefixLen)).append(">");
+  return texts_.Copy(buffer_);
+}
+
+// ---- what texts may be ----
+
+Text PlacedRecords::Cut(Text text) {
+  if (text.size() <= budget_) {
+    budget_ -= text.size();
+    return text;
+  }
+  budget_ = 0;
+  if (text.size() <= kCutSize) return text;
+  size_t size = kCutSize;
+  while (size > 0 && !IsUtf8LeadByte(text[size])) --size;
+  buffer_.assign(text.substr(0, size)).append(kEllipsis);
+  return texts_.Copy(buffer_);
+}
+
+Text PlacedRecords::Shown(Text text) {
+  if (!has_odd_bytes_ || IsWellFormedUtf8(text)) return text;
+  buffer_.clear();
+  AppendShown(text, buffer_);
+  return texts_.Copy(buffer_);
+}
+
+}  // namespace quillet

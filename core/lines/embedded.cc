@@ -1,0 +1,150 @@
+// The expressions embedded in a line, each as a line of its own: fields of formatted strings, string
+// literals that are type hints, and hints in comments.
+//
+// Their tokens are views into the same bytes, and their positions those of the physical line, so an
+// error in one lands where it stands in the file. They are worked out from the bytes like those of
+// any line; where the host gave the outer line's tokens positions of its own, they are counted from
+// the token that holds the expression.
+#include <algorithm>
+#include <memory>
+
+#include "lines/expression_tokens.h"
+#include "lines/fstring_fields.h"
+#include "lines/logical_line.h"
+#include "lines/string_hints.h"
+#include "lines/type_comment.h"
+
+namespace quillet {
+
+namespace {
+
+// An embedded expression: its tokens in the common list, and the outer token that holds it.
+struct Found {
+  LineKind kind;
+  TokenRange range;
+  size_t outer;
+};
+
+class EmbeddedSearch {
+ public:
+  EmbeddedSearch(TokenSpan toks, std::vector<Token>& tokens, std::vector<Found>& found)
+      : toks_(toks), tokens_(tokens), found_(found) {}
+
+  void Run() {
+    bool may_hold_hints = false;
+    bool has_plain_string = false;
+    for (const Token& token : toks_) {
+      may_hold_hints |= token.code == tok::COLON || token.code == tok::RARROW || token.code == word::kCast;
+      has_plain_string |= token.code == tok::STRING && !IsFormattedString(token);
+    }
+    if (may_hold_hints && has_plain_string) FindStringHints(toks_, hints_);
+
+    size_t next_hint = 0;
+    for (size_t i = 0; i < toks_.size(); ++i) {
+      if (next_hint < hints_.size() && hints_[next_hint] == i) {
+        AddHint(LineKind::kStringifiedTypeHint, ContentsOfStringHint(toks_[i]), i);
+        while (next_hint < hints_.size() && hints_[next_hint] == i) ++next_hint;
+      }
+      if (toks_[i].code == tok::STRING && IsFormattedString(toks_[i])) AddFields(i);
+      if (toks_[i].code == tok::COMMENT) AddCommentHint(i);
+    }
+  }
+
+ private:
+  void AddFields(size_t i) {
+    fields_.clear();
+    AppendFieldTokens(toks_[i], tokens_, fields_);
+    for (const TokenRange& field : fields_) found_.push_back({LineKind::kFstringFieldExp, field, i});
+  }
+
+  void AddCommentHint(size_t i) {
+    const Text comment = toks_[i].view();
+    const TypeCommentHint hint = FindTypeCommentHint(comment);
+    if (hint.found) AddHint(LineKind::kCommentedTypeHint, comment.substr(hint.begin, hint.end - hint.begin), i);
+  }
+
+  void AddHint(LineKind kind, Text hint, size_t i) {
+    if (IsNone(hint)) return;
+    const size_t begin = tokens_.size();
+    AppendExpressionTokens(hint.data(), hint.data() + hint.size(), tokens_);
+    if (tokens_.size() > begin) found_.push_back({kind, {begin, tokens_.size()}, i});
+  }
+
+  TokenSpan toks_;
+  std::vector<Token>& tokens_;
+  std::vector<Found>& found_;
+  std::vector<size_t> hints_;
+  std::vector<TokenRange> fields_;
+};
+
+// Positions inside of one token, counted from that token's own.
+class PlacesInToken {
+ public:
+  PlacesInToken(const Token& token, Position position) : token_(token), position_(position) {
+    for (const char* at = token.text; at < token.end(); ++at)
+      if (*at == '\n' || (*at == '\r' && (at + 1 == token.end() || at[1] != '\n'))) line_starts_.push_back(at + 1);
+  }
+
+  Position Of(const char* at) const {
+    const auto next = std::upper_bound(line_starts_.begin(), line_starts_.end(), at);
+    const auto lines = static_cast<int32_t>(next - line_starts_.begin());
+    if (lines == 0) return {position_.line, position_.col + static_cast<int32_t>(at - token_.text)};
+    return {position_.line + lines, static_cast<int32_t>(at - *(next - 1))};
+  }
+
+ private:
+  Token token_;
+  Position position_;
+  std::vector<const char*> line_starts_;
+};
+
+}  // namespace
+
+EmbeddedLines LogicalLine::DirectGetExpLogicals() const {
+  EmbeddedLines embedded;
+  // Only bytes of the source are followed by what a scan may load.
+  if (!source) return embedded;
+  for (const Token& token : toks)
+    if (!token.removed() && !source->Holds(token.text)) return embedded;
+
+  std::vector<Token> tokens;
+  std::vector<Found> found;
+  EmbeddedSearch(toks, tokens, found).Run();
+  if (found.empty()) return embedded;
+
+  const Ref<SourceText> inner = SourceText::Within(source);
+  inner->tokens = std::move(tokens);
+  const PositionView outer_positions = positions();
+  std::unique_ptr<PlacesInToken> places;
+  size_t places_of = toks.size();
+  for (const Found& row : found) {
+    auto line = std::make_unique<LogicalLine>();
+    line->source = inner;
+    line->toks = TokenSpan(inner->tokens).subspan(row.range.begin, row.range.end - row.range.begin);
+    line->token_count = static_cast<int32_t>(line->toks.size());
+    line->kind = row.kind;
+    if (!has_stored_positions_) {
+      line->first_line = first_line;
+      line->first_line += line->positions().LineOf(0);
+    } else if (row.outer < outer_positions.size()) {
+      if (places_of != row.outer) {
+        places = std::make_unique<PlacesInToken>(toks[row.outer], outer_positions[row.outer]);
+        places_of = row.outer;
+      }
+      const int32_t line_of_first = places->Of(line->toks.front().text).line;
+      line->first_line = first_line + line_of_first;
+      std::vector<Position> own_positions;
+      own_positions.reserve(line->toks.size());
+      for (const Token& token : line->toks) {
+        own_positions.push_back(places->Of(token.text));
+        own_positions.back().line -= line_of_first;
+      }
+      line->SetPositions(std::move(own_positions));
+    }
+    embedded.lines.push_back(line.get());
+    embedded.owned.push_back(std::move(line));
+  }
+  return embedded;
+}
+
+}  // namespace quillet

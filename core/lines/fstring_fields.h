@@ -1,0 +1,27 @@
+// The fields of a formatted string: the expressions in its braces, those in format specifications,
+// and those of formatted strings inside of fields.
+#pragma once
+
+#include <cstdint>
+#include <vector>
+
+#include "tokens/token.h"
+
+namespace quillet {
+
+// A row of an embedded expression's tokens in a list of tokens.
+struct TokenRange {
+  size_t begin;
+  size_t end;
+};
+
+// Whether a string token's prefix says that it is formatted.
+bool IsFormattedString(const Token& string);
+
+// Appends the tokens of each field of a formatted string, and the ranges of them, at least one token
+// each. Where the language has no field (an empty one, one that is not closed, a lone closing brace),
+// the range ends with or consists of an error token in the place that is at fault, which no grammar
+// takes. The string's token is followed by 32 readable bytes at least.
+void AppendFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields);
+
+}  // namespace quillet

@@ -1,0 +1,22 @@
+// Which string literals of a statement are type hints.
+#pragma once
+
+#include <cstddef>
+#include <vector>
+
+#include "tokens/token.h"
+
+namespace quillet {
+
+// Appends the indices, in order, of the string tokens that stand for a type: in the annotations of
+// parameters, returns and variables and in the first argument of `cast(...)` and `typing.cast(...)`,
+// whole or inside subscripts. A literal is a hint only where it stands for a whole type of its own:
+// no operand but of "|", no argument of a call, no value of `Literal[...]`, no metadata of
+// `Annotated[...]`, not concatenated.
+void FindStringHints(TokenSpan toks, std::vector<size_t>& hints);
+
+// The text between the quotes of a hint; none for a literal whose text is not what the program
+// sees: bytes, a formatted string, or one with a backslash.
+Text ContentsOfStringHint(const Token& string);
+
+}  // namespace quillet

@@ -1,0 +1,353 @@
+// Text is measured in characters where it is cut, and in cells where it is set in columns.
+#include "output/text_lines.h"
+
+#include <algorithm>
+#include <charconv>
+#include <unordered_map>
+
+#include "foundations/char_tables.h"
+#include "foundations/utf8.h"
+
+namespace quillet {
+
+namespace {
+
+// Records of one statement are set in columns; a name longer than this takes its own width.
+constexpr size_t kNameWidth = 20;
+// How much of a long line is shown, in characters: an error stands within it.
+constexpr size_t kWindow = 160;
+constexpr Text kEllipsis = "\xE2\x80\xA6";
+constexpr Text kReplacement = "\xEF\xBF\xBD";
+
+constexpr Text kPlaceColour = "36";
+constexpr Text kNameColour = "1";
+constexpr Text kErrorColour = "1;31";
+
+bool IsUnsafe(uint32_t c) {
+  if (c < 0x20) return c != '\t';
+  if (c < 0x7F) return false;
+  return c <= 0x9F || c == 0x61C || c == 0x200E || c == 0x200F || (c >= 0x2028 && c <= 0x202E) ||
+         (c >= 0x2066 && c <= 0x2069);
+}
+
+void AppendHex(uint32_t value, int digits, std::string& out) {
+  for (int i = digits - 1; i >= 0; --i) out += "0123456789abcdef"[value >> (4 * i) & 15];
+}
+
+void AppendEscaped(uint32_t c, std::string& out) {
+  if (c == '\n') {
+    out += "\\n";
+  } else if (c == '\r') {
+    out += "\\r";
+  } else if (c < 0x100) {
+    out += "\\x";
+    AppendHex(c, 2, out);
+  } else {
+    out += "\\u";
+    AppendHex(c, 4, out);
+  }
+}
+
+// The bytes at `at` that together stand for one replacement character: the longest beginning of a
+// character, or one byte.
+size_t OddLength(const char* at, const char* end) {
+  const auto byte_at = [&](ptrdiff_t i) { return i < end - at ? static_cast<uint8_t>(at[i]) : 0u; };
+  const uint32_t b0 = byte_at(0);
+  if (b0 < 0xE0 || b0 > 0xF4) return 1;
+  const uint32_t lowest = b0 == 0xE0 ? 0xA0 : b0 == 0xF0 ? 0x90 : 0x80;
+  const uint32_t highest = b0 == 0xED ? 0x9F : b0 == 0xF4 ? 0x8F : 0xBF;
+  if (byte_at(1) < lowest || byte_at(1) > highest) return 1;
+  return b0 >= 0xF0 && byte_at(2) >= 0x80 && byte_at(2) <= 0xBF ? 3 : 2;
+}
+
+// Source text as UTF-8.
+std::string Decoded(Text bytes) {
+  if (IsWellFormedUtf8(bytes)) return std::string(bytes);
+  std::string text;
+  const char* const end = bytes.data() + bytes.size();
+  for (const char* at = bytes.data(); at < end;) {
+    const DecodedChar c = DecodeUtf8(at, end);
+    if (c.length != 0) {
+      text.append(at, c.length);
+      at += c.length;
+    } else {
+      text += kReplacement;
+      at += OddLength(at, end);
+    }
+  }
+  return text;
+}
+
+// Calls `fn(code_point, bytes)` for each character of well-formed text.
+template <class Function>
+void ForEachChar(Text text, Function&& fn) {
+  const char* const end = text.data() + text.size();
+  for (const char* at = text.data(); at < end;) {
+    const DecodedChar c = DecodeUtf8(at, end);
+    const uint32_t length = std::max(c.length, 1u);
+    fn(c.code_point, Text(at, length));
+    at += length;
+  }
+}
+
+bool IsSpace(uint32_t code_point) { return (CharClassOf(code_point) & kCharSpace) != 0; }
+
+// Without white space at both ends.
+Text Stripped(Text text) {
+  size_t begin = text.size();
+  size_t end = 0;
+  ForEachChar(text, [&](uint32_t c, Text bytes) {
+    if (IsSpace(c)) return;
+    const auto at = static_cast<size_t>(bytes.data() - text.data());
+    begin = std::min(begin, at);
+    end = at + bytes.size();
+  });
+  return begin < end ? text.substr(begin, end - begin) : Text();
+}
+
+// The parts of a line that are looked at: more than is shown, and bounded, since a line may hold any
+// number of statements.
+constexpr size_t kMostBytes = 1024;
+
+Text FirstBytes(Text line) {
+  size_t size = std::min(line.size(), kMostBytes);
+  while (size > 0 && size < line.size() && !IsUtf8LeadByte(line[size])) --size;
+  return line.substr(0, size);
+}
+
+Text LastBytes(Text line) {
+  size_t begin = line.size() - std::min(line.size(), kMostBytes);
+  while (begin > 0 && begin < line.size() && !IsUtf8LeadByte(line[begin])) ++begin;
+  return line.substr(begin);
+}
+
+// The first `count` characters of well-formed text.
+Text FirstChars(Text text, size_t count) {
+  size_t at = 0;
+  for (; at < text.size(); ++at) {
+    if (IsUtf8LeadByte(text[at]) && count-- == 0) break;
+  }
+  return text.substr(0, at);
+}
+
+Text LastChars(Text text, size_t count) {
+  size_t at = text.size();
+  while (at > 0 && count > 0) count -= IsUtf8LeadByte(text[--at]);
+  return text.substr(at);
+}
+
+void AppendLiteralDescription(Text detail, std::string& out) {
+  Text start;
+  if (detail.starts_with("from ")) {
+    start = detail.substr(0, 5);
+    detail.remove_prefix(5);
+  }
+  const size_t colon = detail.find(": ");
+  const Text cls = detail.substr(0, colon);
+  const Text text = colon == Text::npos ? Text() : detail.substr(colon + 2);
+  out.append("= ").append(start);
+  if (text.empty()) {
+    const bool is_vowel = cls.empty() || Text("aeiou").find(cls[0]) != Text::npos;
+    out.append(is_vowel ? "an " : "a ").append(cls);
+  } else {
+    out += text;
+    // None is its own class.
+    if (text != cls) out.append(" (").append(cls).append(")");
+  }
+}
+
+class TextLinesWriter : public FileWriter {
+ public:
+  explicit TextLinesWriter(const TextLinesOptions& options) : options_(options) {}
+
+  void Write(const BatchInput& input, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
+             std::string& out) override {
+    path_.clear();
+    AppendPrintable(input.path, path_);
+    placed.Begin(file, scopes);
+    for (size_t row = 0; row < file.rows().size(); ++row) {
+      if (file.results()[row].error >= 0) {
+        AppendError(file, row, out);
+      } else if (!options_.errors_only) {
+        AppendStatement(file, row, placed.OfRow(row), out);
+      }
+    }
+  }
+
+ private:
+  void AppendError(const FileAnalyzer& file, size_t row, std::string& out) {
+    const Position position = file.ErrorPosition(row);
+    const SyntaxError& error = file.errors()[static_cast<size_t>(file.results()[row].error)];
+    place_.assign(path_).append(":").append(std::to_string(position.line + 1));
+    place_.append(":").append(std::to_string(position.col + 1)).append(":");
+    AppendColoured(kPlaceColour, place_, out);
+    out += ' ';
+    text_.clear();
+    AppendPrintable(error.message(), text_);
+    AppendColoured(kErrorColour, text_, out);
+
+    const Text line = PhysicalLine(file.source(), static_cast<size_t>(position.line));
+    const size_t column = std::min(static_cast<size_t>(position.col), line.size());
+    std::string before = Decoded(LastBytes(line.substr(0, column)));
+    std::string after = Decoded(FirstBytes(line.substr(column)));
+    if (CharCountOfUtf8(before) + CharCountOfUtf8(after) > kWindow) {
+      if (CharCountOfUtf8(before) > kWindow / 2) before = std::string(kEllipsis).append(LastChars(before, kWindow / 2));
+      if (CharCountOfUtf8(after) > kWindow / 2) after = std::string(FirstChars(after, kWindow / 2)).append(kEllipsis);
+    }
+    text_.clear();
+    AppendPrintable(before, text_);
+    std::string caret;
+    ForEachChar(text_, [&](uint32_t c, Text) { c == '\t' ? caret.append(1, '\t') : caret.append(WidthOf(c), ' '); });
+    caret += '^';
+    AppendPrintable(after, text_);
+    out.append("\n    ").append(text_).append("\n    ");
+    AppendColoured(kErrorColour, caret, out);
+    out += '\n';
+  }
+
+  void AppendStatement(const FileAnalyzer& file, size_t row, std::span<const PlacedRecord> records, std::string& out) {
+    if (records.empty()) return;
+    const LineRow& line = file.rows()[row];
+    place_.assign(path_).append(":").append(std::to_string(line.first_line + 1)).append(":");
+    AppendColoured(kPlaceColour, place_, out);
+    out += ' ';
+    const std::string source = Decoded(FirstBytes(PhysicalLine(file.source(), line.first_line)));
+    text_.clear();
+    AppendPrintable(Stripped(source), text_);
+    if (CharCountOfUtf8(text_) > kWindow) {
+      out.append(FirstChars(text_, kWindow - 1)).append(kEllipsis);
+    } else {
+      out += text_;
+    }
+    if (line.last_line > line.first_line) out.append(" ").append(kEllipsis);
+    out += '\n';
+    for (const PlacedRecord& record : records) {
+      text_.clear();
+      AppendPrintable(record.name, text_);
+      size_t width = 0;
+      ForEachChar(text_, [&](uint32_t c, Text) { width += WidthOf(c); });
+      out += "    ";
+      AppendColoured(kNameColour, text_, out);
+      out.append(width + 2 <= kNameWidth ? kNameWidth - width : 2, ' ');
+      text_.clear();
+      AppendDescription(record, text_);
+      AppendPrintable(text_, out);
+      out += '\n';
+    }
+  }
+
+  void AppendColoured(Text colour, Text text, std::string& out) const {
+    if (!options_.colours || text.empty()) {
+      out += text;
+    } else {
+      out.append("\x1b[").append(colour).append("m").append(text).append("\x1b[0m");
+    }
+  }
+
+  // A physical line, counted from 0, without its end; empty past the last one.
+  static Text PhysicalLine(const SourceText& source, size_t line) {
+    const std::vector<uint32_t>& starts = source.line_starts;
+    if (line >= starts.size()) return {};
+    const size_t end = line + 1 < starts.size() ? starts[line + 1] : source.size();
+    const Text text = source.text().substr(starts[line], end - starts[line]);
+    return text.substr(0, text.find_last_not_of("\r\n") + 1);
+  }
+
+  size_t WidthOf(uint32_t c) {
+    if (c < 0x80 || !options_.width_of) return 1;
+    const auto [found, added] = widths_.try_emplace(c, 0);
+    if (added) found->second = options_.width_of(c);
+    return found->second;
+  }
+
+  const TextLinesOptions options_;
+  std::unordered_map<uint32_t, uint32_t> widths_;
+  std::string path_;
+  std::string place_;
+  std::string text_;
+};
+
+}  // namespace
+
+void AppendPrintable(Text text, std::string& out) {
+  const char* const end = text.data() + text.size();
+  const char* safe = text.data();
+  for (const char* at = safe; at < end;) {
+    const auto byte = static_cast<uint8_t>(*at);
+    if (byte >= 0x20 && byte < 0x7F) [[likely]] {
+      ++at;
+      continue;
+    }
+    const DecodedChar c = DecodeUtf8(at, end);
+    const uint32_t length = std::max(c.length, 1u);
+    const uint32_t code_point = c.length != 0 ? c.code_point : 0xDC00 + byte;
+    if (c.length == 0 || IsUnsafe(code_point)) {
+      out.append(safe, at);
+      AppendEscaped(code_point, out);
+      safe = at + length;
+    }
+    at += length;
+  }
+  out.append(safe, end);
+}
+
+void AppendDescription(const PlacedRecord& record, std::string& out) {
+  const Text detail = record.detail;
+  switch (record.kind) {
+    case RecordKind::kSet:
+      out += record.is_parameter ? "parameter" : "set";
+      return;
+    case RecordKind::kGet:
+      out += "read";
+      return;
+    case RecordKind::kWithinExpr:
+      out.append("set inside the expression, at token ").append(detail);
+      return;
+    case RecordKind::kCalled:
+      out.append("called with ").append(detail);
+      return;
+    case RecordKind::kImport:
+      out.append("import ").append(detail);
+      return;
+    case RecordKind::kFromImport: {
+      const size_t blank = detail.rfind(' ');
+      const Text module = blank == Text::npos ? Text() : detail.substr(0, blank);
+      out.append("from ").append(module).append(" import ").append(detail.substr(blank + 1));
+      return;
+    }
+    case RecordKind::kImportAs:
+      out.append("imported as ").append(detail);
+      return;
+    case RecordKind::kGlobal:
+      out += "declared global";
+      return;
+    case RecordKind::kNonlocal:
+      out += "declared nonlocal";
+      return;
+    case RecordKind::kTypeParameter:
+      out += "type parameter";
+      if (!detail.empty()) out.append(" ").append(detail);
+      return;
+    case RecordKind::kExpression:
+    case RecordKind::kEqual:
+      out.append("= ").append(detail.empty() ? Text("nothing") : detail);
+      return;
+    case RecordKind::kLiteral:
+      return AppendLiteralDescription(detail, out);
+    case RecordKind::kHint:
+      out.append("hint ").append(detail);
+      return;
+    case RecordKind::kInstance:
+      out.append("instance of ").append(detail);
+      return;
+    case RecordKind::kOther:
+      out += detail;
+      return;
+  }
+}
+
+std::unique_ptr<FileWriter> MakeTextLinesWriter(const TextLinesOptions& options) {
+  return std::make_unique<TextLinesWriter>(options);
+}
+
+}  // namespace quillet

@@ -1,0 +1,542 @@
+// Many files at once: order, threads, what becomes of files that cannot be read, and what is said of
+// each record: its place, its scope, its words.
+#include "analysis/batch.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <chrono>
+#include <cstdio>
+#include <filesystem>
+#include <fstream>
+#include <map>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "analysis/source_bytes.h"
+#include "output/arrow_stream.h"
+#include "output/json_lines.h"
+#include "output/text_lines.h"
+#include "tests/core/support/analyzer_helper.h"
+
+namespace quillet {
+namespace {
+
+using testing::AnalyzerOptions;
+using testing::kPy2;
+using testing::kPy3;
+using Strings = std::vector<std::string>;
+
+BatchAnalyzer::Options Options(unsigned jobs = 2, Version version = kPy3) {
+  BatchAnalyzer::Options options;
+  static_cast<CPGenAnalyzerImpl::Options&>(options.analyzer) = AnalyzerOptions(version);
+  options.jobs = jobs;
+  return options;
+}
+
+BatchInput Source(std::string path, std::string bytes) { return {std::move(path), std::move(bytes), {}}; }
+
+std::vector<BatchResult> ResultsOf(BatchAnalyzer::Options options, std::vector<BatchInput> inputs) {
+  BatchAnalyzer batch(std::move(options), std::move(inputs));
+  std::vector<BatchResult> results;
+  BatchResult result;
+  while (batch.Next(result)) results.push_back(std::move(result));
+  return results;
+}
+
+BatchResult ResultOf(std::string source, Version version = kPy3) {
+  return std::move(ResultsOf(Options(1, version), {Source("a.py", std::move(source))}).at(0));
+}
+
+// A record as "line:column scope|name kind detail", with "arg " in front for parameters.
+std::string ShowRecord(const RecordTable& table, size_t i) {
+  std::string shown = table.is_parameter[i] ? "arg " : "";
+  shown += std::to_string(table.lines[i]) + ":" + std::to_string(table.columns[i]) + " ";
+  shown.append(table.ScopeAt(i))
+      .append("|")
+      .append(table.NameAt(i))
+      .append(" ")
+      .append(RecordKindWords()[static_cast<size_t>(table.kinds[i])]);
+  if (!table.DetailAt(i).empty()) shown.append(" ").append(table.DetailAt(i));
+  return shown;
+}
+
+// The records of a source whose name is `name`, or all of them.
+Strings RecordsOf(std::string source, Text name = kNoText, Version version = kPy3) {
+  const BatchResult result = ResultOf(std::move(source), version);
+  EXPECT_EQ(result.problem, "");
+  Strings records;
+  for (size_t i = 0; i < result.table.size(); ++i)
+    if (IsNone(name) || result.table.NameAt(i) == name) records.push_back(ShowRecord(result.table, i));
+  return records;
+}
+
+// ---- places ----
+
+TEST(Places, ANameStandsWhereTheSourceSpellsIt) {
+  EXPECT_EQ(RecordsOf("x = a.b(\n    c)\n"), (Strings{"1:1 |x set", "1:1 |x equal a.b(c)", "1:5 |a.b called (c)",
+                                                      "1:5 |a get", "1:5 |a.b get", "2:5 |c get"}));
+}
+
+TEST(Places, ColumnsCountBytesBehindAByteOrderMark) {
+  EXPECT_EQ(RecordsOf("\xEF\xBB\xBFx; \xC3\xA9; y\n"), (Strings{"1:1 |x get", "1:4 |\xC3\xA9 get", "1:8 |y get"}));
+}
+
+TEST(Places, ANameInAFormattedStringStandsInTheString) {
+  EXPECT_EQ(RecordsOf("f'{a} {b.c}'\n"), (Strings{"1:4 |a get", "1:8 |b get", "1:8 |b.c get"}));
+}
+
+TEST(Places, TheHintOfAParameterStandsAtTheParameter) {
+  EXPECT_EQ(RecordsOf("def f(a, b: int): pass\n", "b"), (Strings{"arg 1:10 f|b set", "arg 1:10 f|b hint int"}));
+}
+
+TEST(Places, ANameThatTheStatementDoesNotSpellStandsAtItsFirstToken) {
+  EXPECT_EQ(RecordsOf("if a: return (\\\n 1)\n", "return"), (Strings{"1:7 |return literal int: 1"}));
+  EXPECT_EQ(RecordsOf("x\n  \\\n y\ndef f(a) -> int: pass\n", "return"), (Strings{"arg 4:1 f|return hint int"}));
+}
+
+// ---- scopes ----
+
+TEST(Scopes, AStatementBelongsToTheDefinitionsAroundIt) {
+  EXPECT_EQ(RecordsOf("x\nclass A:\n  x\n  def f(self):\n    x\n    class B:\n      x\n  x\nx\n", "x"),
+            (Strings{"1:1 |x get", "3:3 A|x get", "5:5 A.f|x get", "7:7 A.f.B|x get", "8:3 A|x get", "9:1 |x get"}));
+}
+
+TEST(Scopes, AHeadsOwnNamesBelongToTheScopeAroundAndItsParametersToTheScopeItOpens) {
+  EXPECT_EQ(RecordsOf("class A(B):\n  def f[T: U](x=y) -> z: pass\n"),
+            (Strings{"1:7 |A set", "1:9 |B get", "2:7 A|f set", "2:12 A|U get", "2:17 A|y get", "2:23 A|z get",
+                     "arg 2:9 A.f|T type_parameter U", "arg 2:15 A.f|x set", "arg 2:15 A.f|x equal y",
+                     "arg 2:3 A.f|return hint z"}));
+}
+
+TEST(Scopes, ABodyOnTheHeadsLineBelongsToTheDefinition) {
+  EXPECT_EQ(RecordsOf("def f(): x; y\nx\n"), (Strings{"1:5 |f set", "1:10 f|x get", "1:13 f|y get", "2:1 |x get"}));
+}
+
+TEST(Scopes, StoresInsideExpressionsStayWithTheirStatement) {
+  EXPECT_EQ(RecordsOf("def f():\n  return [i for i in j]\n", "i"), (Strings{"2:11 f|i get", "2:17 f|i within_expr 4"}));
+}
+
+TEST(Scopes, TheParametersOfATypeAliasBelongToTheAlias) {
+  EXPECT_EQ(RecordsOf("type X[T: int] = T\n", "X"), (Strings{"1:6 |X set", "1:6 |X equal T"}));
+  for (const std::string& record : RecordsOf("type X[T: int] = T\n", "T"))
+    EXPECT_NE(record.find(record.starts_with("arg") ? " X|T" : " |T"), std::string::npos) << record;
+}
+
+TEST(Scopes, AGlobalNameBelongsToTheModule) {
+  EXPECT_EQ(RecordsOf("def f():\n  g.x = 1\n  global g\n  g = h\n  def k(): g\n", "g"),
+            (Strings{"2:3 |g get", "3:10 f|g global", "4:3 |g set", "4:3 |g equal h", "5:12 f.k|g get"}));
+  EXPECT_EQ(RecordsOf("def f():\n  global g\n  g.x[0] = 1\n", "g.x[0]"), (Strings{"3:3 |g.x[0] literal int: 1"}));
+}
+
+TEST(Scopes, ANonlocalNameBelongsToTheNearestFunctionThatBindsIt) {
+  const std::string source =
+      "def a(n):\n  def b():\n    class C:\n      def d(self):\n        nonlocal n, m\n        n = m\n";
+  EXPECT_EQ(RecordsOf(source, "n").back(), "6:9 a|n equal m");
+  // Nobody binds it: the nearest function, past the class.
+  EXPECT_EQ(RecordsOf(source, "m").back(), "6:13 a.b|m get");
+}
+
+TEST(Scopes, ANonlocalNamePassesThroughAFunctionThatDeclaresItToo) {
+  EXPECT_EQ(RecordsOf("def a():\n  n = 1\n  def b():\n    nonlocal n\n    n = 2\n    def c():\n      nonlocal n\n"
+                      "      n = 3\n",
+                      "n")
+                .back(),
+            "8:7 a|n literal int: 3");
+}
+
+TEST(Scopes, ADeclarationWithoutAFunctionAroundChangesNothing) {
+  EXPECT_EQ(RecordsOf("global g\ng\n", "g"), (Strings{"1:8 |g global", "2:1 |g get"}));
+  EXPECT_EQ(RecordsOf("def f():\n  nonlocal n\n  n\n", "n"), (Strings{"2:12 f|n nonlocal", "3:3 f|n get"}));
+}
+
+TEST(Scopes, ASignatureCommentGivesFactsAboutItsFunctionsParameters) {
+  EXPECT_EQ(RecordsOf("def f(a, b):\n  # type: (int, str) -> bool\n  pass\n", "b"),
+            (Strings{"arg 1:10 f|b set", "arg 2:3 f|b hint str"}));
+  EXPECT_EQ(RecordsOf("def f(a, b):\n  # type: (int, str) -> bool\n  pass\n", "return"),
+            (Strings{"arg 2:3 f|return hint bool"}));
+}
+
+TEST(Scopes, ASignatureCommentOfAMethodMayLeaveOutTheObject) {
+  const std::string head = "class A:\n  def f(self, a):\n    # type: (";
+  EXPECT_EQ(RecordsOf(head + "int) -> bool\n    pass\n", "a").back(), "arg 3:5 A.f|a hint int");
+  EXPECT_EQ(RecordsOf(head + "A, int) -> bool\n    pass\n", "a").back(), "arg 3:5 A.f|a hint int");
+  EXPECT_EQ(RecordsOf("def f():\n  # type: (int) -> bool\n  pass\n", "<argument 0>"),
+            (Strings{"arg 2:3 f|<argument 0> hint int"}));
+}
+
+TEST(Scopes, DefinitionsAreListedWithTheirExtent) {
+  const BatchResult result = ResultOf("@d\nclass A:\n  def f(self):\n    x\n\n    # end\n  y = 1\n\ndef (: pass\n");
+  ASSERT_EQ(result.table.definitions.size(), 3u);
+  const auto shown = [&](size_t i) {
+    const RecordTable::Definition& found = result.table.definitions[i];
+    return std::string(result.table.scope_texts[found.scope]) + " " + std::to_string(found.line) + ":" +
+           std::to_string(found.column) + " " + std::to_string(found.first_line) + "-" +
+           std::to_string(found.last_line);
+  };
+  EXPECT_EQ(shown(0), "A 2:7 2-7");
+  EXPECT_EQ(shown(1), "A.f 3:7 3-4");
+  EXPECT_EQ(shown(2), "<no name> 9:1 9-9");
+}
+
+TEST(Scopes, ANameThatOpensOneIsMarked) {
+  const RecordTable table =
+      ResultOf("class A:\n  def f(self, g=A): pass\nasync def f(): pass\ntype T = f\nf = A\n").table;
+  Strings marked;
+  for (size_t i = 0; i < table.size(); ++i) {
+    if (table.opens[i] == RecordTable::Opens::kNothing) continue;
+    marked.push_back(ShowRecord(table, i) + (table.opens[i] == RecordTable::Opens::kClass ? " class" : " def"));
+  }
+  EXPECT_EQ(marked, (Strings{"1:7 |A set class", "2:7 A|f set def", "3:11 |f set def"}));
+}
+
+TEST(Scopes, DeepAndLongNamesStayBounded) {
+  std::string source;
+  for (size_t depth = 0; depth < 2000; ++depth) source += std::string(depth, ' ') + "def name(a):\n";
+  const BatchResult result = ResultOf(source);
+  EXPECT_EQ(result.table.definitions.size(), 2000u);
+  const TextList& scopes = result.table.scope_texts;
+  for (size_t i = 0; i < scopes.size(); ++i) EXPECT_LE(scopes[i].size(), ScopeNames::kMaxNameSize);
+  EXPECT_EQ(ResultOf("class " + std::string(100'000, 'a') + ":\n  x = 1\n").table.scope_texts.size(), 1u);
+}
+
+TEST(Texts, EachStandsInTheTableOnce) {
+  const RecordTable table = ResultOf("x = y\ndef x(y): pass\nx(y)\nz(y)\n").table;
+  Strings names, details;
+  for (size_t i = 0; i < table.name_texts.size(); ++i) names.emplace_back(table.name_texts[i]);
+  for (size_t i = 0; i < table.detail_texts.size(); ++i) details.emplace_back(table.detail_texts[i]);
+  EXPECT_EQ(names, (Strings{"x", "y", "z"}));
+  EXPECT_EQ(details, (Strings{"", "y", "(y)"}));
+}
+
+TEST(Texts, ThoseOfAllRecordsGrowWithTheSourceAndNotItsSquare) {
+  std::string source = "x = y\nz = a";
+  for (int i = 0; i < 20'000; ++i) source += ".a";
+  const BatchResult result = ResultOf(source + "\n");
+  EXPECT_LT(result.table.name_texts.bytes.size() + result.table.detail_texts.bytes.size(),
+            PlacedRecords::kSmallestBudget + PlacedRecords::kBudgetPerSourceByte * source.size() +
+                result.table.size() * (PlacedRecords::kCutSize + 8));
+  EXPECT_GT(result.table.size(), 20'000u);
+  EXPECT_TRUE(result.table.NameAt(result.table.size() - 1).ends_with("\xE2\x80\xA6"));
+}
+
+TEST(Texts, OddBytesAreShownAsEscapes) {
+  const Strings records = RecordsOf("x = '\xFF'\n");
+  EXPECT_EQ(records, (Strings{"1:1 |x set", "1:1 |x literal str: '\\xff'"}));
+}
+
+// ---- batches ----
+
+std::vector<BatchInput> ManySources(size_t count) {
+  std::vector<BatchInput> inputs;
+  for (size_t i = 0; i < count; ++i) {
+    std::string source;
+    // Files of very unequal sizes, so that threads finish out of order.
+    for (size_t line = 0; line < (i % 7 == 0 ? 300 : 3); ++line)
+      source += "name" + std::to_string(i) + " = call(" + std::to_string(line) + ")\n";
+    if (i % 5 == 0) source += "x = = 1\n";
+    inputs.push_back(Source("file" + std::to_string(i) + ".py", source));
+  }
+  return inputs;
+}
+
+TEST(Batch, ResultsComeInTheOrderOfTheInputs) {
+  const std::vector<BatchResult> results = ResultsOf(Options(4), ManySources(200));
+  ASSERT_EQ(results.size(), 200u);
+  for (size_t i = 0; i < results.size(); ++i) {
+    EXPECT_EQ(results[i].index, i);
+    EXPECT_EQ(results[i].table.NameAt(0), "name" + std::to_string(i));
+    EXPECT_EQ(results[i].errors.size(), i % 5 == 0 ? 1u : 0u);
+  }
+}
+
+TEST(Batch, OutputIsTheSameWhateverTheNumberOfThreads) {
+  const auto output_of = [](unsigned jobs, bool json) {
+    BatchAnalyzer::Options options = Options(jobs);
+    options.most_waiting = jobs;
+    options.make_writer = [json] { return json ? MakeJsonLinesWriter({}) : MakeTextLinesWriter({}); };
+    std::string output;
+    for (const BatchResult& result : ResultsOf(std::move(options), ManySources(100))) output += result.output;
+    return output;
+  };
+  for (const bool json : {false, true}) {
+    const std::string expected = output_of(1, json);
+    EXPECT_GT(expected.size(), 10'000u);
+    for (const unsigned jobs : {2u, 3u, 8u}) EXPECT_EQ(output_of(jobs, json), expected);
+  }
+}
+
+TEST(Batch, AnEmptyListEndsAtOnce) { EXPECT_TRUE(ResultsOf(Options(), {}).empty()); }
+
+TEST(Batch, ThreadsStayWithinTheirBoundsOfTheReader) {
+  static std::atomic<size_t> written{0};
+  written = 0;
+  class Counting : public FileWriter {
+   public:
+    void Write(const BatchInput&, const FileAnalyzer&, const ScopeNames&, PlacedRecords&, std::string& out) override {
+      out.assign(1000, 'x');
+      ++written;
+    }
+  };
+  for (const bool by_bytes : {false, true}) {
+    written = 0;
+    BatchAnalyzer::Options options = Options(4);
+    options.most_waiting = by_bytes ? 1000 : 5;
+    if (by_bytes) options.most_waiting_bytes = 1;
+    options.make_writer = [] { return std::make_unique<Counting>(); };
+    BatchAnalyzer batch(std::move(options), ManySources(100));
+    BatchResult result;
+    for (size_t handed_out = 1; batch.Next(result); ++handed_out) {
+      if (handed_out % 20 == 1) std::this_thread::sleep_for(std::chrono::milliseconds(20));
+      // By bytes, a thread may be at work for each job when the bound is met.
+      EXPECT_LE(written, handed_out + 5);
+    }
+    EXPECT_EQ(written, 100u);
+  }
+}
+
+TEST(Batch, CancellingEndsItEarly) {
+  BatchAnalyzer batch(Options(2), ManySources(500));
+  BatchResult result;
+  EXPECT_TRUE(batch.Next(result));
+  batch.Cancel();
+  EXPECT_FALSE(batch.Next(result));
+  BatchAnalyzer never_started(Options(2), ManySources(3));
+  never_started.Cancel();
+  EXPECT_FALSE(never_started.Next(result));
+}
+
+TEST(Batch, CancellingWakesAReaderThatWaits) {
+  const std::string pipe = ::testing::TempDir() + "/quillet_batch_pipe";
+  std::remove(pipe.c_str());
+  ASSERT_EQ(std::system(("mkfifo " + pipe).c_str()), 0);
+  BatchAnalyzer batch(Options(1), {{pipe, std::nullopt, {}}});
+  BatchResult result;
+  EXPECT_EQ(batch.Next(result, std::chrono::milliseconds(50)), BatchAnalyzer::Wait::kTimeout);
+  std::thread canceller([&batch] {
+    std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    batch.Cancel();
+  });
+  EXPECT_FALSE(batch.Next(result));
+  canceller.join();
+  std::remove(pipe.c_str());
+}
+
+// ---- files ----
+
+class Files : public ::testing::Test {
+ protected:
+  Files() : folder_(std::filesystem::path(::testing::TempDir()) / "quillet_batch_files") {
+    std::filesystem::create_directories(folder_);
+  }
+  ~Files() override { std::filesystem::remove_all(folder_); }
+
+  std::string Write(const std::string& name, const std::string& bytes) const {
+    const std::string path = (folder_ / name).string();
+    std::ofstream(path, std::ios::binary) << bytes;
+    return path;
+  }
+
+  std::filesystem::path folder_;
+};
+
+TEST_F(Files, AreReadWhole) {
+  std::string big;
+  for (int i = 0; i < 20'000; ++i) big += "x = 1  # line\n";
+  const std::vector<BatchResult> results = ResultsOf(
+      Options(), {{Write("big.py", big), {}, {}}, {Write("empty.py", ""), {}, {}}, {Write("a\nb.py", "x"), {}, {}}});
+  EXPECT_EQ(results[0].line_count, 20'000u);
+  EXPECT_EQ(results[0].statement_count, 20'000u);
+  EXPECT_EQ(results[0].byte_count, big.size());
+  EXPECT_EQ(results[0].table.size(), 40'000u);
+  EXPECT_EQ(results[1].line_count, 0u);
+  EXPECT_EQ(results[1].problem, "");
+  EXPECT_EQ(results[2].line_count, 1u);
+}
+
+TEST_F(Files, ThatCannotBeReadAreResults) {
+  const std::vector<BatchResult> results = ResultsOf(Options(), {{(folder_ / "missing.py").string(), {}, {}},
+                                                                 {folder_.string(), {}, {}},
+                                                                 {std::string("a\0b", 3), {}, {}},
+                                                                 {"given.py", {}, "said before"},
+                                                                 {Write("good.py", "x\n"), {}, {}}});
+  EXPECT_EQ(results[0].problem, "No such file or directory");
+  EXPECT_EQ(results[1].problem, "Is a directory");
+  EXPECT_EQ(results[2].problem, "embedded null byte");
+  EXPECT_EQ(results[3].problem, "said before");
+  EXPECT_EQ(results[4].problem, "");
+  EXPECT_EQ(results[4].table.size(), 1u);
+}
+
+TEST_F(Files, InAnotherEncodingAreDecodedByTheHost) {
+  const std::vector<BatchInput> inputs = {Source("a.py", "# coding: latin-1\nx = '\xE9'\n"),
+                                          Source("b.py", "# coding: no-such\n"), Source("c.py", "x\n")};
+  EXPECT_EQ(ResultsOf(Options(), inputs)[0].problem, "the source names an encoding that only a host can decode");
+  BatchAnalyzer::Options options = Options();
+  options.decode = [](Text bytes, std::string& utf8) {
+    utf8 = bytes.find("latin-1") != Text::npos ? "x = '\xC3\xA9'\n" : "unknown";
+    return bytes.find("latin-1") != Text::npos;
+  };
+  const std::vector<BatchResult> results = ResultsOf(std::move(options), inputs);
+  EXPECT_EQ(results[0].table.DetailAt(1), "str: '\xC3\xA9'");
+  EXPECT_EQ(results[1].problem, "unknown");
+  EXPECT_EQ(results[2].table.size(), 1u);
+}
+
+TEST(Encodings, AreNamedInOneOfTheFirstTwoLines) {
+  for (const Text source : {"# coding: latin-1\n", "#!/bin/x\n# -*- coding: cp1252 -*-\n",
+                            "\n\t\f# vim: set fileencoding=utf-16 :", "# coding=\t koi8-r", "# coding: , coding: big5",
+                            "\xFF\xFEx", "\r# coding: ascii\r"})
+    EXPECT_TRUE(NeedsHostDecoding(source)) << source;
+  for (const Text source : {"", "x", "# coding: utf-8\n", "# coding: UTF_8\n", "# coding: utf8\n",
+                            "# coding: utf-8-sig", "x\n# coding: latin-1\n", "\n\n# coding: latin-1\n",
+                            "x = 'coding: latin-1'\n", "\xEF\xBB\xBF# coding: latin-1\n", "# coding:\n",
+                            "# encoding latin-1\n", "# coding: utf-8\n# coding: latin-1\n"})
+    EXPECT_FALSE(NeedsHostDecoding(source)) << source;
+}
+
+// ---- what is told of the analysis itself ----
+
+TEST(Reports, StayWithTheFileInWhichTheyArose) {
+  std::string deep = "y\nx = ";
+  for (int i = 0; i < 20'000; ++i) deep += "a + ";
+  deep += "a\n";
+  std::vector<BatchInput> inputs;
+  for (int i = 0; i < 20; ++i) inputs.push_back(Source("a.py", i % 4 == 1 ? deep : "x = 1\n"));
+  const testing::ConsoleCapture process;
+  const std::vector<BatchResult> results = ResultsOf(Options(4), std::move(inputs));
+  for (size_t i = 0; i < results.size(); ++i) {
+    EXPECT_EQ(results[i].reports.empty(), i % 4 != 1) << i;
+    for (const BatchResult::Message& report : results[i].reports) EXPECT_EQ(report.line, 2u);
+  }
+  EXPECT_TRUE(testing::ConsoleCapture::PrintedLines().empty());
+  EXPECT_TRUE(testing::ReportedErrors().empty());
+}
+
+TEST(Reports, AnAnalyzerThatCannotBeBuiltIsToldWithEveryFile) {
+  BatchAnalyzer::Options options = Options(2);
+  options.analyzer.grammar_file = "/no/such/grammar";
+  const std::vector<BatchResult> results = ResultsOf(std::move(options), ManySources(3));
+  ASSERT_EQ(results.size(), 3u);
+  for (const BatchResult& result : results) EXPECT_NE(result.problem.find("/no/such/grammar"), std::string::npos);
+}
+
+// ---- formats ----
+
+std::string Written(std::unique_ptr<FileWriter> (*make)(), std::string path, std::string source) {
+  BatchAnalyzer::Options options = Options(1);
+  options.make_writer = make;
+  return ResultsOf(std::move(options), {Source(std::move(path), std::move(source))}).at(0).output;
+}
+std::string Json(std::string source, std::string path = "a.py") {
+  return Written([] { return MakeJsonLinesWriter({}); }, std::move(path), std::move(source));
+}
+std::string PlainText(std::string source, std::string path = "a.py") {
+  return Written([] { return MakeTextLinesWriter({}); }, std::move(path), std::move(source));
+}
+
+TEST(Formats, AJsonStringHoldsAnyBytes) {
+  const auto quoted = [](Text text) {
+    std::string out;
+    AppendJsonString(text, out);
+    return out;
+  };
+  EXPECT_EQ(quoted(Text("a\"\\\n\r\t\f\b\0\x1f\x7f z", 13)), "\"a\\\"\\\\\\n\\r\\t\\f\\b\\u0000\\u001f\\u007f z\"");
+  EXPECT_EQ(quoted("\xC3\xA9\xE6\xBC\xA2\xF0\x9F\x98\x80"), "\"\\u00e9\\u6f22\\ud83d\\ude00\"");
+  EXPECT_EQ(quoted("\xFF\xC3"), "\"\\udcff\\udcc3\"");
+}
+
+TEST(Formats, AJsonLineCarriesEachRecordsPlaceAndScope) {
+  EXPECT_EQ(
+      Json("def f(a): pass\n", "a\n\xFF.py"),
+      "{\"type\":\"line\",\"path\":\"a\\n\\udcff.py\",\"first_line\":1,\"last_line\":1,\"indent\":0,\"kind\":\"def\","
+      "\"in_async_def\":false,\"first_in_def\":false,\"records\":["
+      "{\"name\":\"f\",\"kind\":\"set\",\"detail\":\"\",\"is_parameter\":false,\"line\":1,\"column\":5,\"scope\":\"\"},"
+      "{\"name\":\"a\",\"kind\":\"set\",\"detail\":\"\",\"is_parameter\":true,\"line\":1,\"column\":7,\"scope\":\"f\"}"
+      "]}\n");
+}
+
+TEST(Formats, AnErrorIsAJsonLineOfItsOwn) {
+  EXPECT_NE(Json("x = 1\ny = = 2\n")
+                .find("\"records\":[],\"error\":{\"message\":\"invalid syntax\",\"line\":2,\"column\":5}}\n"),
+            std::string::npos);
+}
+
+TEST(Formats, TextIsSafeToShow) {
+  EXPECT_EQ(PlainText("x = '\x1b'\n", "a\n\xFF.py"),
+            "a\\n\\udcff.py:1: x = '\\x1b'\n    x                   set\n    x                   = '\\x1b' (str)\n");
+  EXPECT_EQ(PlainText("\ty = = \xE2\x80\xAE\n"), "a.py:1:6: invalid syntax\n    \ty = = \\u202e\n    \t    ^\n");
+}
+
+TEST(Formats, ManyStatementsOnALongLineTakeLinearTime) {
+  std::string source;
+  for (int i = 0; i < 50'000; ++i) source += "x;";
+  const std::string text = PlainText(source + "\n");
+  EXPECT_LT(text.size(), 50'000u * 600);
+}
+
+// ---- columns ----
+
+class OneSource : public RecordSource {
+ public:
+  explicit OneSource(std::vector<BatchInput> inputs) : batch_(Options(2), std::move(inputs)) {}
+  bool Next(BatchResult& result) override { return batch_.Next(result); }
+  const std::string& PathOf(const BatchResult& result) override { return batch_.inputs()[result.index].path; }
+
+ private:
+  BatchAnalyzer batch_;
+};
+
+TEST(Columns, HoldTheRecordsOfAllFiles) {
+  ArrowArrayStream stream;
+  ExportRecordStream(std::make_unique<OneSource>(std::vector<BatchInput>{
+                         Source("a.py", "x\n"), {"gone", {}, "problem"}, Source("b\xFF.py", "def f(yy): pass\n")}),
+                     &stream);
+  ArrowSchema schema;
+  ASSERT_EQ(stream.get_schema(&stream, &schema), 0);
+  ASSERT_EQ(schema.n_children, 8);
+  EXPECT_STREQ(schema.children[4]->name, "name");
+  schema.release(&schema);
+  EXPECT_EQ(schema.release, nullptr);
+
+  ArrowArray array;
+  ASSERT_EQ(stream.get_next(&stream, &array), 0);
+  ASSERT_EQ(array.length, 3);
+  const auto text_at = [](const ArrowArray* column, int64_t i) {
+    const auto* offsets = static_cast<const int64_t*>(column->buffers[1]);
+    return Text(static_cast<const char*>(column->buffers[2]) + offsets[i],
+                static_cast<size_t>(offsets[i + 1] - offsets[i]));
+  };
+  EXPECT_EQ(text_at(array.children[4], 2), "yy");
+  const auto* paths = static_cast<const int32_t*>(array.children[0]->buffers[1]);
+  EXPECT_EQ(text_at(array.children[0]->dictionary, paths[2]), "b\\xff.py");
+  const auto* scopes = static_cast<const int32_t*>(array.children[3]->buffers[1]);
+  EXPECT_EQ(text_at(array.children[3]->dictionary, scopes[2]), "f");
+  EXPECT_EQ(static_cast<const uint8_t*>(array.children[7]->buffers[1])[0], 4);
+
+  // A column that a reader moved away lives on its own.
+  ArrowArray moved = *array.children[4];
+  array.children[4]->release = nullptr;
+  array.release(&array);
+  stream.release(&stream);
+  EXPECT_EQ(text_at(&moved, 0), "x");
+  moved.release(&moved);
+}
+
+TEST(Columns, EndWithoutABatch) {
+  ArrowArrayStream stream;
+  ExportRecordStream(std::make_unique<OneSource>(std::vector<BatchInput>{}), &stream);
+  ArrowArray array;
+  ASSERT_EQ(stream.get_next(&stream, &array), 0);
+  EXPECT_EQ(array.release, nullptr);
+  EXPECT_EQ(stream.get_last_error(&stream), nullptr);
+  stream.release(&stream);
+}
+
+TEST(Batch, TheOldPrintStatementIsReadAsItsVersionReadsIt) {
+  EXPECT_EQ(RecordsOf("print x\n", kNoText, kPy2), (Strings{"1:7 |x get"}));
+}
+
+}  // namespace
+}  // namespace quillet
