@@ -11,15 +11,14 @@ from __future__ import annotations
 import io
 import os
 import sys
-from collections.abc import Callable, Iterator
-from contextlib import closing, contextmanager
+from collections.abc import Callable
+from contextlib import closing
 from typing import TextIO
-
-import click
 
 from quillet._batch import BatchInput, write_files
 from quillet.cli.files import Found, find_files
 from quillet.cli.output import output_format, output_header
+from quillet.cli.progress import Progress, is_terminal, say
 from quillet.cli.show import printable
 from quillet.cli.streams import quiet_output
 
@@ -44,7 +43,8 @@ def run(
         found = list(find_files(paths, gitignore=gitignore))
         inputs = [_input_of(item, stdin_filename) for item in found]
         results = write_files(inputs, version=version, jobs=jobs, form=output_format(form, errors_only))
-        with closing(results), _progress(len(found)) as advance:
+        # The line is for a person who waits: where the data itself runs over the terminal, there is none.
+        with closing(results), Progress("analysing", len(found), wanted=not is_terminal(out)) as progress:
             for result in results:
                 path = found[result.index].path
                 if result.problem is not None:
@@ -54,9 +54,9 @@ def run(
                     _complain(out, path, message)
                 errors += len(result.errors)
                 write(memoryview(result))
-                advance()
+                progress.advance()
     if unread:
-        print(f"quillet: {unread} {'file' if unread == 1 else 'files'} could not be read", file=sys.stderr)
+        say(f"{unread} {'file' if unread == 1 else 'files'} could not be read")
     return 1 if unread or (strict and errors) else 0
 
 
@@ -71,7 +71,7 @@ def _complain(out: TextIO, path: str, reason: str) -> None:
     # The lines before it come first where both streams go to one place.
     out.flush()
     first_line = reason.partition("\n")[0]
-    print(f"quillet: {printable(path)}: {printable(first_line)}", file=sys.stderr)
+    say(f"{printable(path)}: {printable(first_line)}")
 
 
 def _bytes_writer(out: TextIO) -> Callable[[memoryview], object]:
@@ -81,17 +81,3 @@ def _bytes_writer(out: TextIO) -> Callable[[memoryview], object]:
         binary = out.buffer
         return lambda data: binary.write(data)
     return lambda data: out.write(str(data, "utf-8", "surrogatepass"))
-
-
-@contextmanager
-def _progress(count: int) -> Iterator[Callable[[], None]]:
-    """What to call behind each file, with a bar on stderr meanwhile.
-
-    The bar is for a person who waits: without a terminal, or where the data itself runs over it, there
-    is none.
-    """
-    if not sys.stderr.isatty() or sys.stdout.isatty():
-        yield lambda: None
-        return
-    with click.progressbar(length=count, label="analysing", show_pos=True, file=sys.stderr) as bar:
-        yield lambda: bar.update(1)
