@@ -296,7 +296,7 @@ class FileBatch {
     }
   }
 
-  const std::string& PathOf(size_t index) const { return batch_->inputs()[index].path; }
+  const std::vector<BatchInput>& inputs() const { return batch_->inputs(); }
 
   // The files so far that could not be analysed, as (index, reason).
   nb::list Problems() {
@@ -387,7 +387,7 @@ class StreamSource : public RecordSource {
       ThrowError(ErrorKind::kRuntimeError, message);
     }
   }
-  const std::string& PathOf(const BatchResult& result) override { return files_->PathOf(result.index); }
+  const std::vector<BatchInput>& inputs() const override { return files_->inputs(); }
 
  private:
   nb::object batch_;

@@ -5,6 +5,7 @@
 #include <array>
 #include <cerrno>
 #include <exception>
+#include <unordered_map>
 #include <utility>
 #include <vector>
 
@@ -26,7 +27,7 @@ struct Column {
 };
 
 constexpr Column kColumns[] = {
-    {"path", "i", true},  {"line", "I", false}, {"column", "I", false}, {"scope", "i", true},
+    {"path", "i", true},  {"line", "I", false}, {"column", "I", false}, {"scope", "U", false},
     {"name", "U", false}, {"kind", "c", true},  {"detail", "U", false}, {"is_parameter", "b", false},
 };
 constexpr size_t kColumnCount = std::size(kColumns);
@@ -105,34 +106,45 @@ void FillArray(size_t length, std::unique_ptr<OwnedArray> owned, ArrowArray* arr
   array->private_data = owned.release();
 }
 
+// The dictionaries of a stream: all of its batches have the same ones, each text once.
+struct Dictionaries {
+  TextList paths;
+  TextList kinds;
+  std::vector<int32_t> path_of_input;  // index in paths
+
+  explicit Dictionaries(const std::vector<BatchInput>& inputs) {
+    std::unordered_map<std::string, int32_t> numbers;
+    path_of_input.reserve(inputs.size());
+    for (const BatchInput& input : inputs) {
+      std::string shown;
+      AppendShown(input.path, shown);
+      const auto [known, is_new] = numbers.try_emplace(std::move(shown), static_cast<int32_t>(paths.size()));
+      if (is_new) paths.Add(known->first);
+      path_of_input.push_back(known->second);
+    }
+    for (const Text word : RecordKindWords()) kinds.Add(word);
+  }
+};
+
 // The records of several files as columns.
 struct Columns {
+  std::shared_ptr<const Dictionaries> dictionaries;
   std::vector<int32_t> path_indices;
   std::vector<uint32_t> lines;
   std::vector<uint32_t> columns;
-  std::vector<uint32_t> scope_indices;
+  TextList scopes;
   TextList names;
   std::vector<RecordKind> kind_indices;
   TextList details;
   std::vector<uint8_t> parameter_bits;
-  TextList paths;
-  TextList scopes;
-  TextList kinds;
 
-  Columns() {
-    for (const Text word : RecordKindWords()) kinds.Add(word);
-  }
+  explicit Columns(std::shared_ptr<const Dictionaries> shared) : dictionaries(std::move(shared)) {}
 
   size_t size() const { return lines.size(); }
 
-  void Add(const RecordTable& table, const std::string& path) {
-    std::string shown;
-    AppendShown(path, shown);
-    path_indices.insert(path_indices.end(), table.size(), static_cast<int32_t>(paths.size()));
-    paths.Add(shown);
-    const auto first_scope = static_cast<uint32_t>(scopes.size());
-    for (size_t i = 0; i < table.scope_texts.size(); ++i) scopes.Add(table.scope_texts[i]);
-    for (const uint32_t scope : table.scopes) scope_indices.push_back(first_scope + scope);
+  void Add(const BatchResult& result) {
+    const RecordTable& table = result.table;
+    path_indices.insert(path_indices.end(), table.size(), dictionaries->path_of_input[result.index]);
     const auto append = [](auto& to, const auto& from) { to.insert(to.end(), from.begin(), from.end()); };
     append(lines, table.lines);
     append(columns, table.columns);
@@ -140,6 +152,7 @@ struct Columns {
     const size_t before = size() - table.size();
     parameter_bits.resize((size() + 7) / 8);
     for (size_t i = 0; i < table.size(); ++i) {
+      scopes.Add(table.ScopeAt(i));
       names.Add(table.NameAt(i));
       details.Add(table.DetailAt(i));
       const size_t bit = before + i;
@@ -169,12 +182,12 @@ void FillTableArray(const std::shared_ptr<const Columns>& columns, ArrowArray* a
     FillArray(columns->size(), std::move(column), &owned->children[next++]);
   };
   // In the order of kColumns.
-  add({columns->path_indices.data()}, &columns->paths);
+  add({columns->path_indices.data()}, &columns->dictionaries->paths);
   add({columns->lines.data()});
   add({columns->columns.data()});
-  add({columns->scope_indices.data()}, &columns->scopes);
+  add({columns->scopes.offsets.data(), columns->scopes.bytes.data()});
   add({columns->names.offsets.data(), columns->names.bytes.data()});
-  add({columns->kind_indices.data()}, &columns->kinds);
+  add({columns->kind_indices.data()}, &columns->dictionaries->kinds);
   add({columns->details.offsets.data(), columns->details.bytes.data()});
   add({columns->parameter_bits.data()});
   FillArray(columns->size(), std::move(owned), array);
@@ -184,6 +197,7 @@ void FillTableArray(const std::shared_ptr<const Columns>& columns, ArrowArray* a
 
 struct Stream {
   std::unique_ptr<RecordSource> source;
+  std::shared_ptr<const Dictionaries> dictionaries;
   std::string error;
 };
 
@@ -214,10 +228,10 @@ int GetSchema(ArrowArrayStream* stream, ArrowSchema* out) {
 
 int GetNext(ArrowArrayStream* stream, ArrowArray* out) {
   return Guarded(stream, [out](Stream& self) {
-    auto columns = std::make_shared<Columns>();
+    auto columns = std::make_shared<Columns>(self.dictionaries);
     BatchResult result;
     while (columns->size() < kBatchRows && self.source->Next(result)) {
-      if (result.table.size() != 0) columns->Add(result.table, self.source->PathOf(result));
+      columns->Add(result);
       result = {};
     }
     *out = {};
@@ -239,6 +253,7 @@ void ReleaseStream(ArrowArrayStream* stream) {
 
 void ExportRecordStream(std::unique_ptr<RecordSource> source, ArrowArrayStream* stream) {
   auto state = std::make_unique<Stream>();
+  state->dictionaries = std::make_shared<const Dictionaries>(source->inputs());
   state->source = std::move(source);
   *stream = {GetSchema, GetNext, GetLastError, ReleaseStream, state.release()};
 }

@@ -5,16 +5,17 @@
 // buffers live until the reader releases them. Columns:
 //   path          dictionary<int32, large_utf8>    name          large_utf8
 //   line, column  uint32                           kind          dictionary<int8, large_utf8>
-//   scope         dictionary<int32, large_utf8>    detail        large_utf8
+//   scope         large_utf8                       detail        large_utf8
 //                                                  is_parameter  bool
 // Strings have 64-bit offsets, since the details of one large file may pass 2 GiB.
-// Dictionaries belong to their batch: one has the paths and scopes of its own files.
+// A dictionary has each text once and is the same in all batches (that of path has all inputs, that of
+// kind all kinds): many readers group and compare by its indices, and few join dictionaries that
+// differ. The scopes are not known before the last file is read, so they are plain strings.
 #pragma once
 
 #include <cstdint>
-#include <functional>
 #include <memory>
-#include <string>
+#include <vector>
 
 #include "analysis/batch.h"
 
@@ -63,7 +64,8 @@ class RecordSource {
   virtual ~RecordSource() = default;
   // The next file that was analysed; false at the end. An exception ends the stream with its message.
   virtual bool Next(BatchResult& result) = 0;
-  virtual const std::string& PathOf(const BatchResult& result) = 0;
+  // The files of all its results.
+  virtual const std::vector<BatchInput>& inputs() const = 0;
 };
 
 // Fills `stream`, which then owns the source. Its reader calls from one thread at a time.

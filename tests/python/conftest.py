@@ -2,12 +2,18 @@
 
 from __future__ import annotations
 
+import signal
 import sys
 from pathlib import Path
 
 import pytest
 
 sys.path.insert(0, str(Path(__file__).resolve().parent.parent.parent / "scripts"))
+
+# A run behind nohup or "&" may have been started with interrupts ignored, and so would be what the tests
+# start, some of which they interrupt.
+if signal.getsignal(signal.SIGINT) == signal.SIG_IGN:
+    signal.signal(signal.SIGINT, signal.default_int_handler)
 
 
 def pytest_addoption(parser: pytest.Parser) -> None:

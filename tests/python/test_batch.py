@@ -8,6 +8,7 @@ import signal
 import subprocess
 import sys
 import threading
+from collections import Counter
 from pathlib import Path
 
 import pytest
@@ -277,6 +278,71 @@ def test_pyarrow_reads_many_batches() -> None:
     assert len(batches) > 1
     assert sum(batch.num_rows for batch in batches) == 6 * 9000 * 5
     assert {path for batch in batches for path in batch.column("path").to_pylist()} == {path for path, _ in sources}
+
+
+# Two files that share scopes, names and one path, in more records than one batch holds.
+SHARED = [(path, b"class A:\n    def f(self): pass\nclass B: x = 1\n" * 6000) for path in ("a.py", "b.py", "a.py")]
+
+
+def shared_counts(*columns: str) -> dict[tuple[object, ...], int]:
+    """How many records of SHARED have the same values in these columns, by the rows themselves."""
+    names = ("path", *FileRecord._fields)
+    places = [names.index(column) for column in columns]
+    return dict(Counter(tuple(row[place] for place in places) for row in expected_rows(analyze_files(SHARED))))
+
+
+def test_a_dictionary_has_each_text_once_and_is_that_of_all_batches() -> None:
+    pyarrow = pytest.importorskip("pyarrow")
+    table = pyarrow.table(analyze_files([*SHARED, ("empty.py", b"")]))
+    dictionaries = {}
+    for name in table.column_names:
+        if pyarrow.types.is_dictionary(table.schema.field(name).type):
+            chunks = [chunk.dictionary.to_pylist() for chunk in table.column(name).chunks]
+            assert len(chunks) > 1
+            assert all(chunk == chunks[0] for chunk in chunks)
+            dictionaries[name] = chunks[0]
+    assert dictionaries == {
+        "path": ["a.py", "b.py", "empty.py"],
+        "kind": list(_host.RECORD_KIND_WORDS),
+    }
+
+
+@pytest.mark.parametrize("columns", [("scope",), ("path",), ("kind",), ("path", "scope", "kind"), ("name",)])
+def test_readers_agree_on_groups(columns: tuple[str, ...]) -> None:
+    pyarrow = pytest.importorskip("pyarrow")
+    expected = shared_counts(*columns)
+    groups = pyarrow.table(analyze_files(SHARED)).group_by(list(columns)).aggregate([("line", "count")])
+    rows = zip(*(groups.column(name).to_pylist() for name in (*columns, "line_count")), strict=True)
+    assert {tuple(key): count for *key, count in rows} == expected
+    assert groups.num_rows == len(expected)
+
+
+@pytest.mark.parametrize("columns", [("scope",), ("path", "scope", "kind")])
+def test_pandas_agrees_on_groups(columns: tuple[str, ...]) -> None:
+    pyarrow = pytest.importorskip("pyarrow")
+    pytest.importorskip("pandas")
+    frame = pyarrow.table(analyze_files(SHARED)).to_pandas()
+    assert list(frame["path"].cat.categories) == ["a.py", "b.py"]
+    sizes = frame.groupby(list(columns), observed=True).size()
+    found = {key if isinstance(key, tuple) else (key,): count for key, count in sizes.items()}
+    assert found == shared_counts(*columns)
+
+
+@pytest.mark.parametrize("columns", [("scope",), ("path", "scope", "kind")])
+def test_polars_agrees_on_groups(columns: tuple[str, ...]) -> None:
+    polars = pytest.importorskip("polars")
+    frame = polars.DataFrame(analyze_files(SHARED))
+    assert {tuple(key): count for *key, count in frame.group_by(columns).len().rows()} == shared_counts(*columns)
+
+
+@pytest.mark.parametrize("columns", [("scope",), ("path", "scope", "kind")])
+def test_duckdb_agrees_on_groups(columns: tuple[str, ...]) -> None:
+    duckdb = pytest.importorskip("duckdb")
+    records = analyze_files(SHARED)  # noqa: F841 -- found by its name
+    names = ", ".join(columns)
+    rows = duckdb.sql(f"select {names}, count(*) from records group by {names}").fetchall()
+    assert {tuple(key): count for *key, count in rows} == shared_counts(*columns)
+    assert len(rows) == len(shared_counts(*columns))
 
 
 def test_polars_reads_columns() -> None:

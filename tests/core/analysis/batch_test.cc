@@ -482,7 +482,7 @@ class OneSource : public RecordSource {
  public:
   explicit OneSource(std::vector<BatchInput> inputs) : batch_(Options(2), std::move(inputs)) {}
   bool Next(BatchResult& result) override { return batch_.Next(result); }
-  const std::string& PathOf(const BatchResult& result) override { return batch_.inputs()[result.index].path; }
+  const std::vector<BatchInput>& inputs() const override { return batch_.inputs(); }
 
  private:
   BatchAnalyzer batch_;
@@ -511,8 +511,8 @@ TEST(Columns, HoldTheRecordsOfAllFiles) {
   EXPECT_EQ(text_at(array.children[4], 2), "yy");
   const auto* paths = static_cast<const int32_t*>(array.children[0]->buffers[1]);
   EXPECT_EQ(text_at(array.children[0]->dictionary, paths[2]), "b\\xff.py");
-  const auto* scopes = static_cast<const int32_t*>(array.children[3]->buffers[1]);
-  EXPECT_EQ(text_at(array.children[3]->dictionary, scopes[2]), "f");
+  EXPECT_EQ(array.children[0]->dictionary->length, 3);
+  EXPECT_EQ(text_at(array.children[3], 2), "f");
   EXPECT_EQ(static_cast<const uint8_t*>(array.children[7]->buffers[1])[0], 4);
 
   // A column that a reader moved away lives on its own.
@@ -522,6 +522,26 @@ TEST(Columns, HoldTheRecordsOfAllFiles) {
   stream.release(&stream);
   EXPECT_EQ(text_at(&moved, 0), "x");
   moved.release(&moved);
+}
+
+TEST(Columns, HaveTheSameDictionariesInAllBatches) {
+  std::vector<BatchInput> inputs;
+  std::string source;
+  for (int i = 0; i < 20'000; ++i) source += "name = call(value)\n";
+  for (const char* path : {"a.py", "b.py", "a.py"}) inputs.push_back(Source(path, source));
+  ArrowArrayStream stream;
+  ExportRecordStream(std::make_unique<OneSource>(std::move(inputs)), &stream);
+  std::vector<int32_t> first_paths;
+  for (ArrowArray array;; array.release(&array)) {
+    ASSERT_EQ(stream.get_next(&stream, &array), 0);
+    if (array.release == nullptr) break;
+    const ArrowArray* dictionary = array.children[0]->dictionary;
+    ASSERT_EQ(dictionary->length, 2);
+    EXPECT_EQ(Text(static_cast<const char*>(dictionary->buffers[2]), 8), "a.pyb.py");
+    first_paths.push_back(static_cast<const int32_t*>(array.children[0]->buffers[1])[0]);
+  }
+  EXPECT_EQ(first_paths, (std::vector<int32_t>{0, 1, 0}));
+  stream.release(&stream);
 }
 
 TEST(Columns, EndWithoutABatch) {
