@@ -434,9 +434,6 @@ void BindBatch(nb::module_& tarvex) {
           },
           nb::arg("sources"), "Analyses UTF-8 sources, a sequence of bytes; gives (records, statements rejected).");
 
-  nb::list words;
-  for (const Text word : RecordKindWords()) words.append(StrOf(word));
-  host.attr("RECORD_KIND_WORDS") = nb::tuple(words);
   nb::class_<FileResult>(host, "FileResult", nb::type_slots(file_result_slots),
                          "What became of a file of a batch. Its buffer is what a format wrote of it.")
       .def_prop_ro("index", [](const FileResult& self) { return self.result.index; })

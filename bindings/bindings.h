@@ -31,6 +31,7 @@ void BindWalker(nb::module_& tarvex);
 void BindHints(nb::module_& tarvex);
 void BindAnalysis(nb::module_& tarvex);
 void BindHost(nb::module_& tarvex);
+void BindRecordWords(nb::module_& tarvex);
 void BindBatch(nb::module_& tarvex);
 
 }  // namespace quillet::host

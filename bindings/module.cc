@@ -52,6 +52,7 @@ NB_MODULE(tarvex_in_owner, tarvex) {
   BindHints(tarvex);
   BindAnalysis(tarvex);
   BindHost(tarvex);
+  BindRecordWords(tarvex);
   BindBatch(tarvex);
 }
 

@@ -2,7 +2,6 @@
 #include "analysis/placed_records.h"
 
 #include <algorithm>
-#include <array>
 #include <charconv>
 
 #include "foundations/shown_text.h"
@@ -13,37 +12,7 @@ namespace quillet {
 
 namespace {
 
-constexpr Text kWords[] = {
-#define QUILLET_RECORD_KIND(identifier, word) word,
-#include "analysis/record_kinds.def"
-};
-
 constexpr Text kEllipsis = "\xE2\x80\xA6";
-constexpr Text kYieldFrom = "from ";
-
-constexpr std::array<RecordKind, 256> kKindOfByte = [] {
-  std::array<RecordKind, 256> kinds{};
-  kinds.fill(RecordKind::kOther);
-  kinds[kSetKind] = RecordKind::kSet;
-  kinds[kGetKind] = RecordKind::kGet;
-  kinds[kWithinExprKind] = RecordKind::kWithinExpr;
-  kinds[kCalledKind] = RecordKind::kCalled;
-  kinds[kImportKind] = RecordKind::kImport;
-  kinds[kFromImportKind] = RecordKind::kFromImport;
-  kinds[kImportAsNameKind] = RecordKind::kImportAs;
-  kinds[kGlobalKind] = RecordKind::kGlobal;
-  kinds[kNonlocalKind] = RecordKind::kNonlocal;
-  kinds[kTypeParameterKind] = RecordKind::kTypeParameter;
-  kinds[kExpressionEquivKind] = RecordKind::kExpression;
-  kinds[kTypedLiteralKind] = RecordKind::kLiteral;
-  kinds[kTypeHintKind] = RecordKind::kHint;
-  return kinds;
-}();
-
-Text WithoutInstanceSuffix(Text text) {
-  if (text.ends_with(kClassInstanceSuffix)) text.remove_suffix(kClassInstanceSuffix.size());
-  return text;
-}
 
 // The index of a name that is an argument's place; false for any other name.
 bool ArgIndexOf(Text name, size_t& index) {
@@ -52,21 +21,7 @@ bool ArgIndexOf(Text name, size_t& index) {
   return std::from_chars(name.data(), name.data() + name.size(), index).ec == std::errc();
 }
 
-void DecodeInfoString(Text info, PlacedRecord& placed) {
-  const char byte = GetInfoBytesKind(info);
-  if (byte == kPlainEquivKind && !info.starts_with(":=")) {
-    placed.kind = info.ends_with(kClassInstanceSuffix) ? RecordKind::kInstance : RecordKind::kEqual;
-    placed.detail = WithoutInstanceSuffix(info);
-    return;
-  }
-  placed.kind = kKindOfByte[static_cast<uint8_t>(byte)];
-  placed.detail = placed.kind == RecordKind::kOther ? info : info.substr(std::min<size_t>(kPrefixLen, info.size()));
-  if (placed.kind == RecordKind::kLiteral) placed.detail = WithoutInstanceSuffix(placed.detail);
-}
-
 }  // namespace
-
-std::span<const Text> RecordKindWords() { return kWords; }
 
 void PlacedRecords::Begin(const FileAnalyzer& file, const ScopeNames& scopes) {
   file_ = &file;
@@ -93,7 +48,9 @@ void PlacedRecords::Add(size_t row, const Record& record, bool is_parameter) {
   placed.scope = scopes_->scopes()[scopes_->ScopeOf(row, record, is_parameter)].name;
   placed.is_parameter = is_parameter;
   SetPlace(file_->rows()[row], name, placed);
-  Decode(record.info(), placed);
+  const RecordInWords words = DecodeInfo(record.info(), buffer_);
+  placed.kind = words.kind;
+  placed.detail = words.detail.data() == buffer_.data() ? texts_.Copy(words.detail) : words.detail;
   if (in_signature_ && placed.kind == RecordKind::kHint) placed.is_parameter = true;
   if (name.starts_with(kArgPrefix)) [[unlikely]]
     name = ShownArgument(name);
@@ -127,20 +84,6 @@ const char* PlacedRecords::PlaceOfCopy(const LineRow& row, Text name) {
   return (first != toks.end() ? *first : toks.front()).text;
 }
 
-void PlacedRecords::Decode(Text info, PlacedRecord& placed) {
-  // What `yield from` yields from is itself an info string behind the word. Nothing else begins with
-  // the word and a blank, since `from` is no name.
-  if (!info.starts_with(kYieldFrom)) return DecodeInfoString(info, placed);
-  DecodeInfoString(info.substr(kYieldFrom.size()), placed);
-  const Text inner = placed.detail;
-  if (!inner.empty() && inner.data() == info.data() + kYieldFrom.size()) {
-    placed.detail = info.substr(0, kYieldFrom.size() + inner.size());
-    return;
-  }
-  buffer_.assign(inner.empty() ? kYieldFrom.substr(0, kYieldFrom.size() - 1) : kYieldFrom).append(inner);
-  placed.detail = texts_.Copy(buffer_);
-}
-
 // ---- signature comments ----
 
 // A method's comment may leave out the object itself: then there is one type less than parameters.
@@ -167,7 +110,8 @@ bool PlacedRecords::FindSignature(size_t row) {
 Text PlacedRecords::ShownArgument(Text name) {
   size_t index;
   if (in_signature_ && ArgIndexOf(name, index) && index < parameters_.size()) return parameters_[index];
-  buffer_.assign("<argument ").append(name.substr(kPrefixLen)).append(">");
+  buffer_.clear();
+  AppendArgumentPlace(name, buffer_);
   return texts_.Copy(buffer_);
 }
 

@@ -17,18 +17,11 @@
 #include <vector>
 
 #include "analysis/file_analyzer.h"
+#include "analysis/record_words.h"
 #include "analysis/scope_names.h"
 #include "foundations/arena.h"
 
 namespace quillet {
-
-enum class RecordKind : uint8_t {
-#define QUILLET_RECORD_KIND(identifier, word) k##identifier,
-#include "analysis/record_kinds.def"
-};
-
-// The words of all kinds, in their order.
-std::span<const Text> RecordKindWords();
 
 struct PlacedRecord {
   Text name;
@@ -57,7 +50,6 @@ class PlacedRecords {
  private:
   void Add(size_t row, const Record& record, bool is_parameter);
   void SetPlace(const LineRow& row, Text name, PlacedRecord& placed);
-  void Decode(Text info, PlacedRecord& placed);
   bool FindSignature(size_t row);
   Text ShownArgument(Text name);
   const char* PlaceOfCopy(const LineRow& row, Text name);

@@ -136,26 +136,6 @@ Text LastChars(Text text, size_t count) {
   return text.substr(at);
 }
 
-void AppendLiteralDescription(Text detail, std::string& out) {
-  Text start;
-  if (detail.starts_with("from ")) {
-    start = detail.substr(0, 5);
-    detail.remove_prefix(5);
-  }
-  const size_t colon = detail.find(": ");
-  const Text cls = detail.substr(0, colon);
-  const Text text = colon == Text::npos ? Text() : detail.substr(colon + 2);
-  out.append("= ").append(start);
-  if (text.empty()) {
-    const bool is_vowel = cls.empty() || Text("aeiou").find(cls[0]) != Text::npos;
-    out.append(is_vowel ? "an " : "a ").append(cls);
-  } else {
-    out += text;
-    // None is its own class.
-    if (text != cls) out.append(" (").append(cls).append(")");
-  }
-}
-
 class TextLinesWriter : public FileWriter {
  public:
   explicit TextLinesWriter(const TextLinesOptions& options) : options_(options) {}
@@ -230,7 +210,7 @@ class TextLinesWriter : public FileWriter {
       AppendColoured(kNameColour, text_, out);
       out.append(width + 2 <= kNameWidth ? kNameWidth - width : 2, ' ');
       text_.clear();
-      AppendDescription(record, text_);
+      AppendDescription({record.kind, record.detail}, record.is_parameter, text_);
       AppendPrintable(text_, out);
       out += '\n';
     }
@@ -289,61 +269,6 @@ void AppendPrintable(Text text, std::string& out) {
     at += length;
   }
   out.append(safe, end);
-}
-
-void AppendDescription(const PlacedRecord& record, std::string& out) {
-  const Text detail = record.detail;
-  switch (record.kind) {
-    case RecordKind::kSet:
-      out += record.is_parameter ? "parameter" : "set";
-      return;
-    case RecordKind::kGet:
-      out += "read";
-      return;
-    case RecordKind::kWithinExpr:
-      out.append("set inside the expression, at token ").append(detail);
-      return;
-    case RecordKind::kCalled:
-      out.append("called with ").append(detail);
-      return;
-    case RecordKind::kImport:
-      out.append("import ").append(detail);
-      return;
-    case RecordKind::kFromImport: {
-      const size_t blank = detail.rfind(' ');
-      const Text module = blank == Text::npos ? Text() : detail.substr(0, blank);
-      out.append("from ").append(module).append(" import ").append(detail.substr(blank + 1));
-      return;
-    }
-    case RecordKind::kImportAs:
-      out.append("imported as ").append(detail);
-      return;
-    case RecordKind::kGlobal:
-      out += "declared global";
-      return;
-    case RecordKind::kNonlocal:
-      out += "declared nonlocal";
-      return;
-    case RecordKind::kTypeParameter:
-      out += "type parameter";
-      if (!detail.empty()) out.append(" ").append(detail);
-      return;
-    case RecordKind::kExpression:
-    case RecordKind::kEqual:
-      out.append("= ").append(detail.empty() ? Text("nothing") : detail);
-      return;
-    case RecordKind::kLiteral:
-      return AppendLiteralDescription(detail, out);
-    case RecordKind::kHint:
-      out.append("hint ").append(detail);
-      return;
-    case RecordKind::kInstance:
-      out.append("instance of ").append(detail);
-      return;
-    case RecordKind::kOther:
-      out += detail;
-      return;
-  }
 }
 
 std::unique_ptr<FileWriter> MakeTextLinesWriter(const TextLinesOptions& options) {

@@ -18,9 +18,6 @@ namespace quillet {
 // them: one line, safe to show. Tabs are kept.
 void AppendPrintable(Text text, std::string& out);
 
-// Appends a record's kind and detail as a phrase that follows its name.
-void AppendDescription(const PlacedRecord& record, std::string& out);
-
 struct TextLinesOptions {
   bool errors_only = false;
   bool colours = false;

@@ -13,7 +13,7 @@ from types import TracebackType
 from typing import NamedTuple, Union, cast, overload
 
 from quillet._keywords import keywords_of
-from quillet._records import RecordKind
+from quillet._records import KINDS, RecordKind
 from quillet._source import SourceEncodingError, to_utf8
 from quillet.config import GetNorvaFilename
 from quillet.host import PY2_PRINT_FUNCTION_GRAMMAR, language_version
@@ -22,7 +22,6 @@ from quillet.tarvex import _host, kPy2DefaultGrammar, kPy3DefaultGrammar
 StrPath = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
 
 # What the core knows as kinds, in its order.
-_KINDS = tuple(RecordKind(word) for word in _host.RECORD_KIND_WORDS)
 # A file to analyse: its name, its source where that is at hand, and why it cannot be read where that is
 # known.
 BatchInput = tuple[bytes, bytes | None, bytes | None]
@@ -98,15 +97,15 @@ class FileRecords(Sequence[FileRecord]):
     def __getitem__(self, index: int | slice) -> FileRecord | Sequence[FileRecord]:
         places = range(len(self))[index]
         if isinstance(places, int):
-            [record] = self._native.Rows(places, places + 1, FileRecord, _KINDS)
+            [record] = self._native.Rows(places, places + 1, FileRecord, KINDS)
             return cast(FileRecord, record)
         if places.step == 1:
-            return self._native.Rows(places.start, places.stop, FileRecord, _KINDS)
+            return self._native.Rows(places.start, places.stop, FileRecord, KINDS)
         return [self[place] for place in places]
 
     def __iter__(self) -> Iterator[FileRecord]:
         for start in range(0, len(self), _CHUNK):
-            yield from self._native.Rows(start, start + _CHUNK, FileRecord, _KINDS)
+            yield from self._native.Rows(start, start + _CHUNK, FileRecord, KINDS)
 
     def plain(self) -> list[tuple[int, int, str, str, str, str, bool]]:
         """All records as plain tuples, with the kind as a plain str: for a database."""

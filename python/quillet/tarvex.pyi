@@ -658,6 +658,10 @@ class _host:  # a module at run time
         def __iter__(self) -> Iterator[tuple[CLogicalLine, int, int, int, bool, bool]]: ...
 
     RECORD_KIND_WORDS: tuple[str, ...]
+    @staticmethod
+    def DecodeRecord(name: bytes, info: bytes) -> tuple[str, int, str]: ...
+    @staticmethod
+    def DescribeRecord(kind: str, detail: str, is_parameter: bool) -> str: ...
 
     class Language:
         def __init__(
