@@ -3,22 +3,18 @@
 from __future__ import annotations
 
 import ast
+import re
 import warnings
+from pathlib import Path
 
 import pytest
 
 from quillet import symbolinfo
 from quillet._fastaccess import CStringTokenizer
 
-WRITTEN = (
-    "Set Get WithinExpr Called Import FromImport ImportAsName Global Nonlocal TypeParameter ExpressionEquiv"
-    " TypedLiteral TypeHint"
-)
-FOR_CONSUMERS = (
-    "Conditional InferredTypeHint Module Instance Self Class Function UnboundMethod Method Arg BuiltinClass"
-    " TypingModule BuiltinModule SpecificUrl SpecificScope Decorator SetTypeHint DefLineScope GenericTypeAlias"
-)
-KINDS = f"{WRITTEN} {FOR_CONSUMERS}".split()
+ROOT = Path(__file__).resolve().parent.parent.parent
+ROWS = (ROOT / "core/vocabulary/kinds.def").read_text()
+KINDS = re.findall(r"^QUILLET_INFO_KIND\((\w+), ", ROWS, re.MULTILINE)
 
 
 # ---- constants ----
@@ -44,6 +40,7 @@ def test_kinds_are_distinct():
 def test_no_constant_is_missing():
     found = {name[1:-6] for name in vars(symbolinfo) if name.startswith("k") and name.endswith("Prefix")}
     assert found == set(KINDS)
+    assert {"Set", "TypeHint", "GenericTypeAlias"} < found
     assert symbolinfo.kPrefixLen >= 2
     for name in ("kPlainEquivSpec", "kIterationSubscript"):
         assert isinstance(getattr(symbolinfo, name), bytes)
