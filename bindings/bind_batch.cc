@@ -16,6 +16,7 @@
 #include "analysis/file_analyzer.h"
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
+#include "bindings/site_object.h"
 #include "output/arrow_stream.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
@@ -340,10 +341,17 @@ class FileBatch {
     return options;
   }
 
-  // The format is None, ("jsonl", errors_only) or ("text", errors_only, colours, width of a character).
+  // The format is None, ("jsonl", errors_only), ("text", errors_only, colours, width of a character),
+  // ("site survey",) or ("site page", site index).
   std::function<std::unique_ptr<FileWriter>()> WriterMaker() const {
     if (format_.is_none()) return {};
     const auto format = nb::cast<nb::tuple>(format_);
+    if (nb::cast<std::string>(format[0]) == "site survey") return MakeSiteSurveyWriter;
+    if (nb::cast<std::string>(format[0]) == "site page") {
+      auto& site = nb::cast<SiteObject&>(format[1]);
+      site.is_shared = true;
+      return [index = std::shared_ptr<const SiteIndex>(site.index)] { return MakeSitePageWriter(index); };
+    }
     const bool errors_only = nb::cast<bool>(format[1]);
     if (nb::cast<std::string>(format[0]) == "jsonl") {
       const JsonLinesOptions options{errors_only};

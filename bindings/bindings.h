@@ -33,5 +33,6 @@ void BindAnalysis(nb::module_& tarvex);
 void BindHost(nb::module_& tarvex);
 void BindRecordWords(nb::module_& tarvex);
 void BindBatch(nb::module_& tarvex);
+void BindSite(nb::module_& tarvex);
 
 }  // namespace quillet::host

@@ -54,6 +54,7 @@ NB_MODULE(tarvex_in_owner, tarvex) {
   BindHost(tarvex);
   BindRecordWords(tarvex);
   BindBatch(tarvex);
+  BindSite(tarvex);
 }
 
 extern "C" NB_EXPORT PyObject* PyInit_tarvex(void);

@@ -10,7 +10,6 @@
 #include <utility>
 
 #include "foundations/console.h"
-#include "foundations/stop.h"
 #include "lines/syntax_error.h"
 
 namespace quillet {
@@ -48,8 +47,6 @@ std::exception_ptr WrapWalkFailure(const std::exception_ptr& failure, const Logi
   try {
     std::rethrow_exception(failure);
   } catch (const SyntaxError&) {
-    return failure;
-  } catch (const Stopped&) {
     return failure;
   } catch (const Error&) {
   } catch (...) {
@@ -99,11 +96,6 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeSingleLogical(LogicalLine& 
   } catch (const SyntaxError& error) {
     logical.ClearDerivedInfo();
     return error;
-  } catch (const Stopped&) {
-    // As if it had not begun.
-    logical.ClearDerivedInfo();
-    logical.SetParsed(false);
-    throw;
   } catch (...) {
     const std::exception_ptr failure = std::current_exception();
     logical.ClearDerivedInfo();

@@ -169,19 +169,33 @@ def export(form: str, output: str | None, index: str | None) -> None:
 
 
 @click.command()
+@click.argument("paths", nargs=-1, metavar="[PATH]...", type=click.Path())
 @click.option("-o", "--output", metavar="DIR", type=click.Path(), required=True, help="The folder of the site.")
-@_index_option
-def report(output: str, index: str | None) -> None:
+@python_option
+@click.option(
+    "-j",
+    "--jobs",
+    type=click.IntRange(1, 1024),
+    metavar="N",
+    help="Threads that read and write; one a core without it.",
+)
+@click.option("--no-gitignore", is_flag=True, help="Show what .gitignore files exclude, too.")
+def report(
+    paths: tuple[str, ...], output: str, version: tuple[int, int] | None, jobs: int | None, no_gitignore: bool
+) -> None:
     """Writes a static site that is read from disk: files, source with linked names, syntax errors.
 
-    DIR is new, empty, or holds an earlier report, which is replaced.
+    PATH are files and folders, without one the working folder. DIR is new, empty, or holds an earlier
+    report, which is replaced when the new one is whole.
 
     \b
         quillet report -o site
+        quillet report src tests -o site
     """
     from quillet.cli.report import run
+    from quillet.report.site import Settings
 
-    sys.exit(run(output, index=index))
+    sys.exit(run(paths, output, Settings(version, jobs), gitignore=not no_gitignore))
 
 
 @click.command()

@@ -1,26 +1,79 @@
-"""`quillet report`: an index as a static site."""
+"""`quillet report`: files and folders as a static site."""
 
 from __future__ import annotations
 
 import os
-import sys
 
-from quillet.cli.find import fail, say_changed
+from quillet.cli.files import find_files, problem_of
+from quillet.cli.progress import Progress, say
 from quillet.cli.show import printable
-from quillet.index.questions import Index
-from quillet.index.store import IndexProblem, find_index
-from quillet.report.site import SiteProblem, write_site
+from quillet.report.folder import SiteProblem
+from quillet.report.site import Reports, Settings, Source, write_site
 
 
-def run(folder: str, *, index: str | None) -> int:
+def run(paths: tuple[str, ...], folder: str, settings: Settings, *, gitignore: bool) -> int:
     """Runs the command and returns its exit code."""
-    try:
-        with Index(index or find_index()) as opened:
-            count = write_site(opened, folder, say_changed)
-    except (IndexProblem, SiteProblem) as problem:
-        return fail(problem)
-    except OSError as error:
-        print(f"quillet: {printable(folder)}: {error.strerror or error}", file=sys.stderr)
+    paths = paths or (".",)
+    if "-" in paths or "" in paths:
+        say("standard input and empty paths have no place in a report; name files or folders")
         return 2
-    print(f"quillet: {count} files; open {printable(os.path.join(folder, 'index.html'))}", file=sys.stderr)
-    return 0
+    try:
+        sources, lost = _sources(paths, gitignore)
+        if not sources:
+            say(f"{' '.join(map(printable, paths))}: there are no Python files; name a folder that holds some")
+            return 2
+        with Progress("reading", len(sources)) as progress:
+            reports = Reports(unread=_say_of, cut=_say_of, begin=progress.begin, advance=progress.advance)
+            lost += write_site(sources, folder, settings, reports)
+    except KeyboardInterrupt:
+        return 130
+    except SiteProblem as problem:
+        say(printable(str(problem)))
+        return 2
+    except OSError as error:
+        say(f"{printable(folder)}: {printable(problem_of(error))}")
+        return 2
+    count = f"{len(sources)} {'file' if len(sources) == 1 else 'files'}"
+    say(f"{count}; open {printable(os.path.join(folder, 'index.html'))}")
+    return 1 if lost else 0
+
+
+def _sources(paths: tuple[str, ...], gitignore: bool) -> tuple[list[Source], int]:
+    """The files to show, each once, and how many cannot be. What a link leads to must be named, too."""
+    roots = [os.path.realpath(path) for path in paths]
+    sources: dict[str, Source] = {}
+    lost = 0
+    for found in find_files(paths, gitignore=gitignore):
+        problem = found.problem
+        if problem is None and found.path not in paths and os.path.islink(found.path):
+            real = os.path.realpath(found.path)
+            if not any(os.path.commonpath((real, root)) == root for root in roots):
+                problem = "a link that leads out of what was named; left out"
+        if problem is not None:
+            _say_of(found.path, problem)
+            lost += 1
+            continue
+        name = _name_of(found.path)
+        sources.setdefault(name, Source(found.path, name))
+    return sorted(sources.values(), key=lambda source: _parts(source.name)), lost
+
+
+def _name_of(path: str) -> str:
+    """The path below the working folder where it stands there, and otherwise as it was given."""
+    name = os.path.normpath(path)
+    if os.path.isabs(name):
+        here = os.getcwd()
+        if os.path.commonpath((name, here)) == here:
+            name = os.path.relpath(name, here)
+    return os.fsencode(name).decode("utf-8", "backslashreplace").replace(os.sep, "/")
+
+
+def _parts(name: str) -> tuple[tuple[bool, str], ...]:
+    """What sorts the files of a folder in front of its folders."""
+    *folders, file = name.split("/")
+    return (*((True, folder) for folder in folders), (False, file))
+
+
+def _say_of(path: str, problem: str) -> None:
+    first_line = problem.partition("\n")[0]
+    say(f"{printable(path)}: {printable(first_line)}")
