@@ -199,4 +199,9 @@ void AppendFieldTokens(const Token& string, std::vector<Token>& tokens, std::vec
   }
 }
 
+void AppendOwnFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields) {
+  std::vector<Token> nested;
+  FieldScan(string, tokens, fields, nested).Run();
+}
+
 }  // namespace quillet

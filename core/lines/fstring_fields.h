@@ -24,4 +24,8 @@ bool IsFormattedString(const Token& string);
 // takes. The string's token is followed by 32 readable bytes at least.
 void AppendFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields);
 
+// The same for the string's own fields alone, in the order of the source: of formatted strings inside of
+// them there are the tokens.
+void AppendOwnFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields);
+
 }  // namespace quillet

@@ -3,6 +3,9 @@
 
 #include <atomic>
 
+#include "names/reader.h"
+#include "names/symbol_table.h"
+
 namespace quillet {
 
 namespace {
@@ -15,7 +18,11 @@ void SetNameNormalizer(NameNormalizer normalizer) { normalizer_of_all.store(norm
 
 class NameBinder::Impl {
  public:
-  explicit Impl(Version version) : version_(version), source_(SourceText::Copy(Text(""))) {}
+  explicit Impl(Version version)
+      : version_(version),
+        source_(SourceText::Copy(Text(""))),
+        symbols_(version, bindings_),
+        reader_(version, symbols_, bindings_) {}
 
   const Bindings& Bind(Text bytes) {
     source_->Assign(bytes);
@@ -24,12 +31,13 @@ class NameBinder::Impl {
     return Bind(*source_, rows_);
   }
 
-  const Bindings& Bind(const SourceText& source, std::span<const LineRow>) {
+  const Bindings& Bind(const SourceText& source, std::span<const LineRow> rows) {
     bindings_.Clear();
     bindings_.is_python2 = !version_.AtLeast(3, 0);
     bindings_.line_starts = source.line_starts;
-    bindings_.scopes.push_back({kNoIndex, kNoIndex, kNoIndex, 0, 0, static_cast<uint32_t>(source.size()),
-                                NameScopeKind::kModule, true, false, false, false, false});
+    symbols_.Begin(source.size(), source.tokens.size() / 2, normalizer_of_all.load(std::memory_order_acquire));
+    reader_.Read(source, rows);
+    symbols_.Resolve();
     return bindings_;
   }
 
@@ -38,6 +46,8 @@ class NameBinder::Impl {
   Ref<SourceText> source_;
   std::vector<LineRow> rows_;
   Bindings bindings_;
+  SymbolTable symbols_;
+  NameReader reader_;
 };
 
 NameBinder::NameBinder(Version version) : impl_(std::make_unique<Impl>(version)) {}

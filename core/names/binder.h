@@ -14,12 +14,9 @@
 
 #include "lines/cutter.h"
 #include "names/bindings.h"
+#include "names/symbol_table.h"
 
 namespace quillet {
-
-// Brings a name that is not ASCII into the language's normal form (NFKC); false, or the same bytes, for
-// one that is in it. It may be called by any thread.
-using NameNormalizer = bool (*)(Text name, std::string& normal_form);
 
 // For all binders; without one, names are what they are spelled. To be called before other threads bind.
 void SetNameNormalizer(NameNormalizer normalizer);

@@ -81,6 +81,7 @@ struct NameSymbol {
     kAnnotated = 64,
     kNamespace = 128,  // a class or a function of this name is defined
     kTypeParameter = 256,
+    kPassedBy = 512,  // a function inside of the class uses a variable of this name around the class
   };
   enum class Resolution : uint8_t { kLocal, kExplicitGlobal, kImplicitGlobal, kFree };
 

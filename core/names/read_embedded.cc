@@ -1,0 +1,173 @@
+// Expressions in strings and comments, read by the same loop over tokens of their own.
+//
+// Fields of formatted strings are code of the scope that the string stands in. Hints in strings and
+// comments are not: they say what a name means, and nothing of the scope. A hint is written by people and
+// may be prose; names are taken from it only where it can be an expression.
+#include <tuple>
+
+#include "lines/expression_tokens.h"
+#include "lines/string_hints.h"
+#include "lines/token_search.h"
+#include "lines/type_comment.h"
+#include "names/reader.h"
+
+namespace quillet {
+
+void NameReader::String(const Token& string) {
+  front_ = Front::kValue;
+  operand_ = kNoIndex;
+  if (!embeds_) return;
+  if (IsFormattedString(string)) return Fields(string);
+  if (!in_row_ || next_hint_ >= hints_.size()) return;
+  const auto index = static_cast<size_t>(at_ - row_begin_);
+  while (next_hint_ < hints_.size() && hints_[next_hint_] < index) ++next_hint_;
+  if (next_hint_ < hints_.size() && hints_[next_hint_] == index) HintString(string);
+  operand_ = kNoIndex;
+}
+
+void NameReader::Fields(const Token& string) {
+  if (depth_ == kMaxDepth) return;
+  EmbeddedTokens& embedded = TokensOfDepth();
+  AppendOwnFieldTokens(string, embedded.tokens, embedded.ranges);
+  for (const TokenRange& range : embedded.ranges)
+    Embedded(TokenSpan(embedded.tokens).subspan(range.begin, range.end - range.begin));
+  front_ = Front::kValue;
+  operand_ = kNoIndex;
+}
+
+// Whether the name is the prefix of a template string, whose string is the next token.
+bool NameReader::IsTemplatePrefix(const Token& prefix) const {
+  if (!version_.AtLeast(3, 14) || at_ + 1 >= end_ || at_[1].text != prefix.end()) return false;
+  const auto is_letter = [&](size_t i, char letter) { return (prefix.text[i] | 0x20) == letter; };
+  if (prefix.length == 1) return is_letter(0, 't');
+  return prefix.length == 2 && ((is_letter(0, 't') && is_letter(1, 'r')) || (is_letter(0, 'r') && is_letter(1, 't')));
+}
+
+void NameReader::Template(const Token& prefix) {
+  ++at_;
+  Fields({prefix.text, prefix.length + at_->length, tok::STRING});
+}
+
+void NameReader::HintString(const Token& string) {
+  const Text hint = ContentsOfStringHint(string);
+  if (!IsNone(hint)) Hint(hint, kNameString | kNameAnnotation);
+}
+
+void NameReader::Comment(const Token& comment) {
+  if (comment.code != tok::COMMENT || !in_row_) return;
+  const Text text = comment.view();
+  const TypeCommentHint hint = FindTypeCommentHint(text);
+  if (!hint.found) return;
+  const uint32_t scope = scope_;
+  scope_ = statement_scope_;
+  Hint(text.substr(hint.begin, hint.end - hint.begin), kNameComment | kNameAnnotation);
+  scope_ = scope;
+}
+
+NameReader::EmbeddedTokens& NameReader::TokensOfDepth() {
+  if (pool_.size() <= static_cast<size_t>(depth_)) pool_.emplace_back();
+  EmbeddedTokens& embedded = pool_[static_cast<size_t>(depth_)];
+  embedded.tokens.clear();
+  embedded.ranges.clear();
+  return embedded;
+}
+
+// A hint in the scope under way.
+void NameReader::Hint(Text hint, uint8_t flags) {
+  if (depth_ == kMaxDepth) return;
+  EmbeddedTokens& embedded = TokensOfDepth();
+  AppendExpressionTokens(hint.data(), hint.data() + hint.size(), embedded.tokens);
+  if (embedded.tokens.empty() || !IsPlausible(embedded.tokens)) return;
+  const uint32_t quiet = quiet_;
+  const uint8_t outer_flags = flags_;
+  quiet_ = scope_;
+  flags_ = flags_ | flags;
+  Embedded(embedded.tokens);
+  quiet_ = quiet;
+  flags_ = outer_flags;
+}
+
+void NameReader::Embedded(TokenSpan tokens) {
+  const auto saved = std::tuple(at_, end_, base_, front_, operand_, next_comprehension_, in_row_, embeds_);
+  const size_t comprehensions = comprehensions_.size();
+  ++depth_;
+  in_row_ = false;
+  embeds_ = true;
+  next_comprehension_ = comprehensions;
+  at_ = tokens.data();
+  end_ = at_ + tokens.size();
+  FindComprehensions(tokens);
+  BeginBase();
+  ReadTokens(false);
+  EndBase();
+  comprehensions_.resize(comprehensions);
+  --depth_;
+  std::tie(at_, end_, base_, front_, operand_, next_comprehension_, in_row_, embeds_) = saved;
+}
+
+// Whether operands and operators take turns and brackets match, as they do in no sentence of two words.
+bool NameReader::IsPlausible(TokenSpan tokens) const {
+  if (tokens[0].view() == "ignore") return false;
+  size_t depth = 0;
+  bool is_behind_value = false;
+  TokenCode last = tok::ENDMARKER;
+  for (const Token& token : tokens) {
+    switch (MarkOf(token)) {
+      case Mark::kName:
+      case Mark::kAsync:
+      case Mark::kAwait:
+      case Mark::kConstant:
+        if (is_behind_value) return false;
+        is_behind_value = true;
+        break;
+      case Mark::kString:
+        if (is_behind_value && last != tok::STRING) return false;
+        is_behind_value = true;
+        break;
+      case Mark::kOpen:
+        ++depth;
+        is_behind_value = false;
+        break;
+      case Mark::kClose:
+        if (depth == 0) return false;
+        --depth;
+        is_behind_value = true;
+        break;
+      case Mark::kSkip:
+        continue;
+      case Mark::kDefinition:
+        return false;
+      default:
+        if (token.code == tok::ERRORTOKEN || OnlyBeginsStatement(token.code)) return false;
+        is_behind_value = false;
+        break;
+    }
+    last = token.code;
+  }
+  return depth == 0 && (is_behind_value || last == tok::COMMA);
+}
+
+// The brackets in which a "for" stands make comprehensions; they are found in front, since what stands
+// in front of the "for" belongs to them. Nearly no statement has one.
+void NameReader::FindComprehensions(TokenSpan tokens) {
+  size_t first = 1;
+  while (first < tokens.size() && tokens[first].code != word::kFor) ++first;
+  if (first >= tokens.size()) return;
+  brackets_.clear();
+  bracket_stack_.clear();
+  for (const Token& token : tokens) {
+    if (IsOpeningBracket(token.code)) {
+      bracket_stack_.push_back(brackets_.size());
+      brackets_.push_back({&token, false});
+    } else if (IsClosingBracket(token.code)) {
+      if (!bracket_stack_.empty()) bracket_stack_.pop_back();
+    } else if (token.code == word::kFor && !bracket_stack_.empty()) {
+      brackets_[bracket_stack_.back()].holds_for = true;
+    }
+  }
+  for (const OpenBracket& bracket : brackets_) {
+    if (bracket.holds_for) comprehensions_.push_back(bracket.at);
+  }
+}
+
+}  // namespace quillet
