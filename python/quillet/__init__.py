@@ -55,3 +55,7 @@ def __getattr__(name: str) -> object:
     value = getattr(import_module(f"{__name__}.{_HOMES.get(name, 'host')}"), name)
     globals()[name] = value
     return value
+
+
+def __dir__() -> list[str]:
+    return sorted({*globals(), *__all__})

@@ -3,8 +3,12 @@
 from __future__ import annotations
 
 import importlib.util
+import os
 import re
+import shutil
 import subprocess
+import sys
+import warnings
 from pathlib import Path
 from types import ModuleType
 
@@ -25,6 +29,7 @@ def load_script(name: str) -> ModuleType:
 doc_examples = load_script("doc_examples")
 DOCUMENTS = doc_examples.documents()
 IDS = [path.name for path in DOCUMENTS]
+SHOP = (ROOT / "examples" / "shop.py").read_text()
 
 
 @pytest.mark.parametrize("path", DOCUMENTS, ids=IDS)
@@ -62,6 +67,31 @@ def test_the_readme_shows_what_the_demo_analyses() -> None:
     shown = doc_examples.EXAMPLE.search((ROOT / "README.md").read_text())
     assert shown["source"] == (ROOT / shown["file"]).read_text()
     assert f"analyze {shown['file']}" in (ROOT / "run").read_text()
+
+
+README_BLOCKS = re.findall(r"^```(sh|python)\n(.*?)^```$", (ROOT / "README.md").read_text(), re.MULTILINE | re.DOTALL)
+
+
+@pytest.mark.parametrize("language", ["sh", "python"])
+def test_what_the_readme_shows_can_be_pasted(language: str, tmp_path: Path) -> None:
+    shutil.copytree(ROOT / "examples", tmp_path / "examples")
+    command = tmp_path / "bin" / "quillet"
+    command.parent.mkdir()
+    command.write_text(f'#!/bin/sh\nexec "{sys.executable}" -m quillet "$@"\n')
+    command.chmod(0o755)
+    env = {**os.environ, "PATH": f"{command.parent}{os.pathsep}{os.environ['PATH']}"}
+    blocks = [text for marked, text in README_BLOCKS if marked == language]
+    for text in blocks:
+        if text == SHOP:  # the source that the first example analyses
+            continue
+        shell = ["sh", "-ec", text] if language == "sh" else [sys.executable, "-c", text]
+        done = subprocess.run(shell, cwd=tmp_path, env=env, capture_output=True, text=True)
+        if "No module named 'pyarrow'" in done.stderr:
+            warnings.warn("an example was not run: no pyarrow", stacklevel=1)
+            continue
+        assert done.returncode == 0, f"{text}\n{done.stderr}"
+        assert done.stdout, text
+    assert len(blocks) > 1
 
 
 def test_every_record_kind_is_documented() -> None:
