@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "foundations/console.h"
+#include "foundations/stop.h"
 #include "lines/syntax_error.h"
 
 namespace quillet {
@@ -47,6 +48,8 @@ std::exception_ptr WrapWalkFailure(const std::exception_ptr& failure, const Logi
   try {
     std::rethrow_exception(failure);
   } catch (const SyntaxError&) {
+    return failure;
+  } catch (const Stopped&) {
     return failure;
   } catch (const Error&) {
   } catch (...) {
@@ -96,6 +99,11 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeSingleLogical(LogicalLine& 
   } catch (const SyntaxError& error) {
     logical.ClearDerivedInfo();
     return error;
+  } catch (const Stopped&) {
+    // As if it had not begun.
+    logical.ClearDerivedInfo();
+    logical.SetParsed(false);
+    throw;
   } catch (...) {
     const std::exception_ptr failure = std::current_exception();
     logical.ClearDerivedInfo();

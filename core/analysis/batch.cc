@@ -7,11 +7,17 @@
 #include <chrono>
 #include <exception>
 #include <new>
-#include <system_error>
 #include <utility>
 
 #include "analysis/source_bytes.h"
 #include "foundations/console.h"
+#include "foundations/stop.h"
+
+#ifdef _WIN32
+#include <process.h>
+#else
+#include <unistd.h>
+#endif
 
 namespace quillet {
 
@@ -57,12 +63,21 @@ Console CollectingConsole() {
   };
 }
 
+int64_t ThisProcess() {
+#ifdef _WIN32
+  return _getpid();
+#else
+  return getpid();
+#endif
+}
+
+}  // namespace
+
 // ---- one thread's work on one file ----
 
-class Worker {
+class BatchAnalyzer::Worker {
  public:
-  Worker(const BatchAnalyzer::Options& options, const std::atomic<bool>& cancelled)
-      : options_(options), cancelled_(cancelled), file_(options.analyzer) {
+  explicit Worker(const BatchAnalyzer::Options& options) : options_(options), file_(options.analyzer) {
     if (options.make_writer) writer_ = options.make_writer();
   }
 
@@ -71,6 +86,8 @@ class Worker {
     result.index = index;
     try {
       result.problem = AnalyzeInto(input, result);
+    } catch (const Stopped&) {
+      throw;
     } catch (...) {
       result = {};
       result.index = index;
@@ -87,7 +104,7 @@ class Worker {
     if (input.bytes) {
       bytes = *input.bytes;
     } else {
-      if (std::string problem = ReadSourceFile(input.path, bytes_, cancelled_); !problem.empty()) return problem;
+      if (std::string problem = ReadSourceFile(input.path, bytes_); !problem.empty()) return problem;
       bytes = bytes_;
     }
     result.byte_count = bytes.size();
@@ -126,7 +143,6 @@ class Worker {
   }
 
   const BatchAnalyzer::Options& options_;
-  const std::atomic<bool>& cancelled_;
   FileAnalyzer file_;
   ScopeNames scopes_;
   PlacedRecords placed_;
@@ -135,101 +151,31 @@ class Worker {
   std::string bytes_;
 };
 
-}  // namespace
-
 size_t BatchResult::ByteSize() const { return sizeof(BatchResult) + table.ByteSize() + output.capacity(); }
 
-// ---- the ring ----
+// ---- the batch ----
 
 BatchAnalyzer::BatchAnalyzer(Options options, std::vector<BatchInput> inputs)
-    : options_(std::move(options)), inputs_(std::move(inputs)) {
-  waiting_.resize(std::max<size_t>(options_.most_waiting, 1));
+    : options_(std::move(options)), inputs_(std::move(inputs)), ring_(new Ring(*this, 0, false)) {}
+
+BatchAnalyzer::~BatchAnalyzer() {
+  Ring* const ring = ring_;
+  if (ring->IsOfThisProcess()) delete ring;
 }
 
-BatchAnalyzer::~BatchAnalyzer() { Cancel(); }
-
-void BatchAnalyzer::Start() {
-  const std::lock_guard lock(mutex_);
-  if (!started_) StartThreads();
-}
-
-void BatchAnalyzer::StartThreads() {
-  started_ = true;
-  const unsigned cores = std::max(std::thread::hardware_concurrency(), 1u);
-  const size_t count = std::min<size_t>(options_.jobs == 0 ? cores : options_.jobs, inputs_.size());
-  for (size_t i = 0; i < count; ++i) {
-    try {
-      threads_.emplace_back([this] { Work(); });
-    } catch (const std::system_error&) {
-      // Fewer threads than asked for do the same work; none cannot.
-      if (threads_.empty()) throw;
-      return;
-    }
-  }
-}
-
-void BatchAnalyzer::Work() {
-  Console console = CollectingConsole();
-  const ThreadConsole own_console(&console);
-  std::optional<Worker> worker;
-  std::string failure;
-  while (const std::optional<size_t> index = Take()) {
-    // An analyzer that cannot be built (a grammar file is gone) is told with every file.
-    if (!worker) {
-      try {
-        worker.emplace(options_, cancelled_);
-      } catch (...) {
-        failure = MessageOf(std::current_exception());
-      }
-    }
-    BatchResult result;
-    if (worker) {
-      result = worker->Analyze(inputs_[*index], *index);
-    } else {
-      result.index = *index;
-      result.problem = failure;
-    }
-    Deliver(std::move(result));
-  }
-}
-
-std::optional<size_t> BatchAnalyzer::Take() {
-  std::unique_lock lock(mutex_);
-  may_take_.wait(lock, [this] {
-    if (cancelled_ || next_to_take_ >= inputs_.size()) return true;
-    if (next_to_take_ == next_to_hand_out_) return true;
-    return next_to_take_ - next_to_hand_out_ < waiting_.size() && waiting_bytes_ < options_.most_waiting_bytes;
-  });
-  if (cancelled_ || next_to_take_ >= inputs_.size()) return std::nullopt;
-  return next_to_take_++;
-}
-
-void BatchAnalyzer::Deliver(BatchResult&& result) {
-  const size_t index = result.index;
-  {
-    const std::lock_guard lock(mutex_);
-    waiting_bytes_ += result.ByteSize();
-    waiting_[index % waiting_.size()] = std::move(result);
-    if (index != next_to_hand_out_) return;
-  }
-  may_hand_out_.notify_one();
+BatchAnalyzer::Ring& BatchAnalyzer::TheRing() {
+  Ring* ring = ring_;
+  if (ring->IsOfThisProcess()) [[likely]]
+    return *ring;
+  auto own = std::make_unique<Ring>(*this, handed_out_, was_cancelled_);
+  if (ring_.compare_exchange_strong(ring, own.get())) return *own.release();
+  return *ring;  // another thread was first
 }
 
 BatchAnalyzer::Wait BatchAnalyzer::Next(BatchResult& result, std::chrono::milliseconds patience) {
-  {
-    std::unique_lock lock(mutex_);
-    if (!started_) StartThreads();
-    const auto is_over = [this] { return cancelled_ || next_to_hand_out_ >= inputs_.size(); };
-    std::optional<BatchResult>& slot = waiting_[next_to_hand_out_ % waiting_.size()];
-    if (!may_hand_out_.wait_for(lock, patience, [&] { return slot.has_value() || is_over(); })) return Wait::kTimeout;
-    if (is_over()) return Wait::kEnd;
-    result = std::move(*slot);
-    slot.reset();
-    waiting_bytes_ -= std::min(waiting_bytes_, result.ByteSize());
-    ++next_to_hand_out_;
-  }
-  may_take_.notify_all();
-  return Wait::kResult;
+  const Wait wait = TheRing().Next(result, patience);
+  if (wait == Wait::kResult) handed_out_.fetch_add(1);
+  return wait;
 }
 
 bool BatchAnalyzer::Next(BatchResult& result) {
@@ -240,6 +186,134 @@ bool BatchAnalyzer::Next(BatchResult& result) {
 }
 
 void BatchAnalyzer::Cancel() {
+  was_cancelled_ = true;
+  TheRing().Cancel();
+}
+
+// ---- the ring ----
+
+BatchAnalyzer::Ring::Ring(const BatchAnalyzer& batch, size_t first, bool is_cancelled)
+    : batch_(batch),
+      process_(ThisProcess()),
+      next_to_take_(first),
+      next_to_hand_out_(first),
+      waiting_(std::max<size_t>(batch.options_.most_waiting, 1)),
+      cancelled_(is_cancelled) {}
+
+BatchAnalyzer::Ring::~Ring() { Cancel(); }
+
+bool BatchAnalyzer::Ring::IsOfThisProcess() const { return process_ == ThisProcess(); }
+
+void BatchAnalyzer::Ring::Start() {
+  const std::lock_guard lock(mutex_);
+  if (!started_) StartThreads();
+}
+
+void BatchAnalyzer::Ring::StartThreads() {
+  started_ = true;
+  const unsigned cores = std::max(std::thread::hardware_concurrency(), 1u);
+  const unsigned jobs = batch_.options_.jobs == 0 ? cores : batch_.options_.jobs;
+  const size_t count = std::min<size_t>(jobs, batch_.inputs_.size() - next_to_take_);
+  for (size_t i = 0; i < count; ++i) {
+    try {
+      threads_.emplace_back([this] { Work(); });
+    } catch (const std::exception&) {  // fewer threads than asked for do the same work
+      reader_works_ = threads_.empty();
+      return;
+    }
+  }
+}
+
+StopQuestion BatchAnalyzer::Ring::IsWanted() const {
+  return [this] {
+    if (cancelled_) throw Stopped();
+  };
+}
+
+void BatchAnalyzer::Ring::Work() {
+  const ThreadStopQuestion is_wanted(IsWanted());
+  std::unique_ptr<Worker> worker;
+  try {
+    while (const std::optional<size_t> index = Take()) Deliver(Analyze(worker, *index));
+  } catch (const Stopped&) {  // the batch was cancelled
+  }
+}
+
+BatchResult BatchAnalyzer::Ring::Analyze(std::unique_ptr<Worker>& worker, size_t index) {
+  Console console = CollectingConsole();
+  const ThreadConsole own_console(&console);
+  // An analyzer that cannot be built (a grammar file is gone) is told with every file.
+  try {
+    if (worker == nullptr) worker = std::make_unique<Worker>(batch_.options_);
+  } catch (...) {
+    BatchResult result;
+    result.index = index;
+    result.problem = MessageOf(std::current_exception());
+    return result;
+  }
+  return worker->Analyze(batch_.inputs_[index], index);
+}
+
+std::optional<size_t> BatchAnalyzer::Ring::Take() {
+  std::unique_lock lock(mutex_);
+  may_take_.wait(lock, [this] {
+    if (cancelled_ || next_to_take_ >= batch_.inputs_.size()) return true;
+    if (next_to_take_ == next_to_hand_out_) return true;
+    return next_to_take_ - next_to_hand_out_ < waiting_.size() && waiting_bytes_ < batch_.options_.most_waiting_bytes;
+  });
+  if (cancelled_ || next_to_take_ >= batch_.inputs_.size()) return std::nullopt;
+  return next_to_take_++;
+}
+
+void BatchAnalyzer::Ring::Deliver(BatchResult&& result) {
+  const size_t index = result.index;
+  {
+    const std::lock_guard lock(mutex_);
+    waiting_bytes_ += result.ByteSize();
+    waiting_[index % waiting_.size()] = std::move(result);
+    if (index != next_to_hand_out_) return;
+  }
+  may_hand_out_.notify_one();
+}
+
+BatchAnalyzer::Wait BatchAnalyzer::Ring::Next(BatchResult& result, std::chrono::milliseconds patience) {
+  bool wakes_another_reader;
+  {
+    std::unique_lock lock(mutex_);
+    if (!started_) StartThreads();
+    if (reader_works_) {
+      lock.unlock();
+      return NextByReader(result);
+    }
+    if (!may_hand_out_.wait_for(lock, patience, [this] { return IsOver() || NextSlot().has_value(); }))
+      return Wait::kTimeout;
+    if (IsOver()) return Wait::kEnd;
+    result = std::move(*NextSlot());
+    NextSlot().reset();
+    waiting_bytes_ -= std::min(waiting_bytes_, result.ByteSize());
+    ++next_to_hand_out_;
+    wakes_another_reader = IsOver() || NextSlot().has_value();
+  }
+  may_take_.notify_all();
+  if (wakes_another_reader) may_hand_out_.notify_all();
+  return Wait::kResult;
+}
+
+BatchAnalyzer::Wait BatchAnalyzer::Ring::NextByReader(BatchResult& result) {
+  const std::lock_guard one_at_a_time(reader_worker_mutex_);
+  if (IsOver()) return Wait::kEnd;
+  const ThreadStopQuestion is_wanted(IsWanted());
+  try {
+    result = Analyze(reader_worker_, next_to_hand_out_);
+  } catch (const Stopped&) {
+    if (cancelled_) return Wait::kEnd;
+    throw;
+  }
+  ++next_to_hand_out_;
+  return Wait::kResult;
+}
+
+void BatchAnalyzer::Ring::Cancel() {
   {
     const std::lock_guard lock(mutex_);
     started_ = true;

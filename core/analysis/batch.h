@@ -4,7 +4,8 @@
 // Each thread has an analyzer of its own and takes the next file that nobody has; nothing is shared
 // but the list and the results. How far threads run ahead of the reader is bounded, in files and in
 // bytes, so that memory does not grow with the list. No file fails the batch: one that cannot be read
-// is a result that says why.
+// is a result that says why. Where no thread can be had, the reader's does the work. A process that forks
+// has two batches from then on: both hand out what is left.
 // What the core prints or reports while a file is analysed (a walk that met its limit, an internal
 // failure) is collected with that file's result and printed by nobody.
 #pragma once
@@ -24,6 +25,7 @@
 #include "analysis/placed_records.h"
 #include "analysis/record_table.h"
 #include "analysis/scope_names.h"
+#include "foundations/stop.h"
 
 namespace quillet {
 
@@ -88,38 +90,78 @@ class BatchAnalyzer {
   const std::vector<BatchInput>& inputs() const { return inputs_; }
 
   // Sets the threads to work in front of the first Next, which does so otherwise.
-  void Start();
+  void Start() { TheRing().Start(); }
 
   enum class Wait { kResult, kEnd, kTimeout };
-  // The next result in order. kEnd behind the last one and after Cancel. For one thread at a time.
+  // The next result in order. kEnd behind the last one and after Cancel. Where no thread could be
+  // started, this one does the work, however long that takes; Stopped ends it (stop.h), and the file is
+  // begun anew by the next call. For any number of threads.
   Wait Next(BatchResult& result, std::chrono::milliseconds patience);
   // The same, however long it takes; false at the end.
   bool Next(BatchResult& result);
 
-  // Stops after the files under way, and waits for that. For any thread but those of the batch.
+  // Stops, in the middle of a file as well, and waits for that. For any thread but those of the batch.
   void Cancel();
 
  private:
-  void StartThreads();
-  void Work();
-  // The next index for a thread; nothing at the end.
-  std::optional<size_t> Take();
-  void Deliver(BatchResult&& result);
+  class Worker;
+
+  // The threads, and the results that wait for the reader.
+  class Ring {
+   public:
+    Ring(const BatchAnalyzer& batch, size_t first, bool is_cancelled);
+    ~Ring();
+    Ring(const Ring&) = delete;
+    Ring& operator=(const Ring&) = delete;
+
+    void Start();
+    Wait Next(BatchResult& result, std::chrono::milliseconds patience);
+    void Cancel();
+    bool IsOfThisProcess() const;
+
+   private:
+    void StartThreads();
+    void Work();
+    StopQuestion IsWanted() const;
+    // Analyses a file, by a worker that is built at first need.
+    BatchResult Analyze(std::unique_ptr<Worker>& worker, size_t index);
+    // The next result, worked out by the calling thread.
+    Wait NextByReader(BatchResult& result);
+    // The next index for a thread; nothing at the end.
+    std::optional<size_t> Take();
+    void Deliver(BatchResult&& result);
+    bool IsOver() const { return cancelled_ || next_to_hand_out_ >= batch_.inputs_.size(); }
+    std::optional<BatchResult>& NextSlot() { return waiting_[next_to_hand_out_ % waiting_.size()]; }
+
+    const BatchAnalyzer& batch_;
+    const int64_t process_;
+
+    std::mutex mutex_;
+    std::condition_variable may_take_;
+    std::condition_variable may_hand_out_;
+    size_t next_to_take_;      // the first input that no thread has
+    size_t next_to_hand_out_;  // the first result that the reader lacks
+    size_t waiting_bytes_ = 0;
+    std::vector<std::optional<BatchResult>> waiting_;  // a ring, by index
+    std::atomic<bool> cancelled_;
+    bool started_ = false;
+    bool reader_works_ = false;  // no thread could be started
+
+    std::mutex join_mutex_;
+    std::vector<std::thread> threads_;
+    std::mutex reader_worker_mutex_;
+    std::unique_ptr<Worker> reader_worker_;
+  };
+
+  // The ring of this process. A fork copies a ring without its threads, and with locks that they may hold
+  // for ever: the copy is left as it is, for good, and the child goes on with a ring of its own.
+  Ring& TheRing();
 
   const Options options_;
   const std::vector<BatchInput> inputs_;
-
-  std::mutex mutex_;
-  std::condition_variable may_take_;
-  std::condition_variable may_hand_out_;
-  size_t next_to_take_ = 0;      // the first input that no thread has
-  size_t next_to_hand_out_ = 0;  // the first result that the reader lacks
-  size_t waiting_bytes_ = 0;
-  std::vector<std::optional<BatchResult>> waiting_;  // a ring, by index
-  std::atomic<bool> cancelled_{false};
-  std::mutex join_mutex_;
-  std::vector<std::thread> threads_;
-  bool started_ = false;
+  std::atomic<size_t> handed_out_{0};
+  std::atomic<bool> was_cancelled_{false};
+  std::atomic<Ring*> ring_;
 };
 
 }  // namespace quillet

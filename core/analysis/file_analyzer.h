@@ -35,14 +35,25 @@ class FileAnalyzer {
 
   explicit FileAnalyzer(const Options& options);
 
+  // What an analysis found, as an object of its own.
+  struct Found {
+    Ref<SourceText> source;
+    std::vector<LineRow> rows;
+    std::vector<LineResult> results;
+    RecordStore store;
+    std::vector<SyntaxError> errors;
+  };
+
   // Results stand until the next call. The bytes are copied.
   void Analyze(Text bytes);
+  // Gives the results away, and leaves none.
+  Found TakeFound();
 
-  const SourceText& source() const { return *source_; }
-  std::span<const LineRow> rows() const { return rows_; }
-  std::span<const LineResult> results() const { return results_; }
-  const RecordStore& store() const { return store_; }
-  const std::vector<SyntaxError>& errors() const { return errors_; }
+  const SourceText& source() const { return *found_.source; }
+  std::span<const LineRow> rows() const { return found_.rows; }
+  std::span<const LineResult> results() const { return found_.results; }
+  const RecordStore& store() const { return found_.store; }
+  const std::vector<SyntaxError>& errors() const { return found_.errors; }
   // Where the error of a row lies in the source; the row must have one.
   Position ErrorPosition(size_t row) const;
   // The number of physical lines.
@@ -55,11 +66,7 @@ class FileAnalyzer {
   Options options_;
   CPGenAnalyzerImpl analyzer_;
   std::unique_ptr<CPGenAnalyzerImpl> print_function_analyzer_;  // built at first need
-  Ref<SourceText> source_;
-  std::vector<LineRow> rows_;
-  std::vector<LineResult> results_;
-  RecordStore store_;
-  std::vector<SyntaxError> errors_;
+  Found found_;
   ScopeTracker scopes_;
 };
 

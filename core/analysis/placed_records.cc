@@ -5,6 +5,7 @@
 #include <charconv>
 
 #include "foundations/shown_text.h"
+#include "foundations/stop.h"
 #include "foundations/utf8.h"
 #include "vocabulary/symbolinfo.h"
 
@@ -36,6 +37,7 @@ std::span<const PlacedRecord> PlacedRecords::OfRow(size_t row) {
   spelled_at_ = 0;
   const FileAnalyzer::LineResult& result = file_->results()[row];
   const RecordStore& store = file_->store();
+  CountSteps(1 + (result.record_end - result.record_begin) + (result.arg_record_end - result.arg_record_begin));
   in_signature_ = result.first_in_def && file_->rows()[row].kind == LineKind::kComment && FindSignature(row);
   for (uint32_t i = result.record_begin; i < result.record_end; ++i) Add(row, store.rows[i], false);
   for (uint32_t i = result.arg_record_begin; i < result.arg_record_end; ++i) Add(row, store.arg_rows[i], true);

@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <system_error>
 
+#include "foundations/stop.h"
 #include "foundations/utf8.h"
 
 #ifdef _WIN32
@@ -34,6 +35,7 @@ bool ReadAll(size_t expected, std::string& bytes, Function&& read) {
   bytes.resize(std::max(expected + 1, kReadSize));
   while (true) {
     const auto count = read(bytes.data() + size, bytes.size() - size);
+    CountSteps(count / 16);
     if (count < 0) return false;
     if (count == 0) break;
     size += static_cast<size_t>(count);
@@ -47,13 +49,12 @@ bool ReadAll(size_t expected, std::string& bytes, Function&& read) {
 
 #ifdef _WIN32
 
-std::string ReadSourceFile(const std::string& path, std::string& bytes, const std::atomic<bool>& cancelled) {
+std::string ReadSourceFile(const std::string& path, std::string& bytes) {
   if (path.find('\0') != std::string::npos) return "embedded null byte";
   const std::filesystem::path wide(std::u8string(path.begin(), path.end()));
   std::FILE* file = _wfopen(wide.c_str(), L"rb");
   if (file == nullptr) return ReasonOf(errno);
   const bool done = ReadAll(0, bytes, [&](char* at, size_t size) -> int64_t {
-    if (cancelled) return -1;
     const size_t count = std::fread(at, 1, size, file);
     return count == 0 && std::ferror(file) ? -1 : static_cast<int64_t>(count);
   });
@@ -83,20 +84,19 @@ class OpenFile {
   int descriptor_;
 };
 
-// Waits until there is something to read; false once it is no longer wanted.
-bool WaitForInput(int descriptor, const std::atomic<bool>& cancelled) {
-  while (!cancelled) {
+// Waits until there is something to read.
+void WaitForInput(int descriptor) {
+  while (true) {
     pollfd wanted{descriptor, POLLIN, 0};
     const int ready = poll(&wanted, 1, kPollMilliseconds);
-    if (ready > 0 || (ready < 0 && errno != EINTR)) return true;
+    if (ready > 0 || (ready < 0 && errno != EINTR)) return;
+    AskWhetherToStop();
   }
-  errno = ECANCELED;
-  return false;
 }
 
 }  // namespace
 
-std::string ReadSourceFile(const std::string& path, std::string& bytes, const std::atomic<bool>& cancelled) {
+std::string ReadSourceFile(const std::string& path, std::string& bytes) {
   if (path.find('\0') != std::string::npos) return "embedded null byte";
   const OpenFile file(path);
   if (file.get() < 0) return ReasonOf(errno);
@@ -107,7 +107,7 @@ std::string ReadSourceFile(const std::string& path, std::string& bytes, const st
   const size_t expected = is_regular ? static_cast<size_t>(info.st_size) : 0;
   const bool done = ReadAll(expected, bytes, [&](char* at, size_t size) -> ssize_t {
     while (true) {
-      if (!is_regular && !WaitForInput(file.get(), cancelled)) return -1;
+      if (!is_regular) WaitForInput(file.get());
       const ssize_t count = read(file.get(), at, size);
       if (count >= 0 || (errno != EINTR && errno != EAGAIN)) return count;
     }

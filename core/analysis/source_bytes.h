@@ -6,7 +6,6 @@
 // be stoppable.
 #pragma once
 
-#include <atomic>
 #include <string>
 
 #include "foundations/text.h"
@@ -14,9 +13,8 @@
 namespace quillet {
 
 // Reads a whole file into `bytes`, whose memory is kept. Empty, or why it could not be read, as one
-// phrase. `path` is as the operating system spells it (UTF-8 on Windows). Gives up, with a reason,
-// once `cancelled` is set.
-std::string ReadSourceFile(const std::string& path, std::string& bytes, const std::atomic<bool>& cancelled);
+// phrase. `path` is as the operating system spells it (UTF-8 on Windows). May be stopped (stop.h).
+std::string ReadSourceFile(const std::string& path, std::string& bytes);
 
 // Whether a source names an encoding other than UTF-8 for itself.
 bool NeedsHostDecoding(Text bytes);

@@ -4,8 +4,6 @@
 #include <array>
 #include <atomic>
 #include <memory>
-#include <mutex>
-#include <vector>
 
 namespace quillet {
 
@@ -36,32 +34,35 @@ void LoadDefaultPage(uint32_t first, uint8_t* classes) {
   for (uint32_t i = 0; i < kCharPageSize; ++i) classes[i] = DefaultClassOf(first + i);
 }
 
-using Page = std::array<uint8_t, kCharPageSize>;
+// Never freed once it is published: a reader may still look at one that a new loader replaced. `before`
+// links all of them, so that each stays reachable.
+struct Page {
+  std::array<uint8_t, kCharPageSize> classes;
+  const Page* before = nullptr;
+};
 
+// Without a mutex, which a process that forks while another thread holds it would never get.
 struct Pages {
   std::array<std::atomic<const Page*>, kCodePointLimit / kCharPageSize> by_number{};
   std::atomic<CharPageLoader> loader{LoadDefaultPage};
-  // Owns every page ever published: a reader may still look at one that a new loader replaced.
-  std::mutex owned_mutex;
-  std::vector<std::unique_ptr<const Page>> owned;
+  std::atomic<const Page*> latest{nullptr};
 };
 
 Pages& ThePages() {
-  static Pages pages;
+  static constinit Pages pages;
   return pages;
 }
 
-// The loader runs without the mutex, since a host's loader waits for the host's own lock.
 const Page* LoadPage(Pages& pages, uint32_t number) {
   auto page = std::make_unique<Page>();
-  pages.loader.load(std::memory_order_acquire)(number * kCharPageSize, page->data());
-  const std::lock_guard<std::mutex> lock(pages.owned_mutex);
+  pages.loader.load(std::memory_order_acquire)(number * kCharPageSize, page->classes.data());
   const Page* published = nullptr;
   if (!pages.by_number[number].compare_exchange_strong(published, page.get(), std::memory_order_acq_rel)) {
     return published;  // another thread was first
   }
-  pages.owned.push_back(std::move(page));
-  return pages.owned.back().get();
+  Page* const kept = page.release();
+  kept->before = pages.latest.exchange(kept, std::memory_order_acq_rel);
+  return kept;
 }
 
 }  // namespace
@@ -73,7 +74,7 @@ uint8_t CharClassOf(uint32_t code_point) {
   const Page* page = pages.by_number[number].load(std::memory_order_acquire);
   if (page == nullptr) [[unlikely]]
     page = LoadPage(pages, number);
-  return (*page)[code_point % kCharPageSize];
+  return page->classes[code_point % kCharPageSize];
 }
 
 void SetCharPageLoader(CharPageLoader loader) {

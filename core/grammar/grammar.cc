@@ -2,6 +2,7 @@
 #include "grammar/grammar.h"
 
 #include <algorithm>
+#include <atomic>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -29,6 +30,20 @@ bool LooksLikeTokenName(const std::string& name) {
   return std::none_of(name.begin(), name.end(), [](char c) { return c >= 'a' && c <= 'z'; });
 }
 
+// A grammar that is kept. The list is only ever prolonged, without a lock: one that a thread holds while the
+// process forks would be held for ever in the other process.
+struct KeptGrammar {
+  std::string filename;
+  std::string text;
+  TokenNames names;
+  std::shared_ptr<const Grammar> grammar;
+  const KeptGrammar* before;
+};
+constinit std::atomic<const KeptGrammar*> latest_grammar{nullptr};
+// Those of the package are three.
+constexpr int kMostKeptGrammars = 8;
+constinit std::atomic<int> kept_grammar_count{0};
+
 std::string ReadFile(const std::string& filename) {
   const auto fail = [&](int error) {
     ThrowError(ErrorKind::kOSError, "cannot read grammar file '" + filename + "': " + std::strerror(error));
@@ -48,13 +63,14 @@ std::string ReadFile(const std::string& filename) {
 }  // namespace
 
 const TokenNames& TokenNames::Default() {
-  static const TokenNames names = [] {
-    TokenNames made;
+  // For threads that the end of the process overtakes, too.
+  static const TokenNames& names = *[] {
+    auto* made = new TokenNames;
     const auto add_operator = [&](const char* text, int number) {
-      if (text[0] != '\0') made.op2number.emplace(text, number);
+      if (text[0] != '\0') made->op2number.emplace(text, number);
     };
-#define QUILLET_TOKEN(name, number, text)  \
-  made.name2number.emplace(#name, number); \
+#define QUILLET_TOKEN(name, number, text)   \
+  made->name2number.emplace(#name, number); \
   add_operator(text, number);
 #define QUILLET_TOKEN_ALIAS(name, number, text) add_operator(text, number);
 #include "tokens/token_ids.def"
@@ -137,6 +153,21 @@ Grammar Grammar::Parse(Text text, const std::string& filename, const TokenNames&
 
 Grammar Grammar::Load(const std::string& filename, const TokenNames& names) {
   return Parse(ReadFile(filename), filename, names);
+}
+
+std::shared_ptr<const Grammar> Grammar::Shared(const std::string& filename, const TokenNames& names) {
+  const std::string text = ReadFile(filename);
+  for (const KeptGrammar* kept = latest_grammar.load(std::memory_order_acquire); kept != nullptr; kept = kept->before) {
+    if (kept->text == text && kept->filename == filename && kept->names == names) return kept->grammar;
+  }
+  auto made = std::make_shared<const Grammar>(Parse(text, filename, names));
+  if (kept_grammar_count.load(std::memory_order_relaxed) < kMostKeptGrammars &&
+      kept_grammar_count.fetch_add(1, std::memory_order_relaxed) < kMostKeptGrammars) {
+    auto* const kept = new KeptGrammar{filename, text, names, made, latest_grammar.load(std::memory_order_relaxed)};
+    while (!latest_grammar.compare_exchange_weak(kept->before, kept, std::memory_order_acq_rel)) {
+    }
+  }
+  return made;
 }
 
 Grammar::LabelId Grammar::Classify(int type, Text value) const {

@@ -34,6 +34,8 @@ struct TokenNames {
   std::unordered_map<std::string, int> op2number;
 
   static const TokenNames& Default();
+
+  friend bool operator==(const TokenNames&, const TokenNames&) = default;
 };
 
 class Grammar {
@@ -47,6 +49,9 @@ class Grammar {
   static Grammar Parse(Text text, const std::string& filename, const TokenNames& names = TokenNames::Default());
   // Reads the file; OSError that names it where that fails.
   static Grammar Load(const std::string& filename, const TokenNames& names = TokenNames::Default());
+  // The same, for all that read the same text by the same names: the grammars of a process that were asked for
+  // first are kept to its end, and are one object to all threads.
+  static std::shared_ptr<const Grammar> Shared(const std::string& filename, const TokenNames& names);
 
   // ---- what a host sees ----
   // Rules are numbered from kFirstSymbol on, in the order of the file.

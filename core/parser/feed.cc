@@ -8,7 +8,10 @@
 //
 // This is the innermost loop of the analysis of a file: the label of a token is one lookup by its
 // code. Only the first token, and the few codes without a label, get a closer look.
+#include <algorithm>
+
 #include "foundations/errors.h"
+#include "foundations/stop.h"
 #include "parser/parser.h"
 
 namespace quillet {
@@ -111,6 +114,8 @@ CNode* CPGenParserImpl::Feed(TokenEngine& engine, TokenRun run, bool async_keywo
   while (i < count && is_dropped(i)) ++i;
   if (i == count) return nullptr;
 
+  constexpr int64_t kStepsOfAStatement = 16;  // however short it is
+  CountSteps(kStepsOfAStatement + std::min(count, kStepsBetweenQuestions));
   engine.Setup(file_input_number_);
 
   // The first token decides what is invented around the statement.
@@ -175,17 +180,22 @@ CNode* CPGenParserImpl::Feed(TokenEngine& engine, TokenRun run, bool async_keywo
 template <class TokenEngine>
 [[gnu::flatten]] TokenCode CPGenParserImpl::FeedRest(TokenEngine& engine, TokenRun run, int64_t i, TokenCode last_code,
                                                      const FeedTable& table, const PositionView* positions) {
-  for (const int64_t count = run.count(); i < count; ++i) {
-    const Token& token = run.toks[i];
-    const Grammar::LabelId label = table.label[token.code];
-    if (label == Grammar::kNoLabel) [[unlikely]] {
-      if (FeedUnusual(engine, run, i, table, positions)) last_code = token.code;
-      continue;
+  const int64_t count = run.count();
+  while (true) {
+    const int64_t end = std::min(count, i + kStepsBetweenQuestions);
+    for (; i < end; ++i) {
+      const Token& token = run.toks[i];
+      const Grammar::LabelId label = table.label[token.code];
+      if (label == Grammar::kNoLabel) [[unlikely]] {
+        if (FeedUnusual(engine, run, i, table, positions)) last_code = token.code;
+        continue;
+      }
+      engine.Add(label, table.type[token.code], token, run.IndexOf(i));
+      last_code = token.code;
     }
-    engine.Add(label, table.type[token.code], token, run.IndexOf(i));
-    last_code = token.code;
+    if (i == count) return last_code;
+    CountSteps(kStepsBetweenQuestions);
   }
-  return last_code;
 }
 
 // A token without a label of its own: dropped, spelt otherwise, looked up by its text, or given to

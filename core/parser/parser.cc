@@ -129,7 +129,7 @@ CPGenParserImpl::CPGenParserImpl(const Options& options)
     : version_(options.version),
       py3_grammar_(options.py3_grammar),
       async_always_keyword_(options.version.AtLeast(3, 7)),
-      grammar_(std::make_unique<Grammar>(Grammar::Load(options.grammar_file, options.token_names))) {
+      grammar_(Grammar::Shared(options.grammar_file, options.token_names)) {
   const auto file_input = grammar_->symbol2number.find("file_input");
   if (file_input == grammar_->symbol2number.end()) ThrowError(ErrorKind::kKeyError, "file_input");
   file_input_number_ = file_input->second;

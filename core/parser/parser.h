@@ -167,7 +167,7 @@ class CPGenParserImpl {
   Version version_;
   bool py3_grammar_;
   bool async_always_keyword_;
-  std::unique_ptr<Grammar> grammar_;
+  std::shared_ptr<const Grammar> grammar_;
   int file_input_number_ = 0;
   std::vector<NodeKind> kinds_for_states_;
   std::unique_ptr<CNodeFactory> factory_;

@@ -28,6 +28,7 @@
 #include <cstdint>
 #include <vector>
 
+#include "foundations/stop.h"
 #include "tokens/operators.h"
 #include "tokens/token.h"
 #include "tokens/token_ends.h"
@@ -119,6 +120,7 @@ class Appender {
   static constexpr size_t kChunk = 512;
 
   void Grow() {
+    CountSteps(kChunk);
     const size_t used = items_.size();
     if (items_.capacity() < used + kChunk) items_.reserve(2 * used + kChunk);
     items_.resize(used + kChunk);

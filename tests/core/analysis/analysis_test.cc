@@ -9,6 +9,9 @@
 #include <vector>
 
 #include "analysis/analyzer.h"
+#include "analysis/file_analyzer.h"
+#include "foundations/stop.h"
+#include "lines/cutter.h"
 #include "lines/fstring_fields.h"
 #include "lines/string_hints.h"
 #include "tests/core/support/analyzer_helper.h"
@@ -654,6 +657,97 @@ TEST(AnalysisBadInput, MutatedStatementsGivePositionedErrorsOrResults) {
     }
   }
   EXPECT_GT(accepted, 1000);
+}
+
+// ---- work that is stopped ----
+
+// How often a question is asked while `work` runs. It is stopped when it was asked `limit` times.
+template <class Work>
+size_t QuestionsOf(size_t limit, Work&& work) {
+  size_t asked = 0;
+  const ThreadStopQuestion question([&asked, limit] {
+    if (++asked == limit) throw Stopped();
+  });
+  try {
+    work();
+  } catch (const Stopped&) {
+    EXPECT_EQ(asked, limit);
+  }
+  return asked;
+}
+
+std::string Repeated(Text text, size_t times) {
+  std::string all;
+  for (size_t i = 0; i < times; ++i) all += text;
+  return all;
+}
+
+TEST(Stop, WorkEndsWhereItIsNotWantedAndTheNextOneIsWhole) {
+  const std::vector<std::string> sources = {
+      "x = [" + Repeated("name, ", 100'000) + "]\n",                      // one statement
+      Repeated("name = call(value)\n", 20'000),                           // many
+      "x = f'" + Repeated("{name}", 30'000) + "'\n",                      // expressions within one
+      "def f(" + Repeated("a: 'List[int]', ", 10'000) + "b): pass\n",     // hints
+      "match x, y:\n  case [" + Repeated("[a, b], ", 30'000) + "]: x\n",  // parsed by hand
+      "type X[" + Repeated("T: (int, str), ", 10'000) + "S] = int\n",
+      "with (" + Repeated("a as b, ", 40'000) + "c): pass\n",
+  };
+  FileAnalyzer::Options options;
+  static_cast<CPGenAnalyzerImpl::Options&>(options) = testing::AnalyzerOptions(kPy3);
+  FileAnalyzer files(options);
+  FileAnalyzer untouched(options);
+  const ConsoleCapture of_walks_that_meet_their_limit;
+  for (const std::string& source : sources) {
+    size_t asked = 0;
+    for (size_t limit = 1;; ++limit) {
+      asked = QuestionsOf(limit, [&] { files.Analyze(source); });
+      if (asked < limit) break;
+    }
+    EXPECT_GE(asked, 2u) << source.substr(0, 20);
+    EXPECT_LE(asked, source.size() / 1000) << source.substr(0, 20);
+    untouched.Analyze(source);
+    EXPECT_EQ(files.store().rows.size(), untouched.store().rows.size());
+    EXPECT_EQ(files.store().arg_rows.size(), untouched.store().arg_rows.size());
+    EXPECT_EQ(files.errors().size(), untouched.errors().size());
+    ASSERT_EQ(files.rows().size(), untouched.rows().size());
+  }
+}
+
+TEST(Stop, ALineThatWasStoppedCanBeAnalysedAgain) {
+  const std::string text = "x = [" + Repeated("name, ", 100'000) + "]\n";
+  const Ref<SourceText> source = SourceText::Copy(text);
+  std::vector<LineRow> rows;
+  CutLines(*source, kPy3, rows);
+  LogicalLine line;
+  SetFromRow(line, source, rows.at(0));
+  CPGenAnalyzerImpl& analyzer = AnalyzerFor(kPy3);
+  const ConsoleCapture of_a_walk_that_meets_its_limit;
+  EXPECT_EQ(QuestionsOf(1, [&] { analyzer.AnalyzeSingleLogical(line, false); }), 1u);
+  EXPECT_FALSE(line.parsed);
+  EXPECT_TRUE(line.type_equivs().empty());
+  EXPECT_EQ(analyzer.AnalyzeSingleLogical(line, false), std::nullopt);
+  EXPECT_FALSE(line.type_equivs().empty());
+}
+
+TEST(Stop, AllQuestionsOfAThreadAreAsked) {
+  std::string asked;
+  const ThreadStopQuestion outer([&asked] { asked += 'o'; });
+  {
+    const ThreadStopQuestion inner([&asked] { asked += 'i'; });
+    AskWhetherToStop();
+  }
+  AskWhetherToStop();
+  EXPECT_EQ(asked, "ioo");
+}
+
+TEST(Stop, AFewStepsAskNothing) {
+  size_t asked = 0;
+  const ThreadStopQuestion question([&asked] { ++asked; });
+  AskWhetherToStop();
+  CountSteps(kStepsBetweenQuestions / 2);
+  EXPECT_EQ(asked, 1u);
+  CountSteps(kStepsBetweenQuestions);
+  EXPECT_EQ(asked, 2u);
 }
 
 }  // namespace

@@ -3,6 +3,11 @@
 #include "analysis/batch.h"
 
 #include <gtest/gtest.h>
+#ifndef _WIN32
+#include <pthread.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#endif
 
 #include <atomic>
 #include <chrono>
@@ -11,6 +16,7 @@
 #include <fstream>
 #include <map>
 #include <string>
+#include <system_error>
 #include <thread>
 #include <vector>
 
@@ -322,6 +328,145 @@ TEST(Batch, CancellingWakesAReaderThatWaits) {
   canceller.join();
   std::remove(pipe.c_str());
 }
+
+// ---- how it ends, whatever happens to the process ----
+
+// A source of one statement that takes long.
+std::string LongStatement(size_t names) {
+  std::string source = "x = [";
+  for (size_t i = 0; i < names; ++i) source += "name, ";
+  return source + "]\n";
+}
+
+TEST(Batch, CancellingEndsTheFileUnderWay) {
+  std::vector<BatchInput> inputs;
+  for (int i = 0; i < 8; ++i) inputs.push_back(Source("a.py", LongStatement(300'000)));
+  BatchAnalyzer batch(Options(2), std::move(inputs));
+  batch.Start();
+  batch.Cancel();
+  BatchResult result;
+  EXPECT_FALSE(batch.Next(result));
+}
+
+TEST(Batch, SeveralReadersShareTheResults) {
+  BatchAnalyzer batch(Options(3), ManySources(200));
+  std::atomic<size_t> sum{0};
+  std::vector<std::thread> readers;
+  for (int i = 0; i < 4; ++i) {
+    readers.emplace_back([&] {
+      BatchResult result;
+      while (batch.Next(result)) sum += result.index + 1;
+    });
+  }
+  for (std::thread& reader : readers) reader.join();
+  EXPECT_EQ(sum, 200u * 201 / 2);
+}
+
+#ifdef __GLIBC__
+// While it lives no thread can be started: its stack would be larger than the memory there is.
+class NoThreads {
+ public:
+  NoThreads() {
+    pthread_getattr_default_np(&before_);
+    pthread_attr_t huge;
+    pthread_getattr_default_np(&huge);
+    pthread_attr_setstacksize(&huge, size_t{1} << 46);
+    pthread_setattr_default_np(&huge);
+    pthread_attr_destroy(&huge);
+  }
+  ~NoThreads() {
+    pthread_setattr_default_np(&before_);
+    pthread_attr_destroy(&before_);
+  }
+  NoThreads(const NoThreads&) = delete;
+  NoThreads& operator=(const NoThreads&) = delete;
+
+ private:
+  pthread_attr_t before_;
+};
+
+TEST(Batch, TheReaderDoesTheWorkWhereNoThreadCanBeStarted) {
+  const NoThreads no_threads;
+  ASSERT_THROW(std::thread([] {}).join(), std::system_error);
+  BatchAnalyzer batch(Options(4), ManySources(50));
+  batch.Start();
+  BatchResult result;
+  for (size_t i = 0; i < 50; ++i) {
+    ASSERT_TRUE(batch.Next(result));
+    EXPECT_EQ(result.index, i);
+    EXPECT_EQ(result.table.NameAt(0), "name" + std::to_string(i));
+  }
+  EXPECT_FALSE(batch.Next(result));
+}
+
+TEST(Batch, AReaderThatDoesTheWorkMayStopAndGoOn) {
+  const NoThreads no_threads;
+  BatchAnalyzer batch(Options(1), {Source("a.py", LongStatement(200'000)), Source("b.py", "x\n")});
+  BatchResult result;
+  {
+    const ThreadStopQuestion stops([] { throw Stopped(); });
+    EXPECT_THROW(batch.Next(result), Stopped);
+  }
+  ASSERT_TRUE(batch.Next(result));
+  EXPECT_EQ(result.index, 0u);
+  EXPECT_EQ(result.problem, "");
+  EXPECT_GT(result.table.size(), 0u);
+  batch.Cancel();
+  EXPECT_FALSE(batch.Next(result));
+}
+#endif
+
+#if !defined(_WIN32) && !defined(__SANITIZE_THREAD__)
+// What a child process found in the rest of a batch: 0 where that is right.
+int RestInChild(BatchAnalyzer& batch, size_t next, size_t count) {
+  BatchResult result;
+  for (; next < count; ++next) {
+    if (!batch.Next(result) || result.index != next) return 1;
+    if (result.table.NameAt(0) != "name" + std::to_string(next)) return 2;
+  }
+  return batch.Next(result) ? 3 : 0;
+}
+
+TEST(Batch, AForkLeavesTwoBatches) {
+  for (const bool cancels : {false, true}) {
+    auto batch = std::make_unique<BatchAnalyzer>(Options(2), ManySources(100));
+    BatchResult result;
+    for (int i = 0; i < 10; ++i) ASSERT_TRUE(batch->Next(result));
+    const pid_t child = fork();
+    ASSERT_GE(child, 0);
+    if (child == 0) {
+      if (cancels) batch->Cancel();
+      const int code = cancels ? batch->Next(result) : RestInChild(*batch, 10, 100);
+      batch.reset();
+      _exit(code);
+    }
+    int status = -1;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_TRUE(WIFEXITED(status));
+    EXPECT_EQ(WEXITSTATUS(status), 0);
+    for (size_t i = 10; i < 100; ++i) {
+      ASSERT_TRUE(batch->Next(result));
+      EXPECT_EQ(result.index, i);
+    }
+    EXPECT_FALSE(batch->Next(result));
+  }
+}
+
+TEST(Batch, AForkedBatchMayBeDroppedUnread) {
+  auto batch = std::make_unique<BatchAnalyzer>(Options(2), ManySources(100));
+  BatchResult result;
+  ASSERT_TRUE(batch->Next(result));
+  const pid_t child = fork();
+  ASSERT_GE(child, 0);
+  if (child == 0) {
+    batch.reset();
+    _exit(0);
+  }
+  int status = -1;
+  ASSERT_EQ(waitpid(child, &status, 0), child);
+  EXPECT_EQ(status, 0);
+}
+#endif
 
 // ---- files ----
 

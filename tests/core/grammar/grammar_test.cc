@@ -1023,5 +1023,38 @@ TEST(EngineAgainstPlainDriver, OnRandomGrammars) {
   EXPECT_GT(accepted, 500);
 }
 
+// ---- grammars that all share ----
+
+TEST(SharedGrammar, IsOneObjectForOneText) {
+  const std::string filename = std::string(QUILLET_SOURCE_DIR) + "/resources/pgen-grammars/Python-Grammar-3.8";
+  std::vector<std::shared_ptr<const Grammar>> found(8);
+  std::vector<std::thread> threads;
+  for (auto& grammar : found) threads.emplace_back([&] { grammar = Grammar::Shared(filename, TokenNames::Default()); });
+  for (std::thread& thread : threads) thread.join();
+  const auto kept = Grammar::Shared(filename, TokenNames::Default());
+  EXPECT_EQ(Grammar::Shared(filename, TokenNames::Default()), kept);
+  for (const auto& grammar : found) EXPECT_EQ(grammar->symbol_names, kept->symbol_names);
+
+  TokenNames other = TokenNames::Default();
+  other.op2number["+"] = tok::MINUS;
+  EXPECT_NE(Grammar::Shared(filename, other), kept);
+}
+
+TEST(SharedGrammar, IsReadAnewWhenItsFileChanges) {
+  const std::string filename = ::testing::TempDir() + "/quillet_changing_grammar";
+  const auto symbols_of = [&](const std::string& text) {
+    std::ofstream(filename) << text;
+    return Grammar::Shared(filename, TokenNames::Default())->symbol_names;
+  };
+  // More often than grammars are kept.
+  for (int i = 0; i < 20; ++i) {
+    const std::string name = "rule" + std::to_string(i);
+    EXPECT_EQ(symbols_of(name + ": NAME\n"), (std::vector<std::string>{name}));
+  }
+  EXPECT_THROW(symbols_of("a: b\n"), Error);
+  std::remove(filename.c_str());
+  EXPECT_THROW(Grammar::Shared(filename, TokenNames::Default()), Error);
+}
+
 }  // namespace
 }  // namespace quillet
