@@ -5,6 +5,7 @@
 // The trap: threads of a batch may wait for the interpreter lock (to decode a source), so nothing that
 // waits for them may hold it.
 #include <nanobind/stl/string.h>
+#include <nanobind/stl/unique_ptr.h>
 #include <nanobind/stl/vector.h>
 
 #include <chrono>
@@ -17,6 +18,9 @@
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/site_object.h"
+#include "bindings/names_object.h"
+#include "bindings/rows.h"
+#include "names/batch_binder.h"
 #include "output/arrow_stream.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
@@ -66,55 +70,6 @@ class NativeBatch {
 
 // ---- files ----
 
-// str of a record's text. What is no UTF-8 is shown by escapes.
-nb::object ShownText(Text text) {
-  return nb::steal(PyUnicode_DecodeUTF8(text.data(), static_cast<Py_ssize_t>(text.size()), "backslashreplace"));
-}
-
-nb::object Checked(nb::object made) {
-  if (!made.is_valid()) throw nb::python_error();
-  return made;
-}
-
-// The texts of a list as str, each made when it is first asked for.
-class ShownTexts {
- public:
-  explicit ShownTexts(const TextList& texts) : texts_(texts) {}
-
-  const nb::object& operator[](size_t i) {
-    if (shown_.empty()) shown_.resize(texts_.size());
-    nb::object& shown = shown_[i];
-    if (!shown.is_valid()) shown = Checked(ShownText(texts_[i]));
-    return shown;
-  }
-
-  nb::list All() {
-    nb::list list;
-    for (size_t i = 0; i < texts_.size(); ++i) list.append((*this)[i]);
-    return list;
-  }
-
- private:
-  const TextList& texts_;
-  std::vector<nb::object> shown_;
-};
-
-// A tuple under construction. Its size and type are the caller's affair.
-class TupleFiller {
- public:
-  TupleFiller(nb::handle type, Py_ssize_t size)
-      : tuple_(Checked(nb::steal(reinterpret_cast<PyTypeObject*>(type.ptr())
-                                     ->tp_alloc(reinterpret_cast<PyTypeObject*>(type.ptr()), size)))) {}
-
-  void Add(nb::object value) { PyTuple_SET_ITEM(tuple_.ptr(), next_++, Checked(std::move(value)).release().ptr()); }
-  void Add(size_t number) { Add(nb::steal(PyLong_FromSize_t(number))); }
-  nb::object Take() { return std::move(tuple_); }
-
- private:
-  nb::object tuple_;
-  Py_ssize_t next_ = 0;
-};
-
 // The numbers that a database gave to the texts of a list: a list of int, one a text.
 class TextNumbers {
  public:
@@ -145,6 +100,11 @@ struct FileResult {
     return list;
   }
 
+  // None for a result of a batch that does not bind, and for a file with a problem.
+  std::unique_ptr<FileNames> Names() const {
+    return result.bindings ? std::make_unique<FileNames>(result.bindings) : nullptr;
+  }
+
   nb::list Definitions(nb::handle row_class) {
     nb::list list;
     for (const RecordTable::Definition& definition : result.table.definitions) {
@@ -171,9 +131,7 @@ struct FileResult {
   // Records as instances of a class that derives from tuple, with the host's own objects for kinds.
   nb::list Rows(size_t begin, size_t end, nb::handle row_class, const nb::tuple& kinds) {
     const RecordTable& table = result.table;
-    if (!PyType_Check(row_class.ptr()) ||
-        !PyType_IsSubtype(reinterpret_cast<PyTypeObject*>(row_class.ptr()), &PyTuple_Type))
-      ThrowError(ErrorKind::kTypeError, "a class that derives from tuple is needed");
+    CheckRowClass(row_class);
     if (kinds.size() != RecordKindWords().size()) ThrowError(ErrorKind::kValueError, "an object a kind is needed");
     end = std::min(end, table.size());
     begin = std::min(begin, end);
@@ -262,10 +220,11 @@ std::vector<BatchInput> InputsOf(nb::handle sequence) {
 
 class FileBatch {
  public:
-  FileBatch(const Language& language, nb::handle inputs, unsigned jobs, nb::object decode, nb::object format)
+  FileBatch(const Language& language, nb::handle inputs, unsigned jobs, nb::object decode, nb::object format,
+            bool bindings)
       : decode_(std::move(decode)),
         format_(std::move(format)),
-        batch_(std::make_unique<BatchAnalyzer>(OptionsOf(language, jobs), InputsOf(inputs))) {}
+        batch_(std::make_unique<BatchAnalyzer>(OptionsOf(language, jobs, bindings), InputsOf(inputs))) {}
   ~FileBatch() { Cancel(); }
   FileBatch(const FileBatch&) = delete;
   FileBatch& operator=(const FileBatch&) = delete;
@@ -318,10 +277,11 @@ class FileBatch {
   }
 
  private:
-  BatchAnalyzer::Options OptionsOf(const Language& language, unsigned jobs) const {
+  BatchAnalyzer::Options OptionsOf(const Language& language, unsigned jobs, bool bindings) const {
     BatchAnalyzer::Options options;
     options.analyzer = language.options;
     options.jobs = jobs;
+    if (bindings) options.make_binder = [version = language.options.version] { return MakeFileBinder(version); };
     // The host's function gives (UTF-8, None) or (None, reason). It lives as long as this, and so
     // longer than the threads.
     PyObject* const decode = decode_.ptr();
@@ -411,9 +371,10 @@ void ReleaseStreamCapsule(PyObject* capsule) {
 }
 
 // A capsule as the interface lays it down: a reader that takes the stream leaves it released.
-nb::object StreamCapsule(nb::object batch) {
+using Export = void (*)(std::unique_ptr<RecordSource>, ArrowArrayStream*);
+nb::object StreamCapsule(nb::object batch, Export export_stream) {
   auto stream = std::make_unique<ArrowArrayStream>();
-  ExportRecordStream(std::make_unique<StreamSource>(std::move(batch)), stream.get());
+  export_stream(std::make_unique<StreamSource>(std::move(batch)), stream.get());
   nb::object capsule = nb::steal(PyCapsule_New(stream.get(), kStreamCapsule, ReleaseStreamCapsule));
   if (!capsule.is_valid()) {
     stream->release(stream.get());
@@ -454,6 +415,7 @@ void BindBatch(nb::module_& tarvex) {
       .def_prop_ro("statement_count", [](const FileResult& self) { return self.result.statement_count; })
       .def_prop_ro("errors", [](const FileResult& self) { return self.Messages(self.result.errors); })
       .def_prop_ro("reports", [](const FileResult& self) { return self.Messages(self.result.reports); })
+      .def_prop_ro("names", &FileResult::Names)
       .def_prop_ro("record_count", [](const FileResult& self) { return self.result.table.size(); })
       .def("Definitions", &FileResult::Definitions, nb::arg("row_class"),
            "Classes, functions and type aliases: row_class(scope, kind, line, column, first_line, last_line).")
@@ -467,14 +429,17 @@ void BindBatch(nb::module_& tarvex) {
            "Records as rows of integers, several in a tuple, with a database's numbers for the texts: id, name, "
            "scope, line, column, kind, is_parameter, opens, detail.");
   nb::class_<FileBatch>(host, "Batch", "Files through the native path, on threads without the interpreter lock.")
-      .def(nb::init<const Language&, nb::handle, unsigned, nb::object, nb::object>(), nb::arg("language"),
-           nb::arg("inputs"), nb::arg("jobs"), nb::arg("decode"), nb::arg("format").none())
+      .def(nb::init<const Language&, nb::handle, unsigned, nb::object, nb::object, bool>(), nb::arg("language"),
+           nb::arg("inputs"), nb::arg("jobs"), nb::arg("decode"), nb::arg("format").none(), nb::arg("bindings"))
       .def("Start", &FileBatch::Start, "Sets the threads to work in front of the first Next.")
       .def("Next", &FileBatch::Next, "The next file's result, in the order of the inputs; None at the end.")
       .def_prop_ro("problems", &FileBatch::Problems)
       .def(
-          "ArrowStream", [](nb::object self) { return StreamCapsule(std::move(self)); },
+          "ArrowStream", [](nb::object self) { return StreamCapsule(std::move(self), ExportRecordStream); },
           "The records that were not handed out yet, as a capsule of the Arrow C stream interface.")
+      .def(
+          "OccurrenceStream", [](nb::object self) { return StreamCapsule(std::move(self), ExportOccurrenceStream); },
+          "The same with the names of files: for a batch that binds.")
       .def("Cancel", &FileBatch::Cancel, "Stops after the files under way.");
 }
 

@@ -32,6 +32,7 @@ void BindHints(nb::module_& tarvex);
 void BindAnalysis(nb::module_& tarvex);
 void BindHost(nb::module_& tarvex);
 void BindRecordWords(nb::module_& tarvex);
+void BindNames(nb::module_& tarvex);
 void BindBatch(nb::module_& tarvex);
 void BindSite(nb::module_& tarvex);
 

@@ -53,6 +53,7 @@ NB_MODULE(tarvex_in_owner, tarvex) {
   BindAnalysis(tarvex);
   BindHost(tarvex);
   BindRecordWords(tarvex);
+  BindNames(tarvex);
   BindBatch(tarvex);
   BindSite(tarvex);
 }

@@ -79,6 +79,7 @@ class BatchAnalyzer::Worker {
  public:
   explicit Worker(const BatchAnalyzer::Options& options) : options_(options), file_(options.analyzer) {
     if (options.make_writer) writer_ = options.make_writer();
+    if (options.make_binder) binder_ = options.make_binder();
   }
 
   BatchResult Analyze(const BatchInput& input, size_t index) {
@@ -124,6 +125,7 @@ class BatchAnalyzer::Worker {
       writer_->Write(input, file_, scopes_, placed_, result.output);
     else
       result.table = tables_.Make(file_, scopes_, placed_);
+    if (binder_ != nullptr) binder_->Bind(file_, result);
     return {};
   }
 
@@ -148,10 +150,13 @@ class BatchAnalyzer::Worker {
   PlacedRecords placed_;
   RecordTableMaker tables_;
   std::unique_ptr<FileWriter> writer_;
+  std::unique_ptr<FileBinder> binder_;
   std::string bytes_;
 };
 
-size_t BatchResult::ByteSize() const { return sizeof(BatchResult) + table.ByteSize() + output.capacity(); }
+size_t BatchResult::ByteSize() const {
+  return sizeof(BatchResult) + table.ByteSize() + output.capacity() + bindings_size;
+}
 
 // ---- the batch ----
 

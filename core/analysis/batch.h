@@ -29,6 +29,8 @@
 
 namespace quillet {
 
+struct Bindings;
+
 // A file to analyse.
 struct BatchInput {
   std::string path;
@@ -53,6 +55,8 @@ struct BatchResult {
   std::vector<Message> reports;  // of the analysis about itself
   RecordTable table;             // empty where a writer took its place
   std::string output;
+  std::shared_ptr<const Bindings> bindings;  // of its names, where a binder was asked for
+  size_t bindings_size = 0;                  // in bytes
 
   // What the result occupies, nearly.
   size_t ByteSize() const;
@@ -66,6 +70,13 @@ class FileWriter {
                      std::string& out) = 0;
 };
 
+// Binds the names of a file that was analysed; each thread has one.
+class FileBinder {
+ public:
+  virtual ~FileBinder() = default;
+  virtual void Bind(const FileAnalyzer& file, BatchResult& result) = 0;
+};
+
 class BatchAnalyzer {
  public:
   struct Options {
@@ -76,6 +87,8 @@ class BatchAnalyzer {
     size_t most_waiting_bytes = size_t{256} << 20;
     // Makes a thread's writer; without it, results carry tables.
     std::function<std::unique_ptr<FileWriter>()> make_writer;
+    // Makes a thread's binder; without it, results have no bindings.
+    std::function<std::unique_ptr<FileBinder>()> make_binder;
     // Decodes a source that names an encoding of its own to UTF-8: false, and the reason in `utf8`,
     // where that cannot be done. Called by any thread. Without it such a source is a problem.
     std::function<bool(Text bytes, std::string& utf8)> decode;

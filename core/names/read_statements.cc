@@ -477,7 +477,7 @@ void NameReader::EndOfHead() {
     open_.push_back({body, row_->indent, head_.kind == Head::Kind::kFunction, row_->has_inline_body, true});
   else
     EndOfScope(body, OffsetOf(end_[-1]) + end_[-1].length);
-  scope_ = body;
+  scope_ = statement_scope_ = body;
   head_ = Head();
 }
 

@@ -1,8 +1,8 @@
 """Per-statement analysis of Python code: what each statement tells about names.
 
-`analyze` takes a whole source, `analyze_files` many files on all cores. `quillet.tarvex` is the engine
-below, which takes one logical line at a time; `quillet.logicalline`, `quillet.optpgen`,
-`quillet.symbolinfo` and `quillet.strutils` are what it works with.
+`analyze` takes a whole source, `analyze_files` many files on all cores, and `bind` says which variable each
+name of a source is. `quillet.tarvex` is the engine below, which takes one logical line at a time;
+`quillet.logicalline`, `quillet.optpgen`, `quillet.symbolinfo` and `quillet.strutils` are what it works with.
 """
 
 from __future__ import annotations
@@ -11,6 +11,7 @@ from typing import TYPE_CHECKING
 
 if TYPE_CHECKING:
     from quillet._batch import Definition, FileAnalyses, FileAnalysis, FileRecord, FileRecords, analyze_files
+    from quillet._names import FileBindings, FileOccurrences, Occurrence, Scope, Symbol, bind
     from quillet._records import Record, RecordKind
     from quillet._source import SourceEncodingError
     from quillet.host import Analysis, Line, analyze, analyzer_for, language_version
@@ -20,15 +21,21 @@ __all__ = [
     "Definition",
     "FileAnalyses",
     "FileAnalysis",
+    "FileBindings",
+    "FileOccurrences",
     "FileRecord",
     "FileRecords",
     "Line",
+    "Occurrence",
     "Record",
     "RecordKind",
+    "Scope",
     "SourceEncodingError",
+    "Symbol",
     "analyze",
     "analyze_files",
     "analyzer_for",
+    "bind",
     "language_version",
 ]
 
@@ -36,12 +43,18 @@ _HOMES = {
     "Definition": "_batch",
     "FileAnalyses": "_batch",
     "FileAnalysis": "_batch",
+    "FileBindings": "_names",
+    "FileOccurrences": "_names",
     "FileRecord": "_batch",
     "FileRecords": "_batch",
+    "Occurrence": "_names",
     "Record": "_records",
     "RecordKind": "_records",
+    "Scope": "_names",
     "SourceEncodingError": "_source",
+    "Symbol": "_names",
     "analyze_files": "_batch",
+    "bind": "_names",
 }
 
 

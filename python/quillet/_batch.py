@@ -13,6 +13,7 @@ from types import TracebackType
 from typing import NamedTuple, Union, cast, overload
 
 from quillet._keywords import keywords_of
+from quillet._names import FileBindings
 from quillet._records import KINDS, RecordKind
 from quillet._source import SourceEncodingError, to_utf8
 from quillet.config import GetNorvaFilename
@@ -141,11 +142,12 @@ class FileAnalysis:
     reason other than their syntax, in the same form.
     """
 
-    __slots__ = ("_native", "path")
+    __slots__ = ("_bindings", "_native", "path")
 
     def __init__(self, path: str, native: _host.FileResult) -> None:
         self.path = path
         self._native = native
+        self._bindings: FileBindings | None = None
 
     @property
     def problem(self) -> str | None:
@@ -181,9 +183,41 @@ class FileAnalysis:
         """The classes, functions and type aliases, in the order in which they begin."""
         return self._native.Definitions(Definition)
 
+    @property
+    def bindings(self) -> FileBindings:
+        """The names of the file, as `bind` gives them. Raises `ValueError` where they were not asked for, by
+        `bindings=True`, and where the file has a problem.
+        """
+        if self._bindings is None:
+            names = self._native.names
+            if names is None:
+                raise ValueError(self.problem or "analyze_files was not asked for bindings")
+            self._bindings = FileBindings(names)
+        return self._bindings
+
     def __repr__(self) -> str:
         what = self.problem or f"{self.lines} lines, {len(self.records)} records"
         return f"<FileAnalysis {self.path!r}: {what}>"
+
+
+class OccurrenceColumns:
+    """The occurrences of all files of `analyze_files` that are left, for readers of the Arrow C data interface.
+
+    A row is an occurrence. `path` is that of its file, `index` and `receiver` are its place and that of its receiver
+    among the file's occurrences, `scope` is the index of its scope, `scope_name` the dotted name of the class or
+    function in which that stands, `symbol` the number of its variable in the file and `symbol_name` the name of that.
+    Each flag is a column of truth values. The others are those of `Occurrence`.
+    """
+
+    def __init__(self, native: _host.Batch, has_bindings: bool) -> None:
+        self._native = native
+        self._has_bindings = has_bindings
+
+    def __arrow_c_stream__(self, requested_schema: object = None) -> object:
+        """A capsule of the stream. The schema is fixed."""
+        if not self._has_bindings:
+            raise ValueError("analyze_files was not asked for bindings")
+        return self._native.OccurrenceStream()
 
 
 class FileAnalyses(Iterator[FileAnalysis]):
@@ -193,9 +227,10 @@ class FileAnalyses(Iterator[FileAnalysis]):
     stops them; so does dropping the object.
     """
 
-    def __init__(self, paths: list[str], native: _host.Batch) -> None:
+    def __init__(self, paths: list[str], native: _host.Batch, has_bindings: bool) -> None:
         self._paths = paths
         self._native = native
+        self._has_bindings = has_bindings
 
     def __next__(self) -> FileAnalysis:
         result = self._native.Next()
@@ -210,6 +245,11 @@ class FileAnalyses(Iterator[FileAnalysis]):
         one converts what it gets. Files with a problem have no records; `problems` names them.
         """
         return self._native.ArrowStream()
+
+    @property
+    def occurrences(self) -> OccurrenceColumns:
+        """The names of all files that are left, as columns: `pyarrow.table(results.occurrences)`."""
+        return OccurrenceColumns(self._native, self._has_bindings)
 
     @property
     def problems(self) -> list[tuple[str, str]]:
@@ -238,11 +278,13 @@ def analyze_files(
     *,
     version: tuple[int, ...] | None = None,
     jobs: int | None = None,
+    bindings: bool = False,
 ) -> FileAnalyses:
     """Analyses files, on `jobs` threads (one a core without it), and yields a result a file in order.
 
     A path may be given with its source, as a tuple (path, bytes): then nothing is read. `version` is the
-    Python that the files are written for, as for `analyze`.
+    Python that the files are written for, as for `analyze`. With `bindings`, each result has the names of its
+    file as well, as `bind` gives them.
 
     No file ends the run: one that cannot be read, or whose encoding is unknown, is a result with a
     `problem`. Raises `TypeError` and `ValueError` for wrong arguments.
@@ -264,7 +306,7 @@ def analyze_files(
             raise TypeError(f"a source must be bytes, not {type(source).__name__}")
         names.append(os.fsdecode(path))
         inputs.append((os.fsencode(path), source, None))
-    return FileAnalyses(names, _host.Batch(language, inputs, count, decode_source, None))
+    return FileAnalyses(names, _host.Batch(language, inputs, count, decode_source, None, bindings), bindings)
 
 
 def write_files(
@@ -275,7 +317,7 @@ def write_files(
     The formats are ("jsonl", errors_only) and ("text", errors_only, colours, width_of), where `width_of`
     gives the cells that a code point takes on a terminal.
     """
-    batch = _host.Batch(native_language_of(version), inputs, jobs_of(jobs), decode_source, form)
+    batch = _host.Batch(native_language_of(version), inputs, jobs_of(jobs), decode_source, form, False)
     try:
         while (result := batch.Next()) is not None:
             yield result
