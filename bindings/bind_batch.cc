@@ -297,20 +297,22 @@ class FileBatch {
         return false;
       }
     };
-    options.make_writer = WriterMaker();
+    options.make_writer = WriterMaker(options.analyzer.version);
     return options;
   }
 
   // The format is None, ("jsonl", errors_only), ("text", errors_only, colours, width of a character),
   // ("site survey",) or ("site page", site index).
-  std::function<std::unique_ptr<FileWriter>()> WriterMaker() const {
+  std::function<std::unique_ptr<FileWriter>()> WriterMaker(Version version) const {
     if (format_.is_none()) return {};
     const auto format = nb::cast<nb::tuple>(format_);
-    if (nb::cast<std::string>(format[0]) == "site survey") return MakeSiteSurveyWriter;
+    if (nb::cast<std::string>(format[0]) == "site survey") return [version] { return MakeSiteSurveyWriter(version); };
     if (nb::cast<std::string>(format[0]) == "site page") {
       auto& site = nb::cast<SiteObject&>(format[1]);
       site.is_shared = true;
-      return [index = std::shared_ptr<const SiteIndex>(site.index)] { return MakeSitePageWriter(index); };
+      return [index = std::shared_ptr<const SiteIndex>(site.index), version] {
+        return MakeSitePageWriter(index, version);
+      };
     }
     const bool errors_only = nb::cast<bool>(format[1]);
     if (nb::cast<std::string>(format[0]) == "jsonl") {

@@ -1,5 +1,6 @@
 // The index of a site: filled in the interpreter's thread, read by the threads that write pages.
 #include <nanobind/stl/string.h>
+#include <nanobind/stl/vector.h>
 
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
@@ -34,7 +35,13 @@ void BindSite(nb::module_& tarvex) {
   host.attr("SITE_MOST_BYTES") = ShownPart::kMostBytes;
   host.attr("SITE_MOST_BYTES_OF_LINE") = ShownPart::kMostBytesOfLine;
   nb::class_<SiteObject>(host, "SiteIndex", "What the pages of a site know of each other.")
-      .def(nb::init<>())
+      .def(
+          "__init__",
+          [](SiteObject* self, std::vector<std::string> files, std::vector<std::string> builtin_attributes) {
+            new (self) SiteObject{std::make_shared<SiteIndex>(files, builtin_attributes)};
+          },
+          nb::arg("files"), nb::arg("builtin_attributes"),
+          "For files of these names, where values of the language's own types have these attributes.")
       .def(
           "Add",
           [](SiteObject& self, uint32_t file, nb::handle survey) {

@@ -10,7 +10,7 @@
 namespace quillet::host {
 
 struct SiteObject {
-  std::shared_ptr<SiteIndex> index = std::make_shared<SiteIndex>();
+  std::shared_ptr<SiteIndex> index;
   bool is_shared = false;
 
   SiteIndex& Changing() const {

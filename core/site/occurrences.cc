@@ -1,5 +1,4 @@
-// Records say what a statement does to a name; here they become one occurrence a place, and names are looked
-// up in the scopes around them.
+// Two passes over the bindings: the first finds what each variable is, the second copies what is shown.
 #include "site/occurrences.h"
 
 #include <algorithm>
@@ -10,43 +9,24 @@ namespace quillet {
 
 namespace {
 
-// Facts of one name hold at most so many bytes.
+// What is said of one name holds at most so many bytes.
 constexpr size_t kMostFacts = 240;
+// A dotted name holds at most so many bytes; what would have a longer one keeps that of the scope around it.
+constexpr size_t kMostDottedName = 400;
 
 bool IsLineEnd(char c) { return c == '\n' || c == '\r'; }
 
-// A plain or dotted name: letters, digits, "_" and dots between.
-bool IsDottedName(Text name) {
-  bool begins = true;
-  for (const char c : name) {
-    if (c == '.') {
-      if (begins) return false;
-      begins = true;
-      continue;
-    }
-    const bool ascii = static_cast<uint8_t>(c) < 0x80;
-    if (ascii && (AsciiClassOf(c) & (kAsciiAlpha | kAsciiUnderscore | (begins ? 0 : kAsciiDigit))) == 0) return false;
-    begins = false;
-  }
-  return !begins;
+bool Opens(NameKind kind) {
+  return kind == NameKind::kClass || kind == NameKind::kFunction || kind == NameKind::kTypeAlias;
 }
 
-bool IsOfSelf(Text name) { return name.starts_with("self.") || name.starts_with("cls."); }
+bool Binds(const Occurrence& occurrence) {
+  return occurrence.role == NameRole::kDefinition || occurrence.role == NameRole::kWrite ||
+         occurrence.role == NameRole::kImport;
+}
 
-// What matters most of several things that are said of one place.
-int Weight(const SiteOccurrence& occurrence) {
-  switch (occurrence.role) {
-    case NameRole::kDefinition:
-      return 4;
-    case NameRole::kImport:
-      return 3;
-    case NameRole::kWrite:
-      return 2;
-    case NameRole::kCall:
-      return 1;
-    default:
-      return 0;
-  }
+bool IsOpened(const Occurrence& occurrence) {
+  return occurrence.role == NameRole::kDefinition && Opens(occurrence.kind);
 }
 
 }  // namespace
@@ -81,86 +61,161 @@ uint32_t ShownPart::ShownEndOf(uint32_t line) const {
 
 // ---- what is named ----
 
-void SiteOccurrences::Collect(const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
-                              const ShownPart& shown) {
-  found_.clear();
-  facts_.clear();
-  opened_.clear();
-  FindScopes(scopes);
-  const char* const source = file.source().begin();
-  for (const ScopeNames::Scope& scope : scopes.scopes()) {
-    using Kind = ScopeNames::ScopeKind;
-    if (scope.kind == Kind::kModule || !file.source().Holds(scope.own_name.data())) continue;
-    const NameKind kind = scope.kind == Kind::kClass      ? NameKind::kClass
-                          : scope.kind == Kind::kFunction ? NameKind::kFunction
-                                                          : NameKind::kTypeAlias;
-    opened_.emplace(static_cast<uint32_t>(scope.own_name.data() - source), kind);
+void SiteOccurrences::Collect(const FileAnalyzer& file, const ShownPart& shown) {
+  const Bindings& bindings = binder_.Bind(file.source(), file.rows());
+  occurrences_.clear();
+  scope_of_.clear();
+  text_of_.clear();
+  definitions_.clear();
+  attributes_.clear();
+  dotted_names_.assign(bindings.scopes.size(), kNoText);
+  texts_.Reset();
+  FindVariables(bindings);
+  uint32_t line = 0;
+  for (uint32_t i = 0; i < bindings.occurrences.size(); ++i) {
+    const Occurrence& occurrence = bindings.occurrences[i];
+    while (line + 1 < shown.line_count() && shown.BeginOf(line + 1) <= occurrence.begin) ++line;
+    if (line >= shown.shown_lines()) break;
+    if (shown.Shows(line, bindings.EndOf(occurrence))) Add(bindings, i, line);
   }
-  placed.Begin(file, scopes);
-  for (size_t row = 0; row < file.rows().size(); ++row) {
-    if (file.rows()[row].first_line >= shown.shown_lines()) break;
-    for (const PlacedRecord& record : placed.OfRow(row)) AddRecord(record, file, shown);
-  }
-  Settle(file.source().text(), scopes);
+  FindDefinitions(bindings);
 }
 
-void SiteOccurrences::FindScopes(const ScopeNames& scopes) {
-  scopes_.assign(scopes.names().size(), {});
-  for (const ScopeNames::Scope& scope : scopes.scopes()) {
-    ScopeAround& around = scopes_[scope.name];
-    around.is_class = scope.kind == ScopeNames::ScopeKind::kClass;
-    around.is_shared = scope.kind == ScopeNames::ScopeKind::kModule || around.is_class;
-    if (scope.parent != ScopeNames::kNone && scopes.scopes()[scope.parent].name != scope.name)
-      around.parent = scopes.scopes()[scope.parent].name;
+void SiteOccurrences::FindVariables(const Bindings& bindings) {
+  variables_.assign(bindings.symbols.size(), {});
+  for (uint32_t i = 0; i < bindings.symbols.size(); ++i) {
+    const NameScope& scope = bindings.scopes[bindings.symbols[i].scope];
+    variables_[i].is_shared = scope.kind == NameScopeKind::kModule || scope.kind == NameScopeKind::kClass;
   }
-}
-
-void SiteOccurrences::AddRecord(const PlacedRecord& record, const FileAnalyzer& file, const ShownPart& shown) {
-  const uint32_t line = record.line - 1;
-  if (line >= shown.shown_lines() || !IsDottedName(record.name)) return;
-  const uint32_t place = shown.BeginOf(line) + record.column - 1;
-  const auto size = static_cast<uint32_t>(record.name.size());
-  if (!shown.Shows(line, place + size)) return;
-  if (file.source().text().substr(place, size) != record.name) return;
-  const size_t dot = record.name.rfind('.');
-  const uint32_t tail = dot == Text::npos ? 0 : static_cast<uint32_t>(dot) + 1;
-  Found found{{place + tail, size - tail, line, kNone, NameRole::kRead, NameKind::kNone, tail != 0}, record.scope};
-  AddFact(record, place + tail);
-  switch (record.kind) {
-    case RecordKind::kSet: {
-      const auto opened = opened_.find(place + tail);
-      if (opened != opened_.end()) found.occurrence.kind = opened->second;
-      if (record.is_parameter) found.occurrence.kind = NameKind::kParameter;
-      found.occurrence.role = found.occurrence.kind == NameKind::kNone ? NameRole::kWrite : NameRole::kDefinition;
-      break;
+  for (uint32_t i = 0; i < bindings.occurrences.size(); ++i) {
+    const Occurrence& occurrence = bindings.occurrences[i];
+    const uint32_t number = bindings.VariableOf(occurrence);
+    if (number == kNoIndex || !Binds(occurrence)) continue;
+    Variable& variable = variables_[number];
+    if (occurrence.kind == NameKind::kImport) variable.is_imported = true;
+    const bool is_better =
+        variable.binding == kNoIndex || (IsOpened(occurrence) && !IsOpened(bindings.occurrences[variable.binding]));
+    if (is_better) variable.binding = i;
+  }
+  if (!bindings.scopes.empty() && bindings.scopes.front().has_star_import) {
+    for (uint32_t i = 0; i < bindings.symbols.size(); ++i) {
+      if (variables_[i].binding == kNoIndex && bindings.symbols[i].scope == 0) variables_[i].is_imported = true;
     }
-    case RecordKind::kGet:
-      break;
-    case RecordKind::kCalled:
-      found.occurrence.role = NameRole::kCall;
-      break;
-    case RecordKind::kImport:
-    case RecordKind::kFromImport:
-      found.occurrence.role = NameRole::kImport;
-      break;
-    case RecordKind::kGlobal:
-    case RecordKind::kNonlocal:
-      found.occurrence.role = NameRole::kDeclaration;
-      break;
-    default:
-      return;
   }
-  // Attributes of the object itself belong to the class around the method.
-  if (IsOfSelf(record.name) && record.name.find('.') == dot && scopes_[record.scope].parent != kNone &&
-      scopes_[scopes_[record.scope].parent].is_class && found.occurrence.role == NameRole::kWrite) {
-    found.occurrence.kind = NameKind::kVariable;
-    found.scope = scopes_[record.scope].parent;
-  }
-  found_.push_back(found);
 }
 
-void SiteOccurrences::AddFact(const PlacedRecord& record, uint32_t begin) {
-  if (record.detail.empty()) return;
+void SiteOccurrences::Add(const Bindings& bindings, uint32_t index, uint32_t line) {
+  const Occurrence& occurrence = bindings.occurrences[index];
+  const uint32_t number = bindings.VariableOf(occurrence);
+  SiteOccurrence added{occurrence.begin,
+                       static_cast<uint32_t>(bindings.TextOf(occurrence).size()),
+                       line,
+                       number,
+                       kNoIndex,
+                       occurrence.role,
+                       occurrence.kind,
+                       occurrence.is_attribute != 0};
+  if (added.kind == NameKind::kImport) {
+    added.role = NameRole::kImport;
+  } else if (number != kNoIndex && variables_[number].binding == index) {
+    added.role = NameRole::kDefinition;
+  } else if (added.role == NameRole::kWrite) {
+    added.kind = NameKind::kNone;
+  }
+  if (added.is_attribute) {
+    const uint32_t receiver = bindings.ReceiverOf(index);
+    if (receiver != kNoIndex) added.receiver = bindings.VariableOf(bindings.occurrences[receiver]);
+  }
+  if (number != kNoIndex) {
+    Variable& variable = variables_[number];
+    if (variable.binding == kNoIndex && !variable.is_imported) return;  // the language's own
+    if (variable.binding == index) variable.definition = static_cast<uint32_t>(occurrences_.size());
+  }
+  occurrences_.push_back(added);
+  scope_of_.push_back(bindings.ScopeOf(occurrence));
+  text_of_.push_back(occurrence.text);
+}
+
+void SiteOccurrences::FindDefinitions(const Bindings& bindings) {
+  for (uint32_t i = 0; i < occurrences_.size(); ++i) {
+    const SiteOccurrence& occurrence = occurrences_[i];
+    if (occurrence.role == NameRole::kDefinition && Opens(occurrence.kind)) {
+      AddDefinition(bindings, i, scope_of_[i]);
+    } else if (occurrence.role == NameRole::kDefinition && occurrence.kind == NameKind::kVariable) {
+      if (variables_[occurrence.variable].is_shared)
+        AddDefinition(bindings, i, bindings.symbols[occurrence.variable].scope);
+    } else if (occurrence.is_attribute && occurrence.role == NameRole::kWrite && occurrence.receiver != kNoIndex) {
+      // The first place that sets an attribute of the object itself.
+      const NameSymbol& receiver = bindings.symbols[occurrence.receiver];
+      const Text name = bindings.texts[receiver.name];
+      if (!bindings.IsParameter(receiver) || (name != "self" && name != "cls")) continue;
+      const uint32_t around = ClassAround(bindings, receiver.scope);
+      if (around == kNoIndex) continue;
+      const uint64_t key = uint64_t{around} << 32 | text_of_[i];
+      if (attributes_.insert(key).second) AddDefinition(bindings, i, around);
+    }
+  }
+}
+
+void SiteOccurrences::AddDefinition(const Bindings& bindings, uint32_t occurrence, uint32_t scope) {
+  definitions_.push_back({occurrence, DottedNameOf(bindings, scope)});
+}
+
+// The class whose method a function's scope is; kNoIndex without one.
+uint32_t SiteOccurrences::ClassAround(const Bindings& bindings, uint32_t scope) const {
+  scope = bindings.scopes[scope].parent;
+  while (scope != kNoIndex && bindings.scopes[scope].kind == NameScopeKind::kTypeParameters)
+    scope = bindings.scopes[scope].parent;
+  return scope != kNoIndex && bindings.scopes[scope].kind == NameScopeKind::kClass ? scope : kNoIndex;
+}
+
+Text SiteOccurrences::DottedNameOf(const Bindings& bindings, uint32_t scope) {
+  // Up to a scope whose name is known, and back down.
+  while (IsNone(dotted_names_[scope])) {
+    chain_.push_back(scope);
+    if (bindings.scopes[scope].parent == kNoIndex) break;
+    scope = bindings.scopes[scope].parent;
+  }
+  Text outer = IsNone(dotted_names_[scope]) ? Text("") : dotted_names_[scope];
+  for (; !chain_.empty(); chain_.pop_back()) {
+    const NameScope& inner = bindings.scopes[chain_.back()];
+    const bool is_named = inner.kind == NameScopeKind::kClass || inner.kind == NameScopeKind::kFunction;
+    if (is_named && inner.name != kNoIndex) {
+      const Text name = bindings.texts[inner.name];
+      if (outer.size() + 1 + name.size() <= kMostDottedName) {
+        buffer_.assign(outer);
+        if (!outer.empty()) buffer_ += '.';
+        buffer_ += name;
+        outer = texts_.Copy(buffer_);
+      }
+    }
+    dotted_names_[chain_.back()] = outer;
+  }
+  return outer;
+}
+
+// ---- what is known ----
+
+void SiteFacts::Collect(const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
+                        const ShownPart& shown) {
+  facts_.clear();
+  modules_.clear();
+  placed.Begin(file, scopes);
+  for (size_t row = 0; row < file.rows().size() && file.rows()[row].first_line < shown.shown_lines(); ++row) {
+    for (const PlacedRecord& record : placed.OfRow(row)) {
+      const uint32_t line = record.line - 1;
+      if (record.detail.empty() || line >= shown.shown_lines()) continue;
+      // A name with dots is known by its last one.
+      const uint32_t begin = shown.BeginOf(line) + record.column - 1;
+      const auto size = static_cast<uint32_t>(record.name.size());
+      if (!shown.Shows(line, begin + size) || file.source().text().substr(begin, size) != record.name) continue;
+      const size_t dot = record.name.rfind('.');
+      Add(record, dot == Text::npos ? begin : begin + static_cast<uint32_t>(dot) + 1);
+    }
+  }
+}
+
+void SiteFacts::Add(const PlacedRecord& record, uint32_t begin) {
   Text word;
   switch (record.kind) {
     case RecordKind::kHint:
@@ -183,6 +238,8 @@ void SiteOccurrences::AddFact(const PlacedRecord& record, uint32_t begin) {
     default:
       return;
   }
+  if (record.kind == RecordKind::kImport || record.kind == RecordKind::kFromImport)
+    modules_.emplace(begin, record.detail.substr(0, record.detail.find(' ')));
   std::string fact(word);
   fact += record.detail;
   std::string& facts = facts_[begin];
@@ -193,65 +250,13 @@ void SiteOccurrences::AddFact(const PlacedRecord& record, uint32_t begin) {
     facts += facts.empty() ? fact : "  " + fact;
 }
 
-void SiteOccurrences::Settle(Text source, const ScopeNames& scopes) {
-  std::stable_sort(found_.begin(), found_.end(), [](const Found& one, const Found& two) {
-    if (one.occurrence.begin != two.occurrence.begin) return one.occurrence.begin < two.occurrence.begin;
-    return Weight(one.occurrence) > Weight(two.occurrence);
-  });
-  found_.erase(
-      std::unique(found_.begin(), found_.end(),
-                  [](const Found& one, const Found& two) { return one.occurrence.begin == two.occurrence.begin; }),
-      found_.end());
-
-  occurrences_.clear();
-  symbols_.clear();
-  definitions_.clear();
-  symbol_index_.clear();
-  const auto text_of = [source](const SiteOccurrence& of) { return source.substr(of.begin, of.size); };
-  for (size_t i = 0; i < found_.size(); ++i) {
-    SiteOccurrence occurrence = found_[i].occurrence;
-    const uint32_t scope = found_[i].scope;
-    const bool binds = occurrence.role == NameRole::kDefinition || occurrence.role == NameRole::kWrite ||
-                       occurrence.role == NameRole::kImport;
-    const Text name = text_of(occurrence);
-    if (binds && (!occurrence.is_attribute || occurrence.kind == NameKind::kVariable)) {
-      // An attribute of the object itself has a symbol of the class only to be listed once.
-      const Key key{scope, occurrence.is_attribute ? source.substr(occurrence.begin - 1, occurrence.size + 1) : name};
-      const auto [entry, is_new] = symbol_index_.emplace(key, static_cast<uint32_t>(symbols_.size()));
-      if (is_new) {
-        if (occurrence.kind == NameKind::kNone && occurrence.role == NameRole::kWrite)
-          occurrence.kind = NameKind::kVariable;
-        if (occurrence.role == NameRole::kImport) occurrence.kind = NameKind::kImport;
-        if (!occurrence.is_attribute && occurrence.role == NameRole::kWrite) occurrence.role = NameRole::kDefinition;
-        symbols_.push_back(
-            {name, static_cast<uint32_t>(i), scopes_[scope].is_shared, occurrence.role == NameRole::kImport});
-      }
-      const bool opens = occurrence.kind == NameKind::kClass || occurrence.kind == NameKind::kFunction ||
-                         occurrence.kind == NameKind::kTypeAlias;
-      const bool is_listed =
-          occurrence.kind != NameKind::kImport && occurrence.kind != NameKind::kParameter && scopes_[scope].is_shared;
-      if (opens || (is_new && is_listed)) definitions_.push_back({static_cast<uint32_t>(i), scopes.names()[scope]});
-    } else if (occurrence.kind == NameKind::kVariable) {
-      occurrence.kind = NameKind::kNone;
-    }
-    occurrences_.push_back(occurrence);
-  }
-  for (size_t i = 0; i < occurrences_.size(); ++i) {
-    if (!occurrences_[i].is_attribute) occurrences_[i].symbol = SymbolOf(found_[i].scope, text_of(occurrences_[i]));
-  }
+Text SiteFacts::ModuleAt(uint32_t begin) const {
+  const auto module = modules_.find(begin);
+  return module != modules_.end() ? Text(module->second) : Text();
 }
 
-uint32_t SiteOccurrences::SymbolOf(uint32_t scope, Text name) const {
-  for (bool is_own = true; scope != kNone; scope = scopes_[scope].parent, is_own = false) {
-    if (!is_own && scopes_[scope].is_class) continue;
-    const auto entry = symbol_index_.find({scope, name});
-    if (entry != symbol_index_.end()) return entry->second;
-  }
-  return kNone;
-}
-
-Text SiteOccurrences::FactsOf(size_t occurrence) const {
-  const auto facts = facts_.find(occurrences_[occurrence].begin);
+Text SiteFacts::At(uint32_t begin) const {
+  const auto facts = facts_.find(begin);
   return facts != facts_.end() ? Text(facts->second) : Text();
 }
 

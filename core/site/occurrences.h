@@ -1,8 +1,10 @@
 // The names of a file as a site shows them: where each stands, what happens to it there, and whose it is.
 //
-// A name that belongs to a function (or to a lambda, a comprehension) is known by its symbol alone, within the
-// file. Names of modules and classes, and attributes, are *shared*: other files may mean them, and all that can
-// be said of those without running the program is that they are spelled alike.
+// Input: a file's bindings. A variable of a function (or of a lambda, a comprehension) is known by its symbol
+// alone, within the file. Names of modules and classes, attributes, keyword names and the paths of imports are
+// *shared*: other files may mean them, and all that can be said of those without running the program is that
+// they are spelled alike. A name that the file binds nowhere is the language's own, and is not shown as a name,
+// unless a star import may have brought it.
 // The trap is size: a source of one endless line has more names than a page can show, so only those in the
 // shown part are collected.
 #pragma once
@@ -11,12 +13,13 @@
 #include <span>
 #include <string>
 #include <unordered_map>
+#include <unordered_set>
 #include <vector>
 
 #include "analysis/file_analyzer.h"
 #include "analysis/placed_records.h"
-#include "analysis/scope_names.h"
-#include "names/bindings.h"
+#include "foundations/arena.h"
+#include "names/binder.h"
 
 namespace quillet {
 
@@ -25,7 +28,7 @@ inline constexpr size_t kNameRoleCount = static_cast<size_t>(NameRole::kDeclarat
 // The part of a source that a page shows: whole lines up to a limit, of each a limited part.
 class ShownPart {
  public:
-  static constexpr uint32_t kMostBytes = 8 << 20;
+  static constexpr uint32_t kMostBytes = 4 << 20;
   static constexpr uint32_t kMostBytesOfLine = 10'000;
 
   explicit ShownPart(const SourceText& source);
@@ -50,20 +53,15 @@ class ShownPart {
 };
 
 struct SiteOccurrence {
-  uint32_t begin;   // of its bytes in the source
-  uint32_t size;    // in bytes
-  uint32_t line;    // from 0
-  uint32_t symbol;  // index in symbols(); SiteOccurrences::kNone for an attribute
+  uint32_t begin;     // of its bytes in the source
+  uint32_t size;      // in bytes
+  uint32_t line;      // from 0
+  uint32_t variable;  // the symbol that owns it; kNoIndex for attributes, keyword names and paths
+  uint32_t receiver;  // of an attribute, the variable in front of its dot; kNoIndex where that is no variable
+  // The first binding of a variable is its definition, an import never is one.
   NameRole role;
   NameKind kind;  // of what is defined here
   bool is_attribute;
-};
-
-struct SiteSymbol {
-  Text name;
-  uint32_t definition;  // the occurrence that a link leads to; kNone where the file defines it nowhere
-  bool is_shared;       // of a module or a class
-  bool is_imported;     // what it means stands in another file
 };
 
 // A definition as a search lists it.
@@ -74,55 +72,73 @@ struct SiteDefinition {
 
 class SiteOccurrences {
  public:
-  static constexpr uint32_t kNone = UINT32_MAX;
+  explicit SiteOccurrences(Version version) : binder_(version) {}
 
   // What it gives stands until the next call or the next file.
-  void Collect(const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed, const ShownPart& shown);
+  void Collect(const FileAnalyzer& file, const ShownPart& shown);
 
   std::span<const SiteOccurrence> occurrences() const { return occurrences_; }  // in order of their places
-  std::span<const SiteSymbol> symbols() const { return symbols_; }
-  std::span<const SiteDefinition> definitions() const { return definitions_; }
-  // What the records say of an occurrence's name beyond its role, such as ": int"; empty for most.
-  Text FactsOf(size_t occurrence) const;
+  std::span<const SiteDefinition> definitions() const { return definitions_; }  // in order of their places
+
+  // The occurrence that defines a variable; kNoIndex where none that is shown does.
+  uint32_t DefinitionOf(uint32_t variable) const { return variables_[variable].definition; }
+  // Whether what a variable stands for comes from another file.
+  bool IsImported(uint32_t variable) const { return variables_[variable].is_imported; }
   // Whether other files may mean this occurrence's name.
   bool IsShared(const SiteOccurrence& occurrence) const {
-    if (occurrence.symbol == kNone) return occurrence.is_attribute;
-    return symbols_[occurrence.symbol].is_shared || symbols_[occurrence.symbol].is_imported;
+    if (occurrence.variable == kNoIndex) return true;
+    const Variable& variable = variables_[occurrence.variable];
+    return variable.is_shared || variable.is_imported || IsParameter(occurrence);
+  }
+  static bool IsParameter(const SiteOccurrence& occurrence) {
+    return occurrence.role == NameRole::kDefinition && occurrence.kind == NameKind::kParameter;
   }
 
  private:
-  struct Found {
-    SiteOccurrence occurrence;
-    uint32_t scope;  // index in ScopeNames::names()
-  };
-  struct Key {
-    uint32_t scope;
-    Text name;
-    friend bool operator==(const Key&, const Key&) = default;
-  };
-  struct KeyHash {
-    size_t operator()(const Key& key) const { return std::hash<Text>()(key.name) * 31 + key.scope; }
-  };
-  struct ScopeAround {
-    uint32_t parent = kNone;
-    bool is_class = false;
+  struct Variable {
+    uint32_t binding = kNoIndex;     // the occurrence that defines it, among the bindings
+    uint32_t definition = kNoIndex;  // the same among the occurrences that are shown
     bool is_shared = false;
+    bool is_imported = false;
   };
 
-  void FindScopes(const ScopeNames& scopes);
-  void AddRecord(const PlacedRecord& record, const FileAnalyzer& file, const ShownPart& shown);
-  void AddFact(const PlacedRecord& record, uint32_t begin);
-  void Settle(Text source, const ScopeNames& scopes);
-  uint32_t SymbolOf(uint32_t scope, Text name) const;
+  void FindVariables(const Bindings& bindings);
+  void Add(const Bindings& bindings, uint32_t index, uint32_t line);
+  void FindDefinitions(const Bindings& bindings);
+  void AddDefinition(const Bindings& bindings, uint32_t occurrence, uint32_t scope);
+  uint32_t ClassAround(const Bindings& bindings, uint32_t scope) const;
+  Text DottedNameOf(const Bindings& bindings, uint32_t scope);
 
-  std::vector<Found> found_;
+  NameBinder binder_;
   std::vector<SiteOccurrence> occurrences_;
-  std::vector<SiteSymbol> symbols_;
+  std::vector<uint32_t> scope_of_;  // by occurrence
+  std::vector<uint32_t> text_of_;   // by occurrence; index among the bindings' texts
+  std::vector<Variable> variables_;
   std::vector<SiteDefinition> definitions_;
-  std::unordered_map<Key, uint32_t, KeyHash> symbol_index_;
-  std::vector<ScopeAround> scopes_;                  // by name of the scope
-  std::unordered_map<uint32_t, std::string> facts_;  // by first byte
-  std::unordered_map<uint32_t, NameKind> opened_;    // by first byte
+  std::vector<Text> dotted_names_;           // by scope; none where it was not asked for
+  std::unordered_set<uint64_t> attributes_;  // a class and a text: those that were seen
+  std::vector<uint32_t> chain_;
+  std::string buffer_;
+  TextArena texts_;
+};
+
+// What records say of a name beyond its role: its hint, values that it is set to.
+class SiteFacts {
+ public:
+  // What it gives stands until the next call or the next file.
+  void Collect(const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed, const ShownPart& shown);
+
+  // What is said of the name that begins at this byte, such as ": int"; empty for most.
+  Text At(uint32_t begin) const;
+  // The module that the name there is imported from, as the statement spells it.
+  Text ModuleAt(uint32_t begin) const;
+
+ private:
+  void Add(const PlacedRecord& record, uint32_t begin);
+
+  // By first byte.
+  std::unordered_map<uint32_t, std::string> facts_;
+  std::unordered_map<uint32_t, std::string> modules_;
 };
 
 }  // namespace quillet

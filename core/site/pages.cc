@@ -76,13 +76,14 @@ Text KindWord(NameKind kind) {
 
 class SitePageWriter : public FileWriter {
  public:
-  explicit SitePageWriter(std::shared_ptr<const SiteIndex> index) : index_(std::move(index)) {}
+  SitePageWriter(std::shared_ptr<const SiteIndex> index, Version version) : index_(std::move(index)), names_(version) {}
 
   void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
              std::string& out) override {
     const ShownPart shown(file.source());
     source_ = file.source().text();
-    names_.Collect(file, scopes, placed, shown);
+    names_.Collect(file, shown);
+    facts_.Collect(file, scopes, placed, shown);
     FindColours(file);
     FindErrors(file, shown);
     out.append(kSitePageHeadSize, ' ');
@@ -209,7 +210,7 @@ class SitePageWriter : public FileWriter {
     for (; at_name_ < names.size() && names[at_name_].begin < end; ++at_name_) {
       const SiteOccurrence& occurrence = names[at_name_];
       if (occurrence.begin < at || occurrence.begin + occurrence.size > end) continue;
-      if (!BeginLink(at_name_, occurrence)) continue;
+      if (!FindLink(occurrence)) continue;
       AppendColoured(at, occurrence.begin, out);
       AppendLink(occurrence, out);
       at = occurrence.begin + occurrence.size;
@@ -233,29 +234,37 @@ class SitePageWriter : public FileWriter {
     AppendHtml(source_.substr(at, end - at), out);
   }
 
-  // Works out where a name leads; false for one that is no link.
-  bool BeginLink(size_t i, const SiteOccurrence& occurrence) {
+  // Works out where a name leads; false for one that nothing defines.
+  bool FindLink(const SiteOccurrence& occurrence) {
     link_ = {};
-    link_.facts = names_.FactsOf(i);
-    const bool is_known = occurrence.symbol != SiteOccurrences::kNone;
-    if (is_known) {
-      const SiteSymbol& symbol = names_.symbols()[occurrence.symbol];
-      link_.line = names_.occurrences()[symbol.definition].line;
-      if (!names_.IsShared(occurrence)) return true;
-    } else if (!occurrence.is_attribute) {
-      return false;
+    link_.line = occurrence.line;
+    link_.facts = facts_.At(occurrence.begin);
+    const bool is_variable = occurrence.variable != kNoIndex;
+    if (is_variable) {
+      const uint32_t definition = names_.DefinitionOf(occurrence.variable);
+      if (definition != kNoIndex) link_.line = names_.occurrences()[definition].line;
     }
+    if (!names_.IsShared(occurrence)) return true;
     link_.name = index_->Find(TextOf(occurrence));
-    if (link_.name == SiteIndex::kNone) return is_known;
-    const SiteIndex::Name& name = index_->name(link_.name);
-    const bool is_elsewhere = !is_known || names_.symbols()[occurrence.symbol].is_imported;
-    if (is_elsewhere && (name.opened == 1 || name.definitions == 1)) {
-      link_.file = name.file;
-      link_.line = name.line;
-    } else if (!is_known) {
-      link_.line = occurrence.line;
-    }
+    // A star import may have brought what other files define.
+    if (is_variable && names_.DefinitionOf(occurrence.variable) == kNoIndex &&
+        (link_.name == SiteIndex::kNone || index_->name(link_.name).definitions == 0))
+      return false;
+    const uint32_t imported = is_variable ? occurrence.variable : occurrence.receiver;
+    const bool is_imported = imported != kNoIndex && names_.IsImported(imported);
+    if (link_.name == SiteIndex::kNone || !(is_imported || occurrence.is_attribute)) return true;
+    const Text module = is_imported ? ModuleOf(imported) : Text();
+    const SiteIndex::Name* name = index_->OnlyDefinition(link_.name, module, occurrence.is_attribute);
+    if (name == nullptr) return true;
+    link_.file = name->file;
+    link_.line = name->line;
     return true;
+  }
+
+  // The module that a variable is imported from; empty where that is not known.
+  Text ModuleOf(uint32_t variable) const {
+    const uint32_t definition = names_.DefinitionOf(variable);
+    return definition != kNoIndex ? facts_.ModuleAt(names_.occurrences()[definition].begin) : Text();
   }
 
   void AppendLink(const SiteOccurrence& occurrence, std::string& out) const {
@@ -271,9 +280,9 @@ class SitePageWriter : public FileWriter {
     }
     out += "#L";
     AppendDigits(link_.line + 1, out);
-    if (occurrence.symbol != SiteOccurrences::kNone) {
+    if (occurrence.variable != kNoIndex) {
       out += "\" data-s=\"";
-      AppendDigits(occurrence.symbol, out);
+      AppendDigits(occurrence.variable, out);
     }
     if (link_.name != SiteIndex::kNone) {
       out += "\" data-n=\"";
@@ -327,6 +336,7 @@ class SitePageWriter : public FileWriter {
 
   const std::shared_ptr<const SiteIndex> index_;
   SiteOccurrences names_;
+  SiteFacts facts_;
   Text source_;
   std::vector<Colour> colours_;
   std::vector<PageError> errors_;
@@ -337,8 +347,8 @@ class SitePageWriter : public FileWriter {
 
 }  // namespace
 
-std::unique_ptr<FileWriter> MakeSitePageWriter(std::shared_ptr<const SiteIndex> index) {
-  return std::make_unique<SitePageWriter>(std::move(index));
+std::unique_ptr<FileWriter> MakeSitePageWriter(std::shared_ptr<const SiteIndex> index, Version version) {
+  return std::make_unique<SitePageWriter>(std::move(index), version);
 }
 
 }  // namespace quillet

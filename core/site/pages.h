@@ -18,6 +18,6 @@ namespace quillet {
 
 inline constexpr size_t kSitePageHeadSize = 32;
 
-std::unique_ptr<FileWriter> MakeSitePageWriter(std::shared_ptr<const SiteIndex> index);
+std::unique_ptr<FileWriter> MakeSitePageWriter(std::shared_ptr<const SiteIndex> index, Version version);
 
 }  // namespace quillet

@@ -73,6 +73,13 @@ uint32_t CodeOf(const SiteOccurrence& occurrence) {
          static_cast<uint32_t>(occurrence.kind) << kKindShift;
 }
 
+// What of a name's counts a place adds to: that of its role, and behind those that of parameters.
+size_t CountOf(uint32_t code) {
+  constexpr uint32_t kParameterDefinition =
+      static_cast<uint32_t>(NameRole::kDefinition) | static_cast<uint32_t>(NameKind::kParameter) << kKindShift;
+  return code == kParameterDefinition ? kNameRoleCount : code % kNameRoleCount;
+}
+
 // What a definition defines: a NameKind, or behind them an attribute.
 constexpr uint32_t kAttributeDefinition = static_cast<uint32_t>(NameKind::kImport) + 1;
 
@@ -86,10 +93,12 @@ bool Opens(uint8_t kind) {
 
 class SiteSurveyWriter : public FileWriter {
  public:
-  void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
+  explicit SiteSurveyWriter(Version version) : names_(version) {}
+
+  void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames&, PlacedRecords&,
              std::string& out) override {
     const ShownPart shown(file.source());
-    names_.Collect(file, scopes, placed, shown);
+    names_.Collect(file, shown);
     texts_.clear();
     numbers_.clear();
     places_.clear();
@@ -134,7 +143,12 @@ class SiteSurveyWriter : public FileWriter {
 
 }  // namespace
 
-std::unique_ptr<FileWriter> MakeSiteSurveyWriter() { return std::make_unique<SiteSurveyWriter>(); }
+std::unique_ptr<FileWriter> MakeSiteSurveyWriter(Version version) {
+  return std::make_unique<SiteSurveyWriter>(version);
+}
+
+SiteIndex::SiteIndex(const std::vector<std::string>& files, const std::vector<std::string>& builtin_attributes)
+    : files_(files), builtin_attributes_(builtin_attributes.begin(), builtin_attributes.end()) {}
 
 uint32_t SiteIndex::NumberOf(Text name) {
   if (const auto entry = name_index_.find(name); entry != name_index_.end()) return entry->second;
@@ -153,6 +167,7 @@ uint32_t SiteIndex::NumberOfScope(Text scope) {
 }
 
 void SiteIndex::Add(uint32_t file, Text survey) {
+  if (file >= files_.size()) ThrowError(ErrorKind::kIndexError, "there is no file of this number");
   Reader reader(survey);
   std::vector<uint32_t> numbers(reader.TakeBelow(survey.size() + 1));
   for (uint32_t& number : numbers) number = NumberOf(reader.TakeText());
@@ -161,7 +176,7 @@ void SiteIndex::Add(uint32_t file, Text survey) {
     const uint32_t line = places.Take();
     const uint32_t column = places.Take();
     const uint32_t code = places.TakeBelow(kCodeLimit);
-    if (++names_[number].counts[code % kNameRoleCount] > kMostPlaces) continue;
+    if (++names_[number].counts[CountOf(code)] > kMostPlaces) continue;
     std::string& bucket = buckets_[number % kBuckets];
     const size_t before = bucket.size();
     for (const uint32_t value : {number, file, line, column, code}) Put(value, bucket);
@@ -173,8 +188,11 @@ void SiteIndex::Add(uint32_t file, Text survey) {
     const uint32_t scope = NumberOfScope(definitions.TakeText());
     const uint32_t line = definitions.Take();
     const auto kind = static_cast<uint8_t>(definitions.TakeBelow(kAttributeDefinition + 1));
-    definitions_.push_back({number, scope, file, line, kind});
     Name& name = names_[number];
+    const auto index = static_cast<uint32_t>(definitions_.size());
+    (name.last_definition == kNone ? name.first_definition : definitions_[name.last_definition].next) = index;
+    name.last_definition = index;
+    definitions_.push_back({scope, file, line, kNone, kind});
     ++name.definitions;
     const bool is_first_opened = Opens(kind) && ++name.opened == 1;
     if (name.file != kNone && !is_first_opened) continue;
@@ -193,6 +211,27 @@ std::string SiteIndex::TakeBucket(size_t bucket) {
 uint32_t SiteIndex::Find(Text name) const {
   const auto entry = name_index_.find(name);
   return entry != name_index_.end() ? entry->second : kNone;
+}
+
+const SiteIndex::Name* SiteIndex::OnlyDefinition(uint32_t number, Text module, bool is_attribute) const {
+  const Name& found = names_[number];
+  if (found.opened != 1 && found.definitions != 1) return nullptr;
+  if (!module.empty()) return IsOfModule(found.file, module) ? &found : nullptr;
+  return is_attribute && builtin_attributes_.contains(std::string(found.text)) ? nullptr : &found;
+}
+
+// Whether the last part of a module's path is one of a file's: a package may hand on what its modules define.
+bool SiteIndex::IsOfModule(uint32_t file, Text module) const {
+  const Text part = module.substr(module.rfind('.') + 1);
+  if (part.empty()) return true;  // relative to the file's own package
+  Text path = files_[file];
+  path = path.substr(0, path.rfind('.'));
+  for (size_t begin = 0; begin <= path.size();) {
+    const size_t end = std::min(path.find('/', begin), path.size());
+    if (path.substr(begin, end - begin) == part) return true;
+    begin = end + 1;
+  }
+  return false;
 }
 
 // ---- scripts ----
@@ -231,6 +270,8 @@ std::string SiteIndex::PlacesScript(Text buckets) const {
       }
       out.back() = ']';
       out += ",[";
+      AppendScopes(names_[place.name], out);
+      out += "],[";
     }
     if (is_new_file) {
       out += '[';
@@ -245,12 +286,23 @@ std::string SiteIndex::PlacesScript(Text buckets) const {
   return out;
 }
 
+// File, line and dotted scope of the definitions that stand in one.
+void SiteIndex::AppendScopes(const Name& name, std::string& out) const {
+  uint32_t count = 0;
+  ForEachDefinition(name, [&](const Definition& definition) {
+    if (scope_texts_[definition.scope].empty() || ++count > kMostPlaces) return;
+    if (count > 1) out += ',';
+    AppendDigits(definition.file, out);
+    out += ',';
+    AppendDigits(definition.line + 1, out);
+    out += ',';
+    AppendJsonString(scope_texts_[definition.scope], out);
+  });
+}
+
 std::string SiteIndex::DefinitionsScript() const {
   // By NameKind, and behind them an attribute.
   static constexpr char kLetters[] = "?cfpvqtia";
-  std::vector<Definition> sorted = definitions_;
-  std::stable_sort(sorted.begin(), sorted.end(),
-                   [](const Definition& one, const Definition& two) { return one.name < two.name; });
   std::string out = "quillet.take([";
   for (const Text scope : scope_texts_) {
     AppendJsonString(scope, out);
@@ -258,21 +310,22 @@ std::string SiteIndex::DefinitionsScript() const {
   }
   if (!scope_texts_.empty()) out.pop_back();
   out += "],[\n";
-  for (size_t i = 0; i < sorted.size();) {
-    size_t end = i + 1;
-    while (end < sorted.size() && sorted[end].name == sorted[i].name) ++end;
-    out += '[';
-    AppendJsonString(names_[sorted[i].name].text, out);
+  bool is_first = true;
+  for (const Name& name : names_) {
+    if (name.first_definition == kNone) continue;
+    out += is_first ? "[" : ",\n[";
+    is_first = false;
+    AppendJsonString(name.text, out);
     out += ",\"";
-    for (size_t j = i; j < end; ++j) out += kLetters[sorted[j].kind];
+    ForEachDefinition(name, [&out](const Definition& definition) { out += kLetters[definition.kind]; });
     out += '"';
-    for (; i < end; ++i) {
-      for (const uint32_t value : {sorted[i].scope, sorted[i].file, sorted[i].line + 1}) {
+    ForEachDefinition(name, [&out](const Definition& definition) {
+      for (const uint32_t value : {definition.scope, definition.file, definition.line + 1}) {
         out += ',';
         AppendDigits(value, out);
       }
-    }
-    out += i < sorted.size() ? "],\n" : "]";
+    });
+    out += ']';
   }
   return out + "]);\n";
 }

@@ -12,6 +12,7 @@
 #include <memory>
 #include <string>
 #include <unordered_map>
+#include <unordered_set>
 #include <vector>
 
 #include "analysis/batch.h"
@@ -21,7 +22,7 @@
 namespace quillet {
 
 // Writes what SiteIndex::Add takes.
-std::unique_ptr<FileWriter> MakeSiteSurveyWriter();
+std::unique_ptr<FileWriter> MakeSiteSurveyWriter(Version version);
 
 class SiteIndex {
  public:
@@ -38,8 +39,16 @@ class SiteIndex {
     uint32_t opened = 0;
     uint32_t file = kNone;  // of the first one; one that opens something stands before the others
     uint32_t line = 0;      // from 0
-    std::array<uint32_t, kNameRoleCount> counts{};
+    // Its places by role, and behind those the parameters of this name.
+    std::array<uint32_t, kNameRoleCount + 1> counts{};
+    // Of the list of its definitions, in their order; kNone without any.
+    uint32_t first_definition = kNone;
+    uint32_t last_definition = kNone;
   };
+
+  // The names of all files by their numbers, such as "src/shop.py", and the names of the attributes that values
+  // of the language's own types have.
+  SiteIndex(const std::vector<std::string>& files, const std::vector<std::string>& builtin_attributes);
 
   // ---- the first round ----
 
@@ -63,19 +72,32 @@ class SiteIndex {
   uint32_t Find(Text name) const;
   const Name& name(uint32_t number) const { return names_[number]; }
   size_t definition_count() const { return definitions_.size(); }
+  // Where a link to a name leads that is defined elsewhere: the one definition, null where there is none or
+  // several. A definition of another module than `module`, which is empty where it is not known, is not meant.
+  // An attribute that values of the language's own types have may be one of those.
+  const Name* OnlyDefinition(uint32_t number, Text module, bool is_attribute) const;
 
  private:
   struct Definition {
-    uint32_t name;
-    uint32_t scope;
+    uint32_t scope;  // index in scope_texts_
     uint32_t file;
     uint32_t line;  // from 0
+    uint32_t next;  // of the same name; kNone behind the last one
     uint8_t kind;   // a NameKind, or behind them an attribute
   };
 
+  template <class Function>
+  void ForEachDefinition(const Name& name, Function&& function) const {
+    for (uint32_t i = name.first_definition; i != kNone; i = definitions_[i].next) function(definitions_[i]);
+  }
+  void AppendScopes(const Name& name, std::string& out) const;
   uint32_t NumberOf(Text name);
   uint32_t NumberOfScope(Text scope);
 
+  bool IsOfModule(uint32_t file, Text module) const;
+
+  std::vector<std::string> files_;
+  std::unordered_set<std::string> builtin_attributes_;
   std::vector<Name> names_;
   std::unordered_map<Text, uint32_t> name_index_;
   std::vector<Text> scope_texts_;

@@ -93,13 +93,14 @@ def places_of(site: Path, name: str) -> dict[str, list[tuple[str, int, int]]]:
     found: dict[str, list[tuple[str, int, int]]] = {}
     for script in (site / "data").glob("[0-9]*.js"):
         [names] = taken(script)
-        for text, counts, groups in names.values():
+        for text, counts, _, groups in names.values():
             if text != name:
                 continue
             for file, *numbers in groups:
                 for line, column, code in zip(numbers[::3], numbers[1::3], numbers[2::3], strict=True):
-                    found.setdefault(ROLES[code & 7], []).append((files[file], line, column))
-            assert counts == [len(found.get(role, ())) for role in ROLES]
+                    role = "parameter" if code == 3 << 4 else ROLES[code & 7]
+                    found.setdefault(role, []).append((files[file], line, column))
+            assert counts == [len(found.get(role, ())) for role in (*ROLES, "parameter")]
     return found
 
 
@@ -162,6 +163,55 @@ def test_what_is_defined_more_than_once_leads_to_no_one_of_them(tmp_path: Path) 
     assert page_of(tmp_path, a=source).targets("run") == ["#L2", "#L6", "#L9"]
 
 
+def test_a_link_to_another_file_is_what_is_imported(tmp_path: Path) -> None:
+    source = "import os\nfrom c import work\nos.path\nwork()\nx.join()\nx.rest()\n"
+    page = page_of(tmp_path, a=source, b="def path(): pass\ndef work(): pass\ndef join(): pass\ndef rest(): pass\n")
+    assert page.targets("path") == ["#L3"]  # of a module that is not here
+    assert page.targets("work") == ["#L2", "#L2"]
+    assert page.targets("join") == ["#L5"]  # what values of the language's own types have
+    assert page.targets("rest") == ["1.html#L4"]
+
+
+def test_a_star_import_may_have_brought_a_name(tmp_path: Path) -> None:
+    page = page_of(tmp_path, a="from b import *\nwork()\nlen()\n", b="def work(): pass\n")
+    assert page.targets("work") == ["1.html#L1"]
+    assert page.links("len") == []
+
+
+def test_every_occurrence_is_a_link(tmp_path: Path) -> None:
+    source = (
+        "def f(x, *, y: 'Shop' = 1):\n    # type: (int) -> f\n    return f'{x + y!r:>{x}}' + f(x, y=y)\n\n"
+        "class Shop(f):\n    y = [y for y in y if y]\n    @f\n    def g(self, y: y): return (y := y)\n"
+    )
+    page = page_of(tmp_path, a=source)
+    assert page.targets("x") == ["#L1"] * 4
+    assert len(page.links("y")) == 13
+    assert page.targets("f") == ["#L1"] * 5
+    assert page.targets("Shop") == ["#L5", "#L5"]
+    assert {link["class"] for link in page.links("y")} == {"d param", "r", "k", "d", "w"}
+
+
+def test_names_of_a_broken_statement_are_links(tmp_path: Path) -> None:
+    source = (
+        "class A:\n    def f(self, item:\n        item.price = total(item\n\n"
+        "    def g(self):\n        self.f(\n\ndef total(x): pass\n"
+    )
+    site = make_report(tmp_path, a=source)
+    page = Html(site / "files" / "0.html")
+    assert page.targets("total") == ["#L8", "#L8"]
+    assert page.targets("f")[0] == "#L2"
+    assert ("a.py", 3, 22) in places_of(site, "total")["call"]
+    assert '<a href="#L2"><i>def</i> f</a>' in (site / "files" / "0.html").read_text()
+
+
+def test_keyword_arguments_are_listed_with_parameters(tmp_path: Path) -> None:
+    site = make_report(tmp_path, a="def f(using): return using\n", b="f(using=1)\nx.using\n")
+    places = places_of(site, "using")
+    assert places["keyword"] == [("b.py", 1, 3)]
+    assert places["parameter"] == [("a.py", 1, 7)]
+    assert "definition" not in places
+
+
 def test_builtins_lead_nowhere_but_to_a_definition_of_the_module(tmp_path: Path) -> None:
     site = make_report(
         tmp_path, a="len(print)\n", b="def len(x): pass\n\n\nlen(1)\nclass C:\n    def print(self): pass\n"
@@ -169,6 +219,27 @@ def test_builtins_lead_nowhere_but_to_a_definition_of_the_module(tmp_path: Path)
     assert Html(site / "files" / "0.html").links("len") == []
     assert Html(site / "files" / "0.html").links("print") == []
     assert Html(site / "files" / "1.html").targets("len") == ["#L1", "#L1"]
+
+
+def test_a_methods_uses_are_listed_with_its_definitions(tmp_path: Path) -> None:
+    calls = "".join(f"def f{n}(shop):\n    return shop.add({n}, count={n}) + g(shop.add())\n" for n in range(49))
+    site = make_report(tmp_path, shop=SHOP, calls=calls, uses="keep = Shop.add\n")
+    places = places_of(site, "add")
+    assert places["definition"] == [("shop.py", 15, 9)]
+    assert len(places["call"]) == 98 + 1
+    assert places["call"][:2] == [("calls.py", 2, 17), ("calls.py", 2, 42)]
+    assert places["read"] == [("uses.py", 1, 13)]
+
+
+def test_imports_are_no_definitions(tmp_path: Path) -> None:
+    site = make_report(tmp_path, shop=SHOP, a="from shop import Shop\nShop()\n", b="from shop import Shop\n")
+    places = places_of(site, "Shop")
+    assert places["definition"] == [("shop.py", 14, 7)]
+    assert places["import"] == [("a.py", 1, 18), ("b.py", 1, 18)]
+    assert places["call"] == [("a.py", 2, 1), ("shop.py", 25, 12)]
+    assert definitions_of(site)["Shop"] == "c"
+    assert "os" not in definitions_of(site)
+    assert definitions_of(site)["price"] == "va"
 
 
 def test_hints_and_values_are_known_of_a_name(tmp_path: Path) -> None:
@@ -260,14 +331,23 @@ def test_endless_lines_and_files_are_shown_in_part(tmp_path: Path) -> None:
     result = run("report", "-o", "site", cwd=tmp_path)
     assert result.returncode == 0
     assert "a.py: has endless lines, of which its page shows the first 10000 bytes\n" in result.stderr
-    assert "b.py: too large for a page, which shows the first 8 MB\n" in result.stderr
+    assert "b.py: too large for a page, which shows the first 4 MB\n" in result.stderr
     assert len(result.stderr.splitlines()) == 3
     page = (tmp_path / "site" / "files" / "0.html").read_text()
     assert "… and 200006 more bytes</em>" in page
     assert 'id="L2"' in page
     page = (tmp_path / "site" / "files" / "1.html").read_text()
     assert re.search(r"… and \d+ more lines, which a page does not show", page)
-    assert 10_000_000 > (tmp_path / "site" / "files" / "1.js").stat().st_size > 8_000_000
+    assert 5_000_000 > (tmp_path / "site" / "files" / "1.js").stat().st_size > 4_000_000
+
+
+def test_names_that_occur_without_end_are_counted(tmp_path: Path) -> None:
+    site = make_report(tmp_path, a="x.total()\n" * 600 + "x.total\n")
+    [names] = taken(site / "data" / "0.js")
+    [(_, counts, _, groups)] = [entry for entry in names.values() if entry[0] == "total"]
+    assert counts[ROLES.index("call")] == 600
+    assert counts[ROLES.index("read")] == 1
+    assert [len(numbers) // 3 for numbers in groups] == [501]
 
 
 # ---- which files, and where to ----
@@ -467,9 +547,9 @@ def test_the_site_is_the_same_at_any_number_of_threads_and_with_any_spill(
 @pytest.mark.parametrize("survey", [b"\xff", b"\x05\x01a", b"\x01\x01a\x04\x07\x00\x00\x00\x00", b"\xff" * 12])
 def test_bytes_that_are_no_survey_are_told(survey: bytes) -> None:
     with pytest.raises(ValueError, match="no survey"):
-        _host.SiteIndex().Add(0, survey)
+        _host.SiteIndex(["a.py"], []).Add(0, survey)
     with pytest.raises(ValueError, match="no survey"):
-        _host.SiteIndex().PlacesScript(survey)
+        _host.SiteIndex(["a.py"], []).PlacesScript(survey)
 
 
 # ---- in a browser ----
@@ -538,7 +618,7 @@ def test_the_search_takes_a_scope_and_a_file(browser: Browser, long_site: Path) 
     page.press("/")
     page.type_text("queryset.method7")
     page.wait("document.querySelector('#found [aria-selected]')")
-    assert active(page) == "defQuerySet.method7sets.py:23"
+    assert active(page) == "defmethod7 QuerySetsets.py:23"
     page.value("search.select()")
     page.type_text("zzz")
     page.wait("document.querySelector('#found [aria-selected]')?.textContent.includes('zzz')")
@@ -560,6 +640,34 @@ def test_a_click_lists_definitions_and_uses(browser: Browser, tmp_path: Path) ->
     assert hrefs == ["#L3", "../files/1.html#L3", "#L2", "#L3"]
     page.press("Escape")
     assert page.value("document.getElementById('panel').hidden")
+
+
+def test_a_local_name_is_listed_by_its_scope(browser: Browser, tmp_path: Path) -> None:
+    site = make_report(tmp_path, a="def f(n):\n    return n\n\ndef g(n):\n    return n + n\n")
+    page = browser.open(site / "files" / "0.html")
+    page.click("document.querySelector('#L5 a.r')")
+    page.wait("document.getElementById('panel')")
+    assert page.value("[...document.querySelectorAll('#panel .places i')].map(e => e.textContent)") == ["4", "5", "5"]
+    assert page.value("document.querySelectorAll('main .on').length") == 3
+
+
+def test_a_definition_is_listed_with_its_scope(browser: Browser, tmp_path: Path) -> None:
+    site = make_report(
+        tmp_path, a="x.run()\n", b="class A:\n    def run(self): pass\nclass B:\n    def run(self): pass\n"
+    )
+    page = browser.open(site / "files" / "0.html")
+    page.click("document.querySelector('#L1 a.c')")
+    page.wait("document.getElementById('panel')")
+    assert page.value("[...document.querySelectorAll('#panel .places small')].map(e => e.textContent)") == ["A", "B"]
+
+
+def test_a_keyword_lists_parameters_alone(browser: Browser, tmp_path: Path) -> None:
+    site = make_report(tmp_path, a="f(using=1)\nx.using\n", b="def f(using): return using\n")
+    page = browser.open(site / "files" / "0.html")
+    page.click("document.querySelector('#L1 a.k')")
+    page.wait("document.getElementById('panel')")
+    titles = page.value("[...document.querySelectorAll('#panel h3')].map(e => e.textContent)")
+    assert titles == ["Parameters1", "Keyword arguments1"]
 
 
 def test_names_are_reached_by_keys(browser: Browser, tmp_path: Path) -> None:

@@ -39,11 +39,17 @@ const quillet = {
   const ROLES = [
     ["d", "Definitions"], ["w", "Assignments"], ["r", "Reads"], ["c", "Calls"],
     ["x", "Deletions"], ["i", "Imports"], ["k", "Keyword arguments"], ["g", "Declarations"],
+    ["param", "Parameters"],
   ];
   const KINDS = ["", "class", "def", "parameter", "variable", "type parameter", "type", "import"];
   const ATTRIBUTE = 8;
   const DEFINITION = 0;
-  const SHOWN_FIRST = [0, 3, 2, 1, 5, 6, 4, 7];
+  const KEYWORD = 6;
+  const PARAMETER = 8;
+  const SHOWN = [0, 3, 2, 1, 5, 4, 7];
+  // Keyword arguments mean parameters, and nothing else does.
+  const SHOWN_OF_PARAMETERS = [PARAMETER, KEYWORD];
+  const roleOfCode = (code) => (code === 3 << 4 ? PARAMETER : code & 7);
 
   const lineOf = (link) => Number(link.closest("p").id.slice(1));
   const textOfLine = (row) => [...row.childNodes].slice(1).map((node) => node.textContent).join("").trim();
@@ -118,7 +124,8 @@ const quillet = {
     if (isCut) section.append(element("p", {}, `${counted(total - places.length, "more place")} not listed.`));
     return section;
   };
-  const noteOf = (code) => {
+  const noteOf = (code, scope) => {
+    if (scope) return scope;
     const kind = code & ATTRIBUTE && code >> 4 ? "attribute" : KINDS[code >> 4];
     return kind === "import" ? "" : kind;
   };
@@ -131,30 +138,34 @@ const quillet = {
     });
     return sectionOf("In this file", name, places, places.length, null);
   };
-  const elsewhere = (name, counts, groups, files, isExact) => {
+  const elsewhere = ([name, counts, scopes, groups], files, isExact, roles) => {
+    const scopeAt = new Map();
+    for (let i = 0; i < scopes.length; i += 3) scopeAt.set(`${scopes[i]}:${scopes[i + 1]}`, scopes[i + 2]);
     const byRole = ROLES.map(() => []);
     const gone = ROLES.map(() => 0);
     for (const [file, ...numbers] of groups) {
       for (let i = 0; i < numbers.length; i += 3) {
         const [line, , code] = numbers.slice(i, i + 3);
-        const role = code & 7;
+        const role = roleOfCode(code);
         // What the page itself knows for sure stands above.
-        if (isExact && file === FILE) gone[role] += 1;
-        else byRole[role].push({ file, line, code, note: noteOf(code) });
+        if (isExact && file === FILE && !(code & ATTRIBUTE) && role !== KEYWORD) gone[role] += 1;
+        else byRole[role].push({ file, line, code, note: noteOf(code, role === DEFINITION && scopeAt.get(`${file}:${line}`)) });
       }
     }
-    return SHOWN_FIRST.filter((role) => byRole[role].length).map((role) =>
+    return roles.filter((role) => byRole[role].length).map((role) =>
       sectionOf(ROLES[role][1], name, byRole[role], counts[role] - gone[role], files));
   };
 
   let latest = 0;
   const show = async (number, link) => {
     const turn = ++latest;
+    const isParameter = link !== null && (link.classList.contains("k") || link.classList.contains("param"));
     const isLocal = link !== null && link.dataset.s !== undefined;
     const links = link ? linksOf(link) : [...document.querySelectorAll(`a[data-n="${number}"]`)];
     const [taken, paths] = number === null ? [null, null] : await Promise.all([load(`data/${number % scripts}`), load("data/files")]);
     if (turn !== latest) return;
-    const [name, counts, groups] = taken?.[0][number] ?? [link?.textContent ?? "", [], []];
+    const entry = taken?.[0][number] ?? [link?.textContent ?? "", [], [], []];
+    const [name] = entry;
     if (!panel) {
       panel = element("aside", { id: "panel", "aria-label": "Places of a name", tabindex: "-1" });
       document.body.append(panel);
@@ -173,7 +184,7 @@ const quillet = {
     }
     if (isLocal) panel.append(inThisFile(name, links));
     if (number !== null) {
-      const sections = elsewhere(name, counts, groups, paths?.[0] ?? [], isLocal);
+      const sections = elsewhere(entry, paths?.[0] ?? [], isLocal, isParameter ? SHOWN_OF_PARAMETERS : SHOWN);
       if (sections.length) {
         panel.append(element("p", { class: "note" }, isLocal
           ? "Elsewhere, by name: spelled the same. Which of these mean this one is known only when the program runs."
@@ -332,7 +343,7 @@ const quillet = {
       const where = kind === "F" ? paths[0][file] : `${paths[0][file]}:${line}`;
       const target = element("a", { href: kind === "F" ? `${up}files/${file}.html` : `${up}files/${file}.html#L${line}`, tabindex: "-1" },
         element("i", { class: WORDS[kind] }, WORDS[kind]),
-        element("span", {}, scope ? `${scope}.` : "", element("b", {}, ...marked(name, kind === "F" ? text : tail))),
+        element("span", {}, element("b", {}, ...marked(name, kind === "F" ? text : tail)), scope ? ` ${scope}` : ""),
         element("small", {}, element("bdi", {}, where)));
       return element("li", { role: "option", id: `found${number}` }, target);
     }));

@@ -10,6 +10,8 @@ and nothing else.
 
 from __future__ import annotations
 
+import builtins
+import io
 import json
 import os
 import shutil
@@ -70,7 +72,7 @@ def write_site(sources: list[Source], folder: str, settings: Settings, reports: 
             shutil.copyfile(Path(__file__).parent / name, site / name)
         _write_json(site / "data" / "files.js", [source.name for source in sources])
 
-        index = _host.SiteIndex()
+        index = _host.SiteIndex([source.name for source in sources], _builtin_attributes())
         with (site / "spill").open("w+b") as file:
             spill = _Spill(file)
             reports.begin("reading", len(sources))
@@ -90,6 +92,13 @@ def write_site(sources: list[Source], folder: str, settings: Settings, reports: 
         pages = _write_pages(sources, settings, index, site, reports)
         (site / "index.html").write_bytes(_encoded(front_page(pages, index.definition_count, index.script_count)))
     return sum(page.problem is not None for page in pages)
+
+
+def _builtin_attributes() -> list[str]:
+    """The attributes of the language's own types, which say little of what they belong to."""
+    types = [value for value in vars(builtins).values() if isinstance(value, type)]
+    plain = [value for value in types if not issubclass(value, BaseException)]
+    return sorted({name for value in (*plain, io.TextIOWrapper) for name in dir(value)})
 
 
 def _results(sources: list[Source], settings: Settings, form: tuple[object, ...]) -> Iterator[_host.FileResult]:
