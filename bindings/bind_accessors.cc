@@ -10,6 +10,7 @@
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/errors.h"
+#include "bindings/host_call.h"
 #include "bindings/node_ref.h"
 #include "tree/arg_info.h"
 #include "tree/nodes.h"
@@ -96,18 +97,18 @@ class Accessors {
 
   template <auto Accessor>
   Accessors& Def(const char* name) {
-    cls_.def(name, &Bound<Accessor>::template Call<T>);
+    DefOperation(cls_, name, &Bound<Accessor>::template Call<T>);
     return *this;
   }
   // One with an argument.
   template <auto Accessor>
   Accessors& Def(const char* name, const char* argument) {
-    cls_.def(name, &Bound<Accessor>::template Call<T>, nb::arg(argument));
+    DefOperation(cls_, name, &Bound<Accessor>::template Call<T>, nb::arg(argument));
     return *this;
   }
   template <class Function>
   Accessors& DefFunction(const char* name, Function function) {
-    cls_.def(name, function);
+    DefOperation(cls_, name, function);
     return *this;
   }
 
@@ -288,8 +289,8 @@ T* ArgumentAs(nb::handle node, Source& source) {
 }
 
 void BindFreeOperations(nb::module_& m) {
-  m.def(
-      "GetDefiningArgInfoList",
+  DefOperation(
+      m, "GetDefiningArgInfoList",
       [](Any node) {
         Source source;
         CNode* root = ArgumentAs<CNode>(node, source);
@@ -303,16 +304,16 @@ void BindFreeOperations(nb::module_& m) {
       },
       nb::arg("node"),
       "The parameters of the node behind `def name` or `lambda`: a list of CArgInfo, nested for tuple parameters.");
-  m.def(
-      "GetUsedArgInfoList",
+  DefOperation(
+      m, "GetUsedArgInfoList",
       [](Any node) {
         Source source;
         CNode* root = ArgumentAs<CNode>(node, source);
         return WrapUsedArgs(GetUsedArgInfoList(root), source);
       },
       nb::arg("node"), "The arguments of the inside of `value(...)`, as a list of CArgInfo.");
-  m.def(
-      "GetTokenEndIndex",
+  DefOperation(
+      m, "GetTokenEndIndex",
       [](Any node) {
         Source source;
         const CNode* leaf = LastLeaf(ArgumentAs<CNode>(node, source));
@@ -323,25 +324,25 @@ void BindFreeOperations(nb::module_& m) {
         return Int64Of(end);
       },
       nb::arg("node"), "The token index just past a node.");
-  m.def(
-      "_TextForImportName", [](Any nodes) { return StrOf(TextForImportName(NodesOf(nodes, NodeKind::kCNode, true))); },
-      nb::arg("nodes"));
-  m.def(
-      "_ProcessAsNamesList",
+  DefOperation(
+      m, "_TextForImportName",
+      [](Any nodes) { return StrOf(TextForImportName(NodesOf(nodes, NodeKind::kCNode, true))); }, nb::arg("nodes"));
+  DefOperation(
+      m, "_ProcessAsNamesList",
       [](Any node) {
         Source source;
         return ToHost(ProcessAsNamesList(ArgumentAs<CNode>(node, source)), source);
       },
       nb::arg("node"));
-  m.def(
-      "_ProcessSingleModuleNameAs",
+  DefOperation(
+      m, "_ProcessSingleModuleNameAs",
       [](Any node) {
         Source source;
         return WrapAsName(ProcessSingleModuleNameAs(ArgumentAs<CNode>(node, source)));
       },
       nb::arg("node"));
-  m.def(
-      "_GetMatchingChildToken",
+  DefOperation(
+      m, "_GetMatchingChildToken",
       [](Any node, Any text) {
         Source source;
         const HostText wanted = HostText::FromStr(text);
@@ -349,16 +350,16 @@ void BindFreeOperations(nb::module_& m) {
       },
       nb::arg("node"), nb::arg("text"));
 
-  m.def(
-      "DropSimpleParens",
+  DefOperation(
+      m, "DropSimpleParens",
       [](Any node) {
         Source source;
         CNode* root = ArgumentAs<CNode>(node, source);
         return Wrap(DropSimpleParens(root), source);
       },
       nb::arg("node"), "The inside of `( test )`, however deep; any other node as it is.");
-  m.def(
-      "ExpandSeqLiteral",
+  DefOperation(
+      m, "ExpandSeqLiteral",
       [](Any node) {
         Source source;
         CNode* root = ArgumentAs<CNode>(node, source);
@@ -366,22 +367,22 @@ void BindFreeOperations(nb::module_& m) {
         return ExpandSeqLiteral(root, elements) ? WrapList(elements, source) : nb::object(nb::none());
       },
       nb::arg("node"), "The elements of a parenthesised tuple; None for anything else.");
-  m.def(
-      "IsSetLiteral",
+  DefOperation(
+      m, "IsSetLiteral",
       [](Any node) {
         Source source;
         return IsSetLiteral(ArgumentAs<CAtom>(node, source));
       },
       nb::arg("node"), "True for an atom that is clearly a set display.");
-  m.def(
-      "IsGenExpression",
+  DefOperation(
+      m, "IsGenExpression",
       [](Any atom_node) {
         Source source;
         return IsGenExpression(ArgumentAs<CAtom>(atom_node, source));
       },
       nb::arg("atom_node"), "True for a parenthesised atom with a direct child `for`.");
-  m.def(
-      "IsTupleLiteralNode",
+  DefOperation(
+      m, "IsTupleLiteralNode",
       [](Any node) {
         Source source;
         return IsTupleLiteralNode(ArgumentAs<CNode>(node, source));
@@ -399,8 +400,8 @@ void BindInstanceNames(nb::module_& m) {
   m.attr("kBytesInstanceName") = BytesOf(kBytesInstanceName);
   m.attr("kIntLiteralName") = BytesOf(kIntLiteralName);
   m.attr("kFloatLiteralName") = BytesOf(kFloatLiteralName);
-  m.def(
-      "_GetBuiltinInstanceName",
+  DefOperation(
+      m, "_GetBuiltinInstanceName",
       [](Any cls_name) {
         const HostText name = HostText::FromStr(cls_name);
         std::string info(kTypedLiteralPrefix);

@@ -6,6 +6,7 @@
 #include "bindings/convert.h"
 #include "bindings/errors.h"
 #include "bindings/hints_object.h"
+#include "bindings/host_call.h"
 #include "bindings/line_object.h"
 #include "bindings/node_ref.h"
 #include "bindings/parser_object.h"
@@ -33,6 +34,22 @@ void InitAnalyzer(AnalyzerObject* self, Any version_triple, Any grammar_file, An
   }
 }
 
+// An analyzer is its parser and its walkers: an operation claims all three.
+class AnalyzerUse {
+ public:
+  explicit AnalyzerUse(CPGenAnalyzerImpl& analyzer)
+      : parser_(analyzer.logical_parser().thread_use, kTheAnalyzer),
+        walker_(analyzer.node_walker().thread_use, kTheAnalyzer),
+        hint_walker_(analyzer.type_hint_walker().thread_use, kTheAnalyzer) {}
+
+ private:
+  static constexpr const char* kTheAnalyzer = "the analyzer";
+
+  OneThread parser_;
+  OneThread walker_;
+  OneThread hint_walker_;
+};
+
 // While the host holds wrappers of an analyzer's nodes, what an analysis leaves in nodes must stay
 // readable: texts of the line's source, and those of hints, which stand with the line's records.
 class Retained {
@@ -53,6 +70,7 @@ nb::object Analyze(AnalyzerObject& self, Any logical, Truth in_async_def, Truth 
   LineObject& object = LineOf(logical);
   LogicalLine& line = object.line();
   if (line.parsed) return nb::none();
+  const AnalyzerUse use(*self.analyzer);
   object.BeginAnalysis();
   std::optional<SyntaxError> error;
   {
@@ -69,6 +87,7 @@ nb::object Analyze(AnalyzerObject& self, Any logical, Truth in_async_def, Truth 
 
 bool Inspect(AnalyzerObject& self, Any logical, Truth in_async_def, Truth in_embedded_expression, Truth first_in_def) {
   LineObject& object = LineOf(logical);
+  const AnalyzerUse use(*self.analyzer);
   Recording recording(&object);
   const Retained retained(*self.analyzer, object.line().source);
   return self.analyzer->InspectSingleLogical(object.line(), in_async_def, in_embedded_expression, first_in_def);
@@ -77,6 +96,7 @@ bool Inspect(AnalyzerObject& self, Any logical, Truth in_async_def, Truth in_emb
 void InspectEmbedded(AnalyzerObject& self, Any logical, Any node, Truth in_async_def, Truth first_in_def) {
   LineObject& object = LineOf(logical);
   RefOrNull(node);
+  const AnalyzerUse use(*self.analyzer);
   Recording recording(&object);
   const Retained retained(*self.analyzer, object.line().source);
   self.analyzer->InspectEmbeddedExpressions(object.line(), in_async_def, first_in_def);
@@ -123,28 +143,29 @@ void BindAnalysis(nb::module_& tarvex) {
   cls.def("__init__", &InitAnalyzer, nb::arg("version_triple"), nb::arg("grammar_file") = kPy3DefaultGrammar,
           nb::arg("keyword_seq") = nb::none(), nb::arg("py3_grammar") = true,
           nb::arg("hint_grammar_file") = kPy3DefaultGrammar);
-  cls.def("AnalyzeSingleLogical", &Analyze, nb::arg("logical"), nb::arg("in_async_def"),
-          nb::arg("first_in_def") = false,
-          "Analyses a line once and gives the exception that describes a failure, or None.");
-  cls.def("_InspectSingleLogical", &Inspect, nb::arg("logical"), nb::arg("in_async_def"),
-          nb::arg("in_embedded_expression") = false, nb::arg("first_in_def") = false,
-          "Parses and walks a line; raises what AnalyzeSingleLogical returns.");
-  cls.def("_InspectEmbeddedExpressions", &InspectEmbedded, nb::arg("logical"), nb::arg("node"), nb::arg("in_async_def"),
-          nb::arg("first_in_def"), "Inspects the line's embedded expressions and copies their records up.");
-  cls.def(
-      "ParseToNode",
+  DefOperation(cls, "AnalyzeSingleLogical", &Analyze, nb::arg("logical"), nb::arg("in_async_def"),
+               nb::arg("first_in_def") = false,
+               "Analyses a line once and gives the exception that describes a failure, or None.");
+  DefOperation(cls, "_InspectSingleLogical", &Inspect, nb::arg("logical"), nb::arg("in_async_def"),
+               nb::arg("in_embedded_expression") = false, nb::arg("first_in_def") = false,
+               "Parses and walks a line; raises what AnalyzeSingleLogical returns.");
+  DefOperation(cls, "_InspectEmbeddedExpressions", &InspectEmbedded, nb::arg("logical"), nb::arg("node"),
+               nb::arg("in_async_def"), nb::arg("first_in_def"),
+               "Inspects the line's embedded expressions and copies their records up.");
+  DefOperation(
+      cls, "ParseToNode",
       [](AnalyzerObject& self, Any logical, Truth in_async_def) {
         return ForwardParseToNode(self.analyzer->logical_parser(), logical, in_async_def);
       },
       nb::arg("logical"), nb::arg("in_async_def"));
-  cls.def(
-      "ParseTokenListToNode",
+  DefOperation(
+      cls, "ParseTokenListToNode",
       [](AnalyzerObject& self, Any logical, Truth in_async_def) {
         return ForwardParseTokenListToNode(self.analyzer->logical_parser(), logical, in_async_def);
       },
       nb::arg("logical"), nb::arg("in_async_def"));
-  cls.def(
-      "GetTypeParameterNodes",
+  DefOperation(
+      cls, "GetTypeParameterNodes",
       [](AnalyzerObject& self, Any toks) {
         return ForwardGetTypeParameterNodes(self.analyzer->logical_parser(), toks);
       },
@@ -172,8 +193,8 @@ void BindAnalysis(nb::module_& tarvex) {
     return object.type_hint_walker;
   });
 
-  tarvex.def("CreateSyntaxError", &SyntaxErrorFor, nb::arg("msg"), nb::arg("logical"), nb::arg("context"),
-             nb::arg("pos_info_in_tok") = nb::none(), "The SyntaxError for a place in a logical line.");
+  DefOperation(tarvex, "CreateSyntaxError", &SyntaxErrorFor, nb::arg("msg"), nb::arg("logical"), nb::arg("context"),
+               nb::arg("pos_info_in_tok") = nb::none(), "The SyntaxError for a place in a logical line.");
 }
 
 }  // namespace quillet::host

@@ -3,6 +3,7 @@
 #include "bindings/convert.h"
 #include "bindings/errors.h"
 #include "bindings/hints_object.h"
+#include "bindings/host_call.h"
 #include "bindings/line_object.h"
 #include "bindings/node_ref.h"
 #include "bindings/parser_object.h"
@@ -11,6 +12,8 @@
 
 namespace quillet::host {
 namespace {
+
+constexpr const char* kTheWalker = "the walker";
 
 // ---- the dispatch walker ----
 
@@ -85,7 +88,7 @@ class WalkOfHost {
     // The end of a walk leaves the walker without a line, whatever the host handed in meanwhile; only
     // where there was nothing to walk it keeps what it had.
     object_.handed_in.Replace(object_.walker->fLogical == nullptr ? nb::object() : std::exchange(outer_, {}));
-    object_.handed_in.LetGo(std::move(outer_));
+    if (outer_.is_valid()) LetGo(std::move(outer_));
   }
   WalkOfHost(const WalkOfHost&) = delete;
   WalkOfHost& operator=(const WalkOfHost&) = delete;
@@ -113,6 +116,7 @@ void WalkByDict(nb::handle self, Any node, Any logical, Truth first_in_def) {
   NodeRef* root = RefOrNull(node);
   LineObject& line = LineOf(logical);
   RefuseSecondWalk(object);
+  const OneThread use(object.walker->thread_use, kTheWalker);
   const WalkOfHost walk(object, logical);
   const Recording recording(&line);
   const DictVisits visits(object, self, SourceOf(root));
@@ -125,7 +129,8 @@ int Traverse(PyObject* self, visitproc visit, void* arg) {
   if (!nb::inst_ready(self)) return 0;
   auto& object = *nb::inst_ptr<DispatchObject>(self);
   Py_VISIT(object.dispatch_dict.ptr());
-  return object.handed_in.Traverse(visit, arg);
+  Py_VISIT(object.handed_in.line.ptr());
+  return 0;
 }
 
 int Clear(PyObject* self) {
@@ -163,12 +168,13 @@ void BindDispatchWalker(nb::module_& m) {
   DefCount<&CDispatchWalker::fMaxVisits>(cls, "_fMaxVisits");
   DefCount<&CDispatchWalker::fMaxRecurseCount>(cls, "_fMaxRecurseCount");
   cls.def_prop_ro("_fNodeStack", [](DispatchObject& self) { return WrapList(self.walker->fNodeStack, {}); });
-  cls.def("Walk", &WalkByDict, nb::arg("node"), nb::arg("logical"), nb::arg("first_in_def"));
-  cls.def(
-      "_VisitNode",
+  DefOperation(cls, "Walk", &WalkByDict, nb::arg("node"), nb::arg("logical"), nb::arg("first_in_def"));
+  DefOperation(
+      cls, "_VisitNode",
       [](nb::handle self, Any node) {
         auto& object = nb::cast<DispatchObject&>(self);
         NodeRef* root = RefOrNull(node);
+        const OneThread use(object.walker->thread_use, kTheWalker);
         const DictVisits visits(object, self, SourceOf(root));
         object.walker->VisitNode(root == nullptr ? nullptr : root->node());
       },
@@ -176,6 +182,14 @@ void BindDispatchWalker(nb::module_& m) {
 }
 
 // ---- the hint walker ----
+
+// Around an operation that the host calls by name.
+struct HintOperation {
+  explicit HintOperation(HintWalkerObject& self)
+      : use(self.walker->thread_use, kTheWalker), recording(self.walker->fLogical) {}
+  OneThread use;
+  Recording recording;
+};
 
 using HintClass = nb::class_<HintWalkerObject, DispatchObject>;
 
@@ -213,58 +227,58 @@ nb::object WrapHintTree(HintWalkerObject& self, CNode* node) {
 template <class Statement, bool (CTypeHintWalker::*Operation)(CNode*)>
 bool VisitStatement(HintWalkerObject& self, Any node) {
   CNode* root = RefOf(node, NodeKindRange<Statement>::kFirst).node();
-  Recording recording(self.walker->fLogical);
+  const HintOperation operation(self);
   return (self.hints().*Operation)(root);
 }
 
 nb::object TextAndIndex(nb::object text, int32_t tok_i) { return nb::make_tuple(std::move(text), tok_i); }
 
 void BindHintComments(HintClass& cls) {
-  cls.def(
-      "_FindEndingTypeComment",
+  DefOperation(
+      cls, "_FindEndingTypeComment",
       [](HintWalkerObject& self, Any node) {
         const CTypeHintWalker::Hint hint = self.hints().FindEndingTypeComment(RefOf(node).node());
         return TextAndIndex(hint.found ? StrOf(hint.text) : nb::object(nb::none()), hint.tok_i);
       },
       nb::arg("node"));
-  cls.def(
-      "_GetHintFromComment",
+  DefOperation(
+      cls, "_GetHintFromComment",
       [](HintWalkerObject&, Any comment) {
         const HostText text = HostText::FromStr(comment);
         std::string hint;
         return CTypeHintWalker::GetHintFromComment(text.text(), hint) ? StrOf(hint) : nb::object(nb::none());
       },
       nb::arg("comment"));
-  cls.def(
-      "_GetRowRange",
+  DefOperation(
+      cls, "_GetRowRange",
       [](HintWalkerObject& self, Any node) {
         const auto [first, end] = self.hints().GetRowRange(RefOf(node).node());
         return nb::make_tuple(first, end);
       },
       nb::arg("node"));
-  cls.def(
-      "_FindComment",
+  DefOperation(
+      cls, "_FindComment",
       [](HintWalkerObject& self, Any row, Any logical) {
         LogicalLine* line = logical.is_none() ? nullptr : &LineOf(logical).line();
         const CTypeHintWalker::Comment comment = self.hints().FindComment(Int64Of(row), line);
         return TextAndIndex(StrOf(comment.text), comment.tok_i);
       },
       nb::arg("row"), nb::arg("logical") = nb::none());
-  cls.def(
-      "_IsDottedName",
+  DefOperation(
+      cls, "_IsDottedName",
       [](HintWalkerObject&, Any text) { return CTypeHintWalker::IsDottedName(HostText::FromStr(text).text()); },
       nb::arg("text"));
-  cls.def(
-      "_ParseHint",
+  DefOperation(
+      cls, "_ParseHint",
       [](HintWalkerObject& self, Any hint, Any tok_i, Truth call_general_node_walker) {
         const HostText text = HostText::FromStr(hint);
         const int32_t index = Int32Of(tok_i);
-        Recording recording(self.walker->fLogical);
+        const HintOperation operation(self);
         return WrapHintTree(self, self.hints().ParseHint(text.text(), index, call_general_node_walker));
       },
       nb::arg("hint"), nb::arg("tok_i"), nb::arg("call_general_node_walker"));
-  cls.def(
-      "_RaiseHintSyntaxError",
+  DefOperation(
+      cls, "_RaiseHintSyntaxError",
       [](HintWalkerObject& self, Any tok_i, Any offset) {
         self.hints().RaiseHintSyntaxError(Int32Of(tok_i), Int64Of(offset));
       },
@@ -272,54 +286,54 @@ void BindHintComments(HintClass& cls) {
 }
 
 void BindHintStatements(HintClass& cls) {
-  cls.def("_VisitExprStmt", &VisitStatement<CExprStmt, &CTypeHintWalker::VisitExprStmt>, nb::arg("node"));
-  cls.def("_VisitForStmt", &VisitStatement<CForStmt, &CTypeHintWalker::VisitForStmt>, nb::arg("node"));
-  cls.def("_VisitWithStmt", &VisitStatement<CWithStmt, &CTypeHintWalker::VisitWithStmt>, nb::arg("node"));
-  cls.def(
-      "_VisitFuncdefStmt",
+  DefOperation(cls, "_VisitExprStmt", &VisitStatement<CExprStmt, &CTypeHintWalker::VisitExprStmt>, nb::arg("node"));
+  DefOperation(cls, "_VisitForStmt", &VisitStatement<CForStmt, &CTypeHintWalker::VisitForStmt>, nb::arg("node"));
+  DefOperation(cls, "_VisitWithStmt", &VisitStatement<CWithStmt, &CTypeHintWalker::VisitWithStmt>, nb::arg("node"));
+  DefOperation(
+      cls, "_VisitFuncdefStmt",
       [](HintWalkerObject& self, Any node) {
         VisitStatement<CFuncdefStmt, &CTypeHintWalker::VisitFuncdefStmt>(self, node);
       },
       nb::arg("node"));
-  cls.def(
-      "_ProcessTarget",
+  DefOperation(
+      cls, "_ProcessTarget",
       [](HintWalkerObject& self, Any node, Any target) {
         CNode* statement = RefOf(node).node();
         CNode* target_node = NodeOrNull(target, NodeKind::kCExpression);
-        Recording recording(self.walker->fLogical);
+        const HintOperation operation(self);
         self.hints().ProcessTarget(statement, target_node);
       },
       nb::arg("node"), nb::arg("target"));
-  cls.def(
-      "_ProcessNameAndHintNodes",
+  DefOperation(
+      cls, "_ProcessNameAndHintNodes",
       [](HintWalkerObject& self, Any name_node, Any hint_node, Truth is_arg) {
         CNode* name = NodeOrNull(name_node, NodeKind::kCExpression);
         CNode* hint = NodeOrNull(hint_node, NodeKind::kCExpression);
-        Recording recording(self.walker->fLogical);
+        const HintOperation operation(self);
         self.hints().ProcessNameAndHintNodes(name, hint, is_arg);
       },
       nb::arg("name_node"), nb::arg("hint_node"), nb::arg("is_arg"));
-  cls.def(
-      "_GetHintInfoStr",
+  DefOperation(
+      cls, "_GetHintInfoStr",
       [](HintWalkerObject& self, Any node) {
         std::string info;
         return self.hints().GetHintInfoStr(NodeOrNull(node), info) ? BytesOf(info) : nb::object(nb::none());
       },
       nb::arg("node"));
-  cls.def(
-      "_AddSymInfo",
+  DefOperation(
+      cls, "_AddSymInfo",
       [](HintWalkerObject& self, Any name, Any istr, Truth is_arg) {
         const HostText name_text = HostText::FromStrOrBytes(name);
         const HostText info_text = HostText::FromStrOrBytes(istr);
-        Recording recording(self.walker->fLogical);
+        const HintOperation operation(self);
         self.hints().AddSymInfo(name_text.text(), info_text.text(), is_arg);
       },
       nb::arg("name"), nb::arg("istr"), nb::arg("is_arg"));
 }
 
 void BindSignatures(HintClass& cls) {
-  cls.def(
-      "_RewriteFuncdefCommentHint",
+  DefOperation(
+      cls, "_RewriteFuncdefCommentHint",
       [](HintWalkerObject&, Any hint) {
         const HostText text = HostText::FromStr(hint);
         const CTypeHintWalker::RewrittenHint rewritten = CTypeHintWalker::RewriteFuncdefCommentHint(text.text());
@@ -329,26 +343,26 @@ void BindSignatures(HintClass& cls) {
         return nb::make_tuple(tokens, offsets);
       },
       nb::arg("hint"));
-  cls.def(
-      "_ProcessFuncdefComment",
+  DefOperation(
+      cls, "_ProcessFuncdefComment",
       [](HintWalkerObject& self, Any hint, Any tok_i, Any funcdef_logical, Truth is_arg) {
         const HostText text = HostText::FromStr(hint);
         const int32_t index = Int32Of(tok_i);
         LogicalLine* line = funcdef_logical.is_none() ? nullptr : &LineOf(funcdef_logical).line();
-        Recording recording(self.walker->fLogical);
+        const HintOperation operation(self);
         self.hints().ProcessFuncdefComment(text.text(), index, line, is_arg);
       },
       nb::arg("hint"), nb::arg("tok_i"), nb::arg("funcdef_logical"), nb::arg("is_arg"));
-  cls.def(
-      "_ProcessArgSpecificComment",
+  DefOperation(
+      cls, "_ProcessArgSpecificComment",
       [](HintWalkerObject& self, Any arg) {
         const CArgInfo info = ArgOf(arg);
-        Recording recording(self.walker->fLogical);
+        const HintOperation operation(self);
         self.hints().ProcessArgSpecificComment(info);
       },
       nb::arg("arg"));
-  cls.def(
-      "_ParseFuncdefCommentHint",
+  DefOperation(
+      cls, "_ParseFuncdefCommentHint",
       [](HintWalkerObject& self, Any hint, Any tok_i) {
         const HostText text = HostText::FromStr(hint);
         return WrapHintTree(self, self.hints().ParseFuncdefCommentHint(text.text(), Int32Of(tok_i)));
@@ -407,22 +421,23 @@ void BindHintWalker(nb::module_& m) {
   DefConverter<&HintWalkerObject::name_conv, &CTypeHintWalker::name_conv>(cls, "_fNameConv");
   DefConverter<&HintWalkerObject::hint_conv, &CTypeHintWalker::hint_conv>(cls, "_fHintConv");
   cls.def_prop_ro("_fGeneralNodeWalker", [](HintWalkerObject& self) { return self.general_node_walker; });
-  cls.def(
-      "Walk",
+  DefOperation(
+      cls, "Walk",
       [](HintWalkerObject& self, Any node, Any logical, Truth first_in_def) {
         CNode* root = NodeOrNull(node);
         LineObject& line = LineOf(logical);
         if (root != nullptr) RefuseSecondWalk(self);
+        const OneThread use(self.walker->thread_use, kTheWalker);
         const WalkOfHost walk(self, logical);
         const Recording recording(&line);
         self.hints().WalkAnyTree(root, &line.line(), first_in_def);
       },
       nb::arg("node"), nb::arg("logical"), nb::arg("first_in_def"));
-  cls.def(
-      "_VisitNode",
+  DefOperation(
+      cls, "_VisitNode",
       [](HintWalkerObject& self, Any node) {
         CNode* root = NodeOrNull(node);
-        Recording recording(self.walker->fLogical);
+        const HintOperation operation(self);
         self.walker->VisitNode(root);
       },
       nb::arg("node"));

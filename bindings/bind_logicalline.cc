@@ -10,6 +10,7 @@
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/errors.h"
+#include "bindings/host_call.h"
 #include "bindings/line_object.h"
 #include "lines/cutter.h"
 #include "lines/logical_line.h"
@@ -90,22 +91,6 @@ PyObject* PairOf(const Record& row) {
   return pair;
 }
 
-// What lines gave up while the core was waiting for the host in the middle of an operation, which may
-// still read it. It is let go of when the next such thing comes up with the core at rest.
-std::vector<std::shared_ptr<const void>>& Retired() {
-  static auto* retired = new std::vector<std::shared_ptr<const void>>;  // outlives the last lines
-  return *retired;
-}
-
-template <class T>
-void Retire(T&& given_up) {
-  if (HostCall::IsUnderWay()) {
-    Retired().push_back(std::make_shared<const std::decay_t<T>>(std::forward<T>(given_up)));
-  } else {
-    Retired().clear();
-  }
-}
-
 // The half of a host's pair as bytes that the core may keep a moment.
 Text BytesOfHalf(nb::handle half, HostText& keep) {
   keep = HostText::FromBytes(half);
@@ -142,6 +127,28 @@ void LineObject::UpdateHooks() {
   line_->hooks = seen ? this : nullptr;
 }
 
+void LineObject::HoldsHostObject() {
+  if (self_ != nullptr && !PyObject_GC_IsTracked(self_)) PyObject_GC_Track(self_);
+}
+
+int LineObject::Traverse(visitproc visit, void* arg) const {
+  Py_VISIT(type_.ptr());
+  Py_VISIT(toks_.ptr());
+  Py_VISIT(positions_.ptr());
+  Py_VISIT(tok_types_.ptr());
+  Py_VISIT(equivs_.list.ptr());
+  Py_VISIT(arg_equivs_.list.ptr());
+  return 0;
+}
+
+void LineObject::Clear() {
+  const RecordList equivs = std::exchange(equivs_, {});
+  const RecordList arg_equivs = std::exchange(arg_equivs_, {});
+  const nb::object tok_types = std::move(tok_types_);
+  has_host_tok_types_ = false;
+  UpdateHooks();
+}
+
 void LineObject::SetRow(const Ref<SourceText>& source, const LineRow& row, std::shared_ptr<SharedStore> shared) {
   SetFromRow(*line_, source, row);
   shared_ = std::move(shared);
@@ -160,6 +167,7 @@ void LineObject::SetType(nb::handle text) {
 
 nb::object LineObject::GetToks() {
   if (!toks_.is_valid()) {
+    const WithoutCollector all_at_once;
     nb::object tuple = nb::steal(PyTuple_New(static_cast<Py_ssize_t>(line_->toks.size())));
     if (!tuple.is_valid()) throw nb::python_error();
     for (size_t i = 0; i < line_->toks.size(); ++i)
@@ -175,16 +183,18 @@ void LineObject::SetToks(nb::handle sequence) {
   // Records may refer to the old source, and so may positions.
   if (!line_->has_stored_positions()) SetPositions(GetPositions());
   MoveToOwnStore();
-  Retire(std::exchange(line_->source, source));
+  LetGo(std::exchange(line_->source, source));
   line_->toks = source->tokens;
   line_->no_embedded = false;
   if (!token_count_is_set_) line_->token_count = static_cast<int32_t>(source->tokens.size());
   toks_ = std::move(tuple);
+  HoldsHostObject();
   if (!has_host_tok_types_) tok_types_.reset();
 }
 
 nb::object LineObject::GetTokTypes() {
   if (!tok_types_.is_valid()) {
+    const WithoutCollector all_at_once;
     nb::object list = nb::steal(PyList_New(static_cast<Py_ssize_t>(line_->toks.size())));
     if (!list.is_valid()) throw nb::python_error();
     for (size_t i = 0; i < line_->toks.size(); ++i) {
@@ -200,12 +210,14 @@ nb::object LineObject::GetTokTypes() {
 void LineObject::SetTokTypes(nb::handle list) {
   if (!PyList_Check(list.ptr())) ThrowExpected("list", list);
   tok_types_ = nb::borrow(list);
+  HoldsHostObject();
   has_host_tok_types_ = true;
   UpdateHooks();
 }
 
 nb::object LineObject::GetPositions() {
   if (!positions_.is_valid()) {
+    const WithoutCollector all_at_once;
     const PositionView view = line_->positions();
     nb::object tuple = nb::steal(PyTuple_New(static_cast<Py_ssize_t>(view.size())));
     if (!tuple.is_valid()) throw nb::python_error();
@@ -220,8 +232,9 @@ nb::object LineObject::GetPositions() {
 
 void LineObject::SetPositions(nb::handle sequence) {
   nb::object tuple = TupleOf(sequence);
-  Retire(line_->SetPositions(PositionsOf(tuple)));
+  LetGo(line_->SetPositions(PositionsOf(tuple)));
   positions_ = std::move(tuple);
+  HoldsHostObject();
 }
 
 void LineObject::SetTokenCount(int32_t count) {
@@ -230,6 +243,7 @@ void LineObject::SetTokenCount(int32_t count) {
 }
 
 void LineObject::Extend(RecordList& records, std::span<const Record> rows) {
+  const WithoutCollector all_at_once;
   for (; records.made < rows.size(); ++records.made) {
     nb::object pair = nb::steal(PairOf(rows[records.made]));
     if (PyList_Append(records.list.ptr(), pair.ptr()) < 0) throw nb::python_error();
@@ -239,6 +253,7 @@ void LineObject::Extend(RecordList& records, std::span<const Record> rows) {
 nb::object LineObject::ReadRecords(RecordList& records, std::span<const Record> rows) {
   if (!records.list.is_valid()) {
     if (rows.empty()) return nb::none();
+    const WithoutCollector all_at_once;
     nb::object list = nb::steal(PyList_New(static_cast<Py_ssize_t>(rows.size())));
     if (!list.is_valid()) throw nb::python_error();
     for (size_t i = 0; i < rows.size(); ++i) PyList_SET_ITEM(list.ptr(), i, PairOf(rows[i]));
@@ -261,6 +276,7 @@ void LineObject::SetTypeEquivs(nb::handle list) {
   BuiltinClearDerivedInfo();
   if (!arg_list.is_none()) arg_equivs_ = {arg_list, 0};
   if (!list.is_none()) equivs_ = {nb::borrow(list), 0};
+  HoldsHostObject();
   UpdateHooks();
 }
 
@@ -270,6 +286,7 @@ void LineObject::SetArgTypeEquivs(nb::handle list) {
   BuiltinClearDerivedInfo();
   if (!other_list.is_none()) equivs_ = {other_list, 0};
   if (!list.is_none()) arg_equivs_ = {nb::borrow(list), 0};
+  HoldsHostObject();
   UpdateHooks();
 }
 
@@ -284,7 +301,7 @@ bool LineObject::IsAtEndOfStore() const {
 void LineObject::MoveToOwnStore() {
   const bool is_empty = line_->type_equivs().empty() && line_->arg_type_equivs().empty();
   if (is_empty && !writes_to_shared_) {
-    Retire(std::move(shared_));
+    LetGo(std::move(shared_));
     shared_.reset();  // the line makes a store of its own at its first record
     return;
   }
@@ -298,7 +315,7 @@ void LineObject::MoveToOwnStore() {
   for (const Record& row : kept) line_->DirectAppend(copy(row.name()), copy(row.info()));
   for (const Record& row : kept_args) line_->DirectAppendArg(copy(row.name()), copy(row.info()));
   // The store is private now, so the line is at its end for good.
-  Retire(std::exchange(shared_, std::move(own)));
+  LetGo(std::exchange(shared_, std::move(own)));
   writes_to_shared_ = true;
 }
 
@@ -371,7 +388,7 @@ void LineObject::BuiltinAppendArg(Text name, Text info) {
 void LineObject::BuiltinClearDerivedInfo() {
   equivs_ = {};
   arg_equivs_ = {};
-  if (HostCall::IsUnderWay() && !writes_to_shared_) {
+  if (IsUnderWay() && !writes_to_shared_) {
     // What the core has in hand may stand among the texts of the line's own store.
     if (!shared_) shared_ = std::make_shared<SharedStore>();
     writes_to_shared_ = true;
@@ -385,6 +402,7 @@ void LineObject::BuiltinClearDerivedInfo() {
 }
 
 nb::object LineObject::BuiltinGetExpLogicals() {
+  const WithoutCollector all_at_once;
   EmbeddedLines embedded = line_->DirectGetExpLogicals();
   nb::object tuple = nb::steal(PyTuple_New(static_cast<Py_ssize_t>(embedded.owned.size())));
   if (!tuple.is_valid()) throw nb::python_error();
@@ -536,6 +554,7 @@ nb::object NewInstance(Args&&... args) {
   new (object) LineObject(std::forward<Args>(args)...);
   nb::inst_mark_ready(instance);
   object->Attach(instance.ptr());
+  PyObject_GC_UnTrack(instance.ptr());
   return instance;
 }
 
@@ -554,6 +573,7 @@ nb::object CutToTuple(const Ref<SourceText>& source, Version version) {
   std::vector<LineRow> rows;
   CutLines(*source, version, rows);
   auto shared = std::make_shared<SharedStore>();
+  const WithoutCollector all_at_once;
   nb::object tuple = nb::steal(PyTuple_New(static_cast<Py_ssize_t>(rows.size())));
   if (!tuple.is_valid()) throw nb::python_error();
   for (size_t i = 0; i < rows.size(); ++i)
@@ -562,6 +582,20 @@ nb::object CutToTuple(const Ref<SourceText>& source, Version version) {
 }
 
 namespace {
+
+int TraverseLine(PyObject* self, visitproc visit, void* arg) {
+  Py_VISIT(Py_TYPE(self));
+  return nb::inst_ready(self) ? nb::inst_ptr<LineObject>(self)->Traverse(visit, arg) : 0;
+}
+
+int ClearLine(PyObject* self) {
+  if (nb::inst_ready(self)) nb::inst_ptr<LineObject>(self)->Clear();
+  return 0;
+}
+
+const PyType_Slot kLineSlots[] = {{Py_tp_traverse, reinterpret_cast<void*>(TraverseLine)},
+                                  {Py_tp_clear, reinterpret_cast<void*>(ClearLine)},
+                                  {0, nullptr}};
 
 void InitLine(nb::pointer_and_handle<LineObject> self, Any type, Any toks, Any positions, Any tok_types, Any parsed,
               Any first_line, Any token_count) {
@@ -623,7 +657,7 @@ void BindLogicalline(nb::module_& tarvex) {
 #include "lines/line_kinds.def"
   m.attr("kErrorTokenPrefix") = "error";
 
-  nb::class_<LineObject> cls(m, "CLogicalLine",
+  nb::class_<LineObject> cls(m, "CLogicalLine", nb::type_slots(kLineSlots),
                              "One logical line of Python: its tokens, and what analysis recorded on it.");
   g.line_type = (PyTypeObject*)cls.ptr();
   cls.def("__init__", &InitLine, nb::arg("type") = nb::str("unknown"), nb::arg("toks") = nb::tuple(),

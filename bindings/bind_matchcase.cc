@@ -7,6 +7,7 @@
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/errors.h"
+#include "bindings/host_call.h"
 #include "bindings/matchcase_object.h"
 #include "bindings/node_ref.h"
 #include "bindings/parser_object.h"
@@ -245,25 +246,26 @@ void BindMatchcase(nb::module_& tarvex) {
       },
       nb::arg("value"));
 
-  cls.def("ParseMatchStmt", &ParseStatement<&CMatchCaseStatementParser::ParseMatchStmtImpl>, nb::arg("toks"),
-          nb::arg("positions"), "A CMatchStmt, or None for a line that is no such statement.");
-  cls.def("ParseCaseStmt", &ParseStatement<&CMatchCaseStatementParser::ParseCaseStmtImpl>, nb::arg("toks"),
-          nb::arg("positions"), "A CCaseStmt, or None for a line that is no such statement.");
-  cls.def("_ParseMatchStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseMatchStmtImpl>);
-  cls.def("_ParseCaseStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseCaseStmtImpl>);
-  cls.def("_RemoveSkipToks", &RemoveSkipToks, nb::arg("toks"), nb::arg("positions"));
-  cls.def("_NonNestedFindTokenIndex", &NonNestedFindTokenIndex, nb::arg("tok"), nb::arg("start"), nb::arg("end"));
-  cls.def("_NodeForPattern", &NodeForPattern, nb::arg("start"), nb::arg("end"), nb::arg("allow_as") = true);
+  DefOperation(cls, "ParseMatchStmt", &ParseStatement<&CMatchCaseStatementParser::ParseMatchStmtImpl>, nb::arg("toks"),
+               nb::arg("positions"), "A CMatchStmt, or None for a line that is no such statement.");
+  DefOperation(cls, "ParseCaseStmt", &ParseStatement<&CMatchCaseStatementParser::ParseCaseStmtImpl>, nb::arg("toks"),
+               nb::arg("positions"), "A CCaseStmt, or None for a line that is no such statement.");
+  DefOperation(cls, "_ParseMatchStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseMatchStmtImpl>);
+  DefOperation(cls, "_ParseCaseStmtImpl", &ParseStep<&CMatchCaseStatementParser::ParseCaseStmtImpl>);
+  DefOperation(cls, "_RemoveSkipToks", &RemoveSkipToks, nb::arg("toks"), nb::arg("positions"));
+  DefOperation(cls, "_NonNestedFindTokenIndex", &NonNestedFindTokenIndex, nb::arg("tok"), nb::arg("start"),
+               nb::arg("end"));
+  DefOperation(cls, "_NodeForPattern", &NodeForPattern, nb::arg("start"), nb::arg("end"), nb::arg("allow_as") = true);
   const auto def_step = [&cls](const char* name, auto operation) {
-    cls.def(name, operation, nb::arg("start"), nb::arg("end"));
+    DefOperation(cls, name, operation, nb::arg("start"), nb::arg("end"));
   };
   def_step("_NodeForSequencePattern", &PatternStep<&CMatchCaseStatementParser::NodeForSequencePattern>);
   def_step("_NodeForMappingPattern", &PatternStep<&CMatchCaseStatementParser::NodeForMappingPattern>);
   def_step("_NodeForClassPattern", &PatternStep<&CMatchCaseStatementParser::NodeForClassPattern>);
   def_step("_NodeForDottedNameValue", &PatternStep<&CMatchCaseStatementParser::NodeForDottedNameValue>);
   def_step("_NodeForNumberPattern", &PatternStep<&CMatchCaseStatementParser::NodeForNumberPattern>);
-  cls.def("_TokNode", &TokNode, nb::arg("tok_i"));
-  cls.def("_ParseExceptionAt", &ParseExceptionAt, nb::arg("tok_i"));
+  DefOperation(cls, "_TokNode", &TokNode, nb::arg("tok_i"));
+  DefOperation(cls, "_ParseExceptionAt", &ParseExceptionAt, nb::arg("tok_i"));
 }
 
 }  // namespace quillet::host

@@ -5,6 +5,7 @@
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/errors.h"
+#include "bindings/host_call.h"
 #include "bindings/line_object.h"
 #include "bindings/matchcase_object.h"
 #include "bindings/node_ref.h"
@@ -13,6 +14,8 @@
 
 namespace quillet::host {
 namespace {
+
+constexpr const char* kTheParser = "the parser";
 
 PyObject* g_builtin_convert = nullptr;  // CPGenParserImpl.convert
 
@@ -113,6 +116,7 @@ void InitParser(nb::pointer_and_handle<ParserObject> self, Any version_triple, A
 // Runs an operation of the parser that makes nodes from a source.
 template <class Parse>
 nb::object Parsed(CPGenParserImpl& parser, const Ref<SourceText>& source, Parse&& parse) {
+  const OneThread use(parser.thread_use, kTheParser);
   PinSource(parser.factory().pool(), source);
   return Wrap(parse(), source);
 }
@@ -137,6 +141,7 @@ nb::object ParseTokenListToNode(CPGenParserImpl& parser, nb::handle toks, bool i
 
 nb::object GetTypeParameterNodes(CPGenParserImpl& parser, nb::handle toks) {
   TokensArg tokens(toks);
+  const OneThread use(parser.thread_use, kTheParser);
   PinSource(parser.factory().pool(), tokens.source);
   return WrapList(parser.GetTypeParameterNodes(tokens.toks()), tokens.source);
 }
@@ -152,15 +157,15 @@ nb::object SpecialCase(ParserObject& self, Any toks, Truth in_async_def, Any pos
 }
 
 void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
-  cls.def(
-      "ParseToNode",
+  DefOperation(
+      cls, "ParseToNode",
       [](ParserObject& self, Any logical, Truth in_async_def) {
         return ParseToNode(*self.parser, logical, in_async_def);
       },
       nb::arg("logical"), nb::arg("in_async_def"),
       "The tree of a logical line, or None for one without tokens to parse. It goes back through DiscardNode.");
-  cls.def(
-      "ParseToksToNode",
+  DefOperation(
+      cls, "ParseToksToNode",
       [](ParserObject& self, Any toks, Truth in_async_def, Any positions) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
@@ -169,8 +174,8 @@ void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
       },
       nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"),
       "The tree of tokens: special cases first, then the grammar.");
-  cls.def(
-      "_ParseToksToNodeImpl",
+  DefOperation(
+      cls, "_ParseToksToNodeImpl",
       [](ParserObject& self, Any toks, Truth in_async_def, Any positions) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
@@ -178,27 +183,28 @@ void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
                       [&] { return self.parser->ParseToksToNodeImpl(tokens.toks(), in_async_def, places.view()); });
       },
       nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"));
-  cls.def(
-      "ParseTokenListToNode",
+  DefOperation(
+      cls, "ParseTokenListToNode",
       [](ParserObject& self, Any toks, Truth in_async_def) {
         return ParseTokenListToNode(*self.parser, toks, in_async_def);
       },
       nb::arg("toks"), nb::arg("in_async_def"), "The tree of tokens without positions; no special cases.");
-  cls.def(
-      "convert",
+  DefOperation(
+      cls, "convert",
       [](ParserObject& self, Any type, Any value, Any context, Any children) {
         return ConvertSingleNode(self.parser->factory(), type, value, context, children);
       },
       nb::arg("type"), nb::arg("value"), nb::arg("context"), nb::arg("children"));
-  cls.def(
-      "DiscardNode", [](ParserObject& self, Any node) { self.parser->DiscardNode(NodeOrNull(node)); }, nb::arg("node"),
-      "Gives a tree back for reuse.");
-  cls.def(
-      "_AddTokenList",
+  DefOperation(
+      cls, "DiscardNode", [](ParserObject& self, Any node) { self.parser->DiscardNode(NodeOrNull(node)); },
+      nb::arg("node"), "Gives a tree back for reuse.");
+  DefOperation(
+      cls, "_AddTokenList",
       [](nb::handle self, Any tok_list, Any context) {
         auto& object = nb::cast<ParserObject&>(self);
         TokensArg tokens(tok_list);
         const int32_t index = Int32Of(context);
+        const OneThread use(object.parser->thread_use, kTheParser);
         PinSource(object.parser->factory().pool(), tokens.source);
         // To the engine that the host sets up and finishes.
         HostEngine engine(object, EngineOf(self));
@@ -206,43 +212,43 @@ void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
         object.parser->AddTokenList(tokens.toks(), index);
       },
       nb::arg("tok_list"), nb::arg("context"));
-  cls.def(
-      "_ShouldSkipSlash",
+  DefOperation(
+      cls, "_ShouldSkipSlash",
       [](ParserObject&, Any tok_i, Any positions) {
         PositionsArg places(positions);
         return CPGenParserImpl::ShouldSkipSlash(Int64Of(tok_i), places.view());
       },
       nb::arg("tok_i"), nb::arg("positions"));
-  cls.def(
-      "_FindNextNonSkipIndex",
+  DefOperation(
+      cls, "_FindNextNonSkipIndex",
       [](ParserObject&, Any toks, Any tok_i) {
         TokensArg tokens(toks);
         return CPGenParserImpl::FindNextNonSkipIndex(tokens.toks(), Int64Of(tok_i));
       },
       nb::arg("toks"), nb::arg("tok_i"));
-  cls.def(
-      "_FindPrevNonSkipIndex",
+  DefOperation(
+      cls, "_FindPrevNonSkipIndex",
       [](ParserObject&, Any toks, Any tok_i) {
         TokensArg tokens(toks);
         return CPGenParserImpl::FindPrevNonSkipIndex(tokens.toks(), Int64Of(tok_i));
       },
       nb::arg("toks"), nb::arg("tok_i"));
-  cls.def(
-      "_NonNestedFindTokenIndex",
+  DefOperation(
+      cls, "_NonNestedFindTokenIndex",
       [](ParserObject&, Any tok, Any toks, Any start, Any end) {
         const HostText wanted = HostText::FromStr(tok);
         TokensArg tokens(toks);
         return CPGenParserImpl::NonNestedFindTokenIndex(wanted.text(), tokens.toks(), Int64Of(start), Int64Of(end));
       },
       nb::arg("tok"), nb::arg("toks"), nb::arg("start"), nb::arg("end"));
-  cls.def(
-      "_RaiseParseError", [](ParserObject& self, Any context) { self.parser->RaiseParseError(Int64Of(context)); },
+  DefOperation(
+      cls, "_RaiseParseError", [](ParserObject& self, Any context) { self.parser->RaiseParseError(Int64Of(context)); },
       nb::arg("context"));
 }
 
 void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
-  cls.def(
-      "_ParseSpecialCases",
+  DefOperation(
+      cls, "_ParseSpecialCases",
       [](ParserObject& self, Any toks, Truth in_async_def, Any positions) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
@@ -251,16 +257,18 @@ void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
       },
       nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"));
   const auto def_case = [&cls](const char* name, auto operation) {
-    cls.def(name, operation, nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"), nb::arg("tok_i"));
+    DefOperation(cls, name, operation, nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"),
+                 nb::arg("tok_i"));
   };
   def_case("_ParseSpecialCaseParenthesizedWith", &SpecialCase<&CPGenParserImpl::ParseSpecialCaseParenthesizedWith>);
   def_case("_ParseSpecialCaseExceptStar", &SpecialCase<&CPGenParserImpl::ParseSpecialCaseExceptStar>);
   def_case("_ParseSpecialCaseWithTypeParameter", &SpecialCase<&CPGenParserImpl::ParseSpecialCaseWithTypeParameter>);
-  cls.def(
-      "_NodesForTypeParameters",
+  DefOperation(
+      cls, "_NodesForTypeParameters",
       [](ParserObject& self, Any toks, Truth in_async_def, Any positions, Any start, Any end, Truth raise_errors) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
+        const OneThread use(self.parser->thread_use, kTheParser);
         PinSource(self.parser->factory().pool(), tokens.source);
         return WrapList(self.parser->NodesForTypeParameters(tokens.toks(), in_async_def, places.view(), Int64Of(start),
                                                             Int64Of(end), raise_errors),
@@ -268,8 +276,8 @@ void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
       },
       nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"), nb::arg("start"), nb::arg("end"),
       nb::arg("raise_errors"));
-  cls.def(
-      "_CreateSingleTypeParameterNode",
+  DefOperation(
+      cls, "_CreateSingleTypeParameterNode",
       [](ParserObject& self, Any toks, Truth in_async_def, Any positions, Any start, Any end, Truth raise_errors) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
@@ -280,9 +288,10 @@ void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
       },
       nb::arg("toks"), nb::arg("in_async_def"), nb::arg("positions"), nb::arg("start"), nb::arg("end"),
       nb::arg("raise_errors"));
-  cls.def(
-      "GetTypeParameterNodes", [](ParserObject& self, Any toks) { return GetTypeParameterNodes(*self.parser, toks); },
-      nb::arg("toks"), "The type parameters that a line defines, whether or not the rest of it parses.");
+  DefOperation(
+      cls, "GetTypeParameterNodes",
+      [](ParserObject& self, Any toks) { return GetTypeParameterNodes(*self.parser, toks); }, nb::arg("toks"),
+      "The type parameters that a line defines, whether or not the rest of it parses.");
 }
 
 void BindFields(nb::class_<ParserObject, AnalyzerBase>& cls) {
@@ -304,7 +313,7 @@ void BindFields(nb::class_<ParserObject, AnalyzerBase>& cls) {
     }
     return object.match_case_parser;
   });
-  cls.def("_BuildClsForStateList", &MakeClsForStateList);
+  DefOperation(cls, "_BuildClsForStateList", &MakeClsForStateList);
   nb::dict cls_for_state;
   for (const auto& [name, kind] : KindsByStateName()) cls_for_state[StrOf(name)] = ClassOfKind(kind);
   cls.attr("kClsForState") = cls_for_state;
@@ -407,9 +416,10 @@ void BindParser(nb::module_& tarvex) {
   nb::class_<AnalyzerBase, NodeConverter> base(tarvex, "CPGenAnalyzer",
                                                "Analyses a logical line with a parser built on grammar tables.");
   base.def(nb::init<>());
-  base.def(
-      "AnalyzeSingleLogical", [](AnalyzerBase&, Any, Any, Any) { ThrowError(ErrorKind::kNotImplementedError, ""); },
-      nb::arg("logical"), nb::arg("in_async_def"), nb::arg("first_in_def") = false);
+  DefOperation(
+      base, "AnalyzeSingleLogical",
+      [](AnalyzerBase&, Any, Any, Any) { ThrowError(ErrorKind::kNotImplementedError, ""); }, nb::arg("logical"),
+      nb::arg("in_async_def"), nb::arg("first_in_def") = false);
 
   nb::class_<ParserObject, AnalyzerBase> cls(tarvex, "CPGenParserImpl", nb::type_slots(kParserSlots),
                                              "Turns the tokens of one logical line into a tree of nodes.");
@@ -420,8 +430,8 @@ void BindParser(nb::module_& tarvex) {
   BindSpecialCases(cls);
   g_builtin_convert = nb::object(cls.attr("convert")).ptr();  // kept by the class
 
-  tarvex.def(
-      "NextNonRemovedTokenInTuple",
+  DefOperation(
+      tarvex, "NextNonRemovedTokenInTuple",
       [](Any toks, Any i) {
         TokensArg tokens(toks);
         const Token* token = NextNonRemovedTokenInTuple(tokens.toks(), Int64Of(i));

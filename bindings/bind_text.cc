@@ -1,6 +1,7 @@
 // CNodeToTextConverter and its implementation.
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
+#include "bindings/host_call.h"
 #include "bindings/node_ref.h"
 #include "text/node_to_text.h"
 
@@ -35,8 +36,8 @@ void BindText(nb::module_& tarvex) {
 
   nb::class_<ConverterBase> base(tarvex, "CNodeToTextConverter", "Gives a node's text, or None.");
   base.def(nb::init<>());
-  base.def(
-      "TextForNode", [](ConverterBase&, Any node, const nb::args&, const nb::kwargs&) { RefOrNull(node); },
+  DefOperation(
+      base, "TextForNode", [](ConverterBase&, Any node, const nb::args&, const nb::kwargs&) { RefOrNull(node); },
       nb::arg("node"), nb::arg("args"), nb::arg("kwargs"));
 
   nb::class_<ConverterObject, ConverterBase> cls(tarvex, "CNodeToTextConverterImpl",
@@ -54,8 +55,8 @@ void BindText(nb::module_& tarvex) {
   cls.def_prop_ro("_fIncludeStringContents",
                   [](ConverterObject& self) { return self.converter->include_string_contents(); });
   cls.def_prop_ro("_fIncludeArgText", [](ConverterObject& self) { return self.converter->include_arg_text(); });
-  cls.def(
-      "TextForNode",
+  DefOperation(
+      cls, "TextForNode",
       [](ConverterObject& self, Any node, Truth dotted_name_only, Truth discard_simple_parens, Truth literal_only,
          Truth add_parens_if_operator) {
         return BytesOf(self.converter->TextForNode(
@@ -64,8 +65,8 @@ void BindText(nb::module_& tarvex) {
       nb::arg("node"), nb::arg("dotted_name_only") = false, nb::arg("discard_simple_parens") = true,
       nb::arg("literal_only") = false, nb::arg("add_parens_if_operator") = false,
       "The node's text as UTF-8 bytes, or None where it has none in the mode asked for.");
-  cls.def(
-      "TextForAtomPlusTrailers",
+  DefOperation(
+      cls, "TextForAtomPlusTrailers",
       [](ConverterObject& self, Any atom, Any trailers, Truth dotted_name_only, Truth discard_simple_parens,
          Truth literal_only) {
         const std::vector<CNode*> nodes = NodesOf(trailers, NodeKind::kCTrailer);
@@ -74,8 +75,8 @@ void BindText(nb::module_& tarvex) {
       },
       nb::arg("atom"), nb::arg("trailers"), nb::arg("dotted_name_only") = false,
       nb::arg("discard_simple_parens") = true, nb::arg("literal_only") = false);
-  cls.def(
-      "_TextForStringLiteral",
+  DefOperation(
+      cls, "_TextForStringLiteral",
       [](ConverterObject& self, Any node) {
         CNode* literal = RefOf(node, NodeKind::kCStringLiteral).node();
         return BytesOf(self.converter->TextForStringLiteral(static_cast<CStringLiteral*>(literal)));

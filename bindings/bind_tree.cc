@@ -5,6 +5,7 @@
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/errors.h"
+#include "bindings/host_call.h"
 #include "bindings/node_ref.h"
 #include "tree/arg_info.h"
 #include "tree/factory.h"
@@ -136,8 +137,8 @@ void BindNodeCore(nb::class_<NodeHandle<CNode>>& cls) {
     return node->fClsInfo == nullptr ? nb::object(nb::handle((PyObject*)Py_TYPE(self.ptr())).attr("__name__"))
                                      : StrOf(node->GetStateName());
   });
-  cls.def(
-      "_DoesChildTextMatch",
+  DefOperation(
+      cls, "_DoesChildTextMatch",
       [](Handle& self, Any text) {
         self.Synchronise();
         const HostText wanted = HostText::FromStr(text);
@@ -160,7 +161,7 @@ void BindNodeClasses(nb::module_& m) {
   };
   const auto bind = [&]<class T, class Base>(NodeKind kind, const char* name, T*, Base*) {
     if constexpr (std::is_same_v<T, Base>) {
-      nb::class_<NodeHandle<T>> cls(m, name, "A node of a syntax tree.");
+      nb::class_<NodeHandle<T>> cls(m, name, nb::type_slots(kNodeSlots), "A node of a syntax tree.");
       cls.def("__init__", &InitNode<T>, nb::arg("cls_info") = nb::none());
       remember(kind, cls);
       BindNodeCore(cls);
@@ -192,8 +193,30 @@ struct AsNameObject {
   nb::object as_name = nb::none();
 };
 
+// A host's node may hold the record that it stands in.
+int TraverseArg(PyObject* self, visitproc visit, void* arg) {
+  Py_VISIT(Py_TYPE(self));
+  if (!nb::inst_ready(self)) return 0;
+  const ArgInfoObject& object = *nb::inst_ptr<ArgInfoObject>(self);
+  Py_VISIT(object.name.ptr());
+  Py_VISIT(object.value.ptr());
+  Py_VISIT(object.prefix.ptr());
+  Py_VISIT(object.type_expr.ptr());
+  return 0;
+}
+
+int ClearArg(PyObject* self) {
+  if (nb::inst_ready(self)) const ArgInfoObject gone = std::exchange(*nb::inst_ptr<ArgInfoObject>(self), {});
+  return 0;
+}
+
+const PyType_Slot kArgSlots[] = {{Py_tp_traverse, reinterpret_cast<void*>(TraverseArg)},
+                                 {Py_tp_clear, reinterpret_cast<void*>(ClearArg)},
+                                 {0, nullptr}};
+
 void BindRecords(nb::module_& m) {
-  nb::class_<ArgInfoObject> arg(m, "CArgInfo", "One parameter of a definition, or one argument of a call.");
+  nb::class_<ArgInfoObject> arg(m, "CArgInfo", nb::type_slots(kArgSlots),
+                                "One parameter of a definition, or one argument of a call.");
   arg.def(nb::init<>());
   const auto node_field = [&](const char* name, nb::object ArgInfoObject::*field) {
     arg.def_prop_rw(
@@ -430,17 +453,17 @@ void BindFactory(nb::module_& m) {
                   [](FactoryObject& self) { return WrapClassInfo(self.factory->keyword_class_info()); });
   cls.def_prop_ro("_fKeywords", [](FactoryObject& self) { return self.keywords; });
   cls.def_prop_ro("_fOperatorStrToNumber", &OperatorNumbers);
-  cls.def(
-      "ConvertSingleNode",
+  DefOperation(
+      cls, "ConvertSingleNode",
       [](FactoryObject& self, Any nodetype, Any text, Any context, Any children) {
         return ConvertSingleNode(*self.factory, nodetype, text, context, children);
       },
       nb::arg("nodetype"), nb::arg("text"), nb::arg("context"), nb::arg("children"),
       "The node for a reduced rule or a token: a new one, or the statement of a statement and its line end.");
-  cls.def("NewNode", &NewNode, nb::arg("cls_info"), nb::arg("nodetype"), nb::arg("text"), nb::arg("context"),
-          nb::arg("children"), "A node of the record's class, off its free list.");
-  cls.def(
-      "NewKeywordNode",
+  DefOperation(cls, "NewNode", &NewNode, nb::arg("cls_info"), nb::arg("nodetype"), nb::arg("text"), nb::arg("context"),
+               nb::arg("children"), "A node of the record's class, off its free list.");
+  DefOperation(
+      cls, "NewKeywordNode",
       [](FactoryObject& self, Any text, Any context) {
         const Text node_text = NodeText(self.factory->pool(), text);
         return Wrap(WithContext(self.factory->pool(), context,
@@ -448,8 +471,8 @@ void BindFactory(nb::module_& m) {
                     {});
       },
       nb::arg("text"), nb::arg("context"));
-  cls.def(
-      "NewNameNode",
+  DefOperation(
+      cls, "NewNameNode",
       [](FactoryObject& self, Any text, Any context) {
         const Text node_text = NodeText(self.factory->pool(), text);
         return Wrap(WithContext(self.factory->pool(), context,
@@ -457,8 +480,8 @@ void BindFactory(nb::module_& m) {
                     {});
       },
       nb::arg("text"), nb::arg("context"));
-  cls.def(
-      "CreateOperatorNode",
+  DefOperation(
+      cls, "CreateOperatorNode",
       [](FactoryObject& self, Any op_str, Any context) {
         NodePool& pool = self.factory->pool();
         const HostText text = HostText::FromStr(op_str, true);
@@ -469,20 +492,22 @@ void BindFactory(nb::module_& m) {
             WithContext(pool, context, [&](Context owned) { return self.factory->CreateOperatorNode(op, owned); }), {});
       },
       nb::arg("op_str"), nb::arg("context"), "An operator's leaf, or None for text that is no operator.");
-  cls.def(
-      "DiscardNodes", [](FactoryObject& self, Any node) { self.factory->DiscardNodes(NodeOrNull(node)); },
+  DefOperation(
+      cls, "DiscardNodes", [](FactoryObject& self, Any node) { self.factory->DiscardNodes(NodeOrNull(node)); },
       nb::arg("node"), "Gives a whole tree back to the free lists.");
-  cls.def(
-      "RecursiveConvert",
+  DefOperation(
+      cls, "RecursiveConvert",
       [](FactoryObject& self, Any raw_node) { return Wrap(RecursiveConvert(*self.factory, raw_node), {}); },
       nb::arg("raw_node"), "The tree of a raw node (type, value, context, children).");
 
-  m.def(
-      "__FinishedWithNode", [](Any node, Any depth) { FinishedWithNodeAtDepth(NodeOrNull(node), Int64Of(depth)); },
+  DefOperation(
+      m, "__FinishedWithNode", [](Any node, Any depth) { FinishedWithNodeAtDepth(NodeOrNull(node), Int64Of(depth)); },
       nb::arg("node"), nb::arg("depth"));
   const auto finished = [](Any node) { FinishedWithNode(NodeOrNull(node)); };
-  m.def("FinishedWithNode", finished, nb::arg("node"), "Gives a whole tree back for reuse. Each tree goes back once.");
-  m.def("NotCompiledFinishedWithNode", finished, nb::arg("node"), "FinishedWithNode, for callers in host-level code.");
+  DefOperation(m, "FinishedWithNode", finished, nb::arg("node"),
+               "Gives a whole tree back for reuse. Each tree goes back once.");
+  DefOperation(m, "NotCompiledFinishedWithNode", finished, nb::arg("node"),
+               "FinishedWithNode, for callers in host-level code.");
 }
 
 }  // namespace

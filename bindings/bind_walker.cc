@@ -1,9 +1,11 @@
 // CNodeWalker: the walk, and each of its operations by name.
+#include <optional>
 #include <type_traits>
 
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/errors.h"
+#include "bindings/host_call.h"
 #include "bindings/line_object.h"
 #include "bindings/node_ref.h"
 #include "bindings/walker_object.h"
@@ -13,9 +15,13 @@
 namespace quillet::host {
 namespace {
 
+constexpr const char* kTheWalker = "the walker";
+
 // Around an operation that the host calls by name.
 struct OperationByName {
-  explicit OperationByName(WalkerObject& self) : recording(self.walker->fLogical), under_way(*self.walker) {}
+  explicit OperationByName(WalkerObject& self)
+      : use(self.walker->thread_use, kTheWalker), recording(self.walker->fLogical), under_way(*self.walker) {}
+  OneThread use;
   Recording recording;
   CNodeWalker::Operation under_way;
 };
@@ -35,7 +41,7 @@ struct Visit<Operation> {
 
 template <auto Operation>
 void DefVisit(nb::class_<WalkerObject>& cls, const char* name) {
-  cls.def(name, &Visit<Operation>::Call, nb::arg("node"));
+  DefOperation(cls, name, &Visit<Operation>::Call, nb::arg("node"));
 }
 
 Text TextArgument(nb::handle value, HostText& keep, bool none = true) {
@@ -61,12 +67,15 @@ void RecordPair(WalkerObject& self, Any name, Any info) {
 }
 
 void BindFrame(nb::class_<WalkerObject>& cls) {
-  cls.def(
-      "Walk",
+  DefOperation(
+      cls, "Walk",
       [](WalkerObject& self, Any node, Any logical) {
         CNode* root = NodeOrNull(node);
         if (root == nullptr) return self.walker->Walk(nullptr, nullptr);
         LineObject& line = LineOf(logical);
+        // A second walk is refused as such, whoever begins it.
+        std::optional<OneThread> use;
+        if (self.walker->fLogical == nullptr) use.emplace(self.walker->thread_use, kTheWalker);
         // Where the host hands in a line meanwhile, the end of the walk takes it back.
         struct AtEnd {
           WalkerObject& self;
@@ -81,8 +90,8 @@ void BindFrame(nb::class_<WalkerObject>& cls) {
   DefVisit<&CNodeWalker::ProcessNamesFound>(cls, "_ProcessNamesFound");
   DefVisit<&CNodeWalker::VisitChildren>(cls, "_VisitChildren");
   DefVisit<&CNodeWalker::VisitNode>(cls, "_VisitNode");
-  cls.def(
-      "_RaiseIfNotInstance",
+  DefOperation(
+      cls, "_RaiseIfNotInstance",
       [](WalkerObject&, Any node, Any cls_wanted) {
         const int is_instance = PyObject_IsInstance(node.ptr(), cls_wanted.ptr());
         if (is_instance < 0) throw nb::python_error();
@@ -96,8 +105,8 @@ void BindFrame(nb::class_<WalkerObject>& cls) {
 }
 
 void BindNames(nb::class_<WalkerObject>& cls) {
-  cls.def(
-      "_VisitStoreContextNode",
+  DefOperation(
+      cls, "_VisitStoreContextNode",
       [](WalkerObject& self, Any node, Truth within_sub_expr) {
         NodeRef& ref = RefOf(node);
         const OperationByName operation(self);
@@ -106,8 +115,8 @@ void BindNames(nb::class_<WalkerObject>& cls) {
       nb::arg("node"), nb::arg("within_sub_expr") = false);
   DefVisit<&CNodeWalker::VisitLoadContextNode>(cls, "_VisitLoadContextNode");
   DefVisit<&CNodeWalker::VisitCompForNode>(cls, "_VisitCompForNode");
-  cls.def(
-      "_VisitNameLiteral",
+  DefOperation(
+      cls, "_VisitNameLiteral",
       [](WalkerObject& self, Any node, Any atom_node, Any all_trailers, Any trailer_i) {
         NodeRef& ref = RefOf(node);
         CNode* atom = NodeOrNull(atom_node);
@@ -119,11 +128,11 @@ void BindNames(nb::class_<WalkerObject>& cls) {
       },
       nb::arg("node"), nb::arg("atom_node"), nb::arg("all_trailers"), nb::arg("trailer_i"));
   DefVisit<&CNodeWalker::VisitDottedName>(cls, "_VisitDottedName");
-  cls.def("_ProcessLoadName", &RecordName<&CNodeWalker::ProcessLoadName>, nb::arg("name"));
+  DefOperation(cls, "_ProcessLoadName", &RecordName<&CNodeWalker::ProcessLoadName>, nb::arg("name"));
   DefVisit<&CNodeWalker::VisitPower>(cls, "_VisitPower");
   DefVisit<&CNodeWalker::VisitAtomExpr>(cls, "_VisitAtomExpr");
-  cls.def(
-      "_VisitAtomPlusTrailers",
+  DefOperation(
+      cls, "_VisitAtomPlusTrailers",
       [](WalkerObject& self, Any atom_node, Any all_trailers) {
         NodeRef& atom = RefOf(atom_node);
         const std::vector<CNode*> trailers = NodesOf(all_trailers, NodeKind::kCTrailer);
@@ -143,16 +152,16 @@ void BindDefinitions(nb::class_<WalkerObject>& cls) {
   DefVisit<&CNodeWalker::VisitSingleDecorator>(cls, "_VisitSingleDecorator");
   DefVisit<&CNodeWalker::VisitGlobalStmt>(cls, "_VisitGlobalStmt");
   DefVisit<&CNodeWalker::VisitNonlocalStmt>(cls, "_VisitNonlocalStmt");
-  cls.def(
-      "_ProcessDefiningArgList",
+  DefOperation(
+      cls, "_ProcessDefiningArgList",
       [](WalkerObject& self, Any arg_list) {
         const ArgList args = ArgListOf(arg_list);
         const OperationByName operation(self);
         self.walker->ProcessDefiningArgList(args);
       },
       nb::arg("arg_list"));
-  cls.def(
-      "_ProcessLambdaDefiningArgList",
+  DefOperation(
+      cls, "_ProcessLambdaDefiningArgList",
       [](WalkerObject& self, Any arg_list) {
         const ArgList args = ArgListOf(arg_list);
         const OperationByName operation(self);
@@ -176,8 +185,8 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
   DefVisit<&CNodeWalker::VisitCaseStmt>(cls, "_VisitCaseStmt");
   DefVisit<&CNodeWalker::VisitPatternNode>(cls, "_VisitPatternNode");
   DefVisit<&CNodeWalker::VisitTypeParameter>(cls, "_VisitTypeParameter");
-  cls.def(
-      "_ProcessTargets",
+  DefOperation(
+      cls, "_ProcessTargets",
       [](WalkerObject& self, Any lhs, Any rhs, Any extra_trailer) {
         NodeRef& target = RefOf(lhs);
         CNode* value = NodeOrNull(rhs);
@@ -187,8 +196,8 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
         self.walker->ProcessTargets(target.node(), value, trailer);
       },
       nb::arg("lhs"), nb::arg("rhs"), nb::arg("extra_trailer") = nb::none());
-  cls.def(
-      "_VisitCall",
+  DefOperation(
+      cls, "_VisitCall",
       [](WalkerObject& self, Any atom, Any prev_trailers, Any arglist) {
         NodeRef& atom_ref = RefOf(atom);
         const std::vector<CNode*> trailers = NodesOf(prev_trailers, NodeKind::kCTrailer);
@@ -197,8 +206,8 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
         self.walker->VisitCall(atom_ref.node(), trailers, args);
       },
       nb::arg("atom"), nb::arg("prev_trailers"), nb::arg("arglist"));
-  cls.def(
-      "_ProcessFunctionCall",
+  DefOperation(
+      cls, "_ProcessFunctionCall",
       [](WalkerObject& self, Any func_name, Any arg_list) {
         HostText keep;
         const Text name = TextArgument(func_name, keep);
@@ -207,8 +216,8 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
         self.walker->ProcessFunctionCall(name, args);
       },
       nb::arg("func_name"), nb::arg("arg_list"));
-  cls.def(
-      "_ProcessIsInstanceCall",
+  DefOperation(
+      cls, "_ProcessIsInstanceCall",
       [](WalkerObject& self, Any arg_list) {
         const UsedArgList args = UsedArgsOf(arg_list);
         const OperationByName operation(self);
@@ -218,8 +227,8 @@ void BindStatements(nb::class_<WalkerObject>& cls) {
 }
 
 void BindEquivalents(nb::class_<WalkerObject>& cls) {
-  cls.def(
-      "_AppendEquivNode",
+  DefOperation(
+      cls, "_AppendEquivNode",
       [](WalkerObject& self, Any name_node, Any equiv_node, Any extra_trailer) {
         NodeRef& name = RefOf(name_node);
         CNode* equiv = NodeOrNull(equiv_node);
@@ -229,8 +238,8 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
         self.walker->AppendEquivNode(name.node(), equiv, trailer);
       },
       nb::arg("name_node"), nb::arg("equiv_node"), nb::arg("extra_trailer") = nb::none());
-  cls.def(
-      "_AppendSubscriptedEquivNode",
+  DefOperation(
+      cls, "_AppendSubscriptedEquivNode",
       [](WalkerObject& self, Any name_node, Any equiv_node, Any subscript) {
         NodeRef& name = RefOf(name_node);
         CNode* equiv = NodeOrNull(equiv_node);
@@ -239,8 +248,8 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
         self.walker->AppendSubscriptedEquivNode(name.node(), equiv, index);
       },
       nb::arg("name_node"), nb::arg("equiv_node"), nb::arg("subscript"));
-  cls.def(
-      "_AddNodeInfoStr",
+  DefOperation(
+      cls, "_AddNodeInfoStr",
       [](WalkerObject& self, Any name_node, Any istr) {
         NodeRef& name = RefOf(name_node);
         HostText keep;
@@ -249,31 +258,32 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
         self.walker->AddNodeInfoStr(name.node(), text);
       },
       nb::arg("name_node"), nb::arg("istr"));
-  cls.def(
-      "_TypeEquivForNode",
+  DefOperation(
+      cls, "_TypeEquivForNode",
       [](WalkerObject& self, Any node, Any extra_trailer) {
         CNode* root = RefOf(node).node();
         HostText keep;
         return BytesOf(self.walker->TypeEquivForNode(root, TextArgument(extra_trailer, keep)));
       },
       nb::arg("node"), nb::arg("extra_trailer") = nb::none());
-  cls.def(
-      "_TypeEquivForOperatorExpression",
+  DefOperation(
+      cls, "_TypeEquivForOperatorExpression",
       [](WalkerObject& self, Any node) {
         CNode* root = RefOf(node, NodeKind::kCOperatorExpression).node();
         return BytesOf(self.walker->TypeEquivForOperatorExpression(static_cast<COperatorExpression*>(root)));
       },
       nb::arg("node"));
-  cls.def("_AddTypeEquiv", &RecordPair<&CNodeWalker::AddTypeEquiv>, nb::arg("name"), nb::arg("equiv"));
-  cls.def("_AddArgInfoBytes", &RecordPair<&CNodeWalker::AddArgInfoBytes>, nb::arg("name"), nb::arg("ibytes"));
-  cls.def("_AddNameDefined", &RecordName<&CNodeWalker::AddNameDefined>, nb::arg("name"));
-  cls.def("_AddArgNameDefined", &RecordName<&CNodeWalker::AddArgNameDefined>, nb::arg("name"));
+  DefOperation(cls, "_AddTypeEquiv", &RecordPair<&CNodeWalker::AddTypeEquiv>, nb::arg("name"), nb::arg("equiv"));
+  DefOperation(cls, "_AddArgInfoBytes", &RecordPair<&CNodeWalker::AddArgInfoBytes>, nb::arg("name"), nb::arg("ibytes"));
+  DefOperation(cls, "_AddNameDefined", &RecordName<&CNodeWalker::AddNameDefined>, nb::arg("name"));
+  DefOperation(cls, "_AddArgNameDefined", &RecordName<&CNodeWalker::AddArgNameDefined>, nb::arg("name"));
 }
 
 int Traverse(PyObject* self, visitproc visit, void* arg) {
   Py_VISIT(Py_TYPE(self));
   if (!nb::inst_ready(self)) return 0;
-  return nb::inst_ptr<WalkerObject>(self)->handed_in.Traverse(visit, arg);
+  Py_VISIT(nb::inst_ptr<WalkerObject>(self)->handed_in.line.ptr());
+  return 0;
 }
 
 int Clear(PyObject* self) {
@@ -307,6 +317,7 @@ void DefFlag(nb::class_<WalkerObject>& cls, const char* name) {
 }
 
 nb::object LoadedNames(WalkerObject& self) {
+  const WithoutCollector all_at_once;
   nb::dict names;
   const NameSet& loaded = self.walker->fLoadedNames;
   for (size_t i = 0; i < loaded.size(); ++i) names[StrOf(loaded[i])] = "";
@@ -315,6 +326,7 @@ nb::object LoadedNames(WalkerObject& self) {
 
 // The stores of a name as info texts joined by ";".
 nb::object StoredNames(WalkerObject& self) {
+  const WithoutCollector all_at_once;
   const StoreList& stores = self.walker->fStoredNames;
   nb::dict names;
   for (size_t i = 0; i < stores.size(); ++i) {

@@ -8,6 +8,7 @@
 #include "bindings/char_tables_host.h"
 #include "bindings/convert.h"
 #include "bindings/errors.h"
+#include "bindings/host_call.h"
 #include "foundations/console.h"
 #include "foundations/errors.h"
 

@@ -7,6 +7,7 @@
 #include <optional>
 #include <unordered_map>
 
+#include "bindings/host_call.h"
 #include "bindings/line_object.h"
 
 namespace quillet::host {
@@ -26,7 +27,8 @@ ForeignContexts& Foreign() {
 void ReleaseForeign(int32_t number) {
   // Nodes are given back with the interpreter lock held or not at all (a batch without it never
   // meets a node that a host touched), so the table needs no lock of its own.
-  Foreign().objects.erase(number);
+  auto gone = Foreign().objects.extract(number);
+  if (gone) LetGo(std::move(gone.mapped()));
 }
 
 nb::object DecodeLossless(Text text) {

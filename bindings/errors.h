@@ -6,10 +6,9 @@
 //   nanobind::python_error     itself: what a host's operation raised goes through the core unchanged
 //
 // The way back matters where the core tells kinds of errors apart (a parse error, a syntax error, a
-// walk limit): a call into the host is made through CallingHost.
+// walk limit): a call into the host is made through CallingHost (host_call.h).
 #pragma once
 
-#include <atomic>
 #include <memory>
 #include <utility>
 
@@ -45,33 +44,6 @@ class HostParseError : public ParseError {
 
 // Throws what the core shall see of an exception that a host's operation raised.
 [[noreturn]] void RethrowForCore(nb::python_error& error);
-
-// While one lives, the core waits for the host in the middle of an operation: what it works on must
-// outlive whatever the host's code does to the objects that hold it. Changed with the interpreter lock
-// held, and read without it by threads that have no host, which may then keep memory a little longer.
-class HostCall {
- public:
-  HostCall() { count_.fetch_add(1, std::memory_order_relaxed); }
-  ~HostCall() { count_.fetch_sub(1, std::memory_order_relaxed); }
-  HostCall(const HostCall&) = delete;
-  HostCall& operator=(const HostCall&) = delete;
-
-  static bool IsUnderWay() { return count_.load(std::memory_order_relaxed) > 0; }
-
- private:
-  static inline std::atomic<int> count_{0};
-};
-
-// Runs `call`, which enters the host.
-template <class Call>
-auto CallingHost(Call&& call) {
-  const HostCall under_way;
-  try {
-    return call();
-  } catch (nb::python_error& error) {
-    RethrowForCore(error);
-  }
-}
 
 // The SyntaxError object that a host's operation raised since the last call of TakeHostSyntaxError,
 // if `error` came from it; otherwise a null object. An analysis returns that same object.

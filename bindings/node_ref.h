@@ -63,6 +63,9 @@ class NodeRef {
   nb::object HeldChildren();
   // Takes over what the host changed in its list of this node's children.
   void Synchronise();
+  // The list that this wrapper shows to the collector, null without one; and its end.
+  PyObject* OwnList() const;
+  void DropList();
 
  private:
   friend class NodeRegistry;
@@ -75,6 +78,9 @@ class NodeRef {
   Ref<SourceText> source_;
   bool is_lone_bare_ = false;  // made by the host, in no tree yet
 };
+
+// What makes a wrapper an object of the collector's: a host's node may hold the list that it stands in.
+extern const PyType_Slot kNodeSlots[];
 
 // The C++ type bound for a node class: the same handle, in the class tree of the nodes.
 template <class T>
@@ -127,7 +133,7 @@ CArgInfo ArgOf(nb::handle object);
 UsedArgList UsedArgsOf(nb::handle list);
 ArgList ArgListOf(nb::handle list);
 
-// To be called before nodes of the pool are made from a source while wrappers of the pool exist.
+// At the start of an operation that makes nodes of the pool from a source.
 void PinSource(NodePool& pool, const Ref<SourceText>& source);
 
 // Gives the texts of all nodes that wrappers of the pool may reach to the pool: for texts that are

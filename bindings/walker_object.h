@@ -3,20 +3,18 @@
 
 #include <memory>
 #include <utility>
-#include <vector>
 
 #include "bindings/bindings.h"
-#include "bindings/errors.h"
+#include "bindings/host_call.h"
 #include "bindings/line_object.h"
 #include "walker/walker.h"
 
 namespace quillet::host {
 
-// The line that the host handed in to a walker, and those that it handed in before while the core was
-// in the middle of an operation, which may still be on one of them.
+// The line that the host handed in to a walker. One that it replaces meanwhile stays for as long as an operation may be
+// on it.
 struct HandedInLine {
   nb::object line;
-  std::vector<nb::object> replaced;
 
   // The line of the walker becomes `value`, a CLogicalLine or None; `set` tells it to the walker.
   template <class Set>
@@ -28,19 +26,9 @@ struct HandedInLine {
     // Letting go of a line may run the host's code, so it comes last.
     Replace(std::move(next));
   }
-  void Replace(nb::object next) { LetGo(std::exchange(line, std::move(next))); }
-  void LetGo(nb::object old) {
-    if (!HostCall::IsUnderWay()) {
-      std::vector<nb::object> gone = std::exchange(replaced, {});
-    } else if (old.is_valid()) {
-      replaced.push_back(std::move(old));
-    }
-  }
-
-  int Traverse(visitproc visit, void* arg) const {
-    Py_VISIT(line.ptr());
-    for (const nb::object& old : replaced) Py_VISIT(old.ptr());
-    return 0;
+  void Replace(nb::object next) {
+    nb::object old = std::exchange(line, std::move(next));
+    if (old.is_valid()) LetGo(std::move(old));
   }
 };
 

@@ -20,6 +20,8 @@ class RefCounted {
   void Release() const {
     if (refs_.fetch_sub(1, std::memory_order_acq_rel) == 1) delete this;
   }
+  // Whether there is one reference.
+  bool IsUnique() const { return refs_.load(std::memory_order_acquire) == 1; }
 
  protected:
   virtual ~RefCounted() = default;

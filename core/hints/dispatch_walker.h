@@ -11,6 +11,7 @@
 #include <cstdint>
 #include <vector>
 
+#include "foundations/thread_use.h"
 #include "lines/logical_line.h"
 #include "tree/nodes.h"
 
@@ -56,6 +57,8 @@ class CDispatchWalker {
   int32_t fMaxVisits = 10000;
   int32_t fMaxRecurseCount = 40;
   std::vector<CNode*> fNodeStack;
+  // For a host whose threads take turns: who is in the middle of an operation.
+  ThreadUse thread_use;
 
  protected:
   [[noreturn]] static void ThrowTooManyVisits();

@@ -17,6 +17,7 @@
 #include <string>
 #include <vector>
 
+#include "foundations/thread_use.h"
 #include "grammar/grammar.h"
 #include "lines/logical_line.h"
 #include "parser/factory_engine.h"
@@ -117,6 +118,9 @@ class CPGenParserImpl {
   // The class of each state, by number: token numbers and grammar symbols.
   const std::vector<NodeKind>& kinds_for_states() const { return kinds_for_states_; }
   void set_external_engine(ExternalEngine* engine) { external_engine_ = engine; }
+
+  // For a host whose threads take turns: who is in the middle of a parse.
+  ThreadUse thread_use;
 
  private:
   // Part of a statement's tokens and the index of its first one: what stands in front of it counts

@@ -75,8 +75,10 @@ struct alignas(64) CNode {
   NodeKind kind = NodeKind::kCNode;
   TokenCode code = tok::REMOVED;  // of the text; REMOVED where there is none
   bool has_children = false;      // false: the host sees None in place of the list
-  bool given_back = false;        // the pool keeps this record-less node for another use
-  NodePool* pool = nullptr;       // owns the memory; set once
+  bool given_back : 1 = false;    // the pool keeps this record-less node for another use
+  bool is_reached : 1 = false;    // marks of a search for stray nodes, see NodePool::TakeBackStrays
+  bool is_at_rest : 1 = false;
+  NodePool* pool = nullptr;  // owns the memory; set once
 
   // ---- fields as the host names them ----
   Text fText() const { return {text, text_length}; }

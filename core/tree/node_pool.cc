@@ -150,6 +150,7 @@ void NodePool::Reclaim(CNode* node) {
 
 void NodePool::Abandon(CNode* node) {
   abandoned_.push_back(node);
+  CountStray();
   something_waits_ = true;
 }
 
@@ -191,6 +192,48 @@ void NodePool::ReclaimAllWaiting() {
     KeepForReuse(node);
   }
   for (CNode* root : std::exchange(abandoned_, {})) ReclaimNow(root);
+}
+
+// Marks the nodes that are in no tree: on a free list, which a second discard may have closed to a ring, or kept for
+// another use.
+void NodePool::MarkNodesAtRest() {
+  const auto mark_chain = [](CNode* node) {
+    for (; node != nullptr && !node->is_at_rest; node = node->fNextFree) node->is_at_rest = true;
+  };
+  for (const CNodeClassInfo& info : class_infos_) mark_chain(info.fFirstFree);
+  mark_chain(spare_);
+  for (CNode* node : unseen_) node->is_at_rest = true;
+}
+
+// Puts a node that is in nobody's hands where it is found when one is needed.
+void NodePool::TakeBack(CNode* node) {
+  ClearChildren(node);
+  WipeLeafFields(node);
+  if (CNodeClassInfo* cls_info = node->fClsInfo) {
+    node->fNextFree = cls_info->fFirstFree;
+    cls_info->fFirstFree = node;
+  } else {
+    node->given_back = true;
+    node->fNextFree = std::exchange(spare_, node);
+  }
+}
+
+void NodePool::TakeBackStrays(size_t reached) {
+  MarkNodesAtRest();
+  std::erase_if(abandoned_, [](const CNode* root) { return !root->is_reached; });
+  std::erase_if(unseen_, [this](CNode* node) {
+    if (!node->is_reached) node->fNextFree = std::exchange(spare_, node);
+    return !node->is_reached;
+  });
+  for (const Slab& slab : slabs_) {
+    for (size_t i = 0; i < slab.used; ++i) {
+      CNode* node = slab.node(i);
+      if (!node->is_at_rest && !node->is_reached) TakeBack(node);
+      node->is_at_rest = false;
+    }
+  }
+  strays_ = 0;
+  stray_limit_ = std::max(kFewStrays, reached / 4);
 }
 
 Text NodePool::Intern(Text text) {

@@ -102,6 +102,17 @@ class NodePool : public RefCounted {
   }
   void HostViewsDropped() { ReclaimWaiting(); }
 
+  // ---- strays: trees that nobody gives back ----
+  // Counts a tree that may have become one: a host let go of a wrapper of a node in use, or a tree waits
+  // for wrappers to go.
+  void CountStray() { ++strays_; }
+  // Whether there may be so many that a search pays.
+  bool MayHoldStrays() const { return strays_ >= stray_limit_; }
+  // Takes back all nodes in use that are not marked with is_reached, and those that wait. To be called
+  // while nothing works with nodes of the pool. `reached` is the number of nodes that were marked, in all pools,
+  // which is what a search costs.
+  void TakeBackStrays(size_t reached);
+
   // A stable copy of a text, one for equal texts: for nodes that a host makes.
   Text Intern(Text text);
 
@@ -111,9 +122,9 @@ class NodePool : public RefCounted {
   // Called for a node's context that is an object of the host's when the node lets go of it.
   void (*release_foreign)(int32_t number) = nullptr;
 
-  // Tells whether the core waits for the host in the middle of an operation. An array of children
-  // that a host's change or discard puts out of use then stays as it is until the core is done with
-  // it. Null: there is no host.
+  // Tells whether an operation is under way, in whose middle a host may run. An array of children that a
+  // host's change or discard puts out of use then stays as it is until the operation is over. Null: there
+  // is no host.
   static inline bool (*is_core_waiting)() = nullptr;
 
   size_t node_count() const { return node_count_; }
@@ -136,6 +147,8 @@ class NodePool : public RefCounted {
   void ReclaimAllWaiting();
   void FreeArray(CNode** array, uint32_t capacity);
   void FreeRetiredArrays();
+  void MarkNodesAtRest();
+  void TakeBack(CNode* node);
   std::byte* NewNodeStorage();
 
   std::vector<Slab> slabs_;
@@ -151,6 +164,10 @@ class NodePool : public RefCounted {
     uint32_t capacity;
   };
   std::vector<RetiredArray> retired_arrays_;  // see is_core_waiting
+
+  static constexpr size_t kFewStrays = 64;
+  size_t strays_ = 0;
+  size_t stray_limit_ = kFewStrays;
 
   bool something_waits_ = false;
   std::vector<CNode*> abandoned_;  // roots of trees to reclaim

@@ -19,6 +19,7 @@
 #include <vector>
 
 #include "foundations/arena.h"
+#include "foundations/thread_use.h"
 #include "lines/logical_line.h"
 #include "text/node_to_text.h"
 #include "tree/arg_info.h"
@@ -159,6 +160,8 @@ class CNodeWalker {
   int32_t fRecurseCount = 0;
   NameSet fLoadedNames;
   StoreList fStoredNames;
+  // For a host whose threads take turns: who is in the middle of an operation.
+  ThreadUse thread_use;
 
  private:
   // Counts one call of VisitNode and checks both limits for it.

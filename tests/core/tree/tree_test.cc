@@ -573,6 +573,55 @@ TEST_F(TreeTest, ReclaimWaitsWhileTheHostLooks) {
   EXPECT_EQ(FreeListLength(NodeKind::kCExprStmt), 1u);
 }
 
+TEST_F(TreeTest, StraysAreTakenBackAndWhatIsReachedStays) {
+  pool_->host_views = 1;
+  CNode* seen = Rule(NodeKind::kCExprStmt, {Name("a"), Name("b")});
+  CNode* stray = Rule(NodeKind::kCExprStmt, {Name("c"), factory_.NewBare<CPatternNode>()});
+  CNode* abandoned = Rule(NodeKind::kCExprStmt, {Name("d"), Name("e")});
+  pool_->Reclaim(abandoned);
+  CNode* bare = factory_.NewBare<CMatchStmt>();
+  FinishedWithNode(bare);
+  FinishedWithNode(Name("f"));
+  const size_t constructed = pool_->node_count();
+  for (CNode* node : {seen, seen->children[0], seen->children[1]}) node->is_reached = true;
+  pool_->TakeBackStrays(3);
+  for (CNode* node : {seen, seen->children[0], seen->children[1]}) node->is_reached = false;
+
+  EXPECT_EQ(seen->children[1]->fText(), "b");
+  EXPECT_FALSE(stray->has_children);
+  EXPECT_FALSE(abandoned->has_children);
+  EXPECT_EQ(FreeListLength(NodeKind::kCExprStmt), 2u);
+  for (int i = 0; i < 4; ++i) Name("g");  // c, d, e and f
+  // The two without a record, one of which waited, are used again.
+  factory_.NewBare<CPatternNode>();
+  EXPECT_EQ(factory_.NewBare<CMatchStmt>()->pool, pool_.get());
+  EXPECT_EQ(pool_->node_count(), constructed);
+  pool_->host_views = 0;
+  pool_->HostViewsDropped();
+  EXPECT_EQ(FreeListLength(NodeKind::kCExprStmt), 2u);
+}
+
+TEST_F(TreeTest, AFreeListThatIsARingHoldsNoStrays) {
+  CNode* node = Name("a");
+  FinishedWithNode(node);
+  FinishedWithNode(node);
+  CNode* stray = Name("b");
+  EXPECT_EQ(stray, node);
+  pool_->TakeBackStrays(0);
+  EXPECT_EQ(Name("c"), node);
+}
+
+TEST_F(TreeTest, ASearchForStraysPaysOnceThereMayBeManyOfThem) {
+  EXPECT_FALSE(pool_->MayHoldStrays());
+  for (int i = 0; i < 64; ++i) pool_->CountStray();
+  EXPECT_TRUE(pool_->MayHoldStrays());
+  pool_->TakeBackStrays(4000);
+  for (int i = 0; i < 999; ++i) pool_->CountStray();
+  EXPECT_FALSE(pool_->MayHoldStrays());
+  pool_->CountStray();
+  EXPECT_TRUE(pool_->MayHoldStrays());
+}
+
 TEST_F(TreeTest, ANodeWithoutARecordIsWipedAndItsMemoryUsedAgain) {
   CMatchStmt* match = factory_.NewBare<CMatchStmt>();
   CNode* children[] = {Name("match"), Name("x")};
