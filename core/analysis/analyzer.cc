@@ -95,7 +95,8 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeSingleLogical(LogicalLine& 
     return std::nullopt;
   } catch (const ParseError& error) {
     logical.ClearDerivedInfo();
-    return CreateSyntaxError("invalid syntax", logical, error.context);
+    return spells_error_texts_ ? CreateSyntaxError("invalid syntax", logical, error.context)
+                               : CreateTextlessSyntaxError("invalid syntax", logical, error.context);
   } catch (const SyntaxError& error) {
     logical.ClearDerivedInfo();
     return error;
@@ -143,23 +144,35 @@ bool CPGenAnalyzerImpl::InspectSingleLogical(LogicalLine& logical, bool in_async
 }
 
 void CPGenAnalyzerImpl::InspectEmbeddedExpressions(LogicalLine& logical, bool in_async_def, bool first_in_def) {
-  const EmbeddedLines embedded = logical.GetExpLogicals();
-  for (LogicalLine* exp : embedded.lines) {
-    // The hint walker finds and parses these by itself.
-    if (exp->kind == LineKind::kCommentedTypeHint) continue;
-    try {
-      InspectSingleLogical(*exp, in_async_def, true, first_in_def);
-    } catch (const ParseError& error) {
-      logical.ClearDerivedInfo();
-      const char* message = MessageForEmbedded(exp->kind);
-      const SyntaxError inner = CreateSyntaxError(message, *exp, error.context);
-      const int64_t line = static_cast<int64_t>(exp->first_line) - logical.first_line + inner.lineno - 1;
-      const int64_t col = inner.offset - 1;
-      // The message stands where a file name would, and the text is that of the expression alone.
-      throw SyntaxError(message, message, line + 1, col + 1, inner.text);
-    }
-    exp->CopyTypeEquivsTo(logical);
+  // A walk that meets a limit prints a line, which may run code of the host's.
+  if (logical.hooks != nullptr || logical.has_stored_positions()) [[unlikely]] {
+    const EmbeddedLines embedded = logical.GetExpLogicals();
+    for (LogicalLine* exp : embedded.lines) InspectEmbedded(logical, *exp, in_async_def, first_in_def);
+    return;
   }
+  EmbeddedExpressions found(logical);
+  LogicalLine exp;
+  for (size_t i = 0; i < found.size(); ++i) {
+    found.Show(i, exp);
+    InspectEmbedded(logical, exp, in_async_def, first_in_def);
+  }
+}
+
+void CPGenAnalyzerImpl::InspectEmbedded(LogicalLine& logical, LogicalLine& exp, bool in_async_def, bool first_in_def) {
+  // The hint walker finds and parses these by itself.
+  if (exp.kind == LineKind::kCommentedTypeHint) return;
+  try {
+    InspectSingleLogical(exp, in_async_def, true, first_in_def);
+  } catch (const ParseError& error) {
+    logical.ClearDerivedInfo();
+    const char* message = MessageForEmbedded(exp.kind);
+    const SyntaxError inner = CreateSyntaxError(message, exp, error.context);
+    const int64_t line = static_cast<int64_t>(exp.first_line) - logical.first_line + inner.lineno - 1;
+    const int64_t col = inner.offset - 1;
+    // The message stands where a file name would, and the text is that of the expression alone.
+    throw SyntaxError(message, message, line + 1, col + 1, inner.text);
+  }
+  exp.CopyTypeEquivsTo(logical);
 }
 
 }  // namespace quillet

@@ -43,6 +43,12 @@ class CPGenAnalyzerImpl {
   bool InspectSingleLogical(LogicalLine& logical, bool in_async_def, bool in_embedded_expression = false,
                             bool first_in_def = false);
   void InspectEmbeddedExpressions(LogicalLine& logical, bool in_async_def, bool first_in_def);
+  // One of them.
+  void InspectEmbedded(LogicalLine& logical, LogicalLine& exp, bool in_async_def, bool first_in_def);
+
+  // Whether returned errors carry the text of their line, which costs more than the analysis of a short
+  // one: true unless nobody is going to show it.
+  void set_spells_error_texts(bool spells) { spells_error_texts_ = spells; }
 
   CPGenParserImpl& logical_parser() const { return *logical_parser_; }
   CNodeWalker& node_walker() const { return *node_walker_; }
@@ -52,6 +58,7 @@ class CPGenAnalyzerImpl {
   std::unique_ptr<CPGenParserImpl> logical_parser_;
   std::unique_ptr<CNodeWalker> node_walker_;
   std::unique_ptr<CTypeHintWalker> type_hint_walker_;
+  bool spells_error_texts_ = true;
 };
 
 }  // namespace quillet

@@ -137,7 +137,7 @@ class BatchAnalyzer::Worker {
     for (size_t i = 0; i < file_.rows().size() && result.errors.size() < file_.errors().size(); ++i) {
       const int32_t index = file_.results()[i].error;
       if (index < 0) continue;
-      const SyntaxError& error = file_.errors()[static_cast<size_t>(index)];
+      const FileAnalyzer::Failure& error = file_.errors()[static_cast<size_t>(index)];
       const Position position = file_.ErrorPosition(i);
       result.errors.push_back(
           {static_cast<uint32_t>(position.line) + 1, static_cast<uint32_t>(position.col) + 1, error.message()});

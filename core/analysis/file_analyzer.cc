@@ -5,8 +5,45 @@
 #include <utility>
 
 #include "lines/future_imports.h"
+#include "tokens/byte_scan.h"
 
 namespace quillet {
+
+namespace {
+
+// Memory that one source took beyond this goes back before the next one.
+constexpr size_t kKeptMemory = size_t{16} << 20;
+// A tree has about a node a token, most of them without a list of children.
+constexpr size_t kMemoryPerTreeToken = sizeof(CNode) + 2 * sizeof(CNode*);
+// A token of an expression in a string or a comment is held itself, with what tells its place.
+constexpr size_t kMemoryPerInnerToken = kMemoryPerTreeToken + sizeof(Token) + sizeof(EmbeddedExpressions::Found);
+// A statement that is shorter than this takes too little for a closer look.
+constexpr size_t kSmallStatement = size_t{1} << 20;
+
+// The most tokens that a text can hold: a run of letters is one at least.
+size_t MostTokensIn(Text text) {
+  size_t count = 0;
+  bool in_word = false;
+  for (const char c : text) {
+    const bool is_word = IsAsciiIdentifierByte(c) || static_cast<unsigned char>(c) >= 0x80;
+    count += !is_word || !in_word;
+    in_word = is_word;
+  }
+  return count;
+}
+
+template <class T>
+size_t SizeOf(const std::vector<T>& items) {
+  return items.size() * sizeof(T);
+}
+
+template <class T>
+void DropIfHuge(std::vector<T>& items) {
+  if (items.capacity() * sizeof(T) > kKeptMemory) std::vector<T>().swap(items);
+  items.clear();
+}
+
+}  // namespace
 
 FileAnalyzer::FileAnalyzer(const Options& options) : options_(options), analyzer_(options) {
   found_.source = SourceText::Copy(Text(""));
@@ -31,45 +68,105 @@ CPGenAnalyzerImpl& FileAnalyzer::AnalyzerForSource() {
 }
 
 void FileAnalyzer::Analyze(Text bytes) {
-  found_.rows.clear();
-  found_.results.clear();
-  found_.errors.clear();
+  Reset(bytes);
+  Cut();
+  CPGenAnalyzerImpl& analyzer = AnalyzerForSource();
+  analyzer.set_spells_error_texts(false);
+  const NodePool& pool = analyzer.logical_parser().factory().pool();
+  const size_t nodes_before = pool.node_count();
+  found_.results.reserve(found_.rows.size());
+  CountMemory();
+  LogicalLine line;
+  for (const LineRow& row : found_.rows) {
+    CheckMemory(std::max(MostMemoryOf(row), sizeof(CNode) * (pool.node_count() - nodes_before)));
+    AnalyzeRow(analyzer, row, line);
+    CountMemory();
+  }
+  CheckMemory(0);
+}
+
+void FileAnalyzer::Reset(Text bytes) {
+  DropIfHuge(found_.rows);
+  DropIfHuge(found_.results);
+  DropIfHuge(found_.errors);
+  DropIfHuge(found_.store.rows);
+  DropIfHuge(found_.store.arg_rows);
+  DropIfHuge(found_.source->tokens);
+  DropIfHuge(found_.source->line_starts);
+  if (found_.store.texts.byte_size() > kKeptMemory) found_.store.texts = TextArena();
   found_.store.Reset();
   scopes_.Reset();
   found_.source->Assign(bytes);
-  CutLines(*found_.source, options_.version, found_.rows);
-  CPGenAnalyzerImpl& analyzer = AnalyzerForSource();
-  found_.results.reserve(found_.rows.size());
+  memory_limit_ = std::max(options_.least_memory_limit, kMemoryPerSourceByte * bytes.size());
+  held_ = 0;
+}
 
-  LogicalLine line;
-  for (const LineRow& row : found_.rows) {
-    LineResult result;
-    const LinePlace place = scopes_.Next(row);
-    result.in_async_def = place.in_async_def;
-    result.first_in_def = place.first_in_def;
-    result.depth = place.depth;
-    result.record_begin = static_cast<uint32_t>(found_.store.rows.size());
-    result.arg_record_begin = static_cast<uint32_t>(found_.store.arg_rows.size());
-    if (row.token_count != 0) {
-      SetFromRow(line, found_.source, row);
-      line.parsed = false;
-      line.WriteTo(&found_.store);
-      if (auto error = analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def)) {
-        result.error = static_cast<int32_t>(found_.errors.size());
-        found_.errors.push_back(std::move(*error));
-      }
-    }
-    result.record_end = static_cast<uint32_t>(found_.store.rows.size());
-    result.arg_record_end = static_cast<uint32_t>(found_.store.arg_rows.size());
-    found_.results.push_back(result);
+// While tokens and rows grow they are there twice for a moment.
+void FileAnalyzer::Cut() {
+  try {
+    CutLines(*found_.source, options_.version, found_.rows, memory_limit_ / 3);
+  } catch (const Error& error) {
+    if (error.kind() != ErrorKind::kOverflowError) throw;
+    ThrowTooLarge();
   }
+}
+
+void FileAnalyzer::AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, LogicalLine& line) {
+  LineResult result;
+  const LinePlace place = scopes_.Next(row);
+  result.in_async_def = place.in_async_def;
+  result.first_in_def = place.first_in_def;
+  result.depth = place.depth;
+  result.record_begin = static_cast<uint32_t>(found_.store.rows.size());
+  result.arg_record_begin = static_cast<uint32_t>(found_.store.arg_rows.size());
+  if (row.token_count != 0) {
+    SetFromRow(line, found_.source, row);
+    line.parsed = false;
+    line.WriteTo(&found_.store);
+    if (const auto error = analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def)) {
+      result.error = static_cast<int32_t>(found_.errors.size());
+      AddError(*error);
+    }
+  }
+  result.record_end = static_cast<uint32_t>(found_.store.rows.size());
+  result.arg_record_end = static_cast<uint32_t>(found_.store.arg_rows.size());
+  found_.results.push_back(result);
+}
+
+void FileAnalyzer::AddError(const SyntaxError& error) {
+  const std::string& text = *found_.error_texts.insert(error.message()).first;
+  const auto from_1 = [](int64_t number) { return static_cast<int32_t>(std::max<int64_t>(number, 1)); };
+  found_.errors.push_back({&text, {from_1(error.lineno), from_1(error.offset)}});
+}
+
+size_t FileAnalyzer::MostMemoryOf(const LineRow& row) const {
+  size_t memory = kMemoryPerTreeToken * row.token_count;
+  if (row.no_embedded || row.token_count == 0) return memory;
+  const TokenSpan toks = TokenSpan(found_.source->tokens).subspan(row.first_token, row.token_count);
+  if (static_cast<size_t>(toks.back().end() - toks.front().text) < kSmallStatement) return memory;
+  for (const Token& token : toks) {
+    if (token.code == tok::STRING || token.code == tok::COMMENT)
+      memory += kMemoryPerInnerToken * MostTokensIn(token.view());
+  }
+  return memory;
+}
+
+void FileAnalyzer::CountMemory() {
+  // The text, and the copy of it that the caller has.
+  held_ = 2 * found_.source->size() + SizeOf(found_.source->tokens) + SizeOf(found_.source->line_starts) +
+          SizeOf(found_.rows) + SizeOf(found_.results) + SizeOf(found_.errors) + SizeOf(found_.store.rows) +
+          SizeOf(found_.store.arg_rows) + found_.store.texts.byte_size();
+}
+
+void FileAnalyzer::ThrowTooLarge() const {
+  ThrowError(ErrorKind::kOverflowError,
+             "too large to analyse within " + std::to_string(memory_limit_ >> 20) + " MiB of memory");
 }
 
 Position FileAnalyzer::ErrorPosition(size_t row) const {
   // An error's own line and offset count from 1, from the first line of its statement.
-  const SyntaxError& error = found_.errors[static_cast<size_t>(found_.results[row].error)];
-  const int64_t line = static_cast<int64_t>(found_.rows[row].first_line) + std::max<int64_t>(error.lineno, 1) - 1;
-  return {static_cast<int32_t>(line), static_cast<int32_t>(std::max<int64_t>(error.offset, 1) - 1)};
+  const Position place = found_.errors[static_cast<size_t>(found_.results[row].error)].place;
+  return {static_cast<int32_t>(found_.rows[row].first_line) + place.line - 1, place.col - 1};
 }
 
 size_t FileAnalyzer::LineCount() const {

@@ -2,11 +2,15 @@
 //
 // It cuts the bytes into logical lines, works out each line's place (inside an `async def`, first in
 // a function body) and hands line after line to an analyzer. All memory is kept for the next
-// source: tokens, rows, records and nodes. One thread at a time per analyzer.
+// source: tokens, rows, records and nodes; what a huge source took of it goes back. One thread at a time
+// per analyzer.
 #pragma once
 
 #include <cstdint>
+#include <memory>
 #include <span>
+#include <string>
+#include <unordered_set>
 #include <vector>
 
 #include "analysis/analyzer.h"
@@ -27,10 +31,24 @@ class FileAnalyzer {
     bool first_in_def = false;
   };
 
+  // What became of a statement that does not parse, without the text that nobody shows.
+  struct Failure {
+    const std::string* text;  // one for all failures of a kind
+    Position place;           // line and offset from 1, counted from the first line of the statement
+
+    const std::string& message() const { return *text; }
+  };
+
+  // What the analysis of a source may hold: so many bytes, or so many a byte of the source where that is
+  // more. Files that people write take 20 to 60 bytes a byte; what is made to do harm takes hundreds.
+  static constexpr size_t kMemoryPerSourceByte = 10;
+  static constexpr size_t kLeastMemoryLimit = size_t{1} << 30;
+
   struct Options : CPGenAnalyzerImpl::Options {
     // The grammar for sources of 2.7 that switch the print function on; empty where the version has
     // no such switch.
     std::string print_function_grammar_file;
+    size_t least_memory_limit = kLeastMemoryLimit;
   };
 
   explicit FileAnalyzer(const Options& options);
@@ -41,11 +59,19 @@ class FileAnalyzer {
     std::vector<LineRow> rows;
     std::vector<LineResult> results;
     RecordStore store;
-    std::vector<SyntaxError> errors;
+    std::vector<Failure> errors;
+    std::unordered_set<std::string> error_texts;  // that those refer to
   };
 
-  // Results stand until the next call. The bytes are copied.
+  // Results stand until the next call. The bytes are copied. OverflowError for a source that takes more
+  // memory than it may.
   void Analyze(Text bytes);
+  // The same for what is made of the results: OverflowError where `more` bytes are too many beside them.
+  void CheckMemory(size_t more) const {
+    if (held_ + more > memory_limit_) [[unlikely]]
+      ThrowTooLarge();
+  }
+
   // Gives the results away, and leaves none.
   Found TakeFound();
 
@@ -53,7 +79,7 @@ class FileAnalyzer {
   std::span<const LineRow> rows() const { return found_.rows; }
   std::span<const LineResult> results() const { return found_.results; }
   const RecordStore& store() const { return found_.store; }
-  const std::vector<SyntaxError>& errors() const { return found_.errors; }
+  const std::vector<Failure>& errors() const { return found_.errors; }
   // Where the error of a row lies in the source; the row must have one.
   Position ErrorPosition(size_t row) const;
   // The number of physical lines.
@@ -62,12 +88,23 @@ class FileAnalyzer {
  private:
   // The analyzer that reads the source as it asks to be read.
   CPGenAnalyzerImpl& AnalyzerForSource();
+  void Reset(Text bytes);
+  void Cut();
+  void AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, LogicalLine& line);
+  void AddError(const SyntaxError& error);
+  // What the analysis of a row may take beside its results, at most.
+  size_t MostMemoryOf(const LineRow& row) const;
+  // Counts what the results hold by now.
+  void CountMemory();
+  [[noreturn]] void ThrowTooLarge() const;
 
   Options options_;
   CPGenAnalyzerImpl analyzer_;
   std::unique_ptr<CPGenAnalyzerImpl> print_function_analyzer_;  // built at first need
   Found found_;
   ScopeTracker scopes_;
+  size_t memory_limit_ = kLeastMemoryLimit;
+  size_t held_ = 0;
 };
 
 }  // namespace quillet

@@ -44,6 +44,7 @@ RecordTable RecordTableMaker::Make(const FileAnalyzer& file, const ScopeNames& s
   details_.clear();
   placed.Begin(file, scopes);
   for (size_t row = 0; row < file.rows().size(); ++row) {
+    file.CheckMemory(table.ByteSize());
     for (const PlacedRecord& record : placed.OfRow(row)) {
       table.lines.push_back(record.line);
       table.columns.push_back(record.column);

@@ -27,6 +27,7 @@ void TextArena::AddBlock(size_t at_least) {
         blocks_.empty() ? kFirstBlockSize : std::clamp(blocks_.back().size * 2, kFirstBlockSize, kLargestBlockSize);
     const size_t size = std::max(doubled, at_least);
     blocks_.push_back({std::unique_ptr<char[]>(new char[size]), size});
+    byte_size_ += size;
   }
   Enter(following);
 }

@@ -25,6 +25,7 @@ class TextArena {
     end_ = std::exchange(other.end_, nullptr);
     current_ = std::exchange(other.current_, 0);
     blocks_ = std::exchange(other.blocks_, {});
+    byte_size_ = std::exchange(other.byte_size_, 0);
     return *this;
   }
 
@@ -47,6 +48,9 @@ class TextArena {
 
   void Reset();
 
+  // What its blocks take, those kept by Reset included.
+  size_t byte_size() const { return byte_size_; }
+
  private:
   void AddBlock(size_t at_least);
   void Enter(size_t block);
@@ -59,6 +63,7 @@ class TextArena {
   char* next_ = nullptr;
   char* end_ = nullptr;
   size_t current_ = 0;  // index of the block in use, where there are any
+  size_t byte_size_ = 0;
   std::vector<Block> blocks_;
 };
 

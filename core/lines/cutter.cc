@@ -214,18 +214,19 @@ class Statement {
 
 class Cutter {
  public:
-  Cutter(Version version, std::vector<LineRow>& rows) : python2_(!version.AtLeast(3, 0)), rows_(rows) {}
+  Cutter(Version version, std::vector<LineRow>& rows, size_t most_memory)
+      : python2_(!version.AtLeast(3, 0)), rows_(rows), most_memory_(most_memory) {}
 
   // ---- what the scanner calls ----
 
   void BlankLine(uint32_t indent, const ScanOutput& out) {
-    rows_.push_back(
-        {out.token_count(), 0, out.line(), out.line(), indent, LineKind::kBlankLine, false, false, false, true});
+    Add({out.token_count(), 0, out.line(), out.line(), indent, LineKind::kBlankLine, false, false, false, true}, out);
   }
 
   void CommentLine(uint32_t indent, const ScanOutput& out) {
-    rows_.push_back({out.token_count() - 1, 1, out.line(), out.line(), indent, LineKind::kComment, false, false, false,
-                     !facts_.has_type_comment});
+    Add({out.token_count() - 1, 1, out.line(), out.line(), indent, LineKind::kComment, false, false, false,
+         !facts_.has_type_comment},
+        out);
     facts_ = {};
   }
 
@@ -327,12 +328,28 @@ class Cutter {
 
   void AddRow(const Statement& statement, TokenSpan toks, uint32_t end, bool has_inline_body, const ScanOutput& out) {
     const LineKind kind = statement.Kind();
-    rows_.push_back({first_, end - first_, first_line_, LastLine(toks, end, out), indent_, kind, continues_,
-                     has_inline_body, statement.is_async(), statement.HasNoEmbedded(kind)});
+    Add({first_, end - first_, first_line_, LastLine(toks, end, out), indent_, kind, continues_, has_inline_body,
+         statement.is_async(), statement.HasNoEmbedded(kind)},
+        out);
+  }
+
+  void Add(const LineRow& row, const ScanOutput& out) {
+    if (rows_.size() == rows_.capacity()) [[unlikely]]
+      GrowRows(out);
+    rows_.push_back(row);
+  }
+
+  [[gnu::noinline]] void GrowRows(const ScanOutput& out) {
+    const size_t more = rows_.size() / 2 + 64;
+    // For a moment both the old and the new memory is there.
+    const size_t memory = sizeof(Token) * out.token_count() + sizeof(LineRow) * (2 * rows_.size() + more);
+    if (memory > most_memory_) ThrowError(ErrorKind::kOverflowError, "the source holds too many statements");
+    rows_.reserve(rows_.size() + more);
   }
 
   const bool python2_;
   std::vector<LineRow>& rows_;
+  const size_t most_memory_;
   StatementFacts facts_;     // of the tokens since first_
   uint32_t first_ = 0;       // the first token of the statement under way
   uint32_t first_line_ = 0;  // its line
@@ -341,20 +358,22 @@ class Cutter {
 };
 
 template <class Client>
-void Scan(SourceText& source, Version version, Client& client) {
-  Scanner<Client>(source.text(), version.AtLeast(3, 12), source.tokens, source.line_starts, client).Run();
+void Scan(SourceText& source, Version version, size_t most_memory, Client& client) {
+  Scanner<Client>(source.text(), version.AtLeast(3, 12), source.tokens, source.line_starts, client,
+                  most_memory / sizeof(Token))
+      .Run();
 }
 
 }  // namespace
 
-void CutLines(SourceText& source, Version version, std::vector<LineRow>& rows) {
-  Cutter cutter(version, rows);
-  Scan(source, version, cutter);
+void CutLines(SourceText& source, Version version, std::vector<LineRow>& rows, size_t most_memory) {
+  Cutter cutter(version, rows, most_memory);
+  Scan(source, version, most_memory, cutter);
 }
 
 void TokenizeOnly(SourceText& source, Version version) {
   TokensOnly client;
-  Scan(source, version, client);
+  Scan(source, version, SIZE_MAX, client);
 }
 
 void SetFromRow(LogicalLine& line, const Ref<SourceText>& source, const LineRow& row) {

@@ -18,12 +18,7 @@ namespace quillet {
 
 namespace {
 
-// An embedded expression: its tokens in the common list, and the outer token that holds it.
-struct Found {
-  LineKind kind;
-  TokenRange range;
-  size_t outer;
-};
+using Found = EmbeddedExpressions::Found;
 
 class EmbeddedSearch {
  public:
@@ -54,7 +49,7 @@ class EmbeddedSearch {
   void AddFields(size_t i) {
     fields_.clear();
     AppendFieldTokens(toks_[i], tokens_, fields_);
-    for (const TokenRange& field : fields_) found_.push_back({LineKind::kFstringFieldExp, field, i});
+    for (const TokenRange& field : fields_) AddFound(LineKind::kFstringFieldExp, field, i);
   }
 
   void AddCommentHint(size_t i) {
@@ -67,7 +62,12 @@ class EmbeddedSearch {
     if (IsNone(hint)) return;
     const size_t begin = tokens_.size();
     AppendExpressionTokens(hint.data(), hint.data() + hint.size(), tokens_);
-    if (tokens_.size() > begin) found_.push_back({kind, {begin, tokens_.size()}, i});
+    if (tokens_.size() > begin) AddFound(kind, {begin, tokens_.size()}, i);
+  }
+
+  void AddFound(LineKind kind, TokenRange range, size_t outer) {
+    found_.push_back(
+        {kind, static_cast<uint32_t>(range.begin), static_cast<uint32_t>(range.end), static_cast<uint32_t>(outer)});
   }
 
   TokenSpan toks_;
@@ -77,8 +77,10 @@ class EmbeddedSearch {
   std::vector<TokenRange> fields_;
 };
 
+}  // namespace
+
 // Positions inside of one token, counted from that token's own.
-class PlacesInToken {
+class EmbeddedExpressions::PlacesInToken {
  public:
   PlacesInToken(const Token& token, Position position) : token_(token), position_(position) {
     for (const char* at = token.text; at < token.end(); ++at)
@@ -98,51 +100,58 @@ class PlacesInToken {
   std::vector<const char*> line_starts_;
 };
 
-}  // namespace
+EmbeddedExpressions::EmbeddedExpressions(const LogicalLine& line)
+    : outer_toks_(line.toks), first_line_(line.first_line), has_stored_positions_(line.has_stored_positions()) {
+  // Only bytes of the source are followed by what a scan may load.
+  if (!line.source) return;
+  for (const Token& token : line.toks)
+    if (!token.removed() && !line.source->Holds(token.text)) return;
+  std::vector<Token> tokens;
+  EmbeddedSearch(line.toks, tokens, found_).Run();
+  if (found_.empty()) return;
+  inner_ = SourceText::Within(line.source);
+  inner_->tokens = std::move(tokens);
+  outer_positions_ = line.positions();
+}
+
+EmbeddedExpressions::~EmbeddedExpressions() = default;
+
+void EmbeddedExpressions::Show(size_t index, LogicalLine& line) {
+  const Found& found = found_[index];
+  line.ClearDerivedInfo();
+  if (line.has_stored_positions()) line.UseSourcePositions();
+  line.source = inner_;
+  line.toks = TokenSpan(inner_->tokens).subspan(found.begin, found.end - found.begin);
+  line.token_count = static_cast<int32_t>(line.toks.size());
+  line.kind = found.kind;
+  line.first_line = 0;
+  if (!has_stored_positions_) {
+    line.first_line = first_line_;
+    line.first_line += line.positions().LineOf(0);
+  } else if (found.outer < outer_positions_.size()) {
+    if (places_ == nullptr || places_of_ != found.outer) {
+      places_ = std::make_unique<PlacesInToken>(outer_toks_[found.outer], outer_positions_[found.outer]);
+      places_of_ = found.outer;
+    }
+    const int32_t line_of_first = places_->Of(line.toks.front().text).line;
+    line.first_line = first_line_ + line_of_first;
+    std::vector<Position> own_positions;
+    own_positions.reserve(line.toks.size());
+    for (const Token& token : line.toks) {
+      own_positions.push_back(places_->Of(token.text));
+      own_positions.back().line -= line_of_first;
+    }
+    line.SetPositions(std::move(own_positions));
+  }
+}
 
 EmbeddedLines LogicalLine::DirectGetExpLogicals() const {
   EmbeddedLines embedded;
-  // Only bytes of the source are followed by what a scan may load.
-  if (!source) return embedded;
-  for (const Token& token : toks)
-    if (!token.removed() && !source->Holds(token.text)) return embedded;
-
-  std::vector<Token> tokens;
-  std::vector<Found> found;
-  EmbeddedSearch(toks, tokens, found).Run();
-  if (found.empty()) return embedded;
-
-  const Ref<SourceText> inner = SourceText::Within(source);
-  inner->tokens = std::move(tokens);
-  const PositionView outer_positions = positions();
-  std::unique_ptr<PlacesInToken> places;
-  size_t places_of = toks.size();
-  for (const Found& row : found) {
-    auto line = std::make_unique<LogicalLine>();
-    line->source = inner;
-    line->toks = TokenSpan(inner->tokens).subspan(row.range.begin, row.range.end - row.range.begin);
-    line->token_count = static_cast<int32_t>(line->toks.size());
-    line->kind = row.kind;
-    if (!has_stored_positions_) {
-      line->first_line = first_line;
-      line->first_line += line->positions().LineOf(0);
-    } else if (row.outer < outer_positions.size()) {
-      if (places_of != row.outer) {
-        places = std::make_unique<PlacesInToken>(toks[row.outer], outer_positions[row.outer]);
-        places_of = row.outer;
-      }
-      const int32_t line_of_first = places->Of(line->toks.front().text).line;
-      line->first_line = first_line + line_of_first;
-      std::vector<Position> own_positions;
-      own_positions.reserve(line->toks.size());
-      for (const Token& token : line->toks) {
-        own_positions.push_back(places->Of(token.text));
-        own_positions.back().line -= line_of_first;
-      }
-      line->SetPositions(std::move(own_positions));
-    }
-    embedded.lines.push_back(line.get());
-    embedded.owned.push_back(std::move(line));
+  EmbeddedExpressions found(*this);
+  for (size_t i = 0; i < found.size(); ++i) {
+    embedded.owned.push_back(std::make_unique<LogicalLine>());
+    embedded.lines.push_back(embedded.owned.back().get());
+    found.Show(i, *embedded.owned.back());
   }
   return embedded;
 }

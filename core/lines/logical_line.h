@@ -199,6 +199,40 @@ class LogicalLine {
   std::unique_ptr<RecordStore> own_store_;
 };
 
+// What GetExpLogicals gives, found at once and shown one after the other: a string may hold millions of
+// fields, and a line each would be a hundred times their size.
+class EmbeddedExpressions {
+ public:
+  // An embedded expression: its tokens in the common list, and the outer token that holds it.
+  struct Found {
+    LineKind kind;
+    uint32_t begin;
+    uint32_t end;
+    uint32_t outer;
+  };
+
+  // Of a line with positions of the host's own it holds views, so that no code of the host's may run while
+  // it lives.
+  explicit EmbeddedExpressions(const LogicalLine& line);
+  ~EmbeddedExpressions();
+
+  size_t size() const { return found_.size(); }
+  // Makes `line`, a fresh one or one that an expression was shown in, the expression of this index.
+  void Show(size_t index, LogicalLine& line);
+
+ private:
+  class PlacesInToken;
+
+  TokenSpan outer_toks_;
+  int32_t first_line_;
+  bool has_stored_positions_;
+  PositionView outer_positions_;
+  Ref<SourceText> inner_;
+  std::vector<Found> found_;
+  std::unique_ptr<PlacesInToken> places_;
+  size_t places_of_ = 0;
+};
+
 // TextFromTokens of the host: the source text of a line as its tokens and positions spell it.
 // Removed tokens leave blanks.
 std::string TextFromTokens(const LogicalLine& line);

@@ -40,8 +40,8 @@ WidePosition BasePosition(const LogicalLine& logical, Context context) {
 
 }  // namespace
 
-SyntaxError CreateSyntaxError(std::string message, const LogicalLine& logical, Context context,
-                              const Position* in_token) {
+SyntaxError CreateTextlessSyntaxError(std::string message, const LogicalLine& logical, Context context,
+                                      const Position* in_token) {
   WidePosition position;
   if (logical.token_count != 0) {
     position = BasePosition(logical, context);
@@ -51,7 +51,14 @@ SyntaxError CreateSyntaxError(std::string message, const LogicalLine& logical, C
       position.line += in_token->line;
     }
   }
-  return SyntaxError(std::move(message), "<string>", position.line + 1, position.col + 1, TextFromTokens(logical));
+  return SyntaxError(std::move(message), "<string>", position.line + 1, position.col + 1, {});
+}
+
+SyntaxError CreateSyntaxError(std::string message, const LogicalLine& logical, Context context,
+                              const Position* in_token) {
+  SyntaxError error = CreateTextlessSyntaxError(std::move(message), logical, context, in_token);
+  error.text = TextFromTokens(logical);
+  return error;
 }
 
 }  // namespace quillet

@@ -16,5 +16,8 @@ namespace quillet {
 // names a place inside the token, line and column from 0. TypeError for a context that is neither.
 SyntaxError CreateSyntaxError(std::string message, const LogicalLine& logical, Context context,
                               const Position* in_token = nullptr);
+// The same without the text of the line.
+SyntaxError CreateTextlessSyntaxError(std::string message, const LogicalLine& logical, Context context,
+                                      const Position* in_token = nullptr);
 
 }  // namespace quillet

@@ -77,6 +77,7 @@ class JsonLinesWriter : public FileWriter {
     }
     placed.Begin(file, scopes);
     for (size_t row = 0; row < file.rows().size(); ++row) {
+      file.CheckMemory(out.size());
       const FileAnalyzer::LineResult& result = file.results()[row];
       const bool has_records =
           result.record_begin != result.record_end || result.arg_record_begin != result.arg_record_end;

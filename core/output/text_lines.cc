@@ -146,6 +146,7 @@ class TextLinesWriter : public FileWriter {
     AppendPrintable(input.path, path_);
     placed.Begin(file, scopes);
     for (size_t row = 0; row < file.rows().size(); ++row) {
+      file.CheckMemory(out.size());
       if (file.results()[row].error >= 0) {
         AppendError(file, row, out);
       } else if (!options_.errors_only) {
@@ -157,7 +158,7 @@ class TextLinesWriter : public FileWriter {
  private:
   void AppendError(const FileAnalyzer& file, size_t row, std::string& out) {
     const Position position = file.ErrorPosition(row);
-    const SyntaxError& error = file.errors()[static_cast<size_t>(file.results()[row].error)];
+    const FileAnalyzer::Failure& error = file.errors()[static_cast<size_t>(file.results()[row].error)];
     place_.assign(path_).append(":").append(std::to_string(position.line + 1));
     place_.append(":").append(std::to_string(position.col + 1)).append(":");
     AppendColoured(kPlaceColour, place_, out);

@@ -28,6 +28,7 @@
 #include <cstdint>
 #include <vector>
 
+#include "foundations/errors.h"
 #include "foundations/stop.h"
 #include "tokens/operators.h"
 #include "tokens/token.h"
@@ -94,7 +95,8 @@ inline constexpr ByteTables kBytes = MakeByteTables();
 template <class T>
 class Appender {
  public:
-  explicit Appender(std::vector<T>& items) : items_(items) {
+  // More than `most` items are an OverflowError.
+  Appender(std::vector<T>& items, size_t most) : items_(items), most_(most) {
     items_.resize(kChunk);
     Locate(0);
   }
@@ -122,6 +124,7 @@ class Appender {
   void Grow() {
     CountSteps(kChunk);
     const size_t used = items_.size();
+    if (used > most_) ThrowError(ErrorKind::kOverflowError, "the source holds too many tokens or lines");
     if (items_.capacity() < used + kChunk) items_.reserve(2 * used + kChunk);
     items_.resize(used + kChunk);
     Locate(used);
@@ -133,6 +136,7 @@ class Appender {
   }
 
   std::vector<T>& items_;
+  const size_t most_;
   T* base_;
   T* next_;
   T* limit_;
@@ -143,8 +147,8 @@ class Appender {
 // What a scan has found so far. Token indices and lines count from 0.
 class ScanOutput {
  public:
-  ScanOutput(const char* begin, std::vector<Token>& tokens, std::vector<uint32_t>& line_starts)
-      : begin_(begin), tokens_(tokens), line_starts_(line_starts) {}
+  ScanOutput(const char* begin, std::vector<Token>& tokens, std::vector<uint32_t>& line_starts, size_t most)
+      : begin_(begin), tokens_(tokens, most), line_starts_(line_starts, most) {}
 
   const Token* tokens() const { return tokens_.base(); }
   uint32_t token_count() const { return tokens_.count(); }
@@ -182,10 +186,10 @@ class Scanner : private ScanOutput {
  public:
   // The bytes are followed by padding of NUL bytes, 32 at least. `nested_fstrings`: as from 3.12 on.
   // Tokens and line starts are replaced; a line start follows each line end, so the last one is the
-  // end of a source that ends with a line end.
+  // end of a source that ends with a line end. More than about `most` of either are an OverflowError.
   Scanner(Text bytes, bool nested_fstrings, std::vector<Token>& tokens, std::vector<uint32_t>& line_starts,
-          Client& client)
-      : ScanOutput(bytes.data(), tokens, line_starts),
+          Client& client, size_t most = SIZE_MAX)
+      : ScanOutput(bytes.data(), tokens, line_starts, most),
         end_(bytes.data() + bytes.size()),
         nested_fstrings_(nested_fstrings),
         failed_search_budget_(8 * bytes.size() + 4096),
