@@ -1,9 +1,10 @@
 // What each stage costs, over a corpus held in memory (see corpus.h), on one core:
-// tokenising, cutting into logical lines, parsing with discard, walking (hints included), and all of it.
+// tokenising, cutting into logical lines, parsing with discard, walking (hints included), all of it, and
+// binding names, alone and with all of it.
 //
 // Counters: ns per token, MB/s, physical lines/s. Before a stage is timed its result is checked: the
 // tokens cover the source in order, trees come out the same twice, recycled nodes give the records
-// that fresh ones give.
+// that fresh ones give, a recycled binder what a fresh one gives.
 #include <benchmark/benchmark.h>
 
 #include <chrono>
@@ -14,6 +15,7 @@
 
 #include "analysis/file_analyzer.h"
 #include "bench/corpus.h"
+#include "names/binder.h"
 
 namespace quillet::bench {
 namespace {
@@ -255,6 +257,56 @@ void BytesToRecords(benchmark::State& state) {
   Report(state);
 }
 BENCHMARK(BytesToRecords)->Unit(benchmark::kMillisecond);
+
+bool SameNames(const Bindings& a, const Bindings& b) {
+  if (a.occurrences.size() != b.occurrences.size() || a.symbols.size() != b.symbols.size()) return false;
+  for (size_t i = 0; i < a.occurrences.size(); ++i) {
+    const Occurrence& left = a.occurrences[i];
+    const Occurrence& right = b.occurrences[i];
+    if (left.begin != right.begin || left.role != right.role || a.VariableOf(left) != b.VariableOf(right)) return false;
+    if (a.TextOf(left) != b.TextOf(right)) return false;
+  }
+  return true;
+}
+
+// Binds the names of a file that was cut.
+void Names(benchmark::State& state) {
+  NameBinder recycled(kVersion);
+  size_t occurrences = 0, symbols = 0, bytes = 0;
+  for (const CutFile& file : CutCorpus()) {
+    NameBinder fresh(kVersion);
+    Require(SameNames(recycled.Bind(*file.source, file.rows), fresh.Bind(*file.source, file.rows)),
+            "a recycled binder gives other names");
+    const Bindings held = recycled.Bind(*file.source, file.rows);
+    occurrences += held.occurrences.size();
+    symbols += held.symbols.size();
+    bytes += held.ByteSize();
+  }
+  for (auto _ : state) {
+    for (const CutFile& file : CutCorpus())
+      benchmark::DoNotOptimize(recycled.Bind(*file.source, file.rows).occurrences.data());
+  }
+  state.counters["occurrences"] = static_cast<double>(occurrences);
+  state.counters["symbols"] = static_cast<double>(symbols);
+  state.counters["bytes/occurrence"] = static_cast<double>(bytes) / static_cast<double>(occurrences);
+  Report(state);
+}
+BENCHMARK(Names)->Unit(benchmark::kMillisecond);
+
+// Both, as a file is analysed with its names; to be held against BytesToRecords.
+void BytesToRecordsAndNames(benchmark::State& state) {
+  FileAnalyzer analyzer(AnalyzerOptions());
+  NameBinder binder(kVersion);
+  for (auto _ : state) {
+    for (const std::string& bytes : TheCorpus().files) {
+      analyzer.Analyze(bytes);
+      const Bindings held = binder.Bind(analyzer.source(), analyzer.rows());
+      benchmark::DoNotOptimize(held.occurrences.data());
+    }
+  }
+  Report(state);
+}
+BENCHMARK(BytesToRecordsAndNames)->Unit(benchmark::kMillisecond);
 
 }  // namespace
 }  // namespace quillet::bench

@@ -126,6 +126,7 @@ void NameReader::ReadTokens(bool stops_at_colon) {
         operation();
         break;
       case Mark::kIf:
+        if (frames_.back().ends_at_if && frames_.back().in_body) PopLambdas();
         if (frames_.back().part == Frame::Part::kFirstIterable) {
           frames_.back().part = Frame::Part::kRest;
           scope_ = frames_.back().inner;
@@ -412,7 +413,7 @@ void NameReader::Assign(const Token& token) {
   PopLambdaBodies();
   Frame& top = frames_.back();
   if (top.kind != Frame::Kind::kBase) return;
-  if (*token.text == '-') {
+  if (token.code == tok::RARROW && *token.text == '-') {
     if (head_.kind == Head::Kind::kFunction && in_row_) BeginHeadAnnotation();
   } else if (top.is_statement && top.collects) {
     MakeWrites(top.candidates, NameRole::kWrite, kNameAugmented);
@@ -459,6 +460,10 @@ void NameReader::Comma() {
 
 void NameReader::Lambda() {
   Frame frame;
+  const Frame& around = frames_.back();
+  frame.ends_at_if = around.kind == Frame::Kind::kLambda
+                         ? around.ends_at_if
+                         : around.part == Frame::Part::kFirstIterable || around.part == Frame::Part::kRest;
   frame.kind = Frame::Kind::kLambda;
   frame.names = Frame::Names::kParameters;
   frame.inner = OpenScopeAt(NameScopeKind::kLambda, kNoIndex, *at_);

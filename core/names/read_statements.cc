@@ -477,7 +477,7 @@ void NameReader::EndOfHead() {
     open_.push_back({body, row_->indent, head_.kind == Head::Kind::kFunction, row_->has_inline_body, true});
   else
     EndOfScope(body, OffsetOf(end_[-1]) + end_[-1].length);
-  scope_ = statement_scope_ = body;
+  scope_ = body;
   head_ = Head();
 }
 
@@ -492,7 +492,7 @@ bool NameReader::OpenInHead(TokenCode code) {
     head_.type_scope = symbols_.Open({.kind = NameScopeKind::kTypeParameters,
                                       .parent = head_.outer,
                                       .name = head_.name,
-                                      .begin = OffsetOf(*at_),
+                                      .begin = head_.begin,
                                       .is_listed = true,
                                       .sees_class = out_.scopes[head_.outer].kind == NameScopeKind::kClass,
                                       .is_private = is_class && head_.name != kNoIndex});

@@ -91,6 +91,7 @@ class NameReader {
     bool in_annotation = false;
     bool is_first_loop = false;  // the target is that of a comprehension's first "for"
     bool comma_is_as = false;
+    bool ends_at_if = false;    // a lambda in a loop or a condition of a comprehension, in older versions
     uint32_t inner = kNoIndex;  // the scope that it opens
     uint32_t outer = 0;         // the reader's scope in front of it
     uint32_t quiet = kNoIndex;  // likewise

@@ -56,6 +56,7 @@ void SymbolTable::Resolve() {
     open.pop_back();
   }
   PassThrough();
+  MarkNamespaces();
   texts_.CopyTo(out_.texts);
 }
 
@@ -160,6 +161,16 @@ void SymbolTable::PassThrough() {
         passed.uses |= NameSymbol::kPassedBy;
       }
     }
+  }
+}
+
+// The scope of type parameters holds that of the definition, of the same name, whoever mentions it there.
+void SymbolTable::MarkNamespaces() {
+  for (uint32_t scope = 0; scope < out_.scopes.size(); ++scope) {
+    const NameScope& parameters = out_.scopes[scope];
+    if (parameters.kind != NameScopeKind::kTypeParameters || parameters.name == kNoIndex) continue;
+    const uint32_t found = Find(scope, parameters.name);
+    if (found != kNoIndex && out_.symbols[found].is_listed) out_.symbols[found].uses |= NameSymbol::kNamespace;
   }
 }
 

@@ -104,6 +104,7 @@ class SymbolTable {
   void ResolveSymbol(uint32_t symbol, uint32_t class_around);
   uint32_t ModuleSymbol(uint32_t name);
   void PassThrough();
+  void MarkNamespaces();
 
   const Version version_;
   Bindings& out_;
