@@ -307,10 +307,13 @@ void NameReader::Close() {
   const Frame frame = frames_.back();
   if (frame.part == Frame::Part::kTarget) EndTarget();
   PopFrame();
-  if (frames_.back().collects && candidates_.size() > frame.candidates && IsTrailer(NextCode()))
-    MakeReads(frame.candidates);
+  const TokenCode next = NextCode();
+  if (frames_.back().collects && candidates_.size() > frame.candidates && IsTrailer(next)) MakeReads(frame.candidates);
   front_ = Front::kValue;
   if (frame.kind != Frame::Kind::kGroup || !frame.is_plain || frame.is_comprehension) operand_ = kNoIndex;
+  // What parentheses hold alone is called as without them.
+  if (next == tok::LPAR && operand_ != kNoIndex && out_.occurrences[operand_].role == NameRole::kRead)
+    out_.occurrences[operand_].role = NameRole::kCall;
 }
 
 void NameReader::Backquote() {

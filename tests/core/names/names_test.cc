@@ -20,7 +20,8 @@ TEST(Names, ReadsAndCalls) {
   EXPECT_EQ(NamesOf("f(a, b(), *c, **d)\n"), "f=call a=read b=call c=read d=read");
   EXPECT_EQ(NamesOf("a [0] (x)\n"), "a=read x=read");
   EXPECT_EQ(NamesOf("not (a) or -(b)\n"), "a=read b=read");
-  EXPECT_EQ(NamesOf("(f)(x)\n"), "f=read x=read");
+  EXPECT_EQ(NamesOf("(f)(x)\n(a # c\n.b)(y)\n"), "f=call x=read a=read b=call<a y=read");
+  EXPECT_EQ(NamesOf("(f or g)(x)\n"), "f=read g=read x=read");
 }
 
 TEST(Names, KeywordsAndConstantsAreNoNames) {
