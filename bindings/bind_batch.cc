@@ -15,6 +15,7 @@
 
 #include "analysis/batch.h"
 #include "analysis/file_analyzer.h"
+#include "bindings/batch_format.h"
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/names_object.h"
@@ -301,10 +302,11 @@ class FileBatch {
     return options;
   }
 
-  // The format is None, ("jsonl", errors_only), ("text", errors_only, colours, width of a character),
-  // ("site survey",) or ("site page", site index).
+  // The format is None, one that another subsystem made, ("jsonl", errors_only), ("text", errors_only, colours,
+  // width of a character), ("site survey",) or ("site page", site index).
   std::function<std::unique_ptr<FileWriter>()> WriterMaker(Version version) const {
     if (format_.is_none()) return {};
+    if (nb::isinstance<BatchFormat>(format_)) return nb::cast<const BatchFormat&>(format_).make;
     const auto format = nb::cast<nb::tuple>(format_);
     if (nb::cast<std::string>(format[0]) == "site survey") return [version] { return MakeSiteSurveyWriter(version); };
     if (nb::cast<std::string>(format[0]) == "site page") {

@@ -33,6 +33,7 @@ void BindAnalysis(nb::module_& tarvex);
 void BindHost(nb::module_& tarvex);
 void BindRecordWords(nb::module_& tarvex);
 void BindNames(nb::module_& tarvex);
+void BindIndex(nb::module_& tarvex);
 void BindBatch(nb::module_& tarvex);
 void BindSite(nb::module_& tarvex);
 

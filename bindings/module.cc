@@ -54,6 +54,7 @@ NB_MODULE(tarvex_in_owner, tarvex) {
   BindHost(tarvex);
   BindRecordWords(tarvex);
   BindNames(tarvex);
+  BindIndex(tarvex);
   BindBatch(tarvex);
   BindSite(tarvex);
 }

@@ -90,18 +90,16 @@ def working_folder(folder: str) -> Iterator[None]:
 
 
 def find_view(source: str, version: tuple[int, int], name: str) -> str:
-    """What `quillet find NAME --long` prints for an index of the source as shop.py."""
-    from quillet.cli.find import show_hits
-    from quillet.index.questions import Index, Query, match_of
-    from quillet.index.update import Reports, Settings, update
+    """What `quillet find NAME --long` prints of the source as shop.py."""
+    from quillet.cli.find import show_answers
+    from quillet.index.questions import Folder, Query, match_of
 
     with tempfile.TemporaryDirectory() as folder, working_folder(folder):
         Path("shop.py").write_text(source, encoding="utf-8")
-        settings = Settings(paths=("shop.py",), version=version, jobs=1, gitignore=None)
-        update("index", settings, Reports(unread=lambda *_: None, waiting=lambda: None))
-        with Index("index") as index:
-            out = io.StringIO()
-            show_hits(out, index, index.find(Query(name, match_of(name))), as_json=False, long=True)
+        sources = Folder(".", version)
+        question = Query(name, match_of(name)).native(with_lines=True)
+        out = io.StringIO()
+        show_answers(out, sources, sources.answers(question), as_json=False, long=True)
     return out.getvalue()
 
 

@@ -9,6 +9,8 @@ import sys
 from pathlib import Path
 
 from quillet.index.questions import Index
+from quillet.index.store import read_index
+from quillet.tarvex import _host
 
 ENVIRONMENT = {**os.environ, "PYTHONUTF8": "1", "NO_COLOR": "1"}
 COMMAND = [sys.executable, "-m", "quillet"]
@@ -66,10 +68,19 @@ def make_index(folder: Path, **files: str) -> None:
     assert result.returncode == 0, result.stderr
 
 
-def content(index: Path) -> dict[bytes, list[tuple[object, ...]]]:
+def content(index: Path, *roots: str | Path) -> dict[bytes, list[object]]:
     """All that an index says, by file: to compare two indexes that were made by different ways."""
-    with Index(str(index)) as opened:
-        return {row.path: [row[4:], sorted(opened.records_of(row)), opened.errors_of(row)] for row in opened.files()}
+    native = read_index(str(index)).native
+    with Index(str(index), [str(root) for root in roots]) as opened:
+        return {
+            facts.row.path: [facts.row[4:], facts.hits, facts.errors, words_of(native, facts.row.number)]
+            for facts in opened.facts(opened.files())
+        }
+
+
+def words_of(native: _host.NameIndex, number: int) -> list[tuple[str, int]]:
+    """The words of a file and their uses."""
+    return sorted(native.WordsOf(number))
 
 
 def found(*arguments: str, cwd: Path) -> list[str]:

@@ -6,6 +6,7 @@ import json
 import os
 import re
 import shutil
+import sqlite3
 import subprocess
 import sys
 from pathlib import Path
@@ -39,14 +40,14 @@ def test_tags_name_definitions_with_kind_and_scope(shop: Path) -> None:
     tags = [line for line in lines if not line.startswith("!_TAG_")]
     assert tags == sorted(tags)
     assert tags == [
-        'D\tshop.py\t2;"\tv\tline:2\tlanguage:Python',
+        'D\tshop.py\t2;"\tx\tline:2\tlanguage:Python',
         'Item\tshop.py\t7;"\tc\tline:7\tlanguage:Python',
         'LIMIT\tshop.py\t4;"\tv\tline:4\tlanguage:Python',
         'Shop\tshop.py\t14;"\tc\tline:14\tlanguage:Python',
         '__init__\tshop.py\t10;"\tm\tline:10\tlanguage:Python\tclass:Item',
         'add\tshop.py\t15;"\tm\tline:15\tlanguage:Python\tclass:Shop',
         'main\tshop.py\t24;"\tf\tline:24\tlanguage:Python',
-        'os\tshop.py\t1;"\tv\tline:1\tlanguage:Python',
+        'os\tshop.py\t1;"\tI\tline:1\tlanguage:Python',
         'path\tshop.py\t20;"\tm\tline:20\tlanguage:Python\tclass:Shop',
         'price\tshop.py\t8;"\tv\tline:8\tlanguage:Python\tclass:Item',
     ]
@@ -159,7 +160,7 @@ def test_scip_leaves_out_what_lies_outside_its_root(tmp_path: Path) -> None:
     (tmp_path / "out.py").write_text("x = 1\n")
     (tmp_path / "in" / "a.py").write_text("x = 1\n")
     run("index", "../out.py", ".", cwd=tmp_path / "in")
-    result = run("export", "scip", cwd=tmp_path / "in")
+    result = run("export", "scip", "--root", str(tmp_path), cwd=tmp_path / "in")
     assert "out.py: left out" in result.stderr
     assert list(scip_documents(tmp_path / "in" / "index.scip")) == ["a.py"]
 
@@ -230,6 +231,58 @@ def test_parquet_names_what_it_cannot_read_or_write(shop: Path) -> None:
     result = run("index", ".", "--format", "parquet", "-o", "missing/out.parquet", cwd=shop)
     assert result.returncode == 1
     assert result.stderr == "quillet: missing/out.parquet: No such file or directory\n"
+
+
+def test_tables_can_be_asked_by_sql(shop: Path) -> None:
+    records = json.loads(run("stats", "--json", cwd=shop).stdout)["records"]
+    assert run("export", "sqlite", cwd=shop).returncode == 0
+    assert run("index", ".", "--format", "sqlite", "-q", "-o", "other.sqlite", cwd=shop).returncode == 0
+    for name in ("quillet.sqlite", "other.sqlite"):
+        connection = sqlite3.connect(shop / name)
+        rows = connection.execute(
+            "SELECT path, line, scope, name FROM facts WHERE kind = 'set' AND name = 'self.price'"
+        )
+        assert rows.fetchall() == [("shop.py", 11, "Item.__init__", "self.price")]
+        assert connection.execute("SELECT count(*) FROM records").fetchone() == (records,)
+        assert connection.execute("SELECT path, lines, problem FROM files").fetchall() == [(b"shop.py", 26, None)]
+        assert connection.execute("PRAGMA integrity_check").fetchall() == [("ok",)]
+        connection.close()
+        assert not (shop / f"{name}.part").exists()
+
+
+def test_tables_tell_errors_and_problems(tmp_path: Path) -> None:
+    make_index(tmp_path, a="x = = 1\n")
+    (tmp_path / "b.py").write_text("# coding: nothing-such\n")
+    run("index", cwd=tmp_path)
+    result = run("export", "sqlite", "-o", "t.sqlite", cwd=tmp_path)
+    assert "nothing-such" in result.stderr
+    connection = sqlite3.connect(tmp_path / "t.sqlite")
+    assert connection.execute("SELECT id >> 24, line, column FROM errors").fetchall() == [(1, 1, 5)]
+    assert "nothing-such" in connection.execute("SELECT problem FROM files WHERE id = 2").fetchone()[0]
+    connection.close()
+
+
+@pytest.mark.parametrize("form", ["sqlite", "parquet"])
+def test_tables_go_to_a_file_that_is_no_link(shop: Path, form: str) -> None:
+    if form == "parquet":
+        pytest.importorskip("pyarrow")
+    (shop / "elsewhere").write_text("")
+    (shop / "out").symlink_to("elsewhere")
+    for target in ("-", "out"):
+        result = run("export", form, "-o", target, cwd=shop)
+        assert result.returncode == 2
+        assert len(result.stderr.splitlines()) == 1
+    assert (shop / "elsewhere").read_text() == ""
+
+
+def test_an_export_as_parquet_holds_the_files_of_the_index(shop: Path) -> None:
+    pytest.importorskip("pyarrow")
+    from pyarrow import parquet
+
+    (shop / "later.py").write_text("x = 1\n")
+    assert run("export", "parquet", cwd=shop).returncode == 0
+    rows = parquet.read_table(shop / "quillet.parquet").to_pylist()
+    assert {row["path"] for row in rows} == {"shop.py"}
 
 
 def test_an_export_that_cannot_be_written_is_told(shop: Path) -> None:

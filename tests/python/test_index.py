@@ -6,6 +6,7 @@ import fcntl
 import json
 import os
 import random
+import shutil
 import signal
 import sqlite3
 import subprocess
@@ -17,7 +18,8 @@ import pytest
 from indexing import COMMAND, ENVIRONMENT, ODD_NAMES, SHOP, content, make_index, run
 from quillet import RecordKind, analyze_files
 from quillet.index.questions import Index
-from quillet.index.store import KINDS
+from quillet.index.store import KINDS, read_index
+from quillet.tarvex import _host
 
 OLD = 1_500_000_000
 
@@ -66,6 +68,7 @@ def test_files_that_did_not_change_are_not_analysed_again(tmp_path: Path) -> Non
     assert analysed(run("index", ".", cwd=tmp_path).stderr) == 1
     with Index(str(index_path(tmp_path))) as index:
         assert [hit.name for row in index.files() for hit in index.records_of(row) if hit.kind == "set"] == ["c", "b"]
+    assert analysed(run("index", ".", "--force", cwd=tmp_path).stderr) == 2
 
 
 def test_a_change_that_leaves_size_and_time_is_seen_while_the_time_is_young(tmp_path: Path) -> None:
@@ -130,23 +133,74 @@ def test_an_index_moves_with_its_folder(tmp_path: Path) -> None:
     assert run("find", "x", cwd=new).stdout == "a.py:1:1: x = 1\n"
 
 
-def test_texts_that_nothing_holds_any_more_are_dropped(tmp_path: Path) -> None:
+def test_words_that_no_file_holds_any_more_are_dropped(tmp_path: Path) -> None:
     make_index(tmp_path, a="first = 1\n")
-    for text in ("second = 1\n", "third = 1\n"):
-        make_index(tmp_path, a=text)
-    connection = sqlite3.connect(index_path(tmp_path))
-    names = {name for (name,) in connection.execute("SELECT name FROM names")}
-    connection.close()
-    assert "third" in names
-    assert "first" not in names
+    assert b"first" in index_path(tmp_path).read_bytes()
+    make_index(tmp_path, a="second = 1\n")
+    assert b"first" not in index_path(tmp_path).read_bytes()
 
 
-def test_the_tables_can_be_asked_by_sql(tmp_path: Path) -> None:
+def test_the_same_files_give_the_same_bytes_whatever_came_before(tmp_path: Path) -> None:
+    write_modules(tmp_path, 20, 0)
+    run("index", ".", cwd=tmp_path)
+    write_modules(tmp_path, 15, 1)
+    (tmp_path / "m17.py").unlink()
+    (tmp_path / "new.py").write_text("x = 1\n")
+    for path in tmp_path.glob("*.py"):
+        age(path)
+    run("index", ".", cwd=tmp_path)
+    run("index", ".", "-o", "fresh", cwd=tmp_path)
+    assert index_path(tmp_path).read_bytes() == (tmp_path / "fresh").read_bytes()
+
+
+def test_a_run_that_finds_nothing_new_writes_nothing(tmp_path: Path) -> None:
+    (tmp_path / "a.py").write_text("x = 1\n")
+    age(tmp_path / "a.py")
+    run("index", ".", cwd=tmp_path)
+    before = index_path(tmp_path).stat()
+    assert run("index", cwd=tmp_path).returncode == 0
+    after = index_path(tmp_path).stat()
+    assert (after.st_ino, after.st_mtime_ns) == (before.st_ino, before.st_mtime_ns)
+
+
+# ---- what is shown is what is there ----
+
+
+def test_a_file_that_changed_since_is_read_as_it_is_now(tmp_path: Path) -> None:
+    make_index(tmp_path, a="x = 1\n", b="y = 1\n", c="x = 1\n")
+    (tmp_path / "b.py").write_text("z = 1\nx = 2\n")
+    (tmp_path / "c.py").unlink()
+    result = run("find", "x", cwd=tmp_path)
+    assert (result.stdout, result.stderr) == ("a.py:1:1: x = 1\nb.py:2:1: x = 2\n", "")
+    assert run("find", "y", cwd=tmp_path).returncode == 1
+    assert json.loads(run("stats", "--json", cwd=tmp_path).stdout)["records"] == 6
+
+
+def test_asking_leaves_everything_as_it_is(tmp_path: Path) -> None:
     make_index(tmp_path, shop=SHOP)
-    connection = sqlite3.connect(index_path(tmp_path))
-    rows = connection.execute("SELECT path, line, scope, name FROM facts WHERE kind = 'set' AND name = 'self.price'")
-    assert rows.fetchall() == [("shop.py", 11, "Item.__init__", "self.price")]
-    connection.close()
+    index_path(tmp_path).chmod(0o444)
+
+    def look() -> list[tuple[str, int, int]]:
+        return sorted((path.name, path.stat().st_ino, path.stat().st_mtime_ns) for path in tmp_path.iterdir())
+
+    before = look(), tmp_path.stat().st_mtime_ns
+    for command in (["find", "Shop"], ["defs", "shop.py"], ["outline", "shop.py"], ["stats"], ["export", "jsonl"]):
+        assert run(*command, cwd=tmp_path).returncode == 0
+    assert (look(), tmp_path.stat().st_mtime_ns) == before
+
+
+def test_an_index_in_a_folder_that_one_may_not_write_can_be_asked(tmp_path: Path) -> None:
+    if os.geteuid() == 0:
+        pytest.skip("the superuser may write everywhere")
+    make_index(tmp_path, shop=SHOP)
+    tmp_path.chmod(0o555)
+    try:
+        assert run("find", "LIMIT", cwd=tmp_path).returncode == 0
+        result = run("index", cwd=tmp_path)
+        assert result.returncode in (0, 1)
+        assert "Traceback" not in result.stderr
+    finally:
+        tmp_path.chmod(0o755)
 
 
 # ---- ends at the wrong moment, and runs at once ----
@@ -175,10 +229,8 @@ def test_a_killed_run_leaves_an_index_that_the_next_run_completes(tmp_path: Path
     time.sleep(random.Random(seed).uniform(0.02, 0.6))
     process.kill()
     process.wait()
-    if index_path(tmp_path).exists() and index_path(tmp_path).stat().st_size:
-        connection = sqlite3.connect(index_path(tmp_path))
-        assert connection.execute("PRAGMA integrity_check").fetchall() == [("ok",)]
-        connection.close()
+    if index_path(tmp_path).exists():
+        read_index(str(index_path(tmp_path)))  # an old one or a new one, whole
     assert run("index", "source", cwd=tmp_path).returncode == 0
     assert run("index", "source", "-o", "fresh", cwd=tmp_path).returncode == 0
     assert content(index_path(tmp_path)) == content(tmp_path / "fresh")
@@ -289,34 +341,303 @@ def test_a_foreign_file_is_left_alone(tmp_path: Path, name: str, command: list[s
     assert foreign.read_bytes() == before
 
 
-@pytest.mark.parametrize("command", [["index", "."], ["find", "x"], ["stats"]])
-def test_a_damaged_index_is_told_in_one_line(tmp_path: Path, command: list[str]) -> None:
+@pytest.mark.parametrize("command", [["find", "x"], ["stats"], ["export", "jsonl"]])
+def test_a_damaged_index_is_told_in_one_line_and_made_anew(tmp_path: Path, command: list[str]) -> None:
     make_index(tmp_path, shop=SHOP * 50)
-    data = bytearray(index_path(tmp_path).read_bytes())
-    data[4096:] = b"\xa5" * (len(data) - 4096)
+    good = index_path(tmp_path).read_bytes()
+    data = bytearray(good)
+    data[300:] = b"\xa5" * (len(data) - 300)
     index_path(tmp_path).write_bytes(data)
     result = run(*command, cwd=tmp_path)
-    assert result.returncode == (1 if command[0] == "index" else 2)
-    assert "delete it" in only_line(result.stderr)
+    assert result.returncode == 2
+    assert "the index is damaged; make it anew with: quillet index" in only_line(result.stderr)
+    result = run("index", ".", "-q", cwd=tmp_path)
+    assert result.returncode == 0
+    assert "the index is damaged; it is made anew" in only_line(result.stderr)
+    assert run("find", "Shop", cwd=tmp_path).returncode == 0
 
 
-def test_an_index_of_another_schema_is_not_read(tmp_path: Path) -> None:
+def test_any_damage_is_noticed(tmp_path: Path) -> None:
+    make_index(tmp_path, shop=SHOP, other="x = 1\n")
+    good = index_path(tmp_path).read_bytes()
+    assert _host.NameIndex.StateOf(good) == "fine"
+    chance = random.Random(5)
+    for number in range(400):
+        data = bytearray(good)
+        if number % 4 == 0:
+            del data[chance.randrange(len(data)) :]
+        else:
+            data[chance.randrange(len(data))] ^= 1 << chance.randrange(8)
+        assert _host.NameIndex.StateOf(bytes(data)) != "fine"
+        with pytest.raises(ValueError, match="damaged"):
+            _host.NameIndex(bytes(data))
+
+
+def with_checksum(data: bytes) -> bytes:
+    """An index that says of itself that it is whole."""
+    return data[:16] + _host.HashOfSource(data[24:]).to_bytes(8, "little") + data[24:]
+
+
+def test_bytes_that_are_planted_do_no_harm(tmp_path: Path) -> None:
+    make_index(tmp_path, shop=SHOP, other="x = 1\n")
+    good = index_path(tmp_path).read_bytes()
+    assert with_checksum(good) == good
+    chance = random.Random(6)
+    read = 0
+    for _ in range(3000):
+        data = bytearray(good)
+        for _ in range(chance.randrange(1, 4)):
+            place = chance.randrange(24, len(data))
+            data[place : place + chance.randrange(2)] = chance.randbytes(chance.randrange(3))
+        try:
+            index = _host.NameIndex(with_checksum(bytes(data)))
+        except ValueError:
+            continue
+        read += 1
+        index.Files()
+        for number in index.FilesFor(_host.MakeQuestion("glob", "*a*", 1, True, "S*", False)):
+            index.WordsOf(number)
+    assert read > 20
+
+
+def test_an_index_of_another_version_is_made_anew(tmp_path: Path) -> None:
     make_index(tmp_path, a="x = 1\n")
-    connection = sqlite3.connect(index_path(tmp_path))
-    connection.execute("PRAGMA user_version = 99")
-    connection.close()
-    assert "another version of quillet" in only_line(run("find", "x", cwd=tmp_path).stderr)
-
-
-def test_without_an_index_the_answer_says_how_to_make_one(tmp_path: Path) -> None:
+    data = bytearray(index_path(tmp_path).read_bytes())
+    data[12] += 1
+    index_path(tmp_path).write_bytes(data)
     result = run("find", "x", cwd=tmp_path)
     assert result.returncode == 2
-    assert "quillet index ." in only_line(result.stderr)
-    assert run("find", "x", "--index", "none", cwd=tmp_path).returncode == 2
+    assert "was made by another version of quillet; make it anew with: quillet index" in only_line(result.stderr)
+    assert "it is made anew" in only_line(run("index", ".", "-q", cwd=tmp_path).stderr)
+    assert run("find", "x", cwd=tmp_path).returncode == 0
+
+
+def test_an_index_that_was_a_database_is_made_anew(tmp_path: Path) -> None:
+    (tmp_path / "a.py").write_text("x = 1\n")
+    connection = sqlite3.connect(index_path(tmp_path))
+    connection.executescript(
+        "PRAGMA journal_mode=WAL; PRAGMA application_id=0x51554C54; PRAGMA user_version=1; CREATE TABLE a (b)"
+    )
+    connection.close()
+    assert "another version of quillet" in only_line(run("find", "x", cwd=tmp_path).stderr)
+    assert "it is made anew" in only_line(run("index", ".", "-q", cwd=tmp_path).stderr)
+    assert run("find", "x", cwd=tmp_path).stdout == "a.py:1:1: x = 1\n"
+
+
+@pytest.mark.parametrize("kind", ["folder", "pipe"])
+@pytest.mark.parametrize("name", [".quillet-index", ".quillet-index.lock", ".quillet-index.new"])
+def test_what_is_no_file_is_told_in_one_line(tmp_path: Path, name: str, kind: str) -> None:
+    (tmp_path / "a.py").write_text("x = 1\n")
+    if kind == "folder":
+        (tmp_path / name).mkdir()
+    else:
+        os.mkfifo(tmp_path / name)
+    result = run("index", "a.py", "-q", cwd=tmp_path)
+    if kind == "pipe" and name.endswith(".new"):
+        assert result.returncode == 0  # left behind by whoever, and in the way
+        return
+    assert result.returncode == 1
+    assert str(tmp_path.name) in only_line(result.stderr) or name in only_line(result.stderr)
+
+
+def test_a_full_disk_leaves_the_old_index(tmp_path: Path) -> None:
+    make_index(tmp_path, a="x = 1\n")
+    before = index_path(tmp_path).read_bytes()
+    write_modules(tmp_path, 20, 0)
+    code = (
+        "import resource, sys\nresource.setrlimit(resource.RLIMIT_FSIZE, (1000, 1000))\n"
+        "from quillet.cli import main\nmain(['index', '.', '-q'])"
+    )
+    result = subprocess.run(
+        [COMMAND[0], "-c", code], cwd=tmp_path, env=ENVIRONMENT, capture_output=True, text=True, check=False
+    )
+    assert result.returncode == 1
+    assert "File too large" in only_line(result.stderr)
+    assert index_path(tmp_path).read_bytes() == before
+    assert not (tmp_path / ".quillet-index.new").exists()
+
+
+# ---- what somebody else made ----
+
+
+def plant(folder: Path, *paths: bytes, roots: tuple[str, ...] = (".",)) -> None:
+    """Puts an index into a folder that names files of anywhere."""
+    folder.mkdir(exist_ok=True)
+    with open(folder / "seed.py", "w") as file:
+        file.write("SECRET = 1\n")
+    run("index", "seed.py", "-q", cwd=folder)
+    stored = read_index(str(index_path(folder)))
+    writer = _host.NameIndexWriter()
+    words = written_words(b"SECRET = 1\n")
+    for path in paths:
+        writer.Add(path, 11, 5, 1, 0, None, words)
+    settings = stored.settings._replace(roots=roots)._asdict()
+    index_path(folder).write_bytes(writer.Finish(json.dumps(settings).encode()))
+
+
+def written_words(source: bytes) -> bytes:
+    from quillet._batch import decode_source, native_language_of
+
+    batch = _host.Batch(native_language_of(), [(b"a.py", source, None)], 1, decode_source, _host.WordsFormat(), False)
+    return bytes(memoryview(batch.Next()))
+
+
+def test_files_outside_of_the_folder_are_not_shown(tmp_path: Path) -> None:
+    secret = tmp_path / "secret.py"
+    secret.write_text("SECRET = 'of somebody'\n")
+    folder = tmp_path / "project"
+    folder.mkdir()
+    (folder / "link.py").symlink_to(secret)
+    (folder / "up").symlink_to(tmp_path)
+    plant(
+        folder,
+        b"../secret.py",
+        b"x/../../secret.py",
+        os.fsencode(secret),
+        b"link.py",
+        b"up/secret.py",
+        b"",
+        b"..",
+        b"a\0b",
+        b"//" + os.fsencode(secret),
+    )
+    for command in (
+        ["find", "SECRET"],
+        ["find", "*", "--json"],
+        ["export", "jsonl"],
+        ["export", "tags", "-o", "-"],
+        ["stats"],
+    ):
+        for result in (
+            run(*command, cwd=folder),
+            run(*command, "--index", "project/.quillet-index", cwd=tmp_path),
+        ):
+            assert "somebody" not in result.stdout
+            assert "secret" not in result.stdout
+            assert "Traceback" not in result.stderr
+    run("report", "-o", "site", cwd=folder)
+    pages = [path.read_text() for path in (folder / "site").rglob("*") if path.is_file()]
+    assert pages
+    assert not any("somebody" in page for page in pages)
+    # Its owner may name the place.
+    assert "of somebody" in run("find", "SECRET", "--root", "..", cwd=folder).stdout
+
+
+def test_roots_outside_of_the_folder_are_not_walked_unless_named(tmp_path: Path) -> None:
+    (tmp_path / "secret.py").write_text("SECRET = 1\n")
+    folder = tmp_path / "project"
+    plant(folder, roots=(".", "..", str(tmp_path)))
+    result = run("index", cwd=folder)
+    assert result.returncode == 0
+    assert "lies outside the index's folder; name it to bring it up to date" in result.stderr
+    assert list(content(index_path(folder), tmp_path)) == [b"seed.py"]
+
+
+def test_a_file_outside_is_kept_and_told_until_its_folder_is_named(tmp_path: Path) -> None:
+    (tmp_path / "in").mkdir()
+    (tmp_path / "out.py").write_text("x = 1\n")
+    (tmp_path / "in" / "a.py").write_text("x = 1\n")
+    assert run("index", "../out.py", ".", "-q", cwd=tmp_path / "in").returncode == 0
+    result = run("find", "x", cwd=tmp_path / "in")
+    assert result.stdout == "a.py:1:1: x = 1\n"
+    assert "1 file outside of" in only_line(result.stderr)
+    result = run("find", "x", "--root", "..", cwd=tmp_path / "in")
+    assert len(result.stdout.splitlines()) == 2
+    assert result.stderr == ""
+
+
+@pytest.mark.parametrize("name", [".quillet-index", ".quillet-index.lock", ".quillet-index.new"])
+@pytest.mark.parametrize("target", ["there", "not there"])
+def test_links_are_not_followed_where_something_is_written(tmp_path: Path, name: str, target: str) -> None:
+    project = tmp_path / "project"
+    project.mkdir()
+    (project / "a.py").write_text("x = 1\n")
+    elsewhere = tmp_path / "elsewhere"
+    if target == "there":
+        elsewhere.write_text("")
+    (project / name).symlink_to(elsewhere)
+    result = run("index", ".", "-q", cwd=project)
+    if name.endswith(".new"):
+        assert result.returncode == 0
+    else:
+        assert result.returncode == 1
+        assert "is a link, which is not followed" in only_line(result.stderr)
+    assert elsewhere.exists() == (target == "there")
+    assert target == "not there" or elsewhere.read_text() == ""
+
+
+# ---- git ----
+
+
+def git(*arguments: str, cwd: Path) -> str:
+    environment = {**ENVIRONMENT, "GIT_CONFIG_GLOBAL": os.devnull, "GIT_CONFIG_SYSTEM": os.devnull}
+    identity = ("-c", "user.name=a", "-c", "user.email=a@b")
+    result = subprocess.run(
+        ["git", *identity, *arguments], cwd=cwd, env=environment, capture_output=True, text=True, check=True
+    )
+    return result.stdout
+
+
+needs_git = pytest.mark.skipif(shutil.which("git") is None, reason="git is not installed")
+
+
+@needs_git
+def test_the_index_leaves_itself_out_of_git(tmp_path: Path) -> None:
+    main = tmp_path / "main"
+    (main / "sub").mkdir(parents=True)
+    git("init", "-q", cwd=main)
+    (main / "a.py").write_text("x = 1\n")
+    git("add", ".", cwd=main)
+    git("commit", "-qm", "a", cwd=main)
+    git("worktree", "add", "-q", str(tmp_path / "tree"), cwd=main)
+    for _ in range(2):
+        for folder, path in ((main, "."), (main / "sub", ".."), (tmp_path / "tree", ".")):
+            run("index", path, "--force", cwd=folder)
+            assert (folder / ".quillet-index").exists()
+            assert git("status", "--porcelain", cwd=folder) == ""
+    lines = (main / ".git/info/exclude").read_text().splitlines()
+    assert lines.count("/.quillet-index*") == 1
+    assert lines.count("/sub/.quillet-index*") == 1
+
+
+@needs_git
+@pytest.mark.parametrize("planted", ["exclude", "info", "gitdir"])
+def test_a_repository_that_leads_elsewhere_is_let_be(tmp_path: Path, planted: str) -> None:
+    elsewhere = tmp_path / "elsewhere"
+    (elsewhere / "info").mkdir(parents=True)
+    (elsewhere / "info" / "exclude").write_text("")
+    project = tmp_path / "project"
+    project.mkdir()
+    if planted == "gitdir":
+        (project / ".git").write_text(f"gitdir: {elsewhere}\n")
+        (elsewhere / "commondir").write_text(".\n")
+    else:
+        git("init", "-q", cwd=project)
+        place = project / ".git" / "info"
+        shutil.rmtree(place, ignore_errors=True)
+        if planted == "info":
+            place.symlink_to(elsewhere / "info")
+        else:
+            place.mkdir()
+            (place / "exclude").symlink_to(elsewhere / "info" / "exclude")
+    (project / "a.py").write_text("x = 1\n")
+    assert run("index", ".", "-q", cwd=project).returncode == 0
+    assert (elsewhere / "info" / "exclude").read_text() == ""
+
+
+# ---- usage ----
 
 
 @pytest.mark.parametrize(
-    "arguments", [["index", "-"], ["index", ".", "-j", "0"], ["find"], ["find", ""], ["export", "x"]]
+    "arguments",
+    [
+        ["index", "-"],
+        ["index", ".", "-j", "0"],
+        ["index", ".", "-j", "100000"],
+        ["find"],
+        ["find", ""],
+        ["export", "x"],
+    ],
 )
 def test_wrong_usage_is_2(tmp_path: Path, arguments: list[str]) -> None:
     assert run(*arguments, cwd=tmp_path).returncode == 2

@@ -1,26 +1,38 @@
-"""`quillet export`: an index as a tags file, as SCIP or as JSON lines."""
+"""`quillet export`: what the files of an index say, as a tags file, as SCIP, as JSON lines or as tables."""
 
 from __future__ import annotations
 
 import os
 import sys
 import tempfile
-from collections.abc import Iterator
+from collections.abc import Iterator, Sequence
 
-from quillet.cli.find import fail
+from quillet.cli.find import fail, say_outside
 from quillet.cli.show import printable
 from quillet.cli.streams import quiet_output
 from quillet.index.questions import Index
 from quillet.index.store import IndexProblem, find_index
 
-_NAMES = {"tags": "tags", "scip": "index.scip", "jsonl": "-"}
+_NAMES = {
+    "tags": "tags",
+    "scip": "index.scip",
+    "jsonl": "-",
+    "sqlite": "quillet.sqlite",
+    "parquet": "quillet.parquet",
+}
+# What only a file can hold.
+_TABLES = ("sqlite", "parquet")
 
 
-def run(form: str, *, output: str | None, index: str | None) -> int:
+def run(form: str, *, output: str | None, index: str | None, roots: Sequence[str]) -> int:
     """Runs the command and returns its exit code."""
     target = output or _NAMES[form]
     try:
-        with Index(index or find_index()) as opened:
+        with Index(index or find_index(), roots) as opened:
+            opened.files()
+            say_outside(opened)
+            if form in _TABLES:
+                return _write_tables(opened, form, target)
             base = os.getcwd() if target == "-" else os.path.dirname(os.path.abspath(target))
             parts = _parts(opened, form, base)
             if target == "-":
@@ -35,6 +47,26 @@ def run(form: str, *, output: str | None, index: str | None) -> int:
     except OSError as error:
         print(f"quillet: {printable(target)}: {error.strerror or error}", file=sys.stderr)
         return 2
+    return 0
+
+
+def _write_tables(index: Index, form: str, target: str) -> int:
+    from quillet.index.tables import Source, write_sqlite
+
+    if target == "-":
+        return fail(ValueError(f"{form} is written to a file; name one with -o"))
+    rows = index.files()
+    # As a person would name them, since that is how columns of a path are read.
+    paths = [index.shown_path(row.path) for row in rows]
+    source = Source(paths, [row.path for row in rows], index.version or sys.version_info[:2])
+    if form == "parquet":
+        from quillet.index.parquet import write_parquet
+
+        outcome = write_parquet(source, target)
+    else:
+        outcome = write_sqlite(source, target)
+    for path, problem in outcome.problems:
+        print(f"quillet: {printable(path)}: {printable(problem)}", file=sys.stderr)
     return 0
 
 

@@ -1,25 +1,32 @@
 """`quillet find`: the places where a name is set, read, called, imported or hinted at.
 
 A line of output is `path:line:column: source line`, as compilers write it, so that terminals and editors
-jump there. Exit codes are those of grep: 0 found, 1 nothing found, 2 wrong usage or no usable index.
+jump there. Answers are written as they are found. Exit codes are those of grep: 0 found, 1 nothing found,
+2 wrong usage or no usable index.
 """
 
 from __future__ import annotations
 
 import sys
-from collections.abc import Sequence
+import time
+from collections.abc import Iterator, Sequence
 from itertools import groupby
 from typing import TextIO
 
 from quillet.cli.find_options import ROLES
 from quillet.cli.show import Style, printable
 from quillet.cli.streams import quiet_output
-from quillet.index.questions import FileRow, Hit, Index, Query, match_of
-from quillet.index.source import SourceFile
+from quillet.index.questions import FileFacts, Folder, Hit, Index, Query, Sources, match_of
 from quillet.index.store import IndexProblem, find_index
 
 # As much of a source line is shown, in characters.
 _WINDOW = 160
+# How long written lines may wait for more of them, in seconds.
+_PATIENCE = 0.1
+# A search without an index that takes longer could be faster with one.
+_SLOW = 1.0
+# How many words that differ by case are tried where nothing is found.
+_MOST_ALIKE = 5
 
 
 def ask(
@@ -31,6 +38,7 @@ def ask(
     as_json: bool,
     long: bool,
     index: str | None,
+    roots: Sequence[str],
     **roles: bool,
 ) -> int:
     """Runs the command with the parameters of `find_options` and returns its exit code."""
@@ -38,19 +46,37 @@ def ask(
         return fail(ValueError("NAME is empty"))
     wanted = tuple(role for role in ROLES if roles[f"role_{role}"])
     query = Query(name, match or match_of(name), wanted, returns, scope)
-    return run(query, index=index, as_json=as_json, long=long)
+    return run(query, index=index, roots=roots, as_json=as_json, long=long)
 
 
-def run(query: Query, *, index: str | None, as_json: bool, long: bool) -> int:
+def run(query: Query, *, index: str | None, roots: Sequence[str], as_json: bool, long: bool) -> int:
     """Runs the command and returns its exit code."""
+    start = time.monotonic()
     try:
-        with Index(index or find_index()) as opened:
-            hits = opened.find(query)
-            with quiet_output() as out:
-                show_hits(out, opened, hits, as_json=as_json, long=long)
+        sources = sources_to_ask(index, roots)
     except IndexProblem as problem:
         return fail(problem)
-    return 0 if hits else 1
+    with quiet_output() as out:
+        found = show_answers(out, sources, sources.answers(query.native(with_lines=True)), as_json=as_json, long=long)
+    if isinstance(sources, Index):
+        say_outside(sources)
+    elif time.monotonic() - start > _SLOW:
+        print("quillet: there is no index here or above; one is faster: quillet index .", file=sys.stderr)
+    if not found:
+        near = list(nearby(sources, query))
+        if near:
+            print(f"quillet: nothing found; try: {printable(', '.join(near))}", file=sys.stderr)
+    return 0 if found else 1
+
+
+def sources_to_ask(index: str | None, roots: Sequence[str]) -> Sources:
+    """The index that is named or that is nearest, and without one the working folder. Raises `IndexProblem`."""
+    if index is None:
+        try:
+            index = find_index()
+        except IndexProblem:
+            return Folder(".")
+    return Index(index, roots)
 
 
 def fail(problem: Exception) -> int:
@@ -59,41 +85,47 @@ def fail(problem: Exception) -> int:
     return 2
 
 
-def show_hits(out: TextIO, index: Index, hits: Sequence[Hit], *, as_json: bool, long: bool) -> None:
-    """Writes records by their places, each with its source line."""
+def say_outside(index: Index) -> None:
+    """Says that files were left out, since they lie neither in the index's folder nor in one that was named."""
+    if index.outside:
+        noun = "file" if index.outside == 1 else "files"
+        print(
+            f"quillet: {index.outside} {noun} outside of {printable(index.base)} left out;"
+            " name their folder with --root",
+            file=sys.stderr,
+        )
+
+
+def show_answers(out: TextIO, sources: Sources, answers: Iterator[FileFacts], *, as_json: bool, long: bool) -> bool:
+    """Writes answers as they come, and returns whether there were any."""
     style = Style.of_stdout()
-    rows = index.files_of({hit.path for hit in hits})
-    for stored, in_file in groupby(hits, key=lambda hit: hit.path):
-        path = index.shown_path(stored)
-        source = open_source(index, rows.get(stored))
-        for _, records in groupby(in_file, key=lambda hit: (hit.line, hit.column)):
-            group = list(records)
-            if as_json:
-                out.writelines(_json(path, hit, source) for hit in group)
-            else:
-                out.write(place_text(path, group[0].line, group[0].column, source, style))
-                if long:
-                    out.writelines(_detail_text(hit, style) for hit in group)
-        if source.changed:
+    found = False
+    flushed = 0.0
+    for facts in answers:
+        found = True
+        show_hits(out, sources.shown_path(facts.row.path), facts, style, as_json=as_json, long=long)
+        if time.monotonic() - flushed > _PATIENCE:
             out.flush()
-            say_changed(path)
+            flushed = time.monotonic()
+    return found
 
 
-def open_source(index: Index, row: FileRow | None) -> SourceFile:
-    """The source of a file of the index."""
-    if row is None:
-        raise IndexProblem(f"{index.path}: the index changed under the question; ask again")
-    return SourceFile(index.full_path(row.path), row)
+def show_hits(out: TextIO, path: str, facts: FileFacts, style: Style, *, as_json: bool, long: bool) -> None:
+    """Writes the records of a file by their places, each with its source line."""
+    pairs = zip(facts.hits, facts.source_lines, strict=True)
+    if as_json:
+        out.writelines(_json(path, hit, source) for hit, source in pairs)
+        return
+    for (line, column), records in groupby(pairs, key=lambda pair: (pair[0].line, pair[0].column)):
+        group = list(records)
+        out.write(place_text(path, line, column, group[0][1], style))
+        if long:
+            out.writelines(_detail_text(hit, style) for hit, _ in group)
 
 
-def say_changed(path: str) -> None:
-    """Says that a file is not what was indexed, so that its lines may have moved."""
-    print(f"quillet: {printable(path)}: changed since it was indexed; run: quillet index", file=sys.stderr)
-
-
-def place_text(path: str, line: int, column: int, source: SourceFile, style: Style) -> str:
+def place_text(path: str, line: int, column: int, source: bytes, style: Style) -> str:
     """A place and its source line."""
-    text = printable(source.line(line).decode("utf-8", "replace").strip())
+    text = printable(source.decode("utf-8", "replace").strip())
     if len(text) > _WINDOW:
         text = text[: _WINDOW - 1] + "…"
     place = style.place(f"{printable(path)}:{line}:{column}:")
@@ -108,7 +140,7 @@ def _detail_text(hit: Hit, style: Style) -> str:
     return f"    {style.name(printable(hit.name))}  {printable(said)}{where}\n"
 
 
-def _json(path: str, hit: Hit, source: SourceFile) -> str:
+def _json(path: str, hit: Hit, source: bytes) -> str:
     import json
 
     row = {
@@ -121,7 +153,49 @@ def _json(path: str, hit: Hit, source: SourceFile) -> str:
         "kind": hit.kind,
         "detail": hit.detail,
         "is_parameter": hit.is_parameter,
-        "source": source.line(hit.line).decode("utf-8", "backslashreplace"),
-        "changed": source.changed,
+        "source": source.decode("utf-8", "backslashreplace"),
+        "changed": False,
     }
     return json.dumps(row, ensure_ascii=True, separators=(",", ":")) + "\n"
+
+
+# ---- where nothing is found ----
+
+
+def nearby(sources: Sources, query: Query) -> Iterator[str]:
+    """Questions near to one without an answer, as one types them, of those that have one."""
+    seen = {query}
+    for near in _neighbours(sources, query):
+        if near not in seen:
+            seen.add(near)
+            if next(sources.find(near), None) is not None:
+                yield _typed(near)
+
+
+def _neighbours(sources: Sources, query: Query) -> Iterator[Query]:
+    if query.scope is not None:
+        yield query._replace(scope=None)
+    names = [query]
+    if query.match == "exact":
+        names.append(query._replace(name=f".{query.name}", match="suffix"))
+        outer, dot, tail = query.name.rpartition(".")
+        for word in sources.words_alike(tail)[:_MOST_ALIKE]:
+            names.append(query._replace(name=outer + dot + word))
+    elif query.match == "suffix":
+        names.append(query._replace(name=query.name.lstrip("."), match="exact"))
+    yield from names
+    if query.roles or query.returns:
+        for near in names:
+            yield near._replace(roles=(), returns=False)
+
+
+def _typed(query: Query) -> str:
+    parts = [query.name if query.name.replace(".", "").replace("_", "").isalnum() else f"'{query.name}'"]
+    parts += [f"--{role}" for role in query.roles]
+    if query.returns:
+        parts.append("--return")
+    if query.scope is not None:
+        parts.append(f"--scope {query.scope}")
+    if query.match != match_of(query.name):
+        parts.append(f"--match {query.match}")
+    return " ".join(parts)

@@ -18,10 +18,16 @@ class Option(NamedTuple):
     help: str
     metavar: str = ""
     choices: tuple[str, ...] = ()
+    repeated: bool = False
 
     @property
     def takes_value(self) -> bool:
         return bool(self.metavar or self.choices)
+
+    @property
+    def missing(self) -> object:
+        """The value of the parameter where the option is not given."""
+        return () if self.repeated else None if self.takes_value else False
 
 
 ROLES = {
@@ -38,6 +44,13 @@ INDEX_OPTION = Option(
     "The index to ask; without it .quillet-index of this folder or the nearest one above.",
     metavar="FILE",
 )
+ROOT_OPTION = Option(
+    ("--root",),
+    "roots",
+    "A folder outside of the index's own whose files are shown, too. May be given more than once.",
+    metavar="DIR",
+    repeated=True,
+)
 OPTIONS = (
     *(Option((f"--{role}",), f"role_{role}", text) for role, text in ROLES.items()),
     Option(("--return",), "returns", "What the functions of this name return and yield."),
@@ -46,13 +59,14 @@ OPTIONS = (
     Option(("--json",), "as_json", "A JSON object a record."),
     Option(("-l", "--long"), "long", "Below each place what is said of the name there."),
     INDEX_OPTION,
+    ROOT_OPTION,
 )
 _BY_FLAG = {flag: option for option in OPTIONS for flag in option.flags}
 
 
 def plain_parameters(arguments: Sequence[str]) -> dict[str, Any] | None:
     """The parameters that click would find, or None where it has to look for itself."""
-    parameters: dict[str, Any] = {option.parameter: None if option.takes_value else False for option in OPTIONS}
+    parameters: dict[str, Any] = {option.parameter: option.missing for option in OPTIONS}
     rest = iter(arguments)
     for argument in rest:
         option = _BY_FLAG.get(argument)
@@ -64,7 +78,7 @@ def plain_parameters(arguments: Sequence[str]) -> dict[str, Any] | None:
             value = next(rest, "-")
             if value.startswith("-") or (option.choices and value not in option.choices):
                 return None
-            parameters[option.parameter] = value
+            parameters[option.parameter] = (*parameters[option.parameter], value) if option.repeated else value
         else:
             parameters[option.parameter] = True
     return parameters if "name" in parameters else None

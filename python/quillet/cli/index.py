@@ -7,7 +7,9 @@ import sys
 import time
 
 from quillet.cli.files import find_files
+from quillet.cli.progress import Progress, say
 from quillet.cli.show import printable
+from quillet.index.paths import stored_path
 from quillet.index.store import DEFAULT_NAME, IndexProblem, find_index
 from quillet.index.update import Outcome, Reports, Settings, update
 
@@ -21,8 +23,8 @@ def run(settings: Settings, *, output: str | None, form: str, watch: bool, quiet
         print("quillet: standard input has no place in an index; name files or folders", file=sys.stderr)
         return 2
     try:
-        if form == "parquet":
-            return _parquet(settings, output or "quillet.parquet", quiet=quiet)
+        if form != "index":
+            return _tables(settings, form, output or f"quillet.{form}", quiet=quiet)
         index = output or (DEFAULT_NAME if settings.paths else find_index())
         outcome = _update(index, settings, quiet=quiet)
         if watch:
@@ -35,27 +37,52 @@ def run(settings: Settings, *, output: str | None, form: str, watch: bool, quiet
     return 1 if outcome.unread else 0
 
 
-def _parquet(settings: Settings, target: str, *, quiet: bool) -> int:
-    from quillet.index.parquet import write_parquet
+def _tables(settings: Settings, form: str, target: str, *, quiet: bool) -> int:
+    from quillet.index.tables import Source, write_sqlite
 
     if not settings.paths:
-        print("quillet: name what to index: quillet index PATH... --format parquet", file=sys.stderr)
+        print(f"quillet: name what to analyse: quillet index PATH... --format {form}", file=sys.stderr)
         return 2
     start = time.perf_counter()
-    outcome = write_parquet(settings, target, _reports(target))
+    found: list[str] = []
+    unread = 0
+    for item in find_files(settings.paths, gitignore=settings.gitignore is not False):
+        if item.problem is None:
+            found.append(os.path.relpath(item.path))
+        else:
+            _say_unread(item.path, item.problem)
+            unread += 1
+    paths = sorted(set(found))
+    base = os.path.dirname(os.path.abspath(target))
+    stored = [stored_path(path, base) for path in paths]
+    source = Source(paths, stored, settings.version or sys.version_info[:2], settings.jobs)
+    if form == "parquet":
+        from quillet.index.parquet import write_parquet
+
+        written = write_parquet(source, target)
+    else:
+        written = write_sqlite(source, target)
+    for path, problem in written.problems:
+        _say_unread(path, problem)
+    unread += len(written.problems)
+    outcome = Outcome(written.files, written.files - len(written.problems), 0, unread, written.records)
     _tell(target, settings, outcome, time.perf_counter() - start, quiet=quiet)
-    return 1 if outcome.unread else 0
+    return 1 if unread else 0
 
 
 def _update(index: str, settings: Settings, *, quiet: bool) -> Outcome:
     start = time.perf_counter()
-    outcome = update(index, settings, _reports(index))
+    with Progress("indexing", wanted=not quiet) as progress:
+        reports = Reports(
+            unread=_say_unread,
+            waiting=lambda: say(f"{printable(index)}: another run is writing it; waiting for its end"),
+            note=lambda text: say(printable(text)),
+            begin=lambda count: progress.begin("indexing", count),
+            advance=progress.advance,
+        )
+        outcome = update(index, settings, reports)
     _tell(index, settings, outcome, time.perf_counter() - start, quiet=quiet)
     return outcome
-
-
-def _reports(target: str) -> Reports:
-    return Reports(unread=_say_unread, waiting=lambda: _say_waiting(target))
 
 
 def _tell(target: str, settings: Settings, outcome: Outcome, spent: float, *, quiet: bool) -> None:
@@ -74,11 +101,7 @@ def _tell(target: str, settings: Settings, outcome: Outcome, spent: float, *, qu
 
 
 def _say_unread(path: str, problem: str) -> None:
-    print(f"quillet: {printable(path)}: {printable(problem)}", file=sys.stderr)
-
-
-def _say_waiting(index: str) -> None:
-    print(f"quillet: {printable(index)}: another run is writing it; waiting for its end", file=sys.stderr)
+    say(f"{printable(path)}: {printable(problem)}")
 
 
 def _watch(index: str, settings: Settings, *, quiet: bool) -> None:

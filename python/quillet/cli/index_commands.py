@@ -11,7 +11,7 @@ from typing import Any
 
 import click
 
-from quillet.cli.find_options import INDEX_OPTION, OPTIONS, Option
+from quillet.cli.find_options import INDEX_OPTION, OPTIONS, ROOT_OPTION, Option
 from quillet.cli.options import python_option
 
 
@@ -24,7 +24,9 @@ def _options(options: Sequence[Option]) -> Callable[[Callable[..., None]], Calla
             if option.choices:
                 settings["type"] = click.Choice(option.choices)
             elif option.takes_value:
-                settings |= {"metavar": option.metavar, "type": click.Path() if option.metavar == "FILE" else str}
+                settings |= {"metavar": option.metavar, "type": str if option.metavar == "SCOPE" else click.Path()}
+                if option.repeated:
+                    settings["multiple"] = True
             else:
                 settings["is_flag"] = True
             command = click.option(*option.flags, option.parameter, **settings)(command)
@@ -34,6 +36,7 @@ def _options(options: Sequence[Option]) -> Callable[[Callable[..., None]], Calla
 
 
 _index_option = _options([INDEX_OPTION])
+_index_options = _options([INDEX_OPTION, ROOT_OPTION])
 
 
 @click.command()
@@ -42,20 +45,21 @@ _index_option = _options([INDEX_OPTION])
 @click.option(
     "--format",
     "form",
-    type=click.Choice(["sqlite", "parquet"]),
-    default="sqlite",
+    type=click.Choice(["index", "sqlite", "parquet"]),
+    default="index",
     show_default=True,
-    help="sqlite to ask and to update, parquet (needs pyarrow) for data tools.",
+    help="index to ask and to update; sqlite and parquet (needs pyarrow) write all records as tables instead.",
 )
 @python_option
 @click.option(
     "-j",
     "--jobs",
-    type=click.IntRange(1),
+    type=click.IntRange(1, 1024),
     metavar="N",
-    help="Threads that analyse; without it one a core, less the one that writes.",
+    help="Threads that analyse; one a core without it.",
 )
 @click.option("--no-gitignore/--gitignore", default=None, help="Index what .gitignore files exclude, too.")
+@click.option("--force", is_flag=True, help="Analyse all files again, also those that seem not to have changed.")
 @click.option("--watch", is_flag=True, help="Go on, and update the index when a file changes.")
 @click.option("-q", "--quiet", is_flag=True, help="Say nothing of what was done.")
 def index(
@@ -65,6 +69,7 @@ def index(
     version: tuple[int, int] | None,
     jobs: int | None,
     no_gitignore: bool | None,
+    force: bool,
     watch: bool,
     quiet: bool,
 ) -> None:
@@ -82,7 +87,7 @@ def index(
     from quillet.index.update import Settings
 
     gitignore = None if no_gitignore is None else not no_gitignore
-    settings = Settings(paths=paths, version=version, jobs=jobs, gitignore=gitignore)
+    settings = Settings(paths=paths, version=version, jobs=jobs, gitignore=gitignore, force=force)
     sys.exit(run(settings, output=output, form=form, watch=watch, quiet=quiet))
 
 
@@ -108,17 +113,20 @@ def find(name: str, **parameters: Any) -> None:
 
 @click.command()
 @click.argument("file", type=click.Path())
+@click.option("--imports", is_flag=True, help="The names that imports bind, too.")
 @click.option("--json", "as_json", is_flag=True, help="A JSON object a record.")
 @_index_option
-def defs(file: str, as_json: bool, index: str | None) -> None:
+def defs(file: str, imports: bool, as_json: bool, index: str | None) -> None:
     """Lists what FILE defines: classes, functions, and what its module and classes set.
+
+    The file is read as it is now; an index need not know it.
 
     \b
         quillet defs src/shop.py
     """
     from quillet.cli.defs import run
 
-    sys.exit(run(file, index=index, as_json=as_json))
+    sys.exit(run(file, index=index, as_json=as_json, imports=imports))
 
 
 @click.command()
@@ -137,35 +145,38 @@ def outline(file: str, index: str | None) -> None:
 
 @click.command()
 @click.option("--json", "as_json", is_flag=True, help="One JSON object.")
-@_index_option
-def stats(as_json: bool, index: str | None) -> None:
-    """Says what the index holds: files, lines, records by kind, the names most used.
+@_index_options
+def stats(as_json: bool, index: str | None, roots: tuple[str, ...]) -> None:
+    """Says what the files of the index hold: lines, records by kind, the names most used.
 
     \b
         quillet stats
     """
     from quillet.cli.stats import run
 
-    sys.exit(run(index=index, as_json=as_json))
+    sys.exit(run(index=index, roots=roots, as_json=as_json))
 
 
 @click.command()
-@click.argument("form", metavar="FORMAT", type=click.Choice(["tags", "scip", "jsonl"]))
+@click.argument("form", metavar="FORMAT", type=click.Choice(["tags", "scip", "jsonl", "sqlite", "parquet"]))
 @click.option("-o", "--output", metavar="FILE", type=click.Path(), help='Where to; "-" is standard output.')
-@_index_option
-def export(form: str, output: str | None, index: str | None) -> None:
-    """Writes the index as tags (for editors), scip (for code intelligence servers) or jsonl (for programs).
+@_index_options
+def export(form: str, output: str | None, index: str | None, roots: tuple[str, ...]) -> None:
+    """Writes what the files of the index say: as tags (for editors), scip (for code intelligence servers),
+    jsonl (for programs), sqlite or parquet (tables; parquet needs pyarrow).
 
-    Without -o tags go to "tags", scip to "index.scip", jsonl to standard output.
+    Without -o tags go to "tags", scip to "index.scip", jsonl to standard output, tables to "quillet.sqlite"
+    and "quillet.parquet".
 
     \b
         quillet export tags
         quillet export scip -o index.scip
         quillet export jsonl | head
+        quillet export sqlite -o code.sqlite
     """
     from quillet.cli.export import run
 
-    sys.exit(run(form, output=output, index=index))
+    sys.exit(run(form, output=output, index=index, roots=roots))
 
 
 @click.command()

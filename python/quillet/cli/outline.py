@@ -4,37 +4,32 @@ from __future__ import annotations
 
 from collections.abc import Iterator
 
-from quillet.cli.defs import file_of
-from quillet.cli.find import fail, open_source, say_changed
+from quillet.cli.defs import facts_of
+from quillet.cli.find import fail
 from quillet.cli.show import Style, printable
 from quillet.cli.streams import quiet_output
-from quillet.index.questions import FileRow, Hit, Index
-from quillet.index.store import CLASS, FUNCTION, IndexProblem, find_index
+from quillet.index.questions import FileFacts, Hit
+from quillet.index.store import CLASS, FUNCTION, IndexProblem
 
 
 def run(path: str, *, index: str | None) -> int:
     """Runs the command and returns its exit code."""
     try:
-        with Index(index or find_index()) as opened:
-            row = file_of(opened, path)
-            style = Style.of_stdout()
-            found = False
-            with quiet_output() as out:
-                for line in outline(opened, row, style):
-                    found = True
-                    out.write(line)
-                if open_source(opened, row).changed:
-                    out.flush()
-                    say_changed(opened.shown_path(row.path))
+        facts = facts_of(path, index, with_lines=False)
     except IndexProblem as problem:
         return fail(problem)
+    found = False
+    with quiet_output() as out:
+        for line in outline(facts, Style.of_stdout()):
+            found = True
+            out.write(line)
     return 0 if found else 1
 
 
-def outline(index: Index, row: FileRow, style: Style) -> Iterator[str]:
+def outline(facts: FileFacts, style: Style) -> Iterator[str]:
     """The lines of the tree, each with the line number in front."""
-    records = index.records_of(row)
-    digits = len(str(row.lines))
+    records = facts.hits
+    digits = len(str(facts.lines))
     depths: dict[str, int] = {}
     for place, hit in enumerate(records):
         if hit.opens not in (CLASS, FUNCTION):

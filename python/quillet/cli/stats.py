@@ -4,8 +4,9 @@ from __future__ import annotations
 
 import json
 import os
+from collections.abc import Sequence
 
-from quillet.cli.find import fail
+from quillet.cli.find import fail, say_outside
 from quillet.cli.show import Style, printable
 from quillet.cli.streams import quiet_output
 from quillet.index.questions import Index
@@ -14,22 +15,20 @@ from quillet.index.store import IndexProblem, find_index
 _NAMES = 10
 
 
-def run(*, index: str | None, as_json: bool) -> int:
+def run(*, index: str | None, roots: Sequence[str], as_json: bool) -> int:
     """Runs the command and returns its exit code."""
     try:
-        with Index(index or find_index()) as opened:
-            counts = opened.counts()
-            kinds = opened.kinds()
-            names = opened.most_used(_NAMES)
+        with Index(index or find_index(), roots) as opened:
+            counts = opened.counts_now(_NAMES)
             values = {
                 "index": opened.path,
                 "python": opened.python(),
                 "bytes": os.path.getsize(opened.path),
-                **counts,
-                "errors": opened.errors(),
-                "kinds": dict(kinds),
-                "names": dict(names),
+                **counts._asdict(),
+                "kinds": dict(counts.kinds),
+                "names": dict(counts.names),
             }
+            say_outside(opened)
     except (IndexProblem, OSError) as problem:
         return fail(problem)
     with quiet_output() as out:
@@ -39,7 +38,7 @@ def run(*, index: str | None, as_json: bool) -> int:
         style = Style.of_stdout()
         for key in ("index", "python", "bytes", "files", "lines", "records", "errors"):
             out.write(f"{key:<16}{printable(str(values[key]))}\n")
-        for title, rows in (("records by kind", kinds), ("names most used", names)):
+        for title, rows in (("records by kind", counts.kinds), ("names most used", counts.names)):
             out.write(f"\n{style.name(title)}\n")
             out.writelines(f"  {printable(name):<20}{count:>10}\n" for name, count in rows)
     return 0

@@ -1,35 +1,34 @@
-"""Asks an index: where is a name set, read, called, imported, and what does a function return.
+"""Asks for names: where is one set, read, called, imported, and what does a function return.
 
-Names are numbered in the index, so a question first finds the numbers of the names that it means, then
-their records by an index on those. A dotted suffix is found by what stands behind the last dot.
+Answers are found by analysing files as they are now. An index only says which files may hold one; a file
+that changed since it was made is analysed whatever it says. So an answer is never of yesterday, and never
+of a file that the index should not know of: what lies outside its folder is left out unless the caller
+names the folder.
 """
 
 from __future__ import annotations
 
 import os
-from collections.abc import Iterable, Iterator, Sequence
-from typing import Any, NamedTuple, TypeVar
+from collections.abc import Iterable, Iterator
+from typing import NamedTuple
 
-from quillet.index.paths import full_path, stored_path
-from quillet.index.store import CLASS, FILE_SHIFT, FUNCTION, KIND_NUMBER, KINDS, explained, open_to_read, tail_of
+from quillet.index.paths import Places, StoredPaths, stored_path
+from quillet.index.store import CLASS, FUNCTION, KINDS, read_index
+from quillet.tarvex import _host
 
+_BIT = {kind: 1 << number for number, kind in enumerate(KINDS)}
 # What the options of `quillet find` ask for. A record is wanted when one of the roles takes it.
 ROLES = {
-    "set": "(r.kind IN ({set}, {within_expr}) AND NOT r.is_parameter)",
-    "get": "(r.kind = {get})",
-    "call": "(r.kind = {called})",
-    "import": "(r.kind IN ({import}, {from_import}, {import_as}))",
-    "param": "(r.kind = {set} AND r.is_parameter)",
-    "hint": "(r.kind = {hint})",
+    "set": _BIT["set"] | _BIT["within_expr"],
+    "get": _BIT["get"],
+    "call": _BIT["called"],
+    "import": _BIT["import"] | _BIT["from_import"] | _BIT["import_as"],
+    "param": _host.PARAMETER_USE,
+    "hint": _BIT["hint"],
 }
-_VARIABLES = 500
-_Value = TypeVar("_Value")
-_FILE_COLUMNS = "id, path, size, mtime_ns, hash, lines, records, problem"
-_COLUMNS = "f.path, r.line, r.column, s.name, n.name, r.kind, d.detail, r.is_parameter, r.opens"
-_TABLES = (
-    f"records r JOIN files f ON f.id = r.id >> {FILE_SHIFT} JOIN names n ON n.id = r.name"
-    " JOIN names s ON s.id = r.scope JOIN details d ON d.id = r.detail"
-)
+_ALL_USES = sum(_BIT.values()) | _host.PARAMETER_USE
+# A thread of its own is worth while for so much source.
+_BYTES_A_THREAD = 1 << 19
 
 
 class Hit(NamedTuple):
@@ -47,15 +46,16 @@ class Hit(NamedTuple):
 
 
 class FileRow(NamedTuple):
-    """What the index knows of a file itself."""
+    """What is known of a file without a look at it. Without an index, only its path and size."""
 
-    id: int
+    number: int
     path: bytes
     size: int
     mtime_ns: int
-    hash: bytes
+    hash: int
     lines: int
     records: int
+    errors: int
     problem: str | None
 
 
@@ -68,169 +68,272 @@ class Query(NamedTuple):
     returns: bool = False
     scope: str | None = None
 
+    def native(self, *, with_lines: bool = False) -> _host.Question:
+        uses = 0
+        for role in self.roles:
+            uses |= ROLES[role]
+        if not self.roles and not self.returns:
+            uses = _ALL_USES
+        return _host.MakeQuestion(self.match, self.name, uses, self.returns, self.scope, with_lines)
 
-class Index:
-    """An open index. Use it as a context manager. Raises `IndexProblem` where it cannot be used."""
 
-    def __init__(self, path: str) -> None:
-        self.path = os.path.abspath(path)
-        self.base = os.path.dirname(self.path)
+class FileFacts(NamedTuple):
+    """What a file says as it is now. `problem` says why it could not be analysed."""
+
+    row: FileRow
+    hits: list[Hit]
+    source_lines: list[bytes]  # of the hits, where they were asked for
+    errors: list[tuple[int, int, str]]
+    lines: int
+    problem: str | None
+
+
+class Counts(NamedTuple):
+    """Totals of files as they are now. `kinds` and `names` are the most frequent ones first."""
+
+    files: int
+    lines: int
+    records: int
+    errors: int
+    kinds: list[tuple[str, int]]
+    names: list[tuple[str, int]]
+
+
+class Sources:
+    """Files that can be asked. `version` is the Python that they are read as."""
+
+    def __init__(self, base: str, version: tuple[int, int] | None) -> None:
+        self.base = base
+        self.version = version
         self._working_folder = os.path.join(os.getcwd(), "")
-        self._connection = open_to_read(path)
+
+    def files(self) -> list[FileRow]:
+        """All files, by path."""
+        raise NotImplementedError
+
+    def candidates(self, question: _host.Question, /) -> list[FileRow]:
+        """The files that may answer."""
+        raise NotImplementedError
+
+    def words_alike(self, word: str, /) -> list[str]:
+        """Words of the files that differ from one by the case of letters alone, as far as they are known."""
+        raise NotImplementedError
+
+    def full_path(self, stored: bytes) -> str:
+        """The absolute path of a file."""
+        return os.path.join(self.base, os.fsdecode(stored))
+
+    def shown_path(self, stored: bytes) -> str:
+        """A file's path for people: from the working folder where it lies below it."""
+        return self.full_path(stored).removeprefix(self._working_folder)
+
+    # ---- names ----
+
+    def find(self, query: Query) -> Iterator[Hit]:
+        """The records that a question asks for, by path, line and column, as they are found."""
+        for facts in self.answers(query.native()):
+            yield from facts.hits
+
+    def answers(self, question: _host.Question) -> Iterator[FileFacts]:
+        """The same a file, with the files that hold an answer alone."""
+        for facts in self.facts(self.candidates(question), question):
+            if facts.hits:
+                yield facts
+
+    def facts(self, rows: list[FileRow], question: _host.Question | None = None) -> Iterator[FileFacts]:
+        """What files say, one after the other, in their order: all records, or those that answer."""
+        for row, result in self.analysed(rows, question or self.everything()):
+            problem = result.problem
+            hits, lines = ([], []) if problem is not None else _host.Answers(result, row.path, KINDS)
+            errors = sorted([*result.errors, *result.reports])
+            yield FileFacts(row, list(map(Hit._make, hits)), lines, errors, result.line_count, problem)
+
+    @staticmethod
+    def everything(*, with_lines: bool = False) -> _host.Question:
+        """The question that all records of a file answer."""
+        return _host.MakeQuestion("everything", "", _ALL_USES, False, None, with_lines)
+
+    def analysed(self, rows: list[FileRow], form: _host.Format) -> Iterator[tuple[FileRow, _host.FileResult]]:
+        """What a format writes of files, on as many threads as they are worth."""
+        from quillet._batch import available_cores, decode_source, native_language_of
+
+        if not rows:
+            return
+        inputs = [(os.fsencode(self.full_path(row.path)), None, None) for row in rows]
+        jobs = min(available_cores(), 1 + sum(row.size for row in rows) // _BYTES_A_THREAD)
+        batch = _host.Batch(native_language_of(self.version), inputs, jobs, decode_source, form, False)
+        try:
+            while (result := batch.Next()) is not None:
+                yield rows[result.index], result
+        finally:
+            batch.Cancel()
+
+    # ---- files ----
+
+    def facts_of(self, row: FileRow) -> FileFacts:
+        """What one file says."""
+        [facts] = self.facts([row])
+        return facts
+
+    def records_of(self, row: FileRow) -> list[Hit]:
+        """All records of a file, in the order in which they were found."""
+        return self.facts_of(row).hits
+
+    def errors_of(self, row: FileRow) -> list[tuple[int, int, str]]:
+        """The syntax errors of a file as line, column and message."""
+        return self.facts_of(row).errors
+
+
+class Index(Sources):
+    """An open index, to be asked for files of its folder and of `roots`. Raises `IndexProblem`."""
+
+    def __init__(self, path: str, roots: Iterable[str] = ()) -> None:
+        self.path = os.path.abspath(path)
+        stored = read_index(path)
+        super().__init__(os.path.dirname(self.path), stored.settings.python)
+        self._native = stored.native
+        self._places = Places(self.base, roots)
+        self._files: list[FileRow] | None = None
+        self.outside = 0
 
     def __enter__(self) -> Index:
         return self
 
     def __exit__(self, *_: object) -> None:
-        self._connection.close()
-
-    def _rows(self, sql: str, values: Iterable[object] = ()) -> list[Any]:
-        with explained(self.path):
-            return self._connection.execute(sql, tuple(values)).fetchall()
-
-    # ---- names ----
-
-    def find(self, query: Query) -> list[Hit]:
-        """The records that a question asks for, by path, line and column."""
-        hits: list[Hit] = []
-        if query.roles or not query.returns:
-            roles = " OR ".join(ROLES[role].format(**KIND_NUMBER) for role in query.roles)
-            condition = f"({roles})" if roles else "1"
-            hits += self._records(self._names(query.name, query.match), condition)
-            if query.match == "exact" and "." in query.name:
-                hits += self._members(query.name, condition)
-        if query.returns:
-            hits += self._returns(query.name, query.match)
-        if query.scope is not None:
-            hits = [hit for hit in hits if scope_matches(hit.scope, query.scope)]
-        # A record may be asked for twice; the order of records of one place is that of the statement.
-        unique = list(dict.fromkeys(hits))
-        unique.sort(key=lambda hit: hit[:3])
-        return unique
-
-    def _names(self, name: str, match: str) -> list[int]:
-        if match == "exact":
-            return [row[0] for row in self._rows("SELECT id FROM names WHERE name = ?", (name,))]
-        if match == "suffix":
-            dotted = name if name.startswith(".") else "." + name
-            rows = self._rows("SELECT id, name FROM names WHERE tail = ?", (tail_of(name),))
-            return [number for number, text in rows if text == name or text.endswith(dotted)]
-        pattern = name.replace("[", "[[]")
-        return [row[0] for row in self._rows("SELECT id FROM names WHERE name GLOB ?", (pattern,))]
-
-    def _records(self, names: Sequence[int], condition: str) -> Iterator[Hit]:
-        for part in _parts(names):
-            marks = ",".join("?" * len(part))
-            yield from self._hits(f"SELECT {_COLUMNS} FROM {_TABLES} WHERE r.name IN ({marks}) AND {condition}", part)
-
-    def _hits(self, sql: str, values: Iterable[object]) -> Iterator[Hit]:
-        for path, line, column, scope, name, kind, detail, is_parameter, opens in self._rows(sql, values):
-            yield Hit(path, line, column, scope, name, KINDS[kind], detail, bool(is_parameter), opens)
-
-    def _members(self, name: str, condition: str) -> Iterator[Hit]:
-        """What is set in the scope that a dotted name ends in: `Shop.add` is the `add` of the class Shop."""
-        scope, _, member = name.rpartition(".")
-        for hit in self._records(self._names(member, "exact"), f"r.kind = {KIND_NUMBER['set']} AND {condition}"):
-            if not hit.is_parameter and scope_ends(hit.scope, scope):
-                yield hit
-
-    def _returns(self, name: str, match: str) -> Iterator[Hit]:
-        """What the functions of a name return and yield, and the hints for it."""
-        scopes = self._names(name, "glob") if match == "glob" else self._names(name.lstrip("."), "suffix")
-        for part in _parts(scopes):
-            marks = ",".join("?" * len(part))
-            yield from self._hits(
-                f"SELECT {_COLUMNS} FROM {_TABLES} WHERE r.scope IN ({marks})"
-                " AND r.name IN (SELECT id FROM names WHERE name IN ('return', 'yield'))",
-                part,
-            )
-
-    # ---- files ----
+        pass
 
     def files(self) -> list[FileRow]:
-        """All files, by path."""
-        return [FileRow(*row) for row in self._rows(f"SELECT {_FILE_COLUMNS} FROM files ORDER BY path")]
+        """All files that may be shown, by path. `outside` counts the others behind it."""
+        if self._files is None:
+            rows = list(map(FileRow._make, self._native.Files()))
+            self._files = [row for row in rows if self._places.path_of(row.path) is not None]
+            self.outside = len(rows) - len(self._files)
+        return [row for row in self._files if self._places.holds(self.full_path(row.path))]
 
-    def files_of(self, stored: Iterable[bytes]) -> dict[bytes, FileRow]:
-        """The files of paths as the index keeps them, without those that it does not have."""
-        found = {}
-        for part in _parts(list(stored)):
-            marks = ",".join("?" * len(part))
-            for row in self._rows(f"SELECT {_FILE_COLUMNS} FROM files WHERE path IN ({marks})", part):
-                found[row[1]] = FileRow(*row)
+    def candidates(self, question: _host.Question, /) -> list[FileRow]:
+        self.files()
+        wanted = set(self._native.FilesFor(question))
+        found = []
+        for row in self._files or ():
+            path = self.full_path(row.path)
+            try:
+                status = os.stat(path)
+            except OSError:
+                continue  # gone since
+            if row.number not in wanted and is_as_known(path, status, row):
+                continue
+            if self._places.holds(path):
+                found.append(row._replace(size=status.st_size))
         return found
+
+    def words_alike(self, word: str, /) -> list[str]:
+        return self._native.WordsAlike(word)
 
     def file(self, path: str) -> FileRow | None:
         """A file by a path as a person names it, or None where the index does not have it."""
         stored = stored_path(path, self.base)
-        return self.files_of([stored]).get(stored)
-
-    def records_of(self, file: FileRow) -> list[Hit]:
-        """All records of a file, in the order in which they were found."""
-        ends = (file.id << FILE_SHIFT, (file.id + 1) << FILE_SHIFT)
-        return list(self._hits(f"SELECT {_COLUMNS} FROM {_TABLES} WHERE r.id >= ? AND r.id < ? ORDER BY r.id", ends))
-
-    def definitions_of(self, file: FileRow) -> list[Hit]:
-        """What a file defines: its classes and functions, and the names set in its module and classes."""
-        inside = {""}
-        found = []
-        for hit in self.records_of(file):
-            if hit.opens == CLASS:
-                inside.add(f"{hit.scope}.{hit.name}" if hit.scope else hit.name)
-            if hit.kind != "set" or hit.is_parameter:
-                continue
-            if hit.opens in (CLASS, FUNCTION) or hit.scope in inside:
-                found.append(hit)
-        return found
-
-    def errors_of(self, file: FileRow) -> list[tuple[int, int, str]]:
-        """The syntax errors of a file as line, column and message."""
-        ends = (file.id << FILE_SHIFT, (file.id + 1) << FILE_SHIFT)
-        return self._rows("SELECT line, column, message FROM errors WHERE id >= ? AND id < ? ORDER BY id", ends)
+        return next((row for row in self.files() if row.path == stored), None)
 
     def errors(self) -> int:
-        """The number of all syntax errors."""
-        number: int = self._rows("SELECT count(*) FROM errors")[0][0]
-        return number
-
-    def kinds(self) -> list[tuple[str, int]]:
-        """How many records there are of each kind, most first."""
-        rows = self._rows("SELECT kind, count(*) FROM records GROUP BY kind ORDER BY 2 DESC")
-        return [(KINDS[number], count) for number, count in rows]
+        """The number of syntax errors when the index was made."""
+        return sum(row.errors for row in self.files())
 
     def counts(self) -> dict[str, int]:
-        """Totals of files, lines and records."""
-        files, lines, records = self._rows(
-            "SELECT count(*), coalesce(sum(lines), 0), coalesce(sum(records), 0) FROM files"
-        )[0]
-        return {"files": files, "lines": lines, "records": records}
+        """Totals of files, lines and records when the index was made."""
+        rows = self.files()
+        return {
+            "files": len(rows),
+            "lines": sum(row.lines for row in rows),
+            "records": sum(row.records for row in rows),
+        }
 
-    def most_used(self, count: int) -> list[tuple[str, int]]:
-        """The names that most records are of."""
-        return self._rows(
-            "SELECT n.name, r.number FROM (SELECT name, count(*) AS number FROM records GROUP BY name"
-            " ORDER BY number DESC LIMIT ?) r JOIN names n ON n.id = r.name ORDER BY r.number DESC, n.name",
-            (count,),
-        )
+    def counts_now(self, names: int) -> Counts:
+        """Totals of the files as they are now, with so many of the names that most records are of."""
+        sums = _host.RecordCounts()
+        files = lines = errors = 0
+        for _, result in self.analysed(self.files(), _host.CountsFormat()):
+            files += 1
+            if result.problem is None:
+                lines += result.line_count
+                errors += len(result.errors) + len(result.reports)
+                sums.Add(result)
+        kinds = [(kind, count) for kind, count in zip(KINDS, sums.kinds, strict=True) if count]
+        kinds.sort(key=lambda pair: -pair[1])
+        return Counts(files, lines, sum(sums.kinds), errors, kinds, sums.MostUsed(names))
 
     def python(self) -> str:
-        """The version of Python that the last run read files as."""
-        return str(self._rows("SELECT value FROM meta WHERE key = 'python'")[0][0])
-
-    def full_path(self, stored: bytes) -> str:
-        """The absolute path of a file."""
-        return full_path(stored, self.base)
-
-    def shown_path(self, stored: bytes) -> str:
-        """A file's path for people: from the working folder where it lies below it."""
-        path = self.full_path(stored)
-        return path.removeprefix(self._working_folder)
+        """The version of Python that files are read as."""
+        return "{}.{}".format(*self.version or ())
 
 
-def _parts(values: Sequence[_Value]) -> Iterator[Sequence[_Value]]:
-    """As many values at a time as a statement takes."""
-    for start in range(0, len(values), _VARIABLES):
-        yield values[start : start + _VARIABLES]
+class Folder(Sources):
+    """The files of a folder, without an index."""
+
+    def __init__(self, path: str, version: tuple[int, int] | None = None) -> None:
+        super().__init__(os.path.abspath(path), version)
+        self._path = path
+
+    def files(self) -> list[FileRow]:
+        from quillet.cli.files import find_files
+
+        stored = StoredPaths(self.base)
+        sizes = {}
+        for item in find_files((self._path,), gitignore=True):
+            if item.problem is None:
+                try:
+                    sizes[stored(item.path)] = os.stat(item.path).st_size
+                except (OSError, ValueError):
+                    continue
+        return [row_of(path, sizes[path], number) for number, path in enumerate(sorted(sizes))]
+
+    def candidates(self, _: _host.Question, /) -> list[FileRow]:
+        return self.files()
+
+    def words_alike(self, _: str, /) -> list[str]:
+        return []
+
+
+def row_of(path: bytes, size: int = 0, number: int = 0) -> FileRow:
+    """A file of which nothing is known but that it is there."""
+    return FileRow(number, path, size, 0, 0, 0, 0, 0, None)
+
+
+def is_as_known(path: str, status: os.stat_result, row: FileRow) -> bool:
+    """Whether a file's content is what it was: by size and time, and for another time by its hash."""
+    if row.size != status.st_size:
+        return False
+    if row.mtime_ns == status.st_mtime_ns:
+        return True
+    try:
+        with open(path, "rb") as file:
+            return _host.HashOfSource(file.read()) == row.hash
+    except OSError:
+        return False
+
+
+def definitions_in(hits: Iterable[Hit], *, imports: bool = False) -> list[Hit]:
+    """What a file defines, out of its records: its classes and functions, and the names set in its module
+    and classes; names that an import binds are another file's, and come with `imports`.
+    """
+    hits = list(hits)
+    imported = {} if imports else imports_in(hits)
+    inside = {""}
+    found = []
+    for hit in hits:
+        if hit.opens == CLASS:
+            inside.add(f"{hit.scope}.{hit.name}" if hit.scope else hit.name)
+        if hit.kind != "set" or hit.is_parameter or (hit.line, hit.column) in imported:
+            continue
+        if hit.opens in (CLASS, FUNCTION) or hit.scope in inside:
+            found.append(hit)
+    return found
+
+
+def imports_in(hits: Iterable[Hit]) -> dict[tuple[int, int], str]:
+    """The places where an import binds a name, by line and column, and whether it names a module or what is in
+    one: "import" or "from_import".
+    """
+    return {(hit.line, hit.column): hit.kind for hit in hits if hit.kind in ("import", "from_import")}
 
 
 def match_of(name: str) -> str:
@@ -238,17 +341,3 @@ def match_of(name: str) -> str:
     if "*" in name or "?" in name:
         return "glob"
     return "suffix" if name.startswith(".") else "exact"
-
-
-def scope_ends(scope: str, suffix: str) -> bool:
-    """Whether a dotted scope is `suffix` or ends in it."""
-    return scope == suffix or scope.endswith("." + suffix)
-
-
-def scope_matches(scope: str, wanted: str) -> bool:
-    """Whether a scope is the one that is wanted, or lies in it; `wanted` may be a pattern."""
-    if "*" in wanted or "?" in wanted:
-        from fnmatch import fnmatchcase
-
-        return fnmatchcase(scope, wanted.replace("[", "[[]"))
-    return f".{wanted}." in f".{scope}."

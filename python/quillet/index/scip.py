@@ -13,7 +13,7 @@ import os
 import re
 from collections.abc import Callable, Iterator
 
-from quillet.index.questions import FileRow, Hit, Index
+from quillet.index.questions import Hit, Index
 from quillet.index.store import CLASS, FUNCTION
 from quillet.index.wire import data, integer, integers, text
 
@@ -39,13 +39,22 @@ def scip_parts(index: Index, root: str, version: str, skipped: Callable[[str], N
     tool = text(_TOOL_NAME, "quillet") + text(_TOOL_VERSION, version)
     metadata = data(_METADATA_TOOL, tool) + text(_METADATA_ROOT, Path(root).as_uri())
     yield data(_INDEX_METADATA, metadata + integer(_METADATA_ENCODING, _TEXT_UTF8))
+    inside = []
     for row in index.files():
         full = index.full_path(row.path)
-        path = os.path.relpath(full, root).replace(os.sep, "/")
-        if path.startswith("../") or os.path.isabs(path):
+        if _path_from(root, full) is None:
             skipped(full)
-            continue
-        yield data(_INDEX_DOCUMENTS, _document(index, row, path))
+        else:
+            inside.append(row)
+    for facts in index.facts(inside):
+        path = _path_from(root, index.full_path(facts.row.path))
+        if path is not None:
+            yield data(_INDEX_DOCUMENTS, _document(facts.hits, path))
+
+
+def _path_from(root: str, full: str) -> str | None:
+    path = os.path.relpath(full, root).replace(os.sep, "/")
+    return None if path.startswith("../") or os.path.isabs(path) else path
 
 
 def global_symbol(path: str, scopes: list[tuple[str, int]], name: str, opens: int) -> str:
@@ -117,8 +126,7 @@ def _inner(hit: Hit) -> str:
     return f"{hit.scope}.{hit.name}" if hit.scope else hit.name
 
 
-def _document(index: Index, row: FileRow, path: str) -> bytes:
-    hits = index.records_of(row)
+def _document(hits: list[Hit], path: str) -> bytes:
     symbols = _Symbols(path, hits)
     roles: dict[tuple[int, int, int, str], int] = {}
     for hit in hits:

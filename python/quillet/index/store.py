@@ -1,112 +1,62 @@
-"""The file of an index: its tables, how it is opened, and who may write it.
+"""The file of an index: how it is found, read and written, and who may write it.
 
-SQLite in WAL mode, so that questions are answered while a run writes. A run commits file by file in
-batches, and each file's rows go and come in one transaction: whatever moment a run ends at, the index is
-what it was after some of its files. One run writes at a time, by a lock on a file beside the index that
-the system drops with the process. The trap: the number of a record holds its file's, so that a file's
-records lie together and go by one range, without an index on the file.
+The file says which files hold which words; the core makes and reads its bytes, and docs/index.md
+describes them. It is written beside itself and then put in its place, so whatever moment a run ends at,
+the index is the old one or the new one, and who asks never waits. One run writes at a time, by a lock on
+a file beside the index that the system drops with the process. The trap: an index may have come with a
+repository that somebody else made. No link is followed where something is written, and what the file says
+is only ever a hint where to look.
 """
 
 from __future__ import annotations
 
+import json
 import os
-import sqlite3
+import stat
 import sys
 from collections.abc import Callable, Iterator
-from contextlib import contextmanager
+from contextlib import contextmanager, suppress
+from typing import NamedTuple
 
-APPLICATION_ID = 0x51554C54  # "QULT"
-SCHEMA = 1
+from quillet.tarvex import _host
+
 DEFAULT_NAME = ".quillet-index"
-# A record's number is its file's number, shifted, and its place in the file.
-FILE_SHIFT = 24
-MAX_RECORDS = 1 << FILE_SHIFT
-
-# The kinds of records by their number in the index. `quillet.RecordKind` has the same values; they stand
-# here again so that a question does not load the engine.
-KINDS = (
-    "set",
-    "get",
-    "within_expr",
-    "called",
-    "import",
-    "from_import",
-    "import_as",
-    "global",
-    "nonlocal",
-    "type_parameter",
-    "expression",
-    "literal",
-    "hint",
-    "instance",
-    "equal",
-    "other",
-)
+# The kinds of records in the order in which the core numbers them.
+KINDS: tuple[str, ...] = _host.RECORD_KIND_WORDS
 # What a record's name opens a scope for, if any.
 CLASS = 1
 FUNCTION = 2
-KIND_NUMBER = {kind: number for number, kind in enumerate(KINDS)}
 
-_TABLES = f"""
-CREATE TABLE meta (key TEXT PRIMARY KEY, value) WITHOUT ROWID;
-CREATE TABLE kinds (id INTEGER PRIMARY KEY, kind TEXT NOT NULL);
-CREATE TABLE files (
-  id INTEGER PRIMARY KEY,
-  path BLOB NOT NULL UNIQUE,
-  size INTEGER NOT NULL,
-  mtime_ns INTEGER NOT NULL,
-  hash BLOB,
-  made_by TEXT NOT NULL,
-  lines INTEGER NOT NULL,
-  records INTEGER NOT NULL,
-  problem TEXT
-);
-CREATE TABLE names (id INTEGER PRIMARY KEY, name TEXT NOT NULL, tail TEXT NOT NULL);
-CREATE TABLE details (id INTEGER PRIMARY KEY, detail TEXT NOT NULL);
-CREATE TABLE records (
-  id INTEGER PRIMARY KEY,
-  name INTEGER NOT NULL,
-  scope INTEGER NOT NULL,
-  line INTEGER NOT NULL,
-  column INTEGER NOT NULL,
-  kind INTEGER NOT NULL,
-  is_parameter INTEGER NOT NULL,
-  opens INTEGER NOT NULL,
-  detail INTEGER NOT NULL
-);
-CREATE TABLE errors (
-  id INTEGER PRIMARY KEY,
-  line INTEGER NOT NULL,
-  column INTEGER NOT NULL,
-  message TEXT NOT NULL
-);
-CREATE VIEW facts AS
-  SELECT CAST(f.path AS TEXT) AS path, r.line AS line, r.column AS column, s.name AS scope, n.name AS name,
-         k.kind AS kind, d.detail AS detail, r.is_parameter AS is_parameter
-    FROM records r
-    JOIN files f ON f.id = r.id >> {FILE_SHIFT}
-    JOIN names n ON n.id = r.name
-    JOIN names s ON s.id = r.scope
-    JOIN kinds k ON k.id = r.kind
-    JOIN details d ON d.id = r.detail;
-"""
-# A first run makes these last, when all rows can be sorted at once; they stay from then on.
-INDICES = (
-    "CREATE UNIQUE INDEX IF NOT EXISTS names_by_name ON names (name)",
-    "CREATE INDEX IF NOT EXISTS names_by_tail ON names (tail)",
-    "CREATE UNIQUE INDEX IF NOT EXISTS details_by_detail ON details (detail)",
-    "CREATE INDEX IF NOT EXISTS records_by_name ON records (name, scope)",
-)
-RECORD_COLUMNS = 9
+# No index is as large; what is would be read for nothing.
+_MOST_BYTES = 1 << 32
+# An index was once a database that readers and a writer shared, by which it is told from an export.
+_SQLITE = b"SQLite format 3\0"
+_SQLITE_APPLICATION = b"QULT"
+_SQLITE_SHARED = b"\2\2"
 
 
 class IndexProblem(Exception):
     """An index that cannot be used; the text says why and what to do."""
 
 
-def tail_of(name: str) -> str:
-    """What stands behind the last dot, by which names are found from their end."""
-    return name.rpartition(".")[2]
+class StaleIndex(IndexProblem):
+    """An index that a run makes anew: damaged, or of another version."""
+
+
+class Settings(NamedTuple):
+    """What the last run was asked to do."""
+
+    roots: tuple[str, ...]  # as the index keeps paths
+    python: tuple[int, int]
+    gitignore: bool
+    made_by: str
+
+
+class Stored(NamedTuple):
+    """An index as it lies in its file."""
+
+    native: _host.NameIndex
+    settings: Settings
 
 
 def find_index(start: str = ".") -> str:
@@ -122,58 +72,96 @@ def find_index(start: str = ".") -> str:
         folder = parent
 
 
-def open_to_read(path: str) -> sqlite3.Connection:
-    """An index to ask. Raises `IndexProblem`."""
+def read_index(path: str) -> Stored:
+    """Reads an index. Raises `IndexProblem`, and `StaleIndex` for one that a run makes anew."""
     if not os.path.isfile(path):
         raise IndexProblem(f"{path}: there is no such index; make it with: quillet index . -o {path}")
+    with explained(path), open(path, "rb") as file:
+        head = file.read(72)
+        state = _host.NameIndex.StateOf(head)
+        if head.startswith(_SQLITE) and (head[18:20], head[68:72]) == (_SQLITE_SHARED, _SQLITE_APPLICATION):
+            state = "other schema"
+        if state == "foreign" or os.fstat(file.fileno()).st_size > _MOST_BYTES:
+            raise IndexProblem(f"{path}: is no index of quillet; name another file with -o, or delete this one")
+        if state != "other schema":
+            data = head + file.read()
+            state = _host.NameIndex.StateOf(data)
+    if state == "other schema":
+        raise StaleIndex(f"{path}: was made by another version of quillet; make it anew with: quillet index")
+    try:
+        native = _host.NameIndex(data)
+        return Stored(native, _settings_of(native.settings))
+    except (ValueError, KeyError, TypeError) as error:
+        raise StaleIndex(f"{path}: the index is damaged; make it anew with: quillet index") from error
+
+
+def write_index(path: str, writer: _host.NameIndexWriter, settings: Settings) -> None:
+    """Puts a new index in the place of an old one. The caller holds the lock. Raises `IndexProblem`."""
+    data = writer.Finish(json.dumps(settings._asdict(), separators=(",", ":")).encode())
+    unfinished = path + ".new"
     with explained(path):
-        _check_header(path)
-        connection = sqlite3.connect(path, isolation_level=None, timeout=30)
+        with suppress(FileNotFoundError):
+            os.unlink(unfinished)
+        # Made here and now, so that it is no link to somewhere else.
+        descriptor = os.open(unfinished, os.O_WRONLY | os.O_CREAT | os.O_EXCL | _NO_FOLLOW, 0o666)
         try:
-            connection.execute("PRAGMA query_only=1")
-            _check_schema(path, connection)
+            with open(descriptor, "wb") as file:
+                file.write(data)
+            os.replace(unfinished, path)
         except BaseException:
-            connection.close()
+            os.unlink(unfinished)
             raise
-    return connection
 
 
-def open_to_write(path: str) -> sqlite3.Connection:
-    """An index to bring up to date, made where there is none. The caller holds the lock. Raises `IndexProblem`."""
+def check_place(path: str) -> None:
+    """Raises `IndexProblem` where no index can be written at a path, or should not."""
     folder = os.path.dirname(os.path.abspath(path))
     if not os.path.isdir(folder):
         raise IndexProblem(f"{path}: there is no folder {folder} to hold the index")
-    if os.path.isdir(path):
-        raise IndexProblem(f"{path}: is a folder; name a file with -o")
     with explained(path):
-        if os.path.exists(path):
-            _check_header(path)
-        connection = sqlite3.connect(path, isolation_level=None, timeout=30)
         try:
-            empty = not connection.execute("SELECT 1 FROM sqlite_master LIMIT 1").fetchone()
-            if empty and connection.execute("PRAGMA application_id").fetchone()[0] == 0:
-                _create(connection)
-            _check_schema(path, connection)
-            connection.execute("PRAGMA journal_mode=WAL")
-            connection.execute("PRAGMA synchronous=NORMAL")
-            connection.execute("PRAGMA cache_size=-65536")
-        except BaseException:
-            connection.close()
-            raise
-    return connection
+            mode = os.lstat(path).st_mode
+        except FileNotFoundError:
+            return
+    if stat.S_ISDIR(mode):
+        raise IndexProblem(f"{path}: is a folder; name a file with -o")
+    if stat.S_ISLNK(mode):
+        raise IndexProblem(f"{path}: is a link, which is not followed; delete it, or name a file with -o")
+    if not stat.S_ISREG(mode):
+        raise IndexProblem(f"{path}: is no index of quillet; name another file with -o, or delete this one")
+
+
+def engine_mark() -> str:
+    """What tells one build of the engine from another, whose words of a file may be others."""
+    from quillet import tarvex
+
+    status = os.stat(tarvex.__file__ or sys.executable)
+    return f"{status.st_size}-{status.st_mtime_ns}"
 
 
 @contextmanager
 def explained(path: str) -> Iterator[None]:
-    """Turns what SQLite and the system say of a bad file into an `IndexProblem` that says what to do."""
+    """Turns what the system says of a bad file into an `IndexProblem`."""
     try:
         yield
-    except sqlite3.OperationalError as error:
-        raise IndexProblem(f"{path}: {error}; check that it can be written, and the space on the disk") from error
-    except sqlite3.DatabaseError as error:
-        raise IndexProblem(f"{path}: the index is damaged ({error}); delete it and run: quillet index") from error
     except OSError as error:
         raise IndexProblem(f"{path}: {error.strerror or error}") from error
+
+
+def _settings_of(text: bytes) -> Settings:
+    values = json.loads(text)
+    roots = tuple(str(root) for root in values["roots"])
+    major, minor = values["python"]
+    if not (isinstance(major, int) and isinstance(minor, int)):
+        raise TypeError("a version is two numbers")
+    if (major, minor) != (2, 7) and not (major == 3 and 0 <= minor < 100):
+        raise ValueError("a version that there is not")
+    return Settings(roots, (major, minor), bool(values["gitignore"]), str(values["made_by"]))
+
+
+# ---- the lock ----
+
+_NO_FOLLOW = getattr(os, "O_NOFOLLOW", 0) | getattr(os, "O_BINARY", 0) | getattr(os, "O_CLOEXEC", 0)
 
 
 @contextmanager
@@ -182,9 +170,16 @@ def write_lock(path: str, waiting: Callable[[], None]) -> Iterator[None]:
 
     The lock is on a file beside the index, which stays: to delete it would give two runs a lock each.
     """
-    with explained(path):
-        file = os.open(path + ".lock", os.O_RDWR | os.O_CREAT, 0o666)
+    lock = path + ".lock"
+    with explained(lock):
+        if os.path.islink(lock):
+            raise IndexProblem(f"{lock}: is a link, which is not followed; delete it")
+        # A pipe must not be waited for.
+        flags = os.O_RDWR | os.O_CREAT | _NO_FOLLOW | getattr(os, "O_NONBLOCK", 0)
+        file = os.open(lock, flags, 0o666)
     try:
+        if not stat.S_ISREG(os.fstat(file).st_mode):
+            raise IndexProblem(f"{lock}: is no file; delete it")
         if not _try_lock(file):
             waiting()
             _wait_for_lock(file)
@@ -220,35 +215,3 @@ else:
 
     def _wait_for_lock(file: int) -> None:
         fcntl.flock(file, fcntl.LOCK_EX)
-
-
-def _foreign(path: str) -> IndexProblem:
-    return IndexProblem(f"{path}: is no index of quillet; name another file with -o, or delete this one")
-
-
-def _check_header(path: str) -> None:
-    """Looks at the first bytes before SQLite does: it would take any empty or short file as its own."""
-    with open(path, "rb") as file:
-        head = file.read(72)
-    if head and (len(head) < 72 or not head.startswith(b"SQLite format 3\0")):
-        raise _foreign(path)
-    if head and int.from_bytes(head[68:72], "big") not in (0, APPLICATION_ID):
-        raise _foreign(path)
-
-
-def _check_schema(path: str, connection: sqlite3.Connection) -> None:
-    if connection.execute("PRAGMA application_id").fetchone()[0] != APPLICATION_ID:
-        raise _foreign(path)
-    schema = connection.execute("PRAGMA user_version").fetchone()[0]
-    if schema != SCHEMA:
-        raise IndexProblem(f"{path}: was made by another version of quillet; delete it and run: quillet index")
-
-
-def _create(connection: sqlite3.Connection) -> None:
-    # One transaction, so that a run that ends here leaves an empty file, which the next one takes.
-    script = f"BEGIN IMMEDIATE; {_TABLES} PRAGMA application_id={APPLICATION_ID}; PRAGMA user_version={SCHEMA};"
-    connection.executescript(script)
-    connection.executemany("INSERT INTO kinds VALUES (?, ?)", enumerate(KINDS))
-    connection.execute("INSERT INTO names VALUES (0, '', '')")
-    connection.execute("INSERT INTO details VALUES (0, '')")
-    connection.execute("COMMIT")

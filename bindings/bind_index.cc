@@ -1,0 +1,258 @@
+// The index of a repository: questions as formats of a batch, and the bytes that say which files to ask.
+//
+// Everything here takes bytes that Python read or that a batch wrote; no file is touched.
+#include <nanobind/stl/string.h>
+#include <nanobind/stl/vector.h>
+
+#include <optional>
+
+#include "bindings/batch_format.h"
+#include "bindings/bindings.h"
+#include "bindings/convert.h"
+#include "foundations/errors.h"
+#include "index/counts.h"
+#include "index/name_index.h"
+#include "index/question.h"
+#include "index/words.h"
+
+namespace quillet::host {
+
+namespace {
+
+// The bytes of any object with a buffer, for as long as this lives.
+class BufferText {
+ public:
+  explicit BufferText(nb::handle object) {
+    if (PyObject_GetBuffer(object.ptr(), &view_, PyBUF_SIMPLE) != 0) throw nb::python_error();
+  }
+  ~BufferText() { PyBuffer_Release(&view_); }
+  BufferText(const BufferText&) = delete;
+  BufferText& operator=(const BufferText&) = delete;
+
+  Text text() const { return {static_cast<const char*>(view_.buf), static_cast<size_t>(view_.len)}; }
+
+ private:
+  Py_buffer view_;
+};
+
+// ---- questions ----
+
+struct QuestionObject : BatchFormat {
+  Question question;
+};
+
+QuestionObject MakeQuestion(const std::string& match, nb::handle name, Uses uses, bool returns, nb::handle scope,
+                            bool with_lines) {
+  QuestionObject made;
+  Question& question = made.question;
+  question.match = match == "exact"    ? Question::Match::kExact
+                   : match == "suffix" ? Question::Match::kSuffix
+                   : match == "glob"   ? Question::Match::kGlob
+                                       : Question::Match::kEverything;
+  question.name = HostText::FromStr(name).text();
+  question.uses = uses;
+  question.returns = returns;
+  question.has_scope = !scope.is_none();
+  if (question.has_scope) question.scope = HostText::FromStr(scope).text();
+  question.with_lines = with_lines;
+  made.make = QuestionWriters(question);
+  return made;
+}
+
+nb::object Checked(PyObject* made) {
+  if (made == nullptr) throw nb::python_error();
+  return nb::steal(made);
+}
+
+// str of a text, the object of the text before where it is the same one: answers of a file repeat theirs.
+class ShownText {
+ public:
+  const nb::object& operator()(Text text) {
+    if (!object_.is_valid() || text != text_) {
+      object_ = Checked(PyUnicode_DecodeUTF8(text.data(), static_cast<Py_ssize_t>(text.size()), "backslashreplace"));
+      text_ = text;
+    }
+    return object_;
+  }
+
+ private:
+  Text text_;
+  nb::object object_;
+};
+
+// The answers of a file as tuples (path, line, column, scope, name, kind, detail, is_parameter, opens), and
+// for each of them its source line as bytes where lines were asked for.
+nb::tuple Answers(nb::handle written, nb::object path, const nb::tuple& kinds) {
+  if (kinds.size() != RecordKindWords().size()) ThrowError(ErrorKind::kValueError, "an object a kind is needed");
+  const BufferText buffer(written);
+  nb::list rows;
+  nb::list lines;
+  ShownText scopes, names, details;
+  Text line_text;
+  nb::object line_object;
+  const bool done = ReadAnswers(buffer.text(), [&](const Answer& answer, Text line) {
+    rows.append(nb::make_tuple(path, answer.line, answer.column, scopes(answer.scope), names(answer.name),
+                               kinds[static_cast<size_t>(answer.kind)], details(answer.detail), answer.is_parameter,
+                               answer.opens));
+    if (line.data() == nullptr) return;
+    if (!line_object.is_valid() || line.data() != line_text.data()) {
+      line_text = line;
+      line_object = Checked(PyBytes_FromStringAndSize(line.data(), static_cast<Py_ssize_t>(line.size())));
+    }
+    lines.append(line_object);
+  });
+  if (!done) ThrowError(ErrorKind::kValueError, "these are no answers");
+  return nb::make_tuple(rows, lines);
+}
+
+// ---- the index ----
+
+struct IndexObject {
+  nb::bytes bytes;
+  NameIndex index;
+
+  explicit IndexObject(nb::bytes given) : bytes(std::move(given)), index(Text(bytes.c_str(), bytes.size())) {}
+};
+
+const char* WordOf(NameIndex::State state) {
+  switch (state) {
+    case NameIndex::State::kFine:
+      return "fine";
+    case NameIndex::State::kForeign:
+      return "foreign";
+    case NameIndex::State::kOtherSchema:
+      return "other schema";
+    case NameIndex::State::kDamaged:
+      break;
+  }
+  return "damaged";
+}
+
+char LowerOf(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
+
+bool IsAlike(Text a, Text b) {
+  return a.size() == b.size() &&
+         std::equal(a.begin(), a.end(), b.begin(), [](char x, char y) { return LowerOf(x) == LowerOf(y); });
+}
+
+nb::list FilesOf(const IndexObject& self) {
+  nb::list files;
+  for (size_t i = 0; i < self.index.size(); ++i) {
+    const IndexedFile& file = self.index[i];
+    files.append(nb::make_tuple(i, BytesOf(file.path), file.size, file.time, file.hash, file.lines, file.records,
+                                file.errors, file.problem.empty() ? nb::object(nb::none()) : StrOf(file.problem)));
+  }
+  return files;
+}
+
+// The number of its records.
+uint32_t AddFile(NameIndexWriter& self, nb::handle path, uint64_t size, int64_t time, uint32_t lines, uint32_t errors,
+                 nb::handle problem, nb::handle words) {
+  IndexedFile file;
+  file.path = HostText::FromBytes(path).text();
+  file.size = size;
+  file.time = time;
+  file.lines = lines;
+  file.errors = errors;
+  if (!problem.is_none()) file.problem = HostText::FromStr(problem).text();
+  const BufferText buffer(words);
+  const std::optional<uint32_t> records = self.Add(std::move(file), buffer.text());
+  if (!records) ThrowError(ErrorKind::kValueError, "these are no words of a file");
+  return *records;
+}
+
+}  // namespace
+
+void BindIndex(nb::module_& tarvex) {
+  nb::module_ host = SiblingModule(tarvex, "host");
+  nb::class_<BatchFormat>(host, "Format", "What a batch writes of its files.");
+  nb::class_<QuestionObject, BatchFormat>(host, "Question", "A question for a name, as a format of a batch.");
+  host.def("MakeQuestion", &MakeQuestion, nb::arg("match"), nb::arg("name"), nb::arg("uses"), nb::arg("returns"),
+           nb::arg("scope").none(), nb::arg("with_lines"));
+  host.def("WordsFormat", [] { return BatchFormat{MakeWordsWriter}; });
+  host.def("Answers", &Answers, nb::arg("written"), nb::arg("path"), nb::arg("kinds"),
+           "The answers that a question wrote of a file, and their source lines.");
+  host.def(
+      "HashOfSource", [](nb::handle source) { return HashOfBytes(BufferText(source).text()); }, nb::arg("source"));
+  host.attr("PARAMETER_USE") = kParameterUse;
+
+  host.def("CountsFormat", [] { return BatchFormat{MakeCountsWriter}; });
+  nb::class_<RecordCounts>(host, "RecordCounts", "The sum of what the counts format wrote of files.")
+      .def(nb::init<>())
+      .def(
+          "Add",
+          [](RecordCounts& self, nb::handle written) {
+            const BufferText buffer(written);
+            if (!self.Add(buffer.text())) ThrowError(ErrorKind::kValueError, "these are no counts of a file");
+          },
+          nb::arg("written"))
+      .def_prop_ro("kinds", [](const RecordCounts& self) { return self.kinds(); })
+      .def(
+          "MostUsed",
+          [](const RecordCounts& self, size_t count) {
+            nb::list found;
+            for (const auto& [name, number] : self.MostUsed(count)) found.append(nb::make_tuple(StrOf(name), number));
+            return found;
+          },
+          nb::arg("count"));
+
+  nb::class_<IndexObject>(host, "NameIndex", "The bytes of an index. ValueError for what is none, or damaged.")
+      .def(nb::init<nb::bytes>(), nb::arg("data"))
+      .def_static(
+          "StateOf",
+          [](const nb::bytes& data) {
+            return WordOf(NameIndex::StateOf({data.c_str(), data.size()}));
+          },
+          nb::arg("data"), "fine, foreign, other schema or damaged.")
+      .def_prop_ro("settings", [](const IndexObject& self) { return BytesOf(self.index.settings()); })
+      .def("Files", &FilesOf, "Tuples (number, path, size, time, hash, lines, records, errors, problem) by path.")
+      .def(
+          "WordsOf",
+          [](const IndexObject& self, size_t number) {
+            if (number >= self.index.size()) ThrowError(ErrorKind::kIndexError, "there is no such file");
+            nb::list words;
+            self.index.ForEachWordOf(number, [&](uint32_t word, Uses uses) {
+              words.append(nb::make_tuple(StrOf(self.index.words()[word].word), uses));
+            });
+            return words;
+          },
+          nb::arg("number"), "The words of a file, each with its uses.")
+      .def(
+          "FilesFor",
+          [](const IndexObject& self, const QuestionObject& question) {
+            return self.index.FilesFor(WordsNeededBy(question.question));
+          },
+          nb::arg("question"), "The numbers of the files that may hold an answer.")
+      .def(
+          "WordsAlike",
+          [](const IndexObject& self, nb::handle text) {
+            const HostText wanted = HostText::FromStr(text);
+            nb::list found;
+            for (const WordTable::Entry& entry : self.index.words()) {
+              if (entry.word != wanted.text() && IsAlike(entry.word, wanted.text())) found.append(StrOf(entry.word));
+            }
+            return found;
+          },
+          nb::arg("word"), "The words that differ from this one by the case of letters alone.");
+
+  nb::class_<NameIndexWriter>(host, "NameIndexWriter", "Makes the bytes of an index from files in any order.")
+      .def(nb::init<>())
+      .def("Add", &AddFile, nb::arg("path"), nb::arg("size"), nb::arg("time"), nb::arg("lines"), nb::arg("errors"),
+           nb::arg("problem").none(), nb::arg("words"))
+      .def(
+          "Keep",
+          [](NameIndexWriter& self, const IndexObject& index, size_t number, uint64_t size, int64_t time) {
+            if (number >= index.index.size()) ThrowError(ErrorKind::kIndexError, "there is no such file");
+            self.Keep(index.index, number, size, time);
+          },
+          nb::arg("index"), nb::arg("number"), nb::arg("size"), nb::arg("time"), nb::keep_alive<1, 2>(),
+          "Takes over a file of an index.")
+      .def(
+          "Finish",
+          [](NameIndexWriter& self, nb::handle settings) {
+            return BytesOf(self.Finish(HostText::FromBytes(settings).text()));
+          },
+          nb::arg("settings"), "The bytes of the index, with some bytes of the caller's.");
+}
+
+}  // namespace quillet::host

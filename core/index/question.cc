@@ -1,0 +1,348 @@
+// A pass over the placed records of a file; and the words of a question.
+#include "index/question.h"
+
+#include <algorithm>
+
+#include "foundations/utf8.h"
+#include "index/bytes.h"
+
+namespace quillet {
+
+namespace {
+
+// As much of a source line as is handed on: an editor shows no more, and one line may hold any number of
+// answers.
+constexpr size_t kMaxLineSize = 4096;
+
+bool IsWildcard(char c) { return c == '*' || c == '?'; }
+bool IsPattern(Text text) { return std::any_of(text.begin(), text.end(), IsWildcard); }
+
+// Whether a dotted text is a name or ends in it.
+bool EndsInName(Text text, Text name) {
+  if (!text.ends_with(name)) return false;
+  return text.size() == name.size() || text[text.size() - name.size() - 1] == '.';
+}
+
+// Whether a dotted name is one of the scope or of one around it: whole names one behind the other.
+bool HoldsNames(Text scope, Text wanted) {
+  // The scope of the module is within itself alone.
+  if (wanted.empty()) return scope.empty();
+  for (size_t at = scope.find(wanted); at != Text::npos; at = scope.find(wanted, at + 1)) {
+    const size_t end = at + wanted.size();
+    if ((at == 0 || scope[at - 1] == '.') && (end == scope.size() || scope[end] == '.')) return true;
+  }
+  return false;
+}
+
+// ---- which records answer ----
+
+class Matcher {
+ public:
+  explicit Matcher(const Question& question) : question_(question) {
+    name_ = question.name;
+    if (question.match == Question::Match::kSuffix && name_.starts_with('.')) name_.remove_prefix(1);
+    is_dotted_suffix_ = name_.size() != question.name.size();
+    scope_of_name_ = question.name;
+    scope_of_name_.remove_prefix(std::min(scope_of_name_.find_first_not_of('.'), scope_of_name_.size()));
+    const size_t dot = question.name.rfind('.');
+    if (question.match == Question::Match::kExact && dot != std::string::npos) {
+      outer_ = Text(question.name).substr(0, dot);
+      member_ = Text(question.name).substr(dot + 1);
+      has_member_ = true;
+    }
+    scope_is_pattern_ = IsPattern(question.scope);
+  }
+
+  bool Takes(const PlacedRecord& record, Text scope) const {
+    if (question_.match == Question::Match::kEverything) return true;
+    return TakesName(record, scope) && (!question_.has_scope || TakesScope(scope));
+  }
+
+ private:
+  bool TakesName(const PlacedRecord& record, Text scope) const {
+    if ((question_.uses & UseOf(record)) != 0) {
+      if (IsName(record.name)) return true;
+      if (has_member_ && record.kind == RecordKind::kSet && !record.is_parameter && record.name == member_ &&
+          EndsInName(scope, outer_))
+        return true;
+    }
+    return question_.returns && (record.name == "return" || record.name == "yield") && IsScopeOfName(scope);
+  }
+
+  bool IsName(Text text) const {
+    switch (question_.match) {
+      case Question::Match::kExact:
+        return text == name_;
+      case Question::Match::kSuffix:
+        // Behind a dot nothing is the name itself.
+        return EndsInName(text, name_) && !(is_dotted_suffix_ && text.size() == name_.size());
+      case Question::Match::kGlob:
+        return FitsGlob(text, name_);
+      case Question::Match::kEverything:
+        break;
+    }
+    return true;
+  }
+
+  bool IsScopeOfName(Text scope) const {
+    return question_.match == Question::Match::kGlob ? FitsGlob(scope, name_) : EndsInName(scope, scope_of_name_);
+  }
+
+  bool TakesScope(Text scope) const {
+    return scope_is_pattern_ ? FitsGlob(scope, question_.scope) : HoldsNames(scope, question_.scope);
+  }
+
+  const Question& question_;
+  Text name_;
+  bool is_dotted_suffix_ = false;
+  Text scope_of_name_;
+  bool has_member_ = false;
+  Text outer_, member_;
+  bool scope_is_pattern_ = false;
+};
+
+// A source line, counted from 0, without its end.
+Text LineOf(const SourceText& source, uint32_t line) {
+  const std::vector<uint32_t>& starts = source.line_starts;
+  if (line >= starts.size()) return {};
+  const size_t end = line + 1 < starts.size() ? starts[line + 1] : source.size();
+  Text text = source.text().substr(starts[line], end - starts[line]);
+  text = text.substr(0, text.find_last_not_of("\r\n") + 1);
+  if (text.size() <= kMaxLineSize) return text;
+  size_t size = kMaxLineSize;
+  while (size > 0 && !IsUtf8LeadByte(text[size])) --size;
+  return text.substr(0, size);
+}
+
+class QuestionWriter : public FileWriter {
+ public:
+  explicit QuestionWriter(const Question& question) : question_(question), matcher_(question_) {}
+
+  void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
+             std::string& out) override {
+    answers_.clear();
+    placed.Begin(file, scopes);
+    for (size_t row = 0; row < file.rows().size(); ++row) {
+      const FileAnalyzer::LineResult& result = file.results()[row];
+      if (result.record_begin == result.record_end && result.arg_record_begin == result.arg_record_end) continue;
+      for (const PlacedRecord& record : placed.OfRow(row)) {
+        const Text scope = scopes.names()[record.scope];
+        if (!matcher_.Takes(record, scope)) continue;
+        answers_.push_back({record.line, record.column, scope, record.name, record.detail, record.kind,
+                            record.is_parameter, OpensOf(file, scopes, row, record)});
+      }
+    }
+    if (question_.match != Question::Match::kEverything) SortAndUnite();
+    WriteAnswers(file.source(), out);
+  }
+
+ private:
+  // What is set where the head of a class or a function has its name.
+  static uint8_t OpensOf(const FileAnalyzer& file, const ScopeNames& scopes, size_t row, const PlacedRecord& record) {
+    if (record.kind != RecordKind::kSet) return 0;
+    const LineKind kind = file.rows()[row].kind;
+    if (kind != LineKind::kClassDef && kind != LineKind::kFunctionDef) return 0;
+    const uint32_t opened = scopes.ScopeOpenedBy(row);
+    if (opened == ScopeNames::kNone) return 0;
+    const LineRow& head = file.rows()[row];
+    const Text own_name = scopes.scopes()[opened].own_name;
+    const SourceText& source = file.source();
+    const char* at = source.Holds(own_name.data()) ? own_name.data() : source.tokens[head.first_token].text;
+    const Position place = source.PositionFrom(static_cast<int32_t>(head.first_line), at);
+    if (static_cast<uint32_t>(place.line) + 1 != record.line || static_cast<uint32_t>(place.col) + 1 != record.column)
+      return 0;
+    return kind == LineKind::kClassDef ? 1 : 2;
+  }
+
+  void SortAndUnite() {
+    std::stable_sort(answers_.begin(), answers_.end(), [](const Answer& a, const Answer& b) {
+      return a.line != b.line ? a.line < b.line : a.column < b.column;
+    });
+    // Records of one place are few, so each is compared with those in front of it.
+    size_t kept = 0;
+    size_t place = 0;
+    for (size_t i = 0; i < answers_.size(); ++i) {
+      if (kept == 0 || answers_[kept - 1].line != answers_[i].line || answers_[kept - 1].column != answers_[i].column)
+        place = kept;
+      const size_t begin = std::max(place, kept - std::min<size_t>(kept, kMostCompared));
+      const auto first = answers_.begin();
+      if (std::find(first + static_cast<ptrdiff_t>(begin), first + static_cast<ptrdiff_t>(kept), answers_[i]) ==
+          first + static_cast<ptrdiff_t>(kept))
+        answers_[kept++] = answers_[i];
+    }
+    answers_.resize(kept);
+  }
+
+  void WriteAnswers(const SourceText& source, std::string& out) const {
+    AppendNumber(answers_.size(), out);
+    uint32_t line = 0;
+    for (const Answer& answer : answers_) {
+      AppendNumber(answer.line, out);
+      AppendNumber(answer.column, out);
+      out += static_cast<char>(answer.kind);
+      out += static_cast<char>(answer.opens << 1 | static_cast<uint8_t>(answer.is_parameter));
+      AppendText(answer.scope, out);
+      AppendText(answer.name, out);
+      AppendText(answer.detail, out);
+      if (question_.with_lines && answer.line != line) {
+        line = answer.line;
+        AppendText(LineOf(source, line - 1), out);
+      }
+    }
+    out += static_cast<char>(question_.with_lines);
+  }
+
+  static constexpr size_t kMostCompared = 1000;
+
+  const Question question_;
+  const Matcher matcher_;
+  std::vector<Answer> answers_;
+};
+
+// ---- the words of a question ----
+
+void AddPart(Text text, bool at_begin, bool at_end, Uses uses, std::vector<WordPart>& parts) {
+  if (text.size() > kMaxWordSize) {
+    text = text.substr(0, kMaxWordSize);
+    at_end = false;
+  }
+  parts.push_back({std::string(text), at_begin, at_end, uses});
+}
+
+// All words of a name, the last one in these uses.
+void AddWords(Text name, Uses others, Uses last, std::vector<WordPart>& parts) {
+  ForEachWord(name, 0, [&](Text word, bool is_last) { AddPart(word, true, true, is_last ? last : others, parts); });
+}
+
+// The words, or parts of them, that a pattern spells. Behind a star may stand more words, so only one at
+// the end is the last one.
+void AddPartsOfPattern(Text pattern, Uses others, Uses last, std::vector<WordPart>& parts) {
+  for (size_t at = 0; at < pattern.size();) {
+    if (!IsWordByte(pattern[at])) {
+      ++at;
+      continue;
+    }
+    const size_t begin = at;
+    while (at < pattern.size() && IsWordByte(pattern[at])) ++at;
+    const bool at_begin = begin == 0 || !IsWildcard(pattern[begin - 1]);
+    const bool at_end = at == pattern.size() || !IsWildcard(pattern[at]);
+    AddPart(pattern.substr(begin, at - begin), at_begin, at_end, at == pattern.size() ? last : others, parts);
+  }
+}
+
+void AddScope(const Question& question, std::vector<WordPart>& parts) {
+  if (!question.has_scope || question.scope.empty()) return;
+  if (IsPattern(question.scope)) {
+    AddPartsOfPattern(question.scope, kScopeUse, kScopeUse, parts);
+  } else {
+    AddWords(question.scope, kScopeUse, kScopeUse, parts);
+  }
+}
+
+}  // namespace
+
+bool WordPart::Fits(Text word, Uses word_uses) const {
+  if (uses != 0 && (uses & word_uses) == 0) return false;
+  if (at_begin && !word.starts_with(text)) return false;
+  // What was cut off a long word may be anything.
+  if (word.size() >= kMaxWordSize) return true;
+  if (at_begin && at_end) return word.size() == text.size();
+  return at_begin || (at_end ? word.ends_with(text) : word.find(text) != Text::npos);
+}
+
+WordNeeds WordsNeededBy(const Question& question) {
+  using Match = Question::Match;
+  WordNeeds needs;
+  if (question.match == Match::kEverything) return {{}};
+  const bool is_glob = question.match == Match::kGlob;
+  if (question.uses != 0) {
+    Uses last = question.uses;
+    // The member of a scope is set where it is.
+    if (question.match == Match::kExact && question.name.find('.') != std::string::npos)
+      last |= UseOfKind(RecordKind::kSet);
+    std::vector<WordPart>& parts = needs.emplace_back();
+    if (is_glob) {
+      AddPartsOfPattern(question.name, 0, last, parts);
+    } else {
+      AddWords(question.name, 0, last, parts);
+    }
+    AddScope(question, parts);
+  }
+  if (question.returns) {
+    std::vector<WordPart>& parts = needs.emplace_back();
+    if (is_glob) {
+      AddPartsOfPattern(question.name, kScopeUse, kScopeUse, parts);
+    } else {
+      AddWords(question.name, kScopeUse, kScopeUse, parts);
+    }
+    AddScope(question, parts);
+  }
+  return needs;
+}
+
+bool FitsGlob(Text text, Text pattern) {
+  // One way back, to the last star, is enough: what stood in front of it fits already.
+  size_t at = 0;
+  size_t in_pattern = 0;
+  size_t star = Text::npos;
+  size_t star_at = 0;
+  const auto behind_char = [&](size_t place) {
+    ++place;
+    while (place < text.size() && !IsUtf8LeadByte(text[place])) ++place;
+    return place;
+  };
+  while (at < text.size()) {
+    if (in_pattern < pattern.size() && pattern[in_pattern] == '*') {
+      star = in_pattern++;
+      star_at = at;
+    } else if (in_pattern < pattern.size() && pattern[in_pattern] == '?') {
+      ++in_pattern;
+      at = behind_char(at);
+    } else if (in_pattern < pattern.size() && pattern[in_pattern] == text[at]) {
+      ++in_pattern;
+      ++at;
+    } else if (star != Text::npos) {
+      in_pattern = star + 1;
+      at = star_at = behind_char(star_at);
+    } else {
+      return false;
+    }
+  }
+  while (in_pattern < pattern.size() && pattern[in_pattern] == '*') ++in_pattern;
+  return in_pattern == pattern.size();
+}
+
+std::function<std::unique_ptr<FileWriter>()> QuestionWriters(Question question) {
+  return [question = std::move(question)] { return std::make_unique<QuestionWriter>(question); };
+}
+
+bool ReadAnswers(Text written, const std::function<void(const Answer&, Text line)>& take) {
+  if (written.empty()) return false;
+  const bool with_lines = written.back() != 0;
+  ByteReader reader(written.substr(0, written.size() - 1));
+  const uint64_t count = reader.NumberUpTo(written.size());
+  uint32_t line = 0;
+  Text source_line;
+  for (uint64_t i = 0; i < count; ++i) {
+    Answer answer;
+    answer.line = static_cast<uint32_t>(reader.NumberUpTo(UINT32_MAX));
+    answer.column = static_cast<uint32_t>(reader.NumberUpTo(UINT32_MAX));
+    const uint64_t kind = reader.NumberUpTo(RecordKindWords().size() - 1);
+    const uint64_t flags = reader.NumberUpTo(7);
+    answer.kind = static_cast<RecordKind>(kind);
+    answer.is_parameter = (flags & 1) != 0;
+    answer.opens = static_cast<uint8_t>(flags >> 1);
+    answer.scope = reader.String();
+    answer.name = reader.String();
+    answer.detail = reader.String();
+    if (with_lines && answer.line != line) {
+      line = answer.line;
+      source_line = reader.String();
+    }
+    if (reader.failed()) return false;
+    take(answer, source_line);
+  }
+  return reader.left() == 0;
+}
+
+}  // namespace quillet

@@ -1,0 +1,72 @@
+// A question for a name: which records answer it, and which words a file must hold to have one.
+//
+// Answers are found by analysing files as they are, never by what was stored of them, so a question is a
+// writer of a batch like the formats of output/: it writes the records of a file that answer. Words only
+// save the analysis of files that cannot.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "index/words.h"
+
+namespace quillet {
+
+struct Question {
+  enum class Match : uint8_t {
+    kEverything,  // all records, in the order in which they were found
+    kExact,       // the name; with a dot also what is set in the scope that it names
+    kSuffix,      // each name that ends in it, from a dot on
+    kGlob,        // * stands for any text, ? for any character
+  };
+  Match match = Match::kEverything;
+  std::string name;
+  Uses uses = kRecordUses;  // that are asked for
+  bool returns = false;     // what functions of the name return and yield, too
+  bool has_scope = false;
+  std::string scope;  // around the records, by whole names or as a pattern
+  bool with_lines = false;
+};
+
+// A part of a word that a file must hold, in one of these uses.
+struct WordPart {
+  std::string text;
+  bool at_begin = true;  // of the word
+  bool at_end = true;
+  Uses uses = 0;  // 0 for any, and none
+
+  bool Fits(Text word, Uses word_uses) const;
+};
+
+// What a file that answers must hold: all parts of one of the alternatives.
+using WordNeeds = std::vector<std::vector<WordPart>>;
+WordNeeds WordsNeededBy(const Question& question);
+
+// Whether a text is as a pattern of * and ? says.
+bool FitsGlob(Text text, Text pattern);
+
+// A record that answers.
+struct Answer {
+  uint32_t line = 0;    // from 1
+  uint32_t column = 0;  // from 1, in UTF-8 bytes
+  Text scope;
+  Text name;
+  Text detail;
+  RecordKind kind = RecordKind::kSet;
+  bool is_parameter = false;
+  uint8_t opens = 0;  // what the name is set to: 1 a class, 2 a function
+
+  friend bool operator==(const Answer&, const Answer&) = default;
+};
+
+// Writes the answers of each file: by line and column and each once, unless everything is asked for.
+std::function<std::unique_ptr<FileWriter>()> QuestionWriters(Question question);
+
+// Calls `take(answer, line)` for what such a writer wrote; the texts are views of it. `line` is the source
+// line of the answer where lines were asked for, without its end and cut where it is very long; it has
+// the same data as the one before where it is the same line. False where it is something else.
+bool ReadAnswers(Text written, const std::function<void(const Answer&, Text line)>& take);
+
+}  // namespace quillet

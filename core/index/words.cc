@@ -1,0 +1,142 @@
+// An open table of words, which is cleared for each file, and a pass over the placed records.
+#include "index/words.h"
+
+#include <algorithm>
+#include <bit>
+#include <cstring>
+
+#include "index/bytes.h"
+
+namespace quillet {
+
+namespace {
+
+constexpr uint64_t kFactor = 0x9E3779B97F4A7C15;
+
+uint64_t LoadEight(const char* at) {
+  uint64_t value = 0;
+  if constexpr (std::endian::native == std::endian::little) {
+    std::memcpy(&value, at, 8);
+  } else {
+    for (int i = 8; i-- > 0;) value = value << 8 | static_cast<unsigned char>(at[i]);
+  }
+  return value;
+}
+
+uint64_t Mixed(uint64_t hash, uint64_t value) {
+  hash = (hash ^ value) * kFactor;
+  return hash ^ hash >> 32;
+}
+
+class WordsWriter : public FileWriter {
+ public:
+  void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
+             std::string& out) override {
+    table_.Clear();
+    uint64_t records = 0;
+    placed.Begin(file, scopes);
+    for (size_t row = 0; row < file.rows().size(); ++row) {
+      if (file.results()[row].record_begin == file.results()[row].record_end &&
+          file.results()[row].arg_record_begin == file.results()[row].arg_record_end)
+        continue;
+      Text before;
+      uint32_t last = 0;
+      for (const PlacedRecord& record : placed.OfRow(row)) {
+        ++records;
+        const bool goes_on = record.name.data() == before.data() && record.name.size() >= before.size();
+        if (!goes_on || record.name.size() != before.size()) {
+          ForEachWord(record.name, goes_on ? before.size() : 0, [&](Text word, bool) { last = table_.NumberOf(word); });
+          // A name that ends in no word uses the one that the name before ended in.
+          before = record.name;
+        }
+        table_[last].uses |= UseOf(record);
+      }
+    }
+    for (const Text scope : scopes.names()) {
+      const Text own_name = scope.substr(scope.rfind('.') + 1);
+      if (own_name.empty()) continue;
+      ForEachWord(own_name, 0, [&](Text word, bool is_last) {
+        const uint32_t number = table_.NumberOf(word);
+        if (is_last) table_[number].uses |= kScopeUse;
+      });
+    }
+
+    AppendFixed(HashOfBytes(file.source().text()), out);
+    AppendNumber(records, out);
+    AppendNumber(table_.entries().size(), out);
+    for (const auto& [word, uses] : table_.entries()) {
+      AppendText(word, out);
+      AppendNumber(uses, out);
+    }
+  }
+
+ private:
+  WordTable table_;
+};
+
+}  // namespace
+
+uint64_t HashOfBytes(Text bytes) {
+  uint64_t hash = bytes.size() * kFactor;
+  size_t at = 0;
+  for (; at + 8 <= bytes.size(); at += 8) hash = Mixed(hash, LoadEight(bytes.data() + at));
+  char rest[8] = {};
+  std::memcpy(rest, bytes.data() + at, bytes.size() - at);
+  return Mixed(hash, LoadEight(rest));
+}
+
+void WordTable::Clear() {
+  entries_.clear();
+  hashes_.clear();
+  std::fill(slots_.begin(), slots_.end(), 0);
+  texts_.Reset();
+}
+
+uint32_t WordTable::NumberOf(Text word) {
+  if (entries_.size() * 2 >= slots_.size()) Grow();
+  const uint64_t hash = HashOfBytes(word);
+  const size_t mask = slots_.size() - 1;
+  for (size_t slot = hash & mask;; slot = (slot + 1) & mask) {
+    const uint32_t number = slots_[slot];
+    if (number == 0) {
+      entries_.push_back({word, 0});
+      hashes_.push_back(hash);
+      return (slots_[slot] = static_cast<uint32_t>(entries_.size())) - 1;
+    }
+    if (hashes_[number - 1] == hash && entries_[number - 1].word == word) return number - 1;
+  }
+}
+
+uint32_t WordTable::NumberOfCopy(Text word) {
+  const size_t count = entries_.size();
+  const uint32_t number = NumberOf(word);
+  if (entries_.size() != count) entries_[number].word = texts_.Copy(word);
+  return number;
+}
+
+void WordTable::Grow() {
+  slots_.assign(std::max<size_t>(slots_.size() * 2, 1024), 0);
+  const size_t mask = slots_.size() - 1;
+  for (uint32_t number = 0; number < entries_.size(); ++number) {
+    size_t slot = hashes_[number] & mask;
+    while (slots_[slot] != 0) slot = (slot + 1) & mask;
+    slots_[slot] = number + 1;
+  }
+}
+
+std::unique_ptr<FileWriter> MakeWordsWriter() { return std::make_unique<WordsWriter>(); }
+
+bool ReadFileWords(Text written, FileWords& words) {
+  ByteReader reader(written);
+  words.hash = reader.Fixed();
+  words.records = static_cast<uint32_t>(reader.NumberUpTo(UINT32_MAX));
+  const uint64_t count = reader.NumberUpTo(written.size());
+  words.words.clear();
+  for (uint64_t i = 0; i < count && !reader.failed(); ++i) {
+    const Text word = reader.String();
+    words.words.push_back({word, static_cast<Uses>(reader.NumberUpTo(UINT32_MAX))});
+  }
+  return !reader.failed() && reader.left() == 0;
+}
+
+}  // namespace quillet

@@ -1,0 +1,467 @@
+// The index and its questions: words of names, what a question needs, which records answer, and that the
+// bytes of an index hold what was put in, are noticed when they are damaged and do no harm when planted.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <random>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "foundations/errors.h"
+#include "index/bytes.h"
+#include "index/counts.h"
+#include "index/name_index.h"
+#include "index/question.h"
+#include "index/words.h"
+#include "tests/core/support/analyzer_helper.h"
+#include "tests/core/support/expect_error.h"
+
+namespace quillet {
+namespace {
+
+using Match = Question::Match;
+
+// What a writer writes of a source.
+std::string Written(FileWriter& writer, Text source) {
+  static FileAnalyzer file(FileAnalyzer::Options{testing::AnalyzerOptions(testing::kPy3), {}});
+  ScopeNames scopes;
+  PlacedRecords placed;
+  file.Analyze(source);
+  scopes.Build(file);
+  std::string out;
+  writer.Write(BatchInput{}, file, scopes, placed, out);
+  return out;
+}
+
+std::vector<std::string> Words(Text name, size_t from = 0) {
+  std::vector<std::string> words;
+  ForEachWord(name, from, [&](Text word, bool is_last) { words.push_back(std::string(word) + (is_last ? "!" : "")); });
+  return words;
+}
+
+TEST(Words, AreRunsOfLettersDigitsAndUnderscores) {
+  EXPECT_EQ(Words("os.path.join"), (std::vector<std::string>{"os", "path", "join!"}));
+  EXPECT_EQ(Words("x['a b'][0]"), (std::vector<std::string>{"x", "a", "b", "0!"}));
+  EXPECT_EQ(Words("*"), std::vector<std::string>{"*!"});
+  EXPECT_EQ(Words("gr\xC3\xBC\xC3\x9F.e"), (std::vector<std::string>{"gr\xC3\xBC\xC3\x9F", "e!"}));
+  EXPECT_EQ(Words(""), std::vector<std::string>{"!"});
+  EXPECT_EQ(Words(std::string(200, 'x')), std::vector<std::string>{std::string(kMaxWordSize, 'x') + "!"});
+}
+
+TEST(Words, OfANameBehindItsBeginningAreThoseThatEndThere) {
+  EXPECT_EQ(Words("a.b.c", 3), (std::vector<std::string>{"b", "c!"}));
+  EXPECT_EQ(Words("a.b()", 3), (std::vector<std::string>{"b!"}));
+  EXPECT_EQ(Words("a()", 2), std::vector<std::string>());
+}
+
+TEST(Words, TablesNumberWordsInOrder) {
+  WordTable table;
+  for (int round = 0; round < 2; ++round) {
+    table.Clear();
+    for (uint32_t i = 0; i < 5000; ++i) {
+      const std::string word = "w" + std::to_string(i);
+      EXPECT_EQ(table.NumberOfCopy(word), i);
+      EXPECT_EQ(table.NumberOfCopy(word), i);
+    }
+    EXPECT_EQ(table[4321].word, "w4321");
+  }
+}
+
+TEST(Words, OfAFileHaveTheUsesOfTheirRecords) {
+  const auto writer = MakeWordsWriter();
+  const std::string written =
+      Written(*writer, "import os.path\nclass Shop:\n  def add(self, item):\n    self.items.append(1)\n");
+  FileWords words;
+  ASSERT_TRUE(ReadFileWords(written, words));
+  EXPECT_GT(words.records, 8u);
+  const auto uses_of = [&](Text name) {
+    for (const auto& [word, uses] : words.words) {
+      if (word == name) return uses;
+    }
+    return Uses{0};
+  };
+  EXPECT_EQ(uses_of("os"), UseOfKind(RecordKind::kSet) | UseOfKind(RecordKind::kImport));
+  EXPECT_EQ(uses_of("Shop"), UseOfKind(RecordKind::kSet) | kScopeUse);
+  EXPECT_EQ(uses_of("add"), UseOfKind(RecordKind::kSet) | kScopeUse);
+  EXPECT_NE(uses_of("item") & kParameterUse, 0u);
+  EXPECT_NE(uses_of("append") & UseOfKind(RecordKind::kCalled), 0u);
+  EXPECT_FALSE(ReadFileWords(Text(written).substr(0, written.size() - 1), words));
+  EXPECT_FALSE(ReadFileWords(written + "x", words));
+}
+
+TEST(Bytes, ReadersNeverLeaveTheirBytes) {
+  std::string bytes;
+  for (const uint64_t value : {uint64_t{0}, uint64_t{127}, uint64_t{128}, uint64_t{1} << 40, UINT64_MAX})
+    AppendNumber(value, bytes);
+  AppendText("text", bytes);
+  AppendFixed(0x0123456789ABCDEF, bytes);
+  ByteReader reader(bytes);
+  EXPECT_EQ(reader.Number(), 0u);
+  EXPECT_EQ(reader.Number(), 127u);
+  EXPECT_EQ(reader.NumberUpTo(128), 128u);
+  EXPECT_EQ(reader.Number(), uint64_t{1} << 40);
+  EXPECT_EQ(reader.Number(), UINT64_MAX);
+  EXPECT_EQ(reader.String(), "text");
+  EXPECT_EQ(reader.Fixed(), 0x0123456789ABCDEFu);
+  EXPECT_FALSE(reader.failed());
+  EXPECT_EQ(reader.Number(), 0u);
+  EXPECT_TRUE(reader.failed());
+  for (const Text bad : {Text("\x80", 1), Text("\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\x01", 11),
+                         Text("\x05"
+                              "ab",
+                              3)}) {
+    ByteReader of_bad(bad);
+    of_bad.String();
+    EXPECT_TRUE(of_bad.failed());
+    EXPECT_EQ(of_bad.left(), 0u);
+  }
+  ByteReader above(Text("\x05", 1));
+  above.NumberUpTo(4);
+  EXPECT_TRUE(above.failed());
+}
+
+TEST(Hash, DiffersWhereEightBytesDiffer) {
+  std::set<uint64_t> seen{HashOfBytes(""), HashOfBytes(Text("\0", 1))};
+  EXPECT_EQ(seen.size(), 2u);
+  const std::string text(100, 'a');
+  seen = {HashOfBytes(text)};
+  for (size_t i = 0; i < text.size(); ++i) {
+    for (int bit = 0; bit < 8; ++bit) {
+      std::string other = text;
+      other[i] = static_cast<char>(other[i] ^ 1 << bit);
+      EXPECT_TRUE(seen.insert(HashOfBytes(other)).second);
+    }
+  }
+}
+
+TEST(Glob, StarsAreAnyTextAndMarksOneCharacter) {
+  EXPECT_TRUE(FitsGlob("", ""));
+  EXPECT_TRUE(FitsGlob("", "*"));
+  EXPECT_FALSE(FitsGlob("", "?"));
+  EXPECT_TRUE(FitsGlob("abc", "a*c"));
+  EXPECT_TRUE(FitsGlob("abcbc", "a*bc"));
+  EXPECT_FALSE(FitsGlob("abcb", "a*bc"));
+  EXPECT_TRUE(FitsGlob("a.b", "?.?"));
+  EXPECT_TRUE(FitsGlob("\xC3\xBC", "?"));
+  EXPECT_FALSE(FitsGlob("\xC3\xBC", "??"));
+  EXPECT_TRUE(FitsGlob("[a]", "[a]"));
+  EXPECT_FALSE(FitsGlob("a", "[a]"));
+  EXPECT_TRUE(FitsGlob("test_x", "**x*"));
+  EXPECT_FALSE(FitsGlob("ab", "a"));
+  EXPECT_FALSE(FitsGlob(std::string(2000, 'a'), std::string(50, '*') + "b"));
+}
+
+// ---- questions ----
+
+constexpr Text kShop =
+    "import os.path\n"
+    "LIMIT = 10\n"
+    "class Shop:\n"
+    "    def add(self, item, count=1):\n"
+    "        self.items.append(item)\n"
+    "        return self.items\n"
+    "    def path(self, name):\n"
+    "        return os.path.join('shop', name)\n";
+
+Question QuestionFor(Match match, Text name, Uses uses = kRecordUses) {
+  Question question;
+  question.match = match;
+  question.name = name;
+  question.uses = uses;
+  return question;
+}
+
+// The answers as "line:column name", in their order.
+std::vector<std::string> AnswersIn(Text source, const Question& question) {
+  const auto writer = QuestionWriters(question)();
+  std::vector<std::string> found;
+  EXPECT_TRUE(ReadAnswers(Written(*writer, source), [&](const Answer& answer, Text) {
+    found.push_back(std::to_string(answer.line) + ":" + std::to_string(answer.column) + " " + std::string(answer.name));
+  }));
+  return found;
+}
+
+using Found = std::vector<std::string>;
+
+TEST(Questions, AreAnsweredByNameAndUse) {
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kExact, "LIMIT", UseOfKind(RecordKind::kSet))), Found{"2:1 LIMIT"});
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kExact, "LIMIT", UseOfKind(RecordKind::kGet))), Found{});
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kExact, "item", kParameterUse)), Found{"4:19 item"});
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kSuffix, ".join", UseOfKind(RecordKind::kCalled))),
+            Found{"8:16 os.path.join"});
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kSuffix, "path", UseOfKind(RecordKind::kSet))), Found{"7:9 path"});
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kSuffix, ".path", UseOfKind(RecordKind::kSet))), Found{});
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kGlob, "self.?tems", UseOfKind(RecordKind::kGet))),
+            (Found{"5:9 self.items", "6:16 self.items"}));
+}
+
+TEST(Questions, FindTheMemberOfAScope) {
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kExact, "Shop.add")), Found{"4:9 add"});
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kExact, "hop.add")), Found{});
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kExact, "Shop.add", UseOfKind(RecordKind::kGet))), Found{});
+}
+
+TEST(Questions, FindWhatFunctionsReturn) {
+  Question question = QuestionFor(Match::kExact, "Shop.add", 0);
+  question.returns = true;
+  const Found found = AnswersIn(kShop, question);
+  ASSERT_FALSE(found.empty());
+  for (const std::string& answer : found) EXPECT_EQ(answer, "6:9 return");
+  question.name = "Sho.add";
+  EXPECT_EQ(AnswersIn(kShop, question), Found{});
+}
+
+TEST(Questions, StayInAScope) {
+  Question question = QuestionFor(Match::kExact, "name");
+  question.has_scope = true;
+  question.scope = "path";
+  EXPECT_EQ(AnswersIn(kShop, question), (Found{"7:20 name", "8:37 name"}));
+  question.scope = "pat";
+  EXPECT_EQ(AnswersIn(kShop, question), Found{});
+  question.scope = "*.p?th";
+  EXPECT_EQ(AnswersIn(kShop, question).size(), 2u);
+  question.scope = "";
+  EXPECT_EQ(AnswersIn(kShop, question), Found{});
+}
+
+TEST(Questions, HandOnTheSourceLineCutWhereItIsLong) {
+  Question question = QuestionFor(Match::kExact, "x");
+  question.with_lines = true;
+  const std::string source = "x = 1; x = 2\r\ny\nx = '" + std::string(9000, 'a') + "'";
+  const auto writer = QuestionWriters(question)();
+  std::vector<std::string> lines;
+  const std::string written = Written(*writer, source);
+  ASSERT_TRUE(ReadAnswers(written, [&](const Answer&, Text line) { lines.emplace_back(line); }));
+  ASSERT_GE(lines.size(), 3u);
+  EXPECT_EQ(lines.front(), "x = 1; x = 2");
+  EXPECT_EQ(lines[1], "x = 1; x = 2");
+  EXPECT_EQ(lines.back().size(), 4096u);
+  EXPECT_FALSE(ReadAnswers("", [](const Answer&, Text) {}));
+  EXPECT_FALSE(ReadAnswers(Text(written).substr(2), [](const Answer&, Text) {}));
+}
+
+// ---- the index ----
+
+struct Repository {
+  NameIndexWriter writer;
+
+  void Add(const std::string& path, Text source, int64_t time = 7) {
+    const auto words = MakeWordsWriter();
+    IndexedFile file;
+    file.path = path;
+    file.size = source.size();
+    file.time = time;
+    file.lines = 3;
+    ASSERT_TRUE(writer.Add(file, Written(*words, source)).has_value());
+  }
+};
+
+std::vector<std::string> PathsFor(const NameIndex& index, const Question& question) {
+  std::vector<std::string> paths;
+  for (const uint32_t file : index.FilesFor(WordsNeededBy(question))) paths.push_back(index[file].path);
+  return paths;
+}
+
+std::string SmallIndex() {
+  Repository repository;
+  repository.Add("shop.py", kShop);
+  repository.Add("b/x.py", "def total(items): return items\n");
+  repository.Add("b/y.py", "total = 1\nx.total.y\n", -1);
+  IndexedFile bad;
+  bad.path = "bad.py";
+  bad.problem = "no such encoding";
+  EXPECT_TRUE(repository.writer.Add(bad, "").has_value());
+  return repository.writer.Finish("settings");
+}
+
+TEST(Index, HoldsWhatWasPutIn) {
+  const std::string bytes = SmallIndex();
+  ASSERT_EQ(NameIndex::StateOf(bytes), NameIndex::State::kFine);
+  const NameIndex index(bytes);
+  EXPECT_EQ(index.settings(), "settings");
+  ASSERT_EQ(index.size(), 4u);
+  EXPECT_EQ(index[0].path, "b/x.py");
+  EXPECT_EQ(index[1].path, "b/y.py");
+  EXPECT_EQ(index[1].time, -1);
+  EXPECT_EQ(index[1].hash, HashOfBytes("total = 1\nx.total.y\n"));
+  EXPECT_EQ(index[2].problem, "no such encoding");
+  EXPECT_EQ(index[3].size, kShop.size());
+  EXPECT_GT(index[3].records, 10u);
+}
+
+TEST(Index, NamesTheFilesThatMayAnswer) {
+  const std::string bytes = SmallIndex();
+  const NameIndex index(bytes);
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "LIMIT")), (Found{"bad.py", "shop.py"}));
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "total", UseOfKind(RecordKind::kSet))),
+            (Found{"b/x.py", "b/y.py", "bad.py"}));
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "total", UseOfKind(RecordKind::kGet))),
+            (Found{"b/y.py", "bad.py"}));
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "x.total.y")), (Found{"b/y.py", "bad.py"}));
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kGlob, "tot*")), (Found{"b/x.py", "b/y.py", "bad.py"}));
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kGlob, "*MI?")), (Found{"bad.py", "shop.py"}));
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kGlob, "*")).size(), 4u);
+  Question question = QuestionFor(Match::kExact, "total", 0);
+  question.returns = true;
+  EXPECT_EQ(PathsFor(index, question), (Found{"b/x.py", "bad.py"}));
+  question = QuestionFor(Match::kExact, "self");
+  question.has_scope = true;
+  question.scope = "Shop.add";
+  EXPECT_EQ(PathsFor(index, question), (Found{"bad.py", "shop.py"}));
+  question.scope = "Shop.nothing";
+  EXPECT_EQ(PathsFor(index, question), Found{"bad.py"});
+}
+
+TEST(Index, NeverMissesAFileThatAnswers) {
+  const std::vector<std::string> sources = {
+      std::string(kShop), "from a.b import c as d, e\nprint(d.e(1), *x)\n", "x[a.b] = y = 1\nz: T = x[0].q\n",
+      "def f(a, *, b):\n  # type: (int, str) -> bool\n  global g\n  g = a\n  yield b\n",
+      "class A(B):\n  x = lambda q: q\n  def f(s): return s.x(s)\n" + std::string(150, 'l') + " = 1\n"};
+  Repository repository;
+  for (size_t i = 0; i < sources.size(); ++i) repository.Add(std::to_string(i), sources[i]);
+  const std::string bytes = repository.writer.Finish("");
+  const NameIndex index(bytes);
+  size_t answered = 0;
+  for (const std::string& name :
+       std::vector<std::string>{"x",      "self", "d.e", "a.b",    "g",     "A.f",     "Shop",  "T",   "s.x", "x[a.b]",
+                                "x[0].q", "*",    "c",   "return", "items", "os.path", "lllll", "add", "f",   "int"}) {
+    for (const Match match : {Match::kExact, Match::kSuffix, Match::kGlob}) {
+      for (const std::string& form : {name, "*" + name, name + "*", "?" + name.substr(1), "." + name}) {
+        for (const bool returns : {false, true}) {
+          for (const Uses uses :
+               {kRecordUses, UseOfKind(RecordKind::kSet), UseOfKind(RecordKind::kHint), kParameterUse}) {
+            Question question = QuestionFor(match, form, uses);
+            question.returns = returns;
+            const Found candidates = PathsFor(index, question);
+            for (size_t i = 0; i < sources.size(); ++i) {
+              if (AnswersIn(sources[i], question).empty()) continue;
+              ++answered;
+              EXPECT_NE(std::find(candidates.begin(), candidates.end(), std::to_string(i)), candidates.end())
+                  << form << " in " << i;
+            }
+          }
+        }
+      }
+    }
+  }
+  EXPECT_GT(answered, 500u);
+}
+
+TEST(Index, TakesFilesOverAndForgetsWordsThatAreGone) {
+  const std::string bytes = SmallIndex();
+  const NameIndex index(bytes);
+  Repository repository;
+  repository.writer.Keep(index, 0, 31, 9);
+  repository.writer.Keep(index, 3, kShop.size(), 7);
+  const std::string again = repository.writer.Finish("settings");
+  const NameIndex kept(again);
+  ASSERT_EQ(kept.size(), 2u);
+  EXPECT_EQ(kept[0].time, 9);
+  EXPECT_EQ(PathsFor(kept, QuestionFor(Match::kExact, "LIMIT")), Found{"shop.py"});
+  for (const WordTable::Entry& entry : kept.words()) EXPECT_NE(entry.word, "y");
+
+  Repository fresh;
+  fresh.Add("shop.py", kShop);
+  fresh.Add("b/x.py", "def total(items): return items\n", 9);
+  EXPECT_EQ(fresh.writer.Finish("settings"), again);
+}
+
+TEST(Index, ManyUsesAndWordsSurvive) {
+  Repository repository;
+  std::string source;
+  for (int i = 0; i < 300; ++i) {
+    const std::string n = "n" + std::to_string(i);
+    source += i % 2 ? n + " = 1\n" : n + "(1)\n";
+    if (i % 3 == 0) source += n + ": int\n";
+    if (i % 5 == 0) source += "import " + n + "\n";
+    if (i % 7 == 0) source += "def f(" + n + "): pass\n";
+    if (i % 11 == 0) source += "def " + n + "(): pass\n";
+    if (i % 13 == 0) source += "from m import " + n + "\n";
+  }
+  for (int i = 0; i < 40; ++i) repository.Add(std::to_string(i), Text(source).substr(0, source.size() * i / 40));
+  const std::string bytes = repository.writer.Finish("");
+  const NameIndex index(bytes);
+  const auto words = MakeWordsWriter();
+  const std::string written = Written(*words, Text(source).substr(0, source.size() * 39 / 40));
+  FileWords expected;
+  ASSERT_TRUE(ReadFileWords(written, expected));
+  std::set<std::pair<std::string, Uses>> wanted, found;
+  for (const auto& [word, uses] : expected.words) wanted.emplace(word, uses);
+  size_t number = 0;
+  while (index[number].path != "39") ++number;
+  index.ForEachWordOf(number, [&](uint32_t word, Uses uses) { found.emplace(index.words()[word].word, uses); });
+  EXPECT_EQ(found, wanted);
+}
+
+TEST(Index, DamageIsNoticed) {
+  const std::string bytes = SmallIndex();
+  for (size_t size = 0; size < bytes.size(); ++size) {
+    EXPECT_EQ(NameIndex::StateOf(Text(bytes).substr(0, size)), NameIndex::State::kDamaged) << size;
+    test::ExpectError(ErrorKind::kValueError, "the index is damaged", [&] { NameIndex(Text(bytes).substr(0, size)); });
+  }
+  for (size_t i = 0; i < bytes.size(); ++i) {
+    std::string damaged = bytes;
+    damaged[i] = static_cast<char>(damaged[i] ^ 4);
+    EXPECT_NE(NameIndex::StateOf(damaged), NameIndex::State::kFine) << i;
+  }
+  EXPECT_EQ(NameIndex::StateOf("import os\n"), NameIndex::State::kForeign);
+  EXPECT_NE(NameIndex::StateOf(bytes + "x"), NameIndex::State::kFine);
+}
+
+// Bytes with the right checksum may come from anybody.
+TEST(Index, PlantedBytesDoNoHarm) {
+  const std::string bytes = SmallIndex();
+  std::mt19937 chance(3);
+  const auto below = [&](size_t limit) { return static_cast<size_t>(chance() % limit); };
+  size_t read = 0;
+  for (int round = 0; round < 20000; ++round) {
+    std::string planted = bytes;
+    for (size_t i = below(4) + 1; i-- > 0;) {
+      const size_t at = 24 + below(planted.size() - 24);
+      switch (below(3)) {
+        case 0:
+          planted[at] = static_cast<char>(chance());
+          break;
+        case 1:
+          planted.erase(at, below(5));
+          break;
+        default:
+          planted.insert(at, below(5), static_cast<char>(chance()));
+      }
+      if (planted.size() <= 24) break;
+    }
+    std::string checksum;
+    AppendFixed(HashOfBytes(Text(planted).substr(24)), checksum);
+    planted.replace(16, 8, checksum);
+    try {
+      const NameIndex index(planted);
+      ++read;
+      Question question = QuestionFor(Match::kGlob, "*t*");
+      question.returns = true;
+      for (const uint32_t file : index.FilesFor(WordsNeededBy(question)))
+        index.ForEachWordOf(file, [&](uint32_t word, Uses) { ASSERT_LT(word, index.words().size()); });
+      NameIndexWriter writer;
+      for (size_t i = 0; i < index.size(); ++i) writer.Keep(index, i, 0, 0);
+      EXPECT_EQ(NameIndex::StateOf(writer.Finish("")), NameIndex::State::kFine);
+    } catch (const Error&) {
+    }
+  }
+  EXPECT_GT(read, 100u);
+}
+
+TEST(Counts, AreSumsOverFiles) {
+  const auto writer = MakeCountsWriter();
+  RecordCounts counts;
+  ASSERT_TRUE(counts.Add(Written(*writer, "x = y\nx = z\n")));
+  ASSERT_TRUE(counts.Add(Written(*writer, "y.x\n")));
+  const auto names = counts.MostUsed(2);
+  ASSERT_EQ(names.size(), 2u);
+  EXPECT_EQ(names[0].first, "x");
+  EXPECT_EQ(names[1].first, "y");
+  EXPECT_EQ(counts.kinds()[static_cast<size_t>(RecordKind::kSet)], 2u);
+  EXPECT_FALSE(counts.Add("\x80"));
+}
+
+}  // namespace
+}  // namespace quillet
