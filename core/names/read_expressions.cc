@@ -269,7 +269,7 @@ void NameReader::Open(TokenCode code) {
     frame.names = Frame::Names::kParameters;
     frame.inner = around.inner;
   } else if (frame.kind == Frame::Kind::kGroup || frame.kind == Frame::Kind::kList) {
-    frame.position = around.position;
+    if (frame.kind == Frame::Kind::kGroup) frame.position = around.position;
     frame.collects = around.collects;
   }
   frame.outer = scope_;

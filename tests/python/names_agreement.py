@@ -48,6 +48,10 @@ class Rule(Enum):
     SCOPE_NAME = "a variable called like a nameless scope is no namespace"
     DECORATED_LINE = "in 2.7 a decorated definition begins with its decorators"
     COMPREHENSION_LINE = "in 2.7 a comprehension has no line"
+    FIELD_LINE = "before 3.12 what stands in an f-string has no line of its own"
+    NO_STEP = "in 2.7 `a[::]` reads None"
+    ESCAPES = "a string with escapes holds no annotation"
+    TOP = "before 3.13 a function called top is taken for the module"
 
 
 def answers_of(symbol: Symbol) -> int:
@@ -131,7 +135,7 @@ def table_of_symtable(said: list[Any]) -> Table:
     kind, name, line, symbols, children = said
     if kind == "module":
         name, line = "", 1
-    elif kind == "function" and name in _FUNCTIONS:
+    elif kind == "function" and name in _FUNCTIONS and (name == "lambda" or ".0" in symbols):
         kind, name = _FUNCTIONS[name], ""
     return Table(_KINDS.get(kind, kind), name, line, dict(symbols), [table_of_symtable(child) for child in children])
 
@@ -170,11 +174,12 @@ _MADE_UP = {"__classdict__", "__type_params__", "__static_attributes__", "__clas
 class TableComparison:
     """The symbol table of one file."""
 
-    def __init__(self, report: Report, path: str, version: tuple[int, int], rows: list[bytes]) -> None:
+    def __init__(self, report: Report, path: str, version: tuple[int, int], said: dict[str, Any]) -> None:
         self._report = report
         self._path = path
         self._version = version
-        self._rows = rows
+        self._said = said
+        self._rows: list[bytes] = said["rows"]
         self._found: list[tuple[str, str, str]] = []
         self._rules: Counter[Rule] = Counter()
         self._scopes = 0
@@ -211,7 +216,8 @@ class TableComparison:
             self._rules[Rule.INLINED] += 1
             children += child.children
             for name, answers in child.symbols.items():
-                if name not in table.symbols:
+                # A name that the scope only hands on to what is nested in it is in no table yet.
+                if table.symbols.get(name, _BIT["is_free"]) == _BIT["is_free"]:
                     if table.kind == "class" and name == "__class__" and answers & _BIT["is_free"]:
                         answers = answers & ~_BIT["is_free"] | _BIT["is_global"]
                     bound = _BIT["is_local"]
@@ -236,6 +242,22 @@ class TableComparison:
                     line += 1
             self._set_lines_of_2_7(child)
 
+    def _set_lines_in_fields(self, theirs: Table, ours: Table) -> None:
+        """Before 3.12 a scope in an f-string of several lines is on any of them."""
+        keys = Counter(child.key() for child in ours.children)
+        keys.subtract(child.key() for child in theirs.children)
+        for child in theirs.children:
+            if keys[child.key()] >= 0 or child.kind not in ("comprehension", "lambda"):
+                continue
+            for first, last in self._said["spread"]:
+                lines = [line for line in range(first, last + 1) if keys[child.kind, child.name, line] > 0]
+                if first <= child.line <= last and lines:
+                    keys[child.key()] += 1
+                    child.line = lines[0]
+                    keys[child.key()] -= 1
+                    self._rules[Rule.FIELD_LINE] += 1
+                    break
+
     # -- the comparison --
 
     def _compare(self, theirs: Table, ours: Table) -> None:
@@ -249,6 +271,8 @@ class TableComparison:
                 if child.line == 0:
                     self._rules[Rule.COMPREHENSION_LINE] += 1
                     child.line = line
+        if self._version < (3, 12):
+            self._set_lines_in_fields(theirs, ours)
         groups: dict[tuple[str, str, int], tuple[list[Table], list[Table]]] = {}
         for child in theirs.children:
             groups.setdefault(child.key(), ([], []))[0].append(child)
@@ -273,7 +297,7 @@ class TableComparison:
         unlike = []
         for table in theirs:
             for candidate in rest:
-                trial = TableComparison(Report(""), "", self._version, self._rows)
+                trial = TableComparison(Report(""), "", self._version, self._said)
                 trial._compare(table, candidate)
                 if not trial._found:
                     rest.remove(candidate)
@@ -290,6 +314,9 @@ class TableComparison:
                     self._rules[Rule.MADE_UP] += 1
                     continue
                 self._symbols += 1
+                if name == "None" and self._reads_no_step(theirs):
+                    self._rules[Rule.NO_STEP] += 1
+                    continue
                 self._differ("symbols", f"missing in {theirs.kind}, is {words_of(answers)}", theirs, name, "")
                 continue
             self._symbols += 1
@@ -298,6 +325,11 @@ class TableComparison:
         for name, answers in ours.symbols.items():
             if name not in theirs.symbols:
                 self._differ("symbols", f"too many in {theirs.kind}, is {words_of(answers)}", theirs, name, "")
+
+    def _reads_no_step(self, table: Table) -> bool:
+        """Whether a slice without a step stands in a scope of 2.7, or in one that is nested in it."""
+        scopes = [self._said["scopes"][scope] for scope in self._said["unwritten"]]
+        return any((scope[0], scope[1], scope[3]) == (table.kind, table.name, table.line) for scope in scopes)
 
     def _compare_answers(self, theirs: Table, ours: Table, name: str, expected: int, got: int) -> None:
         namespace = _BIT["is_namespace"]
@@ -309,6 +341,12 @@ class TableComparison:
                     return
             if expected & namespace and (name in _FUNCTIONS):
                 self._rules[Rule.SCOPE_NAME] += 1
+                return
+        if theirs.kind == "function" and theirs.name == "top" and (3, 0) < self._version < (3, 13):
+            # What is bound in the module is both local and global.
+            bound = any(expected & _BIT[bit] for bit in ("is_assigned", "is_imported", "is_parameter"))
+            if bound and got | _BIT["is_global"] | _BIT["is_local"] == expected:
+                self._rules[Rule.TOP] += 1
                 return
         more, less = words_of(got & ~expected), words_of(expected & ~got)
         self._differ("questions", f"{theirs.kind}: should be {less}, not {more}", theirs, name, words_of(expected))
@@ -568,6 +606,9 @@ class NamesComparison:
                 self._report.counts["strings of annotations that are no expressions"] += 1
                 continue
             self._report.count("strings of annotations")
+            if not found and line == last_line and b"\\" in self._said["rows"][line - 1][column - 1 : end - 1]:
+                self._report.by_rule[Rule.ESCAPES] += 1
+                continue
             if sorted(found) != (names or []):
                 text = f"{sorted(found)}, not {names}"
                 self._differ("strings of annotations", "other names", line, column, text)
@@ -607,13 +648,14 @@ def compare(report: Report, path: Path, version: tuple[int, int], said: dict[str
     if "failed" in said:
         report.differ("files", "not understood", f"{path}: {said['failed']}")
         return
-    source = to_utf8(path.read_bytes())
-    bindings = bind(source, version=version)
+    data = path.read_bytes()
+    bindings = bind(data, version=version)
+    source = to_utf8(data)
     rows = source.removeprefix(b"\xef\xbb\xbf").split(b"\n")
     said["rows"] = rows
     NamesComparison(report, str(path), version, said, bindings).run()
     theirs = table_of_symtable(said["table"])
-    TableComparison(report, str(path), version, rows).run(theirs, table_of_bindings(bindings, source))
+    TableComparison(report, str(path), version, said).run(theirs, table_of_bindings(bindings, source))
 
 
 def compare_library(library: Library, paths: Sequence[Path]) -> Report:

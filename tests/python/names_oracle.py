@@ -5,14 +5,15 @@ Reads paths from the standard input, one a line, and writes a line of JSON for e
 
     {"refused": why}                 the interpreter does not compile it
     {"failed": why}                  this program does not understand it
-    {"table": ..., "scopes": ..., "names": ..., "strings": ..., "comments": ...}
+    {"table": ..., "scopes": ..., "names": ..., "strings": ..., "spread": ..., "unwritten": ...}
 
 `table` is what `symtable` says, [type, name, line, {symbol: answers}, [children]], the answers as a number with a
 bit for each of QUESTIONS. `names` are all the names that `ast` shows, in the order of the source, as
 [line, column, end column, what, marks, receiver, scope]. `what` is the class of the node; `marks` are letters, see
 MARKS; `receiver` is the index of the name that an attribute is taken from, or -1; `scope` is an index in `scopes`,
 [kind, name, parent, first line, last line, column], which follow from the rules of the language and not from
-`symtable`. `strings` are the names in the strings of annotations, `comments` the comments that speak of types.
+`symtable`. `strings` are the names in the strings of annotations. `spread` are the first and last lines of f-strings on
+several lines, `unwritten` the scopes with a slice of 2.7 whose step nobody wrote.
 
 `ast` gives the places of many names approximately or not at all. So a place is that of the token: the names of the
 tree, in the order of the source, are the tokens of the source that are names and no keywords, one for one, and a
@@ -216,6 +217,8 @@ class Walk(object):
         self.names = []
         self.scopes = []
         self.strings = []
+        self.spread = []
+        self.unwritten = []
         self.marks = ""
         self.open("module", "", None)
         self.visit(tree)
@@ -324,6 +327,8 @@ class Walk(object):
             token = self.tokens[self.at] if self.at < len(self.tokens) else None
             if token and (token.text, token.line, token.column) == ("None", node.step.lineno, node.step.col_offset):
                 self.visit(node.step)
+            else:
+                self.unwritten.append(self.scope)
             return
         self.visit([node.lower, node.upper, node.step])
 
@@ -383,21 +388,25 @@ class Walk(object):
     def annotation(self, node):
         if node is not None:
             self.marked("a", node)
-
-    def visit_Constant(self, node):
-        if "a" in self.marks and isinstance(node.value, str):
-            place = [node.lineno, node.col_offset + 1, node.end_lineno, node.end_col_offset + 1]
-            self.strings.append([place, names_of_text(node.value)])
+            for string in strings_of_type(node):
+                place = [string.lineno, string.col_offset + 1, string.end_lineno, string.end_col_offset + 1]
+                self.strings.append([place, names_of_text(string.value)])
 
     def visit_Dict(self, node):
         for key, value in zip(node.keys, node.values):
             self.unmarked(key)
             self.unmarked(value)
 
+    def visit_NamedExpr(self, node):
+        self.unmarked(node.target)
+        self.visit(node.value)
+
     def visit_IfExp(self, node):
         self.visit([node.body, node.test, node.orelse])
 
     def visit_JoinedStr(self, node):
+        if node.end_lineno != node.lineno:
+            self.spread.append([node.lineno, node.end_lineno])
         for value in node.values:
             if not isinstance(value, ast.Constant):
                 self.visit(value)
@@ -474,9 +483,11 @@ class Walk(object):
     def visit_Lambda(self, node):
         outside = self.scope
         self.open("lambda", "lambda", node)
-        # What stands in a lambda of a decorator, an annotation or a base is marked as it would be outside.
+        before = self.marks
+        self.marks = before.replace("d", "").replace("b", "")
         self.parameters(node.args, outside, outside)
         self.visit(node.body)
+        self.marks = before
         self.close()
 
     def visit_FunctionDef(self, node):
@@ -631,10 +642,32 @@ class Walk(object):
             self.visit(pattern)
 
 
+def strings_of_type(node, inside=False):
+    """The strings in an annotation that stand for a whole type: alone, beside "|", and in subscripts."""
+    if isinstance(node, ast.Constant) and isinstance(node.value, str):
+        return [node]
+    parts = []
+    if isinstance(node, ast.BinOp) and isinstance(node.op, ast.BitOr):
+        parts = [node.left, node.right]
+    elif isinstance(node, ast.Subscript):
+        name = getattr(node.value, "attr", getattr(node.value, "id", ""))
+        index = getattr(node.slice, "value", node.slice) if sys.version_info < (3, 9) else node.slice
+        inside = True
+        parts = index.elts if isinstance(index, ast.Tuple) else [index]
+        if name == "Literal":
+            parts = []
+        elif name == "Annotated":
+            parts = parts[:1]
+    elif inside and isinstance(node, (ast.Tuple, ast.List)):
+        parts = node.elts
+    return [string for part in parts for string in strings_of_type(part, inside)]
+
+
 def names_of_text(text):
-    """The names of a text in their order where it is an expression, otherwise None."""
+    """The names of a text, sorted, where it is an expression, otherwise None."""
     try:
-        tree = ast.parse(text.strip(" \t"), mode="eval").body
+        # `*args: "*Ts"` is a type as well.
+        tree = ast.parse(text.strip(" \t*"), mode="eval").body
     except (SyntaxError, ValueError, RecursionError, MemoryError):
         return None
     found = []
@@ -689,12 +722,9 @@ def facts_of(data, path):
         column = len(row[: token.column].encode("utf-8")) + 1
         end = column + len(token.text.encode("utf-8"))
         names.append([token.line, column, end, what, marks, receiver, scope])
-    comments = []
-    for kind, string, line, column in tokens_of(text):
-        if kind == tokenize.COMMENT and "type" in string:
-            comments.append([line, len(rows[line - 1][:column].encode("utf-8")) + 1, string])
     return {
-        "table": table_of(table), "scopes": walk.scopes, "names": names, "strings": walk.strings, "comments": comments,
+        "table": table_of(table), "scopes": walk.scopes, "names": names, "strings": walk.strings,
+        "spread": walk.spread, "unwritten": walk.unwritten,
     }  # fmt: skip
 
 

@@ -81,6 +81,42 @@ def test_names_in_all_places_are_marked() -> None:
     assert roles == ["write", "write", "delete"]
 
 
+@pytest.mark.parametrize(
+    ("source", "expected"),
+    [
+        ("x -= 1", "x write"),
+        ("x.y -= z", "x read, y write, z read"),
+        ("def f() -> x: pass", "f definition, x read"),
+        ("(f)(x)", "f call, x read"),
+        ("(a\n .b)(x)", "a read, b call, x read"),
+        ("(f, g)(x)", "f read, g read, x read"),
+        ("f[i](x)", "f read, i read, x read"),
+    ],
+)
+def test_roles_follow_from_what_stands_beside(source: str, expected: str) -> None:
+    assert ", ".join(f"{o.text} {o.role}" for o in bind(source, version=(3, 12)).occurrences) == expected
+
+
+def test_a_condition_ends_a_lambda_that_a_loop_goes_through() -> None:
+    bindings = bind("[x() for x in lambda: a, lambda: b if x()]\n", version=(2, 7))
+    assert [(o.text, bindings.scopes[o.scope].kind) for o in bindings.occurrences] == [
+        ("x", "module"),
+        ("x", "module"),
+        ("a", "lambda"),
+        ("b", "lambda"),
+        ("x", "module"),
+    ]
+
+
+@pytest.mark.parametrize(
+    ("decorator", "marked"),
+    [("a.b(c)", ["b"]), ("a[b](c)", ["a"]), ("(a)", ["a"]), ("[a, b][0]", []), ("a or b", ["a", "b"])],
+)
+def test_a_decorator_is_the_name_that_decorates(decorator: str, marked: list[str]) -> None:
+    occurrences = bind(f"@{decorator}\ndef f(): pass\n", version=(3, 12)).occurrences
+    assert [o.text for o in occurrences if "decorator" in o.flags] == marked
+
+
 def test_scopes_have_extents_and_symbols() -> None:
     bindings = bind("class Shop:\n    def total(self):\n        return [i for i in self]\n\n# end\n", version=(3, 12))
     rows = [(s.kind, s.name, s.parent, s.first_line, s.last_line) for s in bindings.scopes]
