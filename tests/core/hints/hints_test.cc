@@ -20,6 +20,7 @@ using testing::ConsoleCapture;
 using testing::HintRecords;
 using testing::kPy2;
 using testing::kPy3;
+using testing::ParsedLine;
 using testing::ReadNames;
 using testing::ReportedErrors;
 using Names = std::vector<std::string>;
@@ -543,6 +544,71 @@ TEST(HintWalk, ATreeLargerThanItsLineReachesTheLimits) {
             (Names{"RuntimeError raised in CNodeWalker.Walk: Maximum recurse count in _VisitNode exceeded",
                    "RuntimeError raised in CNodeWalker.Walk: Maximum number of calls to _VisitNode exceeded"}));
   EXPECT_EQ(HintWalker().fVisitCount, 0);
+}
+
+// The row behind a text is counted as the host's splitlines does, the row of a comment by line ends.
+TEST(EndingComments, AreFoundBehindTextsOfSeveralLines) {
+  const std::pair<const char*, bool> texts[] = {
+      {"'''a'''", true},
+      {"'''a\nb'''", true},
+      {"'''a\nb\n'''", true},
+      {"'''\n\n'''", true},
+      {"'''a\r\nb'''", true},
+      {"'''a\rb\nc'''", true},
+      {"'''a\n\rb'''", true},
+      {"'''a\r\rb\nc'''", true},
+      // Without a line feed a text counts as one line.
+      {"'''a\rb'''", false},
+      {"'''a\x0b''' ''", true},
+      // These end lines to the host alone.
+      {"'''a\x0b\nb'''", false},
+      {"'''a\x0c\nb'''", false},
+      {"'''a\x1c\nb'''", false},
+      {"'''a\x1e\nb'''", false},
+      {"'''a\xC2\x85\nb'''", false},
+      {"'''a\xE2\x80\xA8\nb'''", false},
+      {"'''a\xE2\x80\xA9\nb'''", false},
+      {"'''a\x0e\nb'''", true},
+      {"'''a\x09\nb'''", true},
+      {"'''a\x1b\nb'''", true},
+      {"'''a\x1f\nb'''", true},
+      {"'''a\xC2\x84\nb'''", true},
+      {"'''a\xC3\x85\nb'''", true},
+      {"'''a\xE2\x80\xAA\nb'''", true},
+      {"'''a\xE2\x81\xA8\nb'''", true},
+      {"'''a\xE3\x80\xA8\nb'''", true},
+  };
+  for (const auto& [text, found] : texts) {
+    const AnalyzedLine line = Analyze(std::string("x = ") + text + "  # type: str\n");
+    EXPECT_EQ(line.error, "");
+    EXPECT_EQ(HintRecords(line), found ? Names{"x str"} : Names{}) << text;
+  }
+}
+
+TEST(HintWalk, TuplesNestToTheLimitOfTargets) {
+  const auto reported = [](int depth) {
+    const ConsoleCapture capture;
+    std::string target = "x", hint = "int";
+    for (int i = 0; i < depth; ++i) {
+      target = "[" + target + ", y]";
+      hint = "[" + hint + ", str]";
+    }
+    CTypeHintWalker& walker = HintWalker();
+    const ParsedLine targets(target);
+    const ParsedLine hints(hint);
+    LogicalLine line;
+    walker.fLogical = &line;
+    std::string failure;
+    try {
+      walker.ProcessNameAndHintNodes(targets.root(), hints.root(), false);
+    } catch (const Error& error) {
+      failure = HostExceptionName(error.kind());
+    }
+    walker.fLogical = nullptr;
+    return failure;
+  };
+  EXPECT_EQ(reported(400), "");
+  EXPECT_EQ(reported(401), "RecursionError");
 }
 
 TEST(HintWalk, DeeplyNestedTuplesEndInALimit) {

@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "lines/future_imports.h"
 #include "lines/scopes.h"
 #include "tests/core/support/verify_tokens.h"
 
@@ -62,6 +63,26 @@ LineKind SoftKind(Text bytes) {
   const Ref<SourceText> source = SourceText::Copy(bytes);
   TokenizeOnly(*source, Version::Of(3, 12));
   return FindMatchOrCaseType(source->tokens, 0, source->tokens.size());
+}
+
+// ---- the head of a file ----
+
+TEST(FutureImports, OnlyThoseOfTheFutureSwitchThePrintFunctionOn) {
+  const auto imports = [](Text bytes) {
+    const Cut cut(bytes, Version::Of(2, 7));
+    return ImportsPrintFunction(*cut.source, cut.rows);
+  };
+  EXPECT_TRUE(imports("from __future__ import print_function\n"));
+  EXPECT_TRUE(imports("from __future__ import (division,\n  print_function)\n"));
+  EXPECT_TRUE(imports("'doc'\n# c\n\nfrom __future__ import division\nfrom __future__ import print_function"));
+  EXPECT_FALSE(imports("from x import print_function\n"));
+  EXPECT_FALSE(imports("from x import y\nfrom __future__ import print_function\n"));
+  EXPECT_FALSE(imports("from __future__ import division\nfrom x import print_function\n"));
+  EXPECT_FALSE(imports("import x\nfrom __future__ import print_function\n"));
+  EXPECT_FALSE(imports("x = 1\nfrom __future__ import print_function\n"));
+  EXPECT_FALSE(imports("from __future__ import division\n"));
+  EXPECT_FALSE(imports("from\n"));
+  EXPECT_FALSE(imports(""));
 }
 
 // ---- lines ----

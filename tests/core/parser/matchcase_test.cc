@@ -83,6 +83,17 @@ TEST(MatchStatement, TheLastTokenIsReplacedWhateverItIs) {
   EXPECT_EQ(Parse("match x: pass"), "error at token 1");
 }
 
+TEST(MatchStatement, ABackslashJoinsLinesOrIsRejected) {
+  const Case cases[] = {
+      {"match \\\n x:", "CMatchStmt(match x :)"},
+      {"match \\ x:", "error at token 1"},
+      {"match x \\ :", "error at token 2"},
+      {"match x \\\n \\\n :", "CMatchStmt(match x :)"},
+  };
+  for (const Case& c : cases) EXPECT_EQ(Parse(c.source), c.result) << c.source;
+  EXPECT_EQ(Pattern("\\ x"), "error at 0");
+}
+
 TEST(MatchStatement, LeavesMadeByHandCarryPositions) {
   EXPECT_EQ(ParseLine("match x:").contexts, "0:0 1 0:7");
   EXPECT_EQ(ParseLine("case x if y: z").contexts, "0:0 0:5 0 1 2 3 0:11 0");

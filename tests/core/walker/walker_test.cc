@@ -572,6 +572,43 @@ TEST(Assignments, ANamedExpressionOfAnotherClassIsAnAssertion) {
   }
 }
 
+// A host's tree; the pattern parser stops earlier.
+TEST(Patterns, MayNestToTheLimit) {
+  const auto walk = [](int levels) {
+    const Ref<NodePool> pool(new NodePool);
+    CNode* node = pool->Construct(NodeKind::kCPatternNode, nullptr);
+    CNode* const root = node;
+    while (--levels > 0) {
+      CNode* child = pool->Construct(NodeKind::kCPatternNode, nullptr);
+      pool->ResizeChildren(node, 1)[0] = child;
+      node = child;
+    }
+    CNodeWalker(kPy3).VisitPatternNode(root);
+  };
+  EXPECT_NO_THROW(walk(CNodeWalker::kMaxPatternDepth));
+  EXPECT_THROW(walk(CNodeWalker::kMaxPatternDepth + 1), Error);
+}
+
+TEST(Assignments, ATargetMayNestToTheLimit) {
+  const Printed printed;
+  CNodeWalker walker(kPy3);
+  walker.fMaxRecurseCount = 10'000;
+  const auto nested = [](int depth) {
+    std::string target = "a";
+    for (int i = 0; i < depth; ++i) target = "[" + target + ", b]";
+    return target + " = x";
+  };
+  const auto reads_x = [&](int depth) {
+    const Records records = RecordsOf(walker, nested(depth));
+    return !records.empty() && records.back() == "x :g:";
+  };
+  EXPECT_TRUE(reads_x(CNodeWalker::kMaxTargetDepth));
+  EXPECT_TRUE(printed.lines().empty());
+  EXPECT_FALSE(reads_x(CNodeWalker::kMaxTargetDepth + 1));
+  EXPECT_EQ(printed.lines(), Records{"RuntimeError raised in CNodeWalker.Walk: RecursionError('maximum recursion depth "
+                                     "exceeded while unpacking a target')"});
+}
+
 TEST(Assignments, ATargetNestedTooDeepEndsTheWalk) {
   const Printed printed;
   std::string target = "a";
@@ -638,8 +675,14 @@ TEST(Calls, IsinstanceOfAnythingElseTellsNothing) {
       {"isinstance(f(), C)", {"isinstance :c:(f(),C)", "isinstance :g:", "f :g:", "C :g:"}},
       {"isinstance(x, C, D)", {"isinstance :c:(x,C,D)", "isinstance :g:", "x :g:", "C :g:", "D :g:"}},
       {"isinstance(x, cls=C)", {"isinstance :g:", "x :g:", "C :g:"}},
+      {"isinstance(x, *C)", {"isinstance :g:", "x :g:", "C :g:"}},
       {"b.isinstance(x, C)", {"b.isinstance :c:(x,C)", "b :g:", "b.isinstance :g:", "x :g:", "C :g:"}},
   });
+  // In the older grammar the stars are leaves beside the class.
+  Check({{"isinstance(x, *C)", {"isinstance :g:", "x :g:", "C :g:"}},
+         {"isinstance(x, **C)", {"isinstance :g:", "x :g:", "C :g:"}},
+         {"isinstance(*x)", {"isinstance :g:", "x :g:"}}},
+        kPy2);
 }
 
 TEST(Results, AreRecordedUnderReservedNames) {
