@@ -1,0 +1,227 @@
+// quillet_digest: what the core says of a corpus, as one number a stage.
+//
+//   quillet_digest PATH...    files, and folders with all that lies below them
+//
+// Each file is taken as it is and with some of its lines spoilt, always the same ones in the same way, as
+// 2.7, 3.8 and 3.12: tokens and rows, trees with their contexts and texts, records and errors, what is
+// printed and reported, and the lines of each format. Two builds that print the same numbers tell nobody
+// apart by this corpus. scripts/mutate.py asks it about changes that no test noticed.
+#include <algorithm>
+#include <cstdint>
+#include <cstdio>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <string>
+#include <vector>
+
+#include "analysis/record_table.h"
+#include "output/json_lines.h"
+#include "output/text_lines.h"
+#include "tests/core/support/analyzer_helper.h"
+#include "tests/core/support/tree_text.h"
+
+namespace quillet {
+namespace {
+
+class Digest {
+ public:
+  void Add(Text text) {
+    for (const char byte : text) AddByte(static_cast<uint8_t>(byte));
+    AddByte(0xFF);
+    AddByte(IsNone(text));
+  }
+  void Add(int64_t number) {
+    for (int i = 0; i < 8; ++i) AddByte(static_cast<uint8_t>(number >> (8 * i)));
+  }
+  uint64_t value() const { return value_; }
+
+ private:
+  void AddByte(uint8_t byte) { value_ = (value_ ^ byte) * 1099511628211u; }
+
+  uint64_t value_ = 14695981039346656037u;
+};
+
+struct Digests {
+  Digest tokens, trees, records, output;
+};
+
+Digests digests;
+
+// Some lines of a file spoilt: a byte left out, said twice, or put in.
+std::string Spoilt(const std::string& bytes, uint32_t seed) {
+  static constexpr Text kInserted = "()[]{}:,;=\\'\"#.*@ \n\r\t0a-f|!";
+  std::string spoilt;
+  size_t begin = 0;
+  while (begin < bytes.size()) {
+    const size_t end = std::min(bytes.find('\n', begin), bytes.size() - 1) + 1;
+    std::string line = bytes.substr(begin, end - begin);
+    seed = seed * 1664525u + 1013904223u;
+    if ((seed >> 28) % 4 == 0) {
+      const size_t at = (seed >> 8) % line.size();
+      switch ((seed >> 26) % 3) {
+        case 0:
+          line.erase(at, 1);
+          break;
+        case 1:
+          line.insert(at, 1, line[at]);
+          break;
+        default:
+          line.insert(at, 1, kInserted[(seed >> 12) % kInserted.size()]);
+          break;
+      }
+    }
+    spoilt += line;
+    begin = end;
+  }
+  return spoilt;
+}
+
+void AddTree(CPGenParserImpl& parser, LogicalLine& line, bool in_async_def) {
+  CNode* tree = nullptr;
+  try {
+    for (const LogicalLine* exp : line.GetExpLogicals().lines) {
+      digests.tokens.Add(static_cast<int64_t>(exp->kind));
+      digests.tokens.Add(exp->first_line);
+      for (size_t i = 0; i < exp->toks.size(); ++i) {
+        digests.tokens.Add(exp->toks[i].view());
+        digests.tokens.Add(exp->positions()[i].col);
+      }
+    }
+    tree = parser.ParseToNode(line, in_async_def);
+    digests.trees.Add(testing::ShowTree(tree));
+    if (tree == nullptr) return;
+    digests.trees.Add(testing::ShowContexts(tree));
+    CNodeToTextConverter all(true, true, true), names(false, false, false);
+    digests.trees.Add(all.TextForNode(tree));
+    digests.trees.Add(names.TextForNode(tree));
+  } catch (const Error& error) {
+    digests.trees.Add(error.message());
+  }
+  if (tree != nullptr) parser.DiscardNode(tree);
+}
+
+class Analysis {
+ public:
+  explicit Analysis(Version version) : version_(version), file_(OptionsOf(version)), parser_(OptionsOf(version)) {}
+
+  void Add(const std::string& bytes) {
+    file_.Analyze(bytes);
+    LogicalLine line;
+    const Ref<SourceText> source = SourceText::Copy(bytes);
+    std::vector<LineRow> rows;
+    CutLines(*source, version_, rows);
+    for (const Token& token : source->tokens) {
+      digests.tokens.Add(token.view());
+      digests.tokens.Add(token.code);
+    }
+    for (size_t i = 0; i < rows.size(); ++i) {
+      const LineRow& row = rows[i];
+      for (const int64_t number :
+           {int64_t{row.token_count}, int64_t{row.first_line}, int64_t{row.last_line}, int64_t{row.indent},
+            static_cast<int64_t>(row.kind), int64_t{row.continues_physical_line}, int64_t{row.has_inline_body},
+            int64_t{row.is_async}, int64_t{row.no_embedded}})
+        digests.tokens.Add(number);
+      SetFromRow(line, source, row);
+      AddTree(parser_.logical_parser(), line, file_.results()[i].in_async_def);
+    }
+    AddRecords();
+    AddOutput();
+  }
+
+ private:
+  static FileAnalyzer::Options OptionsOf(Version version) {
+    FileAnalyzer::Options options;
+    static_cast<CPGenAnalyzerImpl::Options&>(options) = testing::AnalyzerOptions(version);
+    if (!version.AtLeast(3, 0)) options.print_function_grammar_file = options.grammar_file;
+    return options;
+  }
+
+  void AddRecords() {
+    for (const auto* rows : {&file_.store().rows, &file_.store().arg_rows}) {
+      for (const Record& record : *rows) {
+        digests.records.Add(record.name());
+        digests.records.Add(record.info());
+      }
+    }
+    for (size_t i = 0; i < file_.results().size(); ++i) {
+      const FileAnalyzer::LineResult& result = file_.results()[i];
+      digests.records.Add(result.record_end);
+      digests.records.Add(result.arg_record_end);
+      digests.records.Add(result.in_async_def + 2 * result.first_in_def);
+      if (result.error < 0) continue;
+      digests.records.Add(file_.errors()[static_cast<size_t>(result.error)].message());
+      digests.records.Add(file_.ErrorPosition(i).line);
+      digests.records.Add(file_.ErrorPosition(i).col);
+    }
+  }
+
+  void AddOutput() {
+    ScopeNames scopes;
+    scopes.Build(file_);
+    PlacedRecords placed;
+    for (const bool json : {false, true}) {
+      std::string out;
+      const std::unique_ptr<FileWriter> writer = json ? MakeJsonLinesWriter({}) : MakeTextLinesWriter({});
+      writer->Write({"a.py", {}, {}}, file_, scopes, placed, out);
+      digests.output.Add(out);
+    }
+    const RecordTable table = RecordTableMaker().Make(file_, scopes, placed);
+    for (size_t i = 0; i < table.size(); ++i) {
+      digests.output.Add(table.NameAt(i));
+      digests.output.Add(table.DetailAt(i));
+      digests.output.Add(static_cast<int64_t>(table.opens[i]));
+    }
+    for (const RecordTable::Definition& definition : table.definitions) {
+      digests.output.Add(table.scope_texts[definition.scope]);
+      digests.output.Add(definition.line);
+      digests.output.Add(definition.last_line);
+    }
+  }
+
+  Version version_;
+  FileAnalyzer file_;
+  CPGenAnalyzerImpl parser_;
+};
+
+std::vector<std::filesystem::path> FilesOf(int argc, char** argv) {
+  std::vector<std::filesystem::path> files;
+  for (int i = 1; i < argc; ++i) {
+    if (!std::filesystem::is_directory(argv[i])) {
+      files.emplace_back(argv[i]);
+      continue;
+    }
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(argv[i]))
+      if (entry.is_regular_file()) files.push_back(entry.path());
+  }
+  std::sort(files.begin(), files.end());
+  return files;
+}
+
+}  // namespace
+}  // namespace quillet
+
+int main(int argc, char** argv) {
+  using namespace quillet;
+  TheConsole().print_line = [](Text line) { digests.records.Add(line); };
+  TheConsole().report_exception = [](const std::exception_ptr& failure, bool) {
+    digests.records.Add(ReprOfException(failure));
+  };
+  Analysis analyses[] = {Analysis(Version::Of(2, 7)), Analysis(Version::Of(3, 8)), Analysis(Version::Of(3, 12))};
+  size_t count = 0;
+  for (const std::filesystem::path& path : FilesOf(argc, argv)) {
+    std::ifstream in(path, std::ios::binary);
+    const std::string bytes{std::istreambuf_iterator<char>(in), {}};
+    ++count;
+    for (uint32_t seed = 0; seed < 3; ++seed) {
+      const std::string text = seed == 0 ? bytes : Spoilt(bytes, seed * 7919 + static_cast<uint32_t>(bytes.size()));
+      for (Analysis& analysis : analyses) analysis.Add(text);
+    }
+  }
+  std::printf("%zu files  tokens %016llx  trees %016llx  records %016llx  output %016llx\n", count,
+              static_cast<unsigned long long>(digests.tokens.value()),
+              static_cast<unsigned long long>(digests.trees.value()),
+              static_cast<unsigned long long>(digests.records.value()),
+              static_cast<unsigned long long>(digests.output.value()));
+  return 0;
+}
