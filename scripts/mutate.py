@@ -252,7 +252,7 @@ class Workshop:
             (name for name in ("mold", "lld", "gold") if shutil.which(f"ld.{name}") or shutil.which(name)), ""
         )
         flags = [f"-DCMAKE_EXE_LINKER_FLAGS=-fuse-ld={linker}"] if linker else []
-        base = [
+        base: list[str | Path] = [
             "cmake",
             "-S",
             self.tree,
