@@ -88,7 +88,8 @@ void NameReader::Hint(Text hint, uint8_t flags) {
 }
 
 void NameReader::Embedded(TokenSpan tokens) {
-  const auto saved = std::tuple(at_, end_, base_, front_, operand_, next_comprehension_, in_row_, embeds_);
+  const auto saved =
+      std::tuple(at_, end_, base_, front_, operand_, next_comprehension_, knows_comprehensions_, in_row_, embeds_);
   const size_t comprehensions = comprehensions_.size();
   ++depth_;
   in_row_ = false;
@@ -96,13 +97,13 @@ void NameReader::Embedded(TokenSpan tokens) {
   next_comprehension_ = comprehensions;
   at_ = tokens.data();
   end_ = at_ + tokens.size();
-  FindComprehensions(tokens);
+  knows_comprehensions_ = false;
   BeginBase();
   ReadTokens(false);
   EndBase();
   comprehensions_.resize(comprehensions);
   --depth_;
-  std::tie(at_, end_, base_, front_, operand_, next_comprehension_, in_row_, embeds_) = saved;
+  std::tie(at_, end_, base_, front_, operand_, next_comprehension_, knows_comprehensions_, in_row_, embeds_) = saved;
 }
 
 // Whether operands and operators take turns and brackets match, as they do in no sentence of two words.
@@ -150,7 +151,7 @@ bool NameReader::IsPlausible(TokenSpan tokens) const {
 // The brackets in which a "for" stands make comprehensions; they are found in front, since what stands
 // in front of the "for" belongs to them. Nearly no statement has one.
 void NameReader::FindComprehensions(TokenSpan tokens) {
-  size_t first = 1;
+  size_t first = 0;
   while (first < tokens.size() && tokens[first].code != word::kFor) ++first;
   if (first >= tokens.size()) return;
   brackets_.clear();

@@ -276,6 +276,10 @@ void NameReader::Open(TokenCode code) {
   frame.flags = flags_;
   frame.quiet = quiet_;
   frame.candidates = frame.target = static_cast<uint32_t>(candidates_.size());
+  if (!knows_comprehensions_) {
+    knows_comprehensions_ = true;
+    FindComprehensions({at_, end_});
+  }
   if (next_comprehension_ < comprehensions_.size() && comprehensions_[next_comprehension_] == at_) [[unlikely]] {
     ++next_comprehension_;
     frame.is_comprehension = true;
@@ -621,39 +625,41 @@ uint32_t NameReader::OpenScopeAt(NameScopeKind kind, uint32_t name, const Token&
   return symbols_.Open({kind, scope_, name, OffsetOf(token), is_listed});
 }
 
-Occurrence& NameReader::Append(const Token& token, uint32_t text, NameRole role, uint32_t flags) {
-  Occurrence& added = out_.occurrences.emplace_back();
+uint32_t NameReader::Add(const Token& token, uint32_t text, NameRole role, NameKind kind, uint32_t flags,
+                         uint32_t symbol) {
+  Occurrence added{};
+  added.begin = OffsetOf(token);
+  added.text = text;
+  added.place = symbol;
+  added.role = role;
+  added.kind = kind;
+  added.flags = flags;
+  added.has_symbol = 1;
+  return Append(added);
+}
+
+uint32_t NameReader::AddWithoutSymbol(const Token& token, uint32_t text, NameRole role) {
+  Occurrence added{};
   added.begin = OffsetOf(token);
   added.text = text;
   added.place = scope_;
   added.role = role;
-  added.kind = NameKind::kNone;
-  added.flags = flags;
-  added.is_attribute = added.has_symbol = added.receiver_distance = 0;
-  return added;
-}
-
-uint32_t NameReader::Add(const Token& token, uint32_t text, NameRole role, NameKind kind, uint32_t flags,
-                         uint32_t symbol) {
-  Occurrence& added = Append(token, text, role, flags);
-  added.kind = kind;
-  added.has_symbol = 1;
-  added.place = symbol;
-  return Last();
-}
-
-uint32_t NameReader::AddWithoutSymbol(const Token& token, uint32_t text, NameRole role) {
-  Append(token, text, role, flags_);
-  return Last();
+  added.flags = flags_;
+  return Append(added);
 }
 
 uint32_t NameReader::AddAttribute(const Token& token, uint32_t text, NameRole role, uint32_t flags, uint32_t receiver) {
-  Occurrence& added = Append(token, text, role, flags);
+  const auto index = static_cast<uint32_t>(out_.occurrences.size());
+  const uint32_t distance = receiver != kNoIndex ? index - receiver : 0;
+  Occurrence added{};
+  added.begin = OffsetOf(token);
+  added.text = text;
+  added.place = scope_;
+  added.role = role;
+  added.flags = flags;
   added.is_attribute = 1;
-  const uint32_t index = Last();
-  if (receiver != kNoIndex && index - receiver <= Occurrence::kMaxReceiverDistance)
-    added.receiver_distance = index - receiver;
-  return index;
+  added.receiver_distance = distance <= Occurrence::kMaxReceiverDistance ? distance : 0;
+  return Append(added);
 }
 
 uint32_t NameReader::AddBound(const Token& token, uint32_t text, NameRole role, NameKind kind, uint16_t use,

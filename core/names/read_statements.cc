@@ -122,14 +122,16 @@ void NameReader::Row() {
     }
     if (may_hold_hints && has_plain_string) FindStringHints(tokens, hints_);
   }
-  FindComprehensions(tokens);
   LineKind kind = row_->kind;
   while (at_ < end_) {
     Statement(kind);
     kind = LineKind::kUnknown;
   }
-  comprehensions_.clear();
-  next_comprehension_ = 0;
+  if (knows_comprehensions_) {
+    knows_comprehensions_ = false;
+    comprehensions_.clear();
+    next_comprehension_ = 0;
+  }
 }
 
 // A signature on a line of its own, in front of the first statement of a function's body.

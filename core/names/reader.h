@@ -203,8 +203,10 @@ class NameReader {
   void FindComprehensions(TokenSpan tokens);
 
   // ---- occurrences ----
-  Occurrence& Append(const Token& token, uint32_t text, NameRole role, uint32_t flags);
-  uint32_t Last() const { return static_cast<uint32_t>(out_.occurrences.size()) - 1; }
+  uint32_t Append(const Occurrence& added) {
+    out_.occurrences.push_back(added);
+    return static_cast<uint32_t>(out_.occurrences.size()) - 1;
+  }
   uint32_t Add(const Token& token, uint32_t text, NameRole role, NameKind kind, uint32_t flags, uint32_t symbol);
   uint32_t AddWithoutSymbol(const Token& token, uint32_t text, NameRole role);
   uint32_t AddAttribute(const Token& token, uint32_t text, NameRole role, uint32_t flags, uint32_t receiver);
@@ -285,6 +287,7 @@ class NameReader {
   std::vector<uint32_t> candidates_;
   std::vector<const Token*> comprehensions_;  // the brackets that hold a "for"
   size_t next_comprehension_ = 0;
+  bool knows_comprehensions_ = false;  // they are looked for at the first bracket
 
   // Indices in the row of the strings that are type hints.
   std::vector<size_t> hints_;
