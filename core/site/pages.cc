@@ -19,6 +19,8 @@ namespace {
 constexpr uint32_t kLinesOfBlock = 64;
 // As much of a line stands in the script of a file's lines, in bytes.
 constexpr size_t kMostBytesOfSnippet = 160;
+// As far in front of a name the path of its module is looked for, in bytes.
+constexpr uint32_t kMostBytesOfPath = 300;
 // A page lists as many errors of one line.
 constexpr size_t kMostErrorsOfLine = 20;
 
@@ -245,11 +247,16 @@ class SitePageWriter : public FileWriter {
       if (definition != kNoIndex) link_.line = names_.occurrences()[definition].line;
     }
     if (!names_.IsShared(occurrence)) return true;
+    if (occurrence.role == NameRole::kImport) {
+      if (const Text module = ModulePath(occurrence); !module.empty()) link_.file = index_->FileOfModule(module);
+      if (link_.file != SiteIndex::kNone) link_.line = kNoIndex;
+    }
     link_.name = index_->Find(TextOf(occurrence));
     // A star import may have brought what other files define.
     if (is_variable && names_.DefinitionOf(occurrence.variable) == kNoIndex &&
         (link_.name == SiteIndex::kNone || index_->name(link_.name).definitions == 0))
       return false;
+    if (link_.file != SiteIndex::kNone) return true;
     const uint32_t imported = is_variable ? occurrence.variable : occurrence.receiver;
     const bool is_imported = imported != kNoIndex && names_.IsImported(imported);
     if (link_.name == SiteIndex::kNone || !(is_imported || occurrence.is_attribute)) return true;
@@ -259,6 +266,27 @@ class SitePageWriter : public FileWriter {
     link_.file = name->file;
     link_.line = name->line;
     return true;
+  }
+
+  // The path of a module up to this name, without the dots in front of a relative one; empty for a name that is
+  // imported from a module.
+  Text ModulePath(const SiteOccurrence& occurrence) const {
+    const auto is_of_path = [](char c) {
+      return c == '.' || static_cast<uint8_t>(c) >= 0x80 ||
+             (AsciiClassOf(c) & (kAsciiAlpha | kAsciiDigit | kAsciiUnderscore)) != 0;
+    };
+    const uint32_t least = occurrence.begin - std::min(occurrence.begin, kMostBytesOfPath);
+    uint32_t begin = occurrence.begin;
+    while (begin > least && is_of_path(source_[begin - 1])) --begin;
+    Text before = source_.substr(least, begin - least);
+    before = before.substr(0, before.find_last_not_of(" \t\\\r\n") + 1);
+    if (!before.ends_with("from")) {
+      const size_t line = source_.find_last_of('\n', occurrence.begin) + 1;
+      const Text statement = source_.substr(std::min(source_.find_first_not_of(" \t", line), size_t{begin}));
+      if (!statement.starts_with("import ")) return {};
+    }
+    while (source_[begin] == '.') ++begin;
+    return source_.substr(begin, occurrence.begin + occurrence.size - begin);
   }
 
   // The module that a variable is imported from; empty where that is not known.
@@ -278,8 +306,10 @@ class SitePageWriter : public FileWriter {
       AppendDigits(link_.file, out);
       out += ".html";
     }
-    out += "#L";
-    AppendDigits(link_.line + 1, out);
+    if (link_.line != kNoIndex) {
+      out += "#L";
+      AppendDigits(link_.line + 1, out);
+    }
     if (occurrence.variable != kNoIndex) {
       out += "\" data-s=\"";
       AppendDigits(occurrence.variable, out);
@@ -329,7 +359,7 @@ class SitePageWriter : public FileWriter {
 
   struct Link {
     uint32_t file = SiteIndex::kNone;  // kNone for the page itself
-    uint32_t line = 0;
+    uint32_t line = 0;                 // kNoIndex for the page as a whole
     uint32_t name = SiteIndex::kNone;
     Text facts;
   };

@@ -2,8 +2,8 @@
 //
 // Input: a file that was analysed, and the index of the site, which stands still. A name that the file defines
 // links to its definition; one that other files may mean links to the one definition of that name where there
-// is one, and otherwise to its own line: the script of the site lists all that are spelled alike. A builtin
-// or a name that nothing defines is no link.
+// is one, and otherwise to its own line: the script of the site lists all that are spelled alike. The path of an
+// import leads to the page of that module. A builtin or a name that nothing defines is no link.
 // Output: kSitePageHeadSize bytes that hold the size of the body in decimal digits and what it shows ("whole",
 // "cut-lines" where some lines are cut, "first-lines" where lines are left out), then the body, then the script.
 // Both are linear in the source, and of an endless line or file a part is shown.

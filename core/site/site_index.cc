@@ -148,7 +148,33 @@ std::unique_ptr<FileWriter> MakeSiteSurveyWriter(Version version) {
 }
 
 SiteIndex::SiteIndex(const std::vector<std::string>& files, const std::vector<std::string>& builtin_attributes)
-    : files_(files), builtin_attributes_(builtin_attributes.begin(), builtin_attributes.end()) {}
+    : files_(files), builtin_attributes_(builtin_attributes.begin(), builtin_attributes.end()) {
+  for (uint32_t file = 0; file < files_.size(); ++file) AddModule(file);
+}
+
+void SiteIndex::AddModule(uint32_t file) {
+  constexpr Text kPackage = "/__init__";
+  Text path = files_[file];
+  path = path.substr(0, path.rfind('.'));
+  if (path.ends_with(kPackage)) path.remove_suffix(kPackage.size());
+  for (bool is_whole = true;; is_whole = false) {
+    const auto [entry, is_new] = modules_.emplace(path, Module{file, is_whole});
+    if (!is_new && is_whole == entry->second.is_whole)
+      entry->second.file = kNone;
+    else if (!is_new && is_whole)
+      entry->second = {file, true};
+    const size_t slash = path.find('/');
+    if (slash == Text::npos) return;
+    path.remove_prefix(slash + 1);
+  }
+}
+
+uint32_t SiteIndex::FileOfModule(Text dotted) const {
+  std::string path(dotted);
+  std::replace(path.begin(), path.end(), '.', '/');
+  const auto entry = modules_.find(path);
+  return entry != modules_.end() ? entry->second.file : kNone;
+}
 
 uint32_t SiteIndex::NumberOf(Text name) {
   if (const auto entry = name_index_.find(name); entry != name_index_.end()) return entry->second;

@@ -76,8 +76,15 @@ class SiteIndex {
   // several. A definition of another module than `module`, which is empty where it is not known, is not meant.
   // An attribute that values of the language's own types have may be one of those.
   const Name* OnlyDefinition(uint32_t number, Text module, bool is_attribute) const;
+  // The file of a module, by its path or the end of it, such as "shop.items"; kNone where none or several are
+  // called that.
+  uint32_t FileOfModule(Text dotted) const;
 
  private:
+  struct Module {
+    uint32_t file;
+    bool is_whole;  // all of the file's path, not its end alone
+  };
   struct Definition {
     uint32_t scope;  // index in scope_texts_
     uint32_t file;
@@ -94,9 +101,11 @@ class SiteIndex {
   uint32_t NumberOf(Text name);
   uint32_t NumberOfScope(Text scope);
 
+  void AddModule(uint32_t file);
   bool IsOfModule(uint32_t file, Text module) const;
 
   std::vector<std::string> files_;
+  std::unordered_map<Text, Module> modules_;  // by path and by each of its ends, with slashes
   std::unordered_set<std::string> builtin_attributes_;
   std::vector<Name> names_;
   std::unordered_map<Text, uint32_t> name_index_;

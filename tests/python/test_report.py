@@ -172,6 +172,17 @@ def test_a_link_to_another_file_is_what_is_imported(tmp_path: Path) -> None:
     assert page.targets("rest") == ["1.html#L4"]
 
 
+def test_the_path_of_an_import_leads_to_its_page(tmp_path: Path) -> None:
+    (tmp_path / "pkg").mkdir()
+    (tmp_path / "pkg" / "__init__.py").write_text("")
+    (tmp_path / "pkg" / "shop.py").write_text("class Shop: pass\n")
+    page = page_of(tmp_path, a="from pkg.shop import Shop\nimport pkg\nimport gone\n")
+    assert page.targets("pkg") == ["1.html", "1.html"]
+    assert page.targets("shop") == ["2.html"]
+    assert page.targets("Shop") == ["2.html#L1"]
+    assert page.targets("gone") == ["#L3"]
+
+
 def test_a_star_import_may_have_brought_a_name(tmp_path: Path) -> None:
     page = page_of(tmp_path, a="from b import *\nwork()\nlen()\n", b="def work(): pass\n")
     assert page.targets("work") == ["1.html#L1"]

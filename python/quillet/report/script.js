@@ -178,8 +178,9 @@ const quillet = {
     if (link && !link.classList.contains("d")) {
       const [page, line] = link.getAttribute("href").split("#L");
       if (page || Number(line) !== lineOf(link)) {
-        panel.append(element("p", { class: "go" }, element("a", { href: link.getAttribute("href") }, "Go to the definition"),
-          element("small", {}, page ? "by its name" : "")));
+        const what = line === undefined ? "Go to the module" : "Go to the definition";
+        panel.append(element("p", { class: "go" }, element("a", { href: link.getAttribute("href") }, what),
+          element("small", {}, page && line !== undefined ? "by its name" : "")));
       }
     }
     if (isLocal) panel.append(inThisFile(name, links));

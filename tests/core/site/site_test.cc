@@ -118,6 +118,28 @@ TEST(Pages, AnImportLeadsIntoItsOwnModuleAlone) {
   EXPECT_EQ(Site({"import b\nb.run\n", "def run(): pass\n"}).Links("run"), (Strings{"1.html#L1"}));
 }
 
+TEST(Pages, ThePathOfAnImportLeadsToItsModule) {
+  const Strings modules = {"from b import b\n", "x = 1\n"};
+  EXPECT_EQ(Site(modules).Links("b"), (Strings{"1.html", "#L1"}));
+  EXPECT_EQ(Site({"import b, c\nb\n", ""}).Links("b"), (Strings{"1.html", "#L1"}));
+  EXPECT_EQ(Site({"import b as d\n", ""}).Links("b"), (Strings{"1.html"}));
+  EXPECT_EQ(Site({"from .b import (d,\n b)\n", ""}).Links("b"), (Strings{"1.html", "#L2"}));
+  EXPECT_EQ(Site({"from far.b.d import e\n", ""}).Links("b"), (Strings{"#L1"}));
+  EXPECT_EQ(Site({"from c import b as d\n", ""}).Links("b"), (Strings{"#L1"}));
+}
+
+TEST(Index, AModuleIsFoundByTheEndOfItsPath) {
+  const SiteIndex index({"src/pkg/__init__.py", "src/pkg/one.py", "lib/one.py", "two.py", "lib/two.py"}, {});
+  EXPECT_EQ(index.FileOfModule("pkg"), 0u);
+  EXPECT_EQ(index.FileOfModule("src.pkg"), 0u);
+  EXPECT_EQ(index.FileOfModule("pkg.one"), 1u);
+  EXPECT_EQ(index.FileOfModule("one"), SiteIndex::kNone);
+  EXPECT_EQ(index.FileOfModule("two"), 3u);
+  EXPECT_EQ(index.FileOfModule("lib.two"), 4u);
+  EXPECT_EQ(index.FileOfModule("three"), SiteIndex::kNone);
+  EXPECT_EQ(index.FileOfModule(""), SiteIndex::kNone);
+}
+
 TEST(Pages, BuiltinsAreNoLinks) {
   EXPECT_EQ(Site({"len(x)\n"}).Links("len"), Strings{});
   EXPECT_EQ(Site({"len(x)\nlen = 1\n"}).Links("len"), (Strings{"#L2", "#L2"}));
