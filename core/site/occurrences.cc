@@ -242,6 +242,9 @@ void SiteFacts::Add(const PlacedRecord& record, uint32_t begin) {
     modules_.emplace(begin, record.detail.substr(0, record.detail.find(' ')));
   std::string fact(word);
   fact += record.detail;
+  // The module, a blank, and the name there.
+  if (const size_t blank = fact.rfind(' '); record.kind == RecordKind::kFromImport && blank > word.size())
+    fact.replace(blank, 1, " import ");
   std::string& facts = facts_[begin];
   if (facts.size() + fact.size() > kMostFacts || facts.find(fact) != std::string::npos) return;
   if (record.kind == RecordKind::kHint)

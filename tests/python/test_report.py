@@ -257,6 +257,8 @@ def test_hints_and_values_are_known_of_a_name(tmp_path: Path) -> None:
     page = page_of(tmp_path, shop=SHOP)
     assert page.links("item")[0]["data-tip"] == ": Item"
     assert page.links("LIMIT")[0]["data-tip"] == ": int  = int: 10"
+    assert page.links("D")[0]["data-tip"] == "from decimal import Decimal"
+    assert page.links("os")[0]["data-tip"] == "import os"
 
 
 def test_errors_stand_below_their_line_and_on_the_front_page(tmp_path: Path) -> None:
@@ -658,6 +660,7 @@ def test_a_local_name_is_listed_by_its_scope(browser: Browser, tmp_path: Path) -
     page = browser.open(site / "files" / "0.html")
     page.click("document.querySelector('#L5 a.r')")
     page.wait("document.getElementById('panel')")
+    assert page.value("document.querySelectorAll('#panel .places mark').length") == 5
     assert page.value("[...document.querySelectorAll('#panel .places i')].map(e => e.textContent)") == ["4", "5", "5"]
     assert page.value("document.querySelectorAll('main .on').length") == 3
 

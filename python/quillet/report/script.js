@@ -89,7 +89,8 @@ const quillet = {
   const fill = (row, text) => {
     const { name } = row.dataset;
     const code = row.querySelector("code");
-    const pieces = text.split(name);
+    const whole = new RegExp(`(?<![\\p{L}\\p{N}_])${name.replace(/[^\p{L}\p{N}_]/gu, "\\$&")}(?![\\p{L}\\p{N}_])`, "u");
+    const pieces = text.split(whole);
     code.replaceChildren(pieces[0]);
     for (const piece of pieces.slice(1)) code.append(element("mark", {}, name), piece);
   };
