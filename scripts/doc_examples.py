@@ -12,7 +12,8 @@ An example is a comment that names a view, a block of source and a block of outp
     ```
 
 The views: `records` (each record raw and decoded), `tree` (the parse tree), `analyze` (what the command
-line prints; the comment may name a file for it), `find` (what it answers of the name in the comment).
+line prints; the comment may name a file for it), `find` (what it answers of the name in the comment), `names` (each
+occurrence: place, text, role, kind or flags, and its variable's scope), `scopes` (each scope with its symbols).
 The version is 3.12 where none is given.
 
     scripts/doc_examples.py            names the examples that are stale; exit code 1 where there is one
@@ -31,7 +32,7 @@ from collections.abc import Iterator
 from contextlib import contextmanager
 from pathlib import Path
 
-from quillet import Record, analyze
+from quillet import FileBindings, Record, analyze, bind
 from quillet._batch import write_files
 from quillet._trees import tree_text
 from quillet.cli.output import output_format
@@ -103,7 +104,58 @@ def find_view(source: str, version: tuple[int, int], name: str) -> str:
     return out.getvalue()
 
 
-VIEWS = {"records": records_view, "tree": tree_view, "analyze": analyze_view, "find": find_view}
+def qualified(bindings: FileBindings, index: int | None) -> str:
+    """The name of a scope with those around it."""
+    parts = []
+    while index:
+        scope = bindings.scopes[index]
+        parts.append(scope.name or scope.kind)
+        index = scope.parent
+    return ".".join(reversed(parts)) or "module"
+
+
+def aligned(rows: list[list[str]]) -> str:
+    """Rows as columns."""
+    widths = [max(map(len, column)) for column in zip(*rows, strict=True)]
+    lines = ["  ".join(f"{cell:{width}}" for cell, width in zip(row, widths, strict=True)) for row in rows]
+    return "".join(line.rstrip() + "\n" for line in lines)
+
+
+def names_view(source: str, version: tuple[int, int], _: str) -> str:
+    """One occurrence a line."""
+    bindings = bind(source, version=version)
+    rows = []
+    for o in bindings.occurrences:
+        if o.symbol is not None:
+            whose = f"{o.symbol.name} of {qualified(bindings, o.symbol.scope)}"
+        elif o.receiver is not None:
+            whose = f"of {bindings.occurrences[o.receiver].text}"
+        else:
+            whose = "attribute" if o.is_attribute else ""
+        marks = ", ".join(filter(None, [o.kind, *sorted(o.flags)]))
+        rows.append([f"{o.line}:{o.column}", o.text, o.role, marks, whose])
+    return aligned(rows)
+
+
+def scopes_view(source: str, version: tuple[int, int], _: str) -> str:
+    """One scope a line, with its symbols."""
+    bindings = bind(source, version=version)
+    rows = []
+    for index, scope in enumerate(bindings.scopes):
+        symbols = " ".join(f"{symbol.name}{' (free)' if symbol.is_free() else ''}" for symbol in scope.symbols)
+        extent = f"{scope.first_line}-{scope.last_line}"
+        rows.append([str(index), extent, scope.kind, scope.name, str(scope.parent or 0) if index else "", symbols])
+    return aligned(rows)
+
+
+VIEWS = {
+    "records": records_view,
+    "tree": tree_view,
+    "analyze": analyze_view,
+    "find": find_view,
+    "names": names_view,
+    "scopes": scopes_view,
+}
 
 
 def output_of(match: re.Match[str]) -> str:

@@ -45,13 +45,13 @@ class Rule(Enum):
     MADE_UP = "a name that no source spells is no symbol"
     INLINED = "a comprehension that 3.12 inlines keeps its scope"
     PRIVATE_NAMESPACE = "a private class or function is a namespace"
-    SCOPE_NAME = "a variable called like a nameless scope is no namespace"
+    SCOPE_NAME = "a name is no namespace because something nested is called so"
     DECORATED_LINE = "in 2.7 a decorated definition begins with its decorators"
     COMPREHENSION_LINE = "in 2.7 a comprehension has no line"
     FIELD_LINE = "before 3.12 what stands in an f-string has no line of its own"
     NO_STEP = "in 2.7 `a[::]` reads None"
     ESCAPES = "a string with escapes holds no annotation"
-    TOP = "before 3.13 a function called top is taken for the module"
+    TOP = "a function called top is not the module"
 
 
 def answers_of(symbol: Symbol) -> int:
@@ -339,10 +339,13 @@ class TableComparison:
                 if any(child.name == spelled for child in ours.children) and spelled != name:
                     self._rules[Rule.PRIVATE_NAMESPACE] += 1
                     return
-            if expected & namespace and (name in _FUNCTIONS):
+            # `symtable` asks what is nested in the scope for its name alone.
+            nested = {child.name for child in theirs.children} | {*_FUNCTIONS}
+            bound = _BIT["is_assigned"] | _BIT["is_parameter"] | _BIT["is_imported"]
+            if expected & namespace and name in nested and (name in _FUNCTIONS or not expected & bound):
                 self._rules[Rule.SCOPE_NAME] += 1
                 return
-        if theirs.kind == "function" and theirs.name == "top" and (3, 0) < self._version < (3, 13):
+        if theirs.kind == "function" and theirs.name == "top" and self._version >= (3, 0):
             # What is bound in the module is both local and global.
             bound = any(expected & _BIT[bit] for bit in ("is_assigned", "is_imported", "is_parameter"))
             if bound and got | _BIT["is_global"] | _BIT["is_local"] == expected:
@@ -464,6 +467,9 @@ class NamesComparison:
                 is_attribute, receiver, expects_symbol = True, dotted, False
             dotted = i
             text = occurrence.text
+            spelled = self._said["rows"][line - 1][occurrence.column - 1 : occurrence.end_column - 1].decode("utf-8")
+            if spelled != text:
+                self._differ("names", f"{what} {marks}: spelled {spelled}", line, column, text)
             said = (occurrence.role, occurrence.kind, occurrence.is_attribute)
             if said != (role, kind, is_attribute):
                 self._differ(
@@ -542,21 +548,29 @@ class NamesComparison:
         if symbol is None:
             # Mentioned only by annotations that are never evaluated.
             return "" if "annotation" in occurrence.flags else "in no table"
+        if self._is_of_class(occurrence.scope, variable):
+            return ""
         if symbol.is_free():
-            scope: int | None = self._scopes[occurrence.scope].parent
+            if variable.name == "__class__" and self._scopes[variable.scope].kind == "class":
+                return ""
+            scope = self._scopes[occurrence.scope].parent
             while scope is not None:
                 around = own[scope].get(variable.name)
                 if around is not None and around.is_local() and self._scopes[scope].kind != "class":
                     break
                 scope = self._scopes[scope].parent
-            if variable.name == "__class__" and self._scopes[variable.scope].kind == "class":
-                return ""
-            if self._scopes[variable.scope].kind == "class":
-                return ""  # an annotation scope sees the names of its class; symtable is compared for these
             return "" if scope == variable.scope else "free, and another scope's"
         if symbol.is_global():
             return "" if variable.scope == 0 else "global, and not the module's"
         return "" if variable is symbol else "local, and another scope's"
+
+    def _is_of_class(self, scope: int | None, variable: Symbol) -> bool:
+        """Whether a scope of annotations sees the variable, as one of the class around it."""
+        while scope is not None and self._scopes[scope].kind in ("annotation", "type parameters"):
+            scope = self._scopes[scope].parent
+            if scope == variable.scope and self._scopes[scope].kind == "class":
+                return variable.is_local()
+        return False
 
     def _mangled(self, occurrence: Occurrence) -> str:
         name = unicodedata.normalize("NFKC", occurrence.text)

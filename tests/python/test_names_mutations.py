@@ -20,7 +20,7 @@ FULL = os.environ.get("QUILLET_FULL") == "1"
 MUTATED = 100_000 if FULL else 10_000
 
 # Words that are names in some places and none in others.
-SOFT = {"match", "case", "type", "_", "print", "exec"}
+SOFT = {"match", "case", "type", "_", "print", "exec", "async", "await"}
 
 __all__ = ["statements"]  # a fixture
 
