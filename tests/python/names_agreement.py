@@ -5,6 +5,7 @@ command it compares them all and prints the table of docs/names-agreement.md; th
 left that no rule explains:
 
     python tests/python/names_agreement.py                  every library
+    python tests/python/names_agreement.py --write          and puts the table into docs/names-agreement.md
     python tests/python/names_agreement.py --python 3.12    only of this version (may be repeated)
     python tests/python/names_agreement.py --python 3.12 FILE OR FOLDER...
 """
@@ -13,6 +14,7 @@ from __future__ import annotations
 
 import argparse
 import json
+import re
 import subprocess
 import sys
 import threading
@@ -32,6 +34,8 @@ from quillet._source import to_utf8
 from survey import NOT_THE_LIBRARY, Library, libraries
 
 ORACLE = Path(__file__).resolve().parent / "names_oracle.py"
+DOCUMENT = Path(__file__).resolve().parent.parent.parent / "docs" / "names-agreement.md"
+TABLE = re.compile(r"(?<=<!-- counts -->\n).*?(?=<!-- end of counts -->)", re.DOTALL)
 VERSIONS = ((2, 7), (3, 8), (3, 11), (3, 12), (3, 13))
 QUESTIONS = (
     "is_parameter", "is_global", "is_declared_global", "is_nonlocal", "is_local", "is_free", "is_imported",
@@ -44,7 +48,6 @@ class Rule(Enum):
 
     MADE_UP = "a name that no source spells is no symbol"
     INLINED = "a comprehension that 3.12 inlines keeps its scope"
-    PRIVATE_NAMESPACE = "a private class or function is a namespace"
     SCOPE_NAME = "a name is no namespace because something nested is called so"
     DECORATED_LINE = "in 2.7 a decorated definition begins with its decorators"
     COMPREHENSION_LINE = "in 2.7 a comprehension has no line"
@@ -334,11 +337,6 @@ class TableComparison:
     def _compare_answers(self, theirs: Table, ours: Table, name: str, expected: int, got: int) -> None:
         namespace = _BIT["is_namespace"]
         if expected ^ got == namespace:
-            if got & namespace and name.startswith("_"):
-                spelled = name[name.index("__") :] if "__" in name[1:] else name
-                if any(child.name == spelled for child in ours.children) and spelled != name:
-                    self._rules[Rule.PRIVATE_NAMESPACE] += 1
-                    return
             # `symtable` asks what is nested in the scope for its name alone.
             nested = {child.name for child in theirs.children} | {*_FUNCTIONS}
             bound = _BIT["is_assigned"] | _BIT["is_parameter"] | _BIT["is_imported"]
@@ -692,7 +690,8 @@ def tables(reports: Sequence[Report]) -> str:
     rows = [[what, *(f"{report.tallies.get(what, Tally()).compared:,}" for report in reports)] for what in whats]
     rows.append(["left over", *(f"{report.left_over:,}" for report in reports)])
     out = [text_table(head, rows), "\n"]
-    rows = [[rule.value, *(f"{report.by_rule[rule]:,}" for report in reports)] for rule in Rule]
+    met = [rule for rule in Rule if any(report.by_rule[rule] for report in reports)]
+    rows = [[rule.value, *(f"{report.by_rule[rule]:,}" for report in reports)] for rule in met]
     out += [text_table(["rule", *head[1:]], rows), "\n"]
     counts = list(dict.fromkeys(what for report in reports for what in report.counts))
     out.append(text_table(["counted", *head[1:]], [[w, *(f"{r.counts[w]:,}" for r in reports)] for w in counts]))
@@ -715,6 +714,7 @@ def main() -> int:
     parser.add_argument("paths", nargs="*", type=Path, metavar="FILE OR FOLDER", help="instead of the libraries")
     parser.add_argument("--python", action="append", metavar="VERSION", help="only this version, such as 3.12")
     parser.add_argument("--each-nth", type=int, default=1, metavar="N", help="only every N-th file")
+    parser.add_argument("--write", action="store_true", help="put the table into docs/names-agreement.md")
     parser.add_argument("--examples", type=int, default=3, metavar="N", help="how many of each kind of difference")
     arguments = parser.parse_args()
     wanted = {tuple(map(int, version.split("."))) for version in arguments.python or ()} or set(VERSIONS)
@@ -730,6 +730,9 @@ def main() -> int:
             for example in examples[: arguments.examples]:
                 print(f"    {example}", file=sys.stderr)
     print(tables(reports), end="")
+    if arguments.write:
+        text = DOCUMENT.read_text(encoding="utf-8")
+        DOCUMENT.write_text(TABLE.sub(lambda _: tables(reports), text), encoding="utf-8")
     return 1 if any(report.left_over for report in reports) else 0
 
 

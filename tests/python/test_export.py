@@ -148,6 +148,20 @@ def test_scip_locals_are_those_of_their_function(tmp_path: Path) -> None:
     assert by_place[0, 6, 7].startswith("local ")
 
 
+def test_scip_has_calls_attributes_of_self_and_broken_definitions(tmp_path: Path) -> None:
+    source = (
+        "class A:\n    def f(self, n)\n        self.n = n\n        return self.f(n=self.n)\n\nA().f(n=1)\nA = len(A)\n"
+    )
+    make_index(tmp_path, a=source)
+    assert run("export", "scip", cwd=tmp_path).returncode == 0
+    document = scip_documents(tmp_path / "index.scip")["a.py"]
+    assert occurrences(document, "quillet . . . `a.py`/A#f().") == [([1, 8, 9], 5), ([3, 20, 21], 8)]
+    assert occurrences(document, "quillet . . . `a.py`/A#n.") == [([2, 13, 14], 5), ([3, 29, 30], 8)]
+    # The first binding is the definition, a later one a write.
+    expected = [([0, 6, 7], 5), ([5, 0, 1], 8), ([6, 0, 1], 4), ([6, 8, 9], 8)]
+    assert occurrences(document, "quillet . . . `a.py`/A#") == expected
+
+
 def test_scip_takes_odd_names(tmp_path: Path) -> None:
     odd_folder(tmp_path)
     assert run("export", "scip", cwd=tmp_path).returncode == 0

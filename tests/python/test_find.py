@@ -177,6 +177,19 @@ def test_outline_is_a_tree_with_parameters_and_hints(shop: Path) -> None:
     ]
 
 
+def test_outline_has_broken_definitions_marked(tmp_path: Path) -> None:
+    source = "class Basket:\n    def add(self, item, count=1)\n        def inner(): pass\n\n    def total(self): pass\n"
+    (tmp_path / "shop.py").write_text(source + "class Broken(A)\n    def kept(self): pass\n")
+    assert run("outline", "shop.py", cwd=tmp_path).stdout.splitlines() == [
+        "1 class Basket",
+        "2     def add(self, item, count)  syntax error",
+        "3         def inner()",
+        "5     def total(self)",
+        "6 class Broken  syntax error",
+        "7     def kept(self)",
+    ]
+
+
 @pytest.mark.parametrize("command", ["defs", "outline"])
 def test_a_file_need_not_be_in_the_index(shop: Path, command: str) -> None:
     (shop / "other.py").write_text("def later(): pass\n")

@@ -12,10 +12,9 @@ from pathlib import Path
 import pytest
 
 import names_agreement
-from names_agreement import VERSIONS, Report, Rule, compare_library
+from names_agreement import DOCUMENT, VERSIONS, Report, Rule, compare_library
 from survey import Library, libraries, library_of
 
-DOCUMENT = Path(__file__).resolve().parent.parent.parent / "docs" / "names-agreement.md"
 FULL = os.environ.get("QUILLET_FULL") == "1"
 EACH_NTH_FILE = 40
 

@@ -36,7 +36,7 @@ def facts_of(path: str, index: str | None, *, with_lines: bool) -> FileFacts:
         status = os.stat(path)
     except (OSError, ValueError) as error:
         raise IndexProblem(f"{path}: {problem_of(error) if isinstance(error, OSError) else error}") from error
-    sources: Sources = Folder(".", _version_of(index))
+    sources: Sources = Folder(".", version_of(index))
     row = row_of(os.fsencode(os.path.abspath(path)), status.st_size)
     [facts] = sources.facts([row], sources.everything(with_lines=with_lines))
     if facts.problem is not None:
@@ -49,7 +49,8 @@ def shown_path(path: str) -> str:
     return os.path.abspath(path).removeprefix(os.path.join(os.getcwd(), ""))
 
 
-def _version_of(index: str | None) -> tuple[int, int] | None:
+def version_of(index: str | None) -> tuple[int, int] | None:
+    """The version that an index was made for, the one that is named or the nearest; None where there is none."""
     if index is not None:
         return Index(index).version
     try:

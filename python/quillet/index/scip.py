@@ -1,10 +1,10 @@
 """Writes an index in SCIP, the format by which code intelligence servers take in what a language says.
 
-The message is an `Index`: metadata, then a `Document` a file with its occurrences and symbols. What a
-file's modules, classes and functions set is a global symbol, described by the file's path and the scope;
-what is set in a function is local to the document. A read refers to the nearest definition of its name
-from its own scope outwards in the same file, classes around a function left out, as Python looks names
-up. A read without one is no occurrence: this index does not follow imports.
+The message is an `Index`: metadata, then a `Document` a file with its occurrences and symbols. Files are bound as they
+are now, so a document has every name in its place. A name of a module or class, and every class and function, is a
+global symbol, described by the file's path and the scopes around; any other is local to the document. An attribute of
+a method's first parameter belongs to the class where the class binds it, or a method sets it. A name that the file does
+not bind is no occurrence: this index does not follow imports.
 """
 
 from __future__ import annotations
@@ -13,8 +13,9 @@ import os
 import re
 from collections.abc import Callable, Iterator
 
-from quillet.index.questions import Hit, Index
-from quillet.index.store import CLASS, FUNCTION
+from quillet._batch import analyze_files
+from quillet._names import FileBindings, Occurrence, Symbol
+from quillet.index.questions import Index
 from quillet.index.wire import data, integer, integers, text
 
 # Numbers of fields and enums of the format.
@@ -39,17 +40,18 @@ def scip_parts(index: Index, root: str, version: str, skipped: Callable[[str], N
     tool = text(_TOOL_NAME, "quillet") + text(_TOOL_VERSION, version)
     metadata = data(_METADATA_TOOL, tool) + text(_METADATA_ROOT, Path(root).as_uri())
     yield data(_INDEX_METADATA, metadata + integer(_METADATA_ENCODING, _TEXT_UTF8))
-    inside = []
+    inside = {}
     for row in index.files():
         full = index.full_path(row.path)
-        if _path_from(root, full) is None:
+        path = _path_from(root, full)
+        if path is None:
             skipped(full)
         else:
-            inside.append(row)
-    for facts in index.facts(inside):
-        path = _path_from(root, index.full_path(facts.row.path))
-        if path is not None:
-            yield data(_INDEX_DOCUMENTS, _document(facts.hits, path))
+            inside[full] = path
+    with analyze_files(inside, version=index.version, bindings=True) as results:
+        for result, path in zip(results, inside.values(), strict=True):
+            if result.problem is None:
+                yield data(_INDEX_DOCUMENTS, _document(result.bindings, path))
 
 
 def _path_from(root: str, full: str) -> str | None:
@@ -57,93 +59,140 @@ def _path_from(root: str, full: str) -> str | None:
     return None if path.startswith("../") or os.path.isabs(path) else path
 
 
-def global_symbol(path: str, scopes: list[tuple[str, int]], name: str, opens: int) -> str:
-    """The symbol of a name in a file: `quillet . . . ` and descriptors of the path, the scopes and the name."""
-    parts = [_quoted(part) + "/" for part in path.split("/")]
-    parts += [_descriptor(scope, kind) for scope, kind in scopes]
-    return f"quillet . . . {''.join(parts)}{_descriptor(name, opens)}"
-
-
-def _descriptor(name: str, opens: int) -> str:
-    return _quoted(name) + {CLASS: "#", FUNCTION: "()."}.get(opens, ".")
+def global_symbol(path: str, descriptors: str) -> str:
+    """The symbol that descriptors tell in a file: `quillet . . . `, the path's own, and those."""
+    return f"quillet . . . {''.join(_quoted(part) + '/' for part in path.split('/'))}{descriptors}"
 
 
 def _quoted(name: str) -> str:
     return name if _IDENTIFIER.fullmatch(name) else "`" + name.replace("`", "``") + "`"
 
 
+# The end of a descriptor and the kind of its symbol, by the kind of the definition.
+_DESCRIBED = {"class": ("#", _KIND_CLASS), "function": ("().", _KIND_FUNCTION), "parameter": (".", _KIND_PARAMETER)}
+_VARIABLE = (".", _KIND_VARIABLE)
+
+
 class _Symbols:
-    """The symbols of one file, by scope and name."""
+    """The symbols of one file."""
 
-    def __init__(self, path: str, hits: list[Hit]) -> None:
+    def __init__(self, path: str, bindings: FileBindings) -> None:
         self._path = path
-        self._opened: dict[str, int] = {"": 0}
-        for hit in hits:
-            if hit.opens:
-                self._opened.setdefault(_inner(hit), hit.opens)
-        self._defined: dict[tuple[str, str], str] = {}
+        self._scopes = bindings.scopes
+        self._occurrences = list(bindings.occurrences)
+        # What a variable is: the kind of its first definition, where that is a class, function or parameter.
+        self._defined: dict[Symbol, str] = {}
+        for occurrence in self._occurrences:
+            if occurrence.symbol is not None and occurrence.kind is not None:
+                self._defined.setdefault(occurrence.symbol, occurrence.kind)
+        self._of_classes = {
+            (symbol.scope, symbol.name): symbol
+            for symbol in self._defined
+            if self._scopes[symbol.scope].kind == "class"
+        }
+        # The first parameters of methods, by which a class's own attributes are reached.
+        self._selves: dict[Symbol, int] = {}
+        with_first: set[int] = set()
+        for occurrence in self._occurrences:
+            if occurrence.kind == "parameter" and occurrence.scope not in with_first:
+                with_first.add(occurrence.scope)
+                around = self._scopes[occurrence.scope].parent
+                if occurrence.symbol is not None and around is not None and self._scopes[around].kind == "class":
+                    self._selves[occurrence.symbol] = around
+        self._set_by_methods = {
+            (self._selves[receiver], occurrence.text)
+            for occurrence in self._occurrences
+            if occurrence.role == "write" and (receiver := self._receiver(occurrence)) in self._selves
+        }
+        self._texts: dict[Symbol | tuple[int, str], str] = {}
         self.kinds: dict[str, tuple[int, str]] = {}
-        self._locals = 0
-        for hit in hits:
-            if hit.kind == "set" and (hit.scope, hit.name) not in self._defined:
-                self._define(hit)
 
-    def _define(self, hit: Hit) -> None:
-        in_class = self._opened.get(hit.scope) == CLASS
-        if hit.is_parameter or (self._opened.get(hit.scope) == FUNCTION and not hit.opens):
-            symbol = f"local {self._locals}"
-            self._locals += 1
-        else:
-            symbol = global_symbol(self._path, self._scopes(hit.scope), hit.name, hit.opens)
-        self._defined[hit.scope, hit.name] = symbol
-        kind = _KIND_VARIABLE
-        if hit.is_parameter:
-            kind = _KIND_PARAMETER
-        elif hit.opens:
-            kind = _KIND_CLASS if hit.opens == CLASS else _KIND_METHOD if in_class else _KIND_FUNCTION
-        self.kinds.setdefault(symbol, (kind, hit.name))
+    def of(self, occurrence: Occurrence) -> str | None:
+        """The symbol of an occurrence."""
+        if occurrence.symbol is not None:
+            return self._of_variable(occurrence.symbol)
+        receiver = self._receiver(occurrence)
+        if receiver not in self._selves:
+            return None
+        own = self._selves[receiver], occurrence.text
+        if own in self._of_classes:
+            return self._of_variable(self._of_classes[own])
+        if own not in self._set_by_methods:
+            return None
+        if own not in self._texts:
+            descriptors = self._descriptors(own[0]) + _quoted(own[1]) + "."
+            self._add(own, global_symbol(self._path, descriptors), _KIND_VARIABLE, own[1])
+        return self._texts[own]
 
-    def _scopes(self, scope: str) -> list[tuple[str, int]]:
-        found = []
-        at = scope
-        while at:
-            outer, _, name = at.rpartition(".")
-            found.append((name, self._opened.get(at, FUNCTION)))
-            at = outer
-        return found[::-1]
+    def _receiver(self, occurrence: Occurrence) -> Symbol | None:
+        if occurrence.receiver is None or not occurrence.is_attribute:
+            return None
+        return self._occurrences[occurrence.receiver].symbol
 
-    def resolve(self, scope: str, name: str) -> str | None:
-        """The symbol that a name means in a scope."""
-        symbol = self._defined.get((scope, name))
-        while symbol is None and scope:
-            scope = scope.rpartition(".")[0]
-            if self._opened.get(scope) != CLASS:
-                symbol = self._defined.get((scope, name))
-        return symbol
+    def _of_variable(self, variable: Symbol) -> str | None:
+        if variable not in self._defined:
+            return None
+        if variable not in self._texts:
+            defined = self._defined[variable]
+            ending, kind = _DESCRIBED.get(defined, _VARIABLE)
+            scope = self._scopes[variable.scope]
+            if scope.kind == "class" and defined == "function":
+                kind = _KIND_METHOD
+            if scope.kind in ("module", "class") or defined in ("class", "function"):
+                symbol = global_symbol(
+                    self._path, f"{self._descriptors(variable.scope)}{_quoted(variable.name)}{ending}"
+                )
+            else:
+                symbol = f"local {len(self._texts)}"
+            self._add(variable, symbol, kind, variable.name)
+        return self._texts[variable]
+
+    def _add(self, key: Symbol | tuple[int, str], symbol: str, kind: int, name: str) -> None:
+        self._texts[key] = symbol
+        self.kinds.setdefault(symbol, (kind, name))
+
+    def _descriptors(self, scope: int | None) -> str:
+        """Those of the classes and functions from the module to a scope."""
+        parts = []
+        while scope is not None:
+            at = self._scopes[scope]
+            if at.kind in ("class", "function"):
+                parts.append(_quoted(at.name) + _DESCRIBED[at.kind][0])
+            scope = at.parent
+        return "".join(reversed(parts))
 
 
-def _inner(hit: Hit) -> str:
-    return f"{hit.scope}.{hit.name}" if hit.scope else hit.name
+def _roles_of(occurrence: Occurrence, is_first: bool) -> int:
+    """What an occurrence does to its symbol. The first that binds it is its definition."""
+    if occurrence.role in ("read", "call"):
+        return _ROLE_READ
+    if occurrence.role == "declaration":
+        return 0
+    roles = _ROLE_WRITE
+    if is_first or occurrence.role == "definition":
+        roles |= _ROLE_DEFINITION
+    if occurrence.role == "import" or occurrence.kind == "import":
+        roles |= _ROLE_IMPORT
+    if "augmented" in occurrence.flags:
+        roles |= _ROLE_READ
+    return roles
 
 
-def _document(hits: list[Hit], path: str) -> bytes:
-    symbols = _Symbols(path, hits)
-    roles: dict[tuple[int, int, int, str], int] = {}
-    for hit in hits:
-        role = {"set": _ROLE_DEFINITION | _ROLE_WRITE, "get": _ROLE_READ}.get(hit.kind)
-        if hit.kind in ("import", "from_import"):
-            role = _ROLE_IMPORT
-        if role is None or "\n" in hit.name:
-            continue
-        symbol = symbols.resolve(hit.scope, hit.name)
-        if symbol is not None:
-            size = len(hit.name.encode("utf-8", "surrogatepass"))
-            place = (hit.line - 1, hit.column - 1, hit.column - 1 + size, symbol)
-            roles[place] = roles.get(place, 0) | role
+def _document(bindings: FileBindings, path: str) -> bytes:
+    symbols = _Symbols(path, bindings)
     out = [text(_DOCUMENT_PATH, path), text(_DOCUMENT_LANGUAGE, "Python")]
-    for (line, start, end, symbol), role in sorted(roles.items()):
-        occurrence = integers(_OCCURRENCE_RANGE, [line, start, end]) + text(_OCCURRENCE_SYMBOL, symbol)
-        out.append(data(_DOCUMENT_OCCURRENCES, occurrence + integer(_OCCURRENCE_ROLES, role)))
+    bound: set[str] = set()
+    for found in bindings.occurrences:
+        symbol = symbols.of(found)
+        if symbol is None:
+            continue
+        binds = found.role in ("definition", "write", "import")
+        roles = _roles_of(found, binds and symbol not in bound)
+        if binds:
+            bound.add(symbol)
+        place = integers(_OCCURRENCE_RANGE, [found.line - 1, found.column - 1, found.end_column - 1])
+        occurrence = place + text(_OCCURRENCE_SYMBOL, symbol) + integer(_OCCURRENCE_ROLES, roles)
+        out.append(data(_DOCUMENT_OCCURRENCES, occurrence))
     for symbol, (kind, name) in symbols.kinds.items():
         information = text(_SYMBOL_NAME, symbol) + integer(_SYMBOL_KIND, kind) + text(_SYMBOL_DISPLAY, name)
         out.append(data(_DOCUMENT_SYMBOLS, information))
