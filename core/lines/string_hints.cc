@@ -26,6 +26,7 @@ class HintSearch {
     Casts();
     std::sort(hints_.begin() + static_cast<ptrdiff_t>(first), hints_.end());
   }
+  void RunOnType() { Region(0, count_); }
 
  private:
   TokenCode CodeAt(size_t i) const { return i < count_ ? toks_[i].code : tok::ENDMARKER; }
@@ -238,6 +239,8 @@ class HintSearch {
 }  // namespace
 
 void FindStringHints(TokenSpan toks, std::vector<size_t>& hints) { HintSearch(toks, hints).Run(); }
+
+void FindStringHintsOfType(TokenSpan toks, std::vector<size_t>& hints) { HintSearch(toks, hints).RunOnType(); }
 
 Text ContentsOfStringHint(const Token& string) {
   const Text text = string.view();

@@ -15,6 +15,9 @@ namespace quillet {
 // `Annotated[...]`, not concatenated.
 void FindStringHints(TokenSpan toks, std::vector<size_t>& hints);
 
+// The same for the tokens of one type, such as those of a hint's own text.
+void FindStringHintsOfType(TokenSpan toks, std::vector<size_t>& hints);
+
 // The text between the quotes of a hint; none for a literal whose text is not what the program
 // sees: bytes, a formatted string, or one with a backslash.
 Text ContentsOfStringHint(const Token& string);

@@ -3,6 +3,7 @@
 // Fields of formatted strings are code of the scope that the string stands in. Hints in strings and
 // comments are not: they say what a name means, and nothing of the scope. A hint is written by people and
 // may be prose; names are taken from it only where it can be an expression.
+#include <algorithm>
 #include <tuple>
 
 #include "lines/expression_tokens.h"
@@ -10,6 +11,7 @@
 #include "lines/token_search.h"
 #include "lines/type_comment.h"
 #include "names/reader.h"
+#include "tokens/token_ends.h"
 
 namespace quillet {
 
@@ -18,10 +20,12 @@ void NameReader::String(const Token& string) {
   operand_ = kNoIndex;
   if (!embeds_) return;
   if (IsFormattedString(string)) return Fields(string);
-  if (!in_row_ || next_hint_ >= hints_.size()) return;
-  const auto index = static_cast<size_t>(at_ - row_begin_);
-  while (next_hint_ < hints_.size() && hints_[next_hint_] < index) ++next_hint_;
-  if (next_hint_ < hints_.size() && hints_[next_hint_] == index) HintString(string);
+  if (hints_.empty()) return;
+  const auto index = static_cast<size_t>(at_ - hints_begin_);
+  while (!hints_.empty() && hints_.front() < index) hints_ = hints_.subspan(1);
+  if (hints_.empty() || hints_.front() != index) return;
+  HintString(string);
+  front_ = Front::kValue;
   operand_ = kNoIndex;
 }
 
@@ -30,7 +34,7 @@ void NameReader::Fields(const Token& string) {
   EmbeddedTokens& embedded = TokensOfDepth();
   AppendOwnFieldTokens(string, embedded.tokens, embedded.ranges);
   for (const TokenRange& range : embedded.ranges)
-    Embedded(TokenSpan(embedded.tokens).subspan(range.begin, range.end - range.begin));
+    Embedded(TokenSpan(embedded.tokens).subspan(range.begin, range.end - range.begin), {});
   front_ = Front::kValue;
   operand_ = kNoIndex;
 }
@@ -43,9 +47,20 @@ bool NameReader::IsTemplatePrefix(const Token& prefix) const {
   return prefix.length == 2 && ((is_letter(0, 't') && is_letter(1, 'r')) || (is_letter(0, 'r') && is_letter(1, 't')));
 }
 
+// The tokeniser knows no such prefix, and ends the string at the first quote: its fields may hold more of
+// the same, and what is in them is no name.
 void NameReader::Template(const Token& prefix) {
-  ++at_;
-  Fields({prefix.text, prefix.length + at_->length, tok::STRING});
+  const char* const row_end = end_[-1].end();
+  const char* string_end = (++at_)->end();
+  if (in_row_ && template_budget_ > 0) {
+    const bool is_raw = prefix.length == 2;
+    const char* stop;
+    const char* const found = NestedFormattedStringEnd(at_->text, row_end, is_raw, stop);
+    if (found == nullptr) template_budget_ -= std::min(template_budget_, static_cast<size_t>(stop - at_->text));
+    if (found != nullptr && found > string_end) string_end = found;
+  }
+  Fields({prefix.text, static_cast<uint32_t>(string_end - prefix.text), tok::STRING});
+  while (at_ + 1 < end_ && at_[1].text < string_end) ++at_;
 }
 
 void NameReader::HintString(const Token& string) {
@@ -78,18 +93,20 @@ void NameReader::Hint(Text hint, uint8_t flags) {
   EmbeddedTokens& embedded = TokensOfDepth();
   AppendExpressionTokens(hint.data(), hint.data() + hint.size(), embedded.tokens);
   if (embedded.tokens.empty() || !IsPlausible(embedded.tokens)) return;
+  embedded.hints.clear();
+  FindStringHintsOfType(embedded.tokens, embedded.hints);
   const uint32_t quiet = quiet_;
   const uint8_t outer_flags = flags_;
   quiet_ = scope_;
   flags_ = flags_ | flags;
-  Embedded(embedded.tokens);
+  Embedded(embedded.tokens, embedded.hints);
   quiet_ = quiet;
   flags_ = outer_flags;
 }
 
-void NameReader::Embedded(TokenSpan tokens) {
-  const auto saved =
-      std::tuple(at_, end_, base_, front_, operand_, next_comprehension_, knows_comprehensions_, in_row_, embeds_);
+void NameReader::Embedded(TokenSpan tokens, std::span<const size_t> hints) {
+  const auto saved = std::tuple(at_, end_, base_, front_, operand_, next_comprehension_, knows_comprehensions_, in_row_,
+                                embeds_, hints_, hints_begin_);
   const size_t comprehensions = comprehensions_.size();
   ++depth_;
   in_row_ = false;
@@ -98,12 +115,15 @@ void NameReader::Embedded(TokenSpan tokens) {
   at_ = tokens.data();
   end_ = at_ + tokens.size();
   knows_comprehensions_ = false;
+  hints_ = hints;
+  hints_begin_ = at_;
   BeginBase();
   ReadTokens(false);
   EndBase();
   comprehensions_.resize(comprehensions);
   --depth_;
-  std::tie(at_, end_, base_, front_, operand_, next_comprehension_, knows_comprehensions_, in_row_, embeds_) = saved;
+  std::tie(at_, end_, base_, front_, operand_, next_comprehension_, knows_comprehensions_, in_row_, embeds_, hints_,
+           hints_begin_) = saved;
 }
 
 // Whether operands and operators take turns and brackets match, as they do in no sentence of two words.

@@ -59,6 +59,7 @@ void NameReader::SetMarks() {
 
 void NameReader::Read(const SourceText& source, std::span<const LineRow> rows) {
   begin_ = source.begin();
+  template_budget_ = 8 * source.size() + 4096;
   last_end_ = 0;
   has_future_annotations_ = false;
   if (is_python2_) marks_[word::kPrint] = ImportsPrintFunction(source, rows) ? Mark::kName : Mark::kOperator;
@@ -73,7 +74,7 @@ void NameReader::Read(const SourceText& source, std::span<const LineRow> rows) {
     if (row.kind == LineKind::kBlankLine) continue;
     CloseScopes(row);
     row_ = &row;
-    row_begin_ = at_ = tokens.data() + row.first_token;
+    at_ = tokens.data() + row.first_token;
     end_ = at_ + row.token_count;
     embeds_ = !row.no_embedded;
     if (row.kind == LineKind::kComment) {
@@ -110,8 +111,7 @@ void NameReader::Row() {
   quiet_ = kNoIndex;
   flags_ = 0;
   open_.back().awaits_first = false;
-  hints_.clear();
-  next_hint_ = 0;
+  hints_ = {};
   const TokenSpan tokens(at_, end_);
   if (embeds_) {
     bool may_hold_hints = false;
@@ -120,7 +120,12 @@ void NameReader::Row() {
       may_hold_hints |= token.code == tok::COLON || token.code == tok::RARROW || token.code == word::kCast;
       has_plain_string |= token.code == tok::STRING && !IsFormattedString(token);
     }
-    if (may_hold_hints && has_plain_string) FindStringHints(tokens, hints_);
+    if (may_hold_hints && has_plain_string) {
+      row_hints_.clear();
+      FindStringHints(tokens, row_hints_);
+      hints_ = row_hints_;
+      hints_begin_ = at_;
+    }
   }
   LineKind kind = row_->kind;
   while (at_ < end_) {

@@ -125,6 +125,7 @@ class NameReader {
   struct EmbeddedTokens {
     std::vector<Token> tokens;
     std::vector<TokenRange> ranges;
+    std::vector<size_t> hints;  // indices of the strings that are hints themselves
   };
 
   static constexpr int kMaxDepth = 200;  // of strings in strings
@@ -198,7 +199,7 @@ class NameReader {
   void HintString(const Token& string);
   void Comment(const Token& comment);
   void Hint(Text hint, uint8_t flags);
-  void Embedded(TokenSpan tokens);
+  void Embedded(TokenSpan tokens, std::span<const size_t> hints);
   bool IsPlausible(TokenSpan tokens) const;
   void FindComprehensions(TokenSpan tokens);
 
@@ -261,6 +262,7 @@ class NameReader {
   std::array<Mark, 256> marks_{};
 
   const char* begin_ = nullptr;  // of the source
+  size_t template_budget_ = 0;   // for searches that may fail
   std::vector<OpenScope> open_;
   uint32_t last_end_ = 0;  // of the last statement
   bool has_future_annotations_ = false;
@@ -268,7 +270,6 @@ class NameReader {
   // Of the statement.
   const Token* at_ = nullptr;
   const Token* end_ = nullptr;
-  const Token* row_begin_ = nullptr;
   const LineRow* row_ = nullptr;
   bool embeds_ = false;  // strings and comments may hold expressions
   uint32_t statement_scope_ = 0;
@@ -289,9 +290,10 @@ class NameReader {
   size_t next_comprehension_ = 0;
   bool knows_comprehensions_ = false;  // they are looked for at the first bracket
 
-  // Indices in the row of the strings that are type hints.
-  std::vector<size_t> hints_;
-  size_t next_hint_ = 0;
+  // Indices of the strings that are type hints, in the tokens under way.
+  std::vector<size_t> row_hints_;
+  std::span<const size_t> hints_;
+  const Token* hints_begin_ = nullptr;
   bool in_row_ = true;
 
   std::deque<EmbeddedTokens> pool_;  // by depth

@@ -240,6 +240,8 @@ TEST(Names, FormattedStrings) {
             "f=definition/function x=definition/parameter@lambda x=read@lambda y=read@f^module");
   EXPECT_EQ(NamesOf("x = '{a}' + rb'{b}'\n"), "x=write/variable");
   EXPECT_EQ(NamesOf("t'{a}' + T\n", kPy314), "a=read T=read");
+  EXPECT_EQ(NamesOf("x = tR\"{a[\"b\"]} {c}\".d\n", kPy314), "x=write/variable a=read c=read d=read<");
+  EXPECT_EQ(NamesOf("f(t'{a', b)\n", kPy314), "f=call a=read b=read");
 }
 
 TEST(Names, AnnotationsInStrings) {
@@ -250,6 +252,8 @@ TEST(Names, AnnotationsInStrings) {
             "C=read+annotation+string");
   EXPECT_EQ(NamesOf("cast('A', b)\n"), "cast=call A=read+annotation+string b=read");
   EXPECT_EQ(NamesOf("x: Literal['a'] = 'b c'\n"), "x=write/variable Literal=read+annotation");
+  EXPECT_EQ(NamesOf("x: 'A[\"B\", Literal[\"c\"]]'\n"),
+            "x=definition/variable A=read+annotation+string B=read+annotation+string Literal=read+annotation+string");
   EXPECT_EQ(NamesOf("x: 'no type at all'\n"), "x=definition/variable");
 }
 
@@ -262,6 +266,8 @@ TEST(Names, AnnotationsInComments) {
   EXPECT_EQ(NamesOf("class K:\n  def f(self, a):  # type: (int) -> K\n    pass\n"),
             "K=definition/class f=definition/function@K self=definition/parameter@f a=definition/parameter@f "
             "int=read+annotation+comment@K^module K=read+annotation+comment@K^module");
+  EXPECT_EQ(NamesOf("x = y  # type: A['B']\n"),
+            "x=write/variable y=read A=read+annotation+comment B=read+annotation+comment+string");
   EXPECT_EQ(NamesOf("x = 1  # type: ignore[attr]\ny = 2  # type: the kind of thing\n"),
             "x=write/variable y=write/variable");
   EXPECT_EQ(NamesOf("f([x  # type: T\n for x in y])\n"),

@@ -92,6 +92,7 @@ inline std::string VerifyTokensHaveNames(const SourceText& source, std::span<con
                                          const Bindings& bindings) {
   size_t next = 0;
   for (const LineRow& row : rows) {
+    const char* template_begin = nullptr;  // the prefix of a template string, whose fields may hold any token
     for (uint32_t i = row.first_token; i < row.first_token + row.token_count; ++i) {
       const Token& token = source.tokens[i];
       const auto begin = static_cast<uint32_t>(token.text - source.begin());
@@ -100,7 +101,8 @@ inline std::string VerifyTokensHaveNames(const SourceText& source, std::span<con
         const bool is_prefix = version.AtLeast(3, 14) && i + 1 < row.first_token + row.token_count &&
                                source.tokens[i + 1].code == tok::STRING && source.tokens[i + 1].text == token.end();
         if (next >= bindings.occurrences.size() || bindings.occurrences[next].begin != begin) {
-          if (is_prefix) continue;
+          if (is_prefix && template_begin == nullptr) template_begin = token.text;
+          if (template_begin != nullptr) continue;
           return "no occurrence of the token " + std::string(token.view());
         }
         if (bindings.TextOf(bindings.occurrences[next]) != token.view()) return At("text of token", i);
@@ -110,7 +112,8 @@ inline std::string VerifyTokensHaveNames(const SourceText& source, std::span<con
       for (; next < bindings.occurrences.size(); ++next) {
         if (bindings.occurrences[next].begin >= begin + token.length) break;
         const bool holds_names = token.code == tok::STRING || token.code == tok::COMMENT || IsNameCode(token.code);
-        if (!holds_names || bindings.occurrences[next].begin < begin) return At("no name at occurrence", next);
+        if (template_begin == nullptr && (!holds_names || bindings.occurrences[next].begin < begin))
+          return At("no name at occurrence", next);
       }
     }
   }
