@@ -14,8 +14,6 @@ constexpr size_t kMostFacts = 240;
 // A dotted name holds at most so many bytes; what would have a longer one keeps that of the scope around it.
 constexpr size_t kMostDottedName = 400;
 
-bool IsLineEnd(char c) { return c == '\n' || c == '\r'; }
-
 bool Opens(NameKind kind) {
   return kind == NameKind::kClass || kind == NameKind::kFunction || kind == NameKind::kTypeAlias;
 }
@@ -47,7 +45,7 @@ ShownPart::ShownPart(const SourceText& source) : source_(source) {
 uint32_t ShownPart::EndOf(uint32_t line) const {
   uint32_t end =
       line + 1 < source_.line_starts.size() ? source_.line_starts[line + 1] : static_cast<uint32_t>(source_.size());
-  while (end > BeginOf(line) && IsLineEnd(source_.begin()[end - 1])) --end;
+  for (const char c : {'\n', '\r'}) end -= end > BeginOf(line) && source_.begin()[end - 1] == c;
   return end;
 }
 
@@ -55,7 +53,7 @@ uint32_t ShownPart::ShownEndOf(uint32_t line) const {
   uint32_t end = EndOf(line);
   if (end - BeginOf(line) <= kMostBytesOfLine) return end;
   end = BeginOf(line) + kMostBytesOfLine;
-  while (end > BeginOf(line) && !IsUtf8LeadByte(source_.begin()[end])) --end;
+  for (int i = 0; i < 3 && !IsUtf8LeadByte(source_.begin()[end]); ++i) --end;
   return end;
 }
 

@@ -86,10 +86,10 @@ class SitePageWriter : public FileWriter {
     source_ = file.source().text();
     names_.Collect(file, shown);
     facts_.Collect(file, scopes, placed, shown);
-    FindColours(file);
+    FindColours(file, shown);
     FindErrors(file, shown);
     out.append(kSitePageHeadSize, ' ');
-    AppendOutline(shown, out);
+    AppendOutline(out);
     AppendSource(shown, out);
     AppendHead(out.size() - kSitePageHeadSize, shown, out);
     AppendSnippets(shown, out);
@@ -105,8 +105,10 @@ class SitePageWriter : public FileWriter {
     out.replace(0, head.size(), head);
   }
 
-  void FindColours(const FileAnalyzer& file) {
+  void FindColours(const FileAnalyzer& file, const ShownPart& shown) {
     colours_.clear();
+    if (shown.shown_lines() == 0) return;
+    const uint32_t limit = shown.ShownEndOf(shown.shown_lines() - 1);
     for (const LineRow& row : file.rows()) {
       const TokenSpan toks = TokenSpan(file.source().tokens).subspan(row.first_token, row.token_count);
       bool is_front = true;
@@ -124,6 +126,7 @@ class SitePageWriter : public FileWriter {
         is_front = false;
         if (letter == 0) continue;
         const auto begin = static_cast<uint32_t>(token.text - source_.data());
+        if (begin >= limit) return;
         colours_.push_back({begin, begin + token.length, letter});
       }
     }
@@ -146,7 +149,7 @@ class SitePageWriter : public FileWriter {
 
   // ---- the outline ----
 
-  void AppendOutline(const ShownPart&, std::string& out) const {
+  void AppendOutline(std::string& out) const {
     bool is_open = false;
     for (const SiteDefinition& definition : names_.definitions()) {
       const SiteOccurrence& occurrence = names_.occurrences()[definition.occurrence];
