@@ -37,13 +37,15 @@ void InitAnalyzer(AnalyzerObject* self, Any version_triple, Any grammar_file, An
 // An analyzer is its parser and its walkers: an operation claims all three.
 class AnalyzerUse {
  public:
-  explicit AnalyzerUse(CPGenAnalyzerImpl& analyzer)
-      : parser_(analyzer.logical_parser().thread_use, kTheAnalyzer),
-        walker_(analyzer.node_walker().thread_use, kTheAnalyzer),
-        hint_walker_(analyzer.type_hint_walker().thread_use, kTheAnalyzer) {}
+  explicit AnalyzerUse(CPGenAnalyzerImpl& analyzer) : AnalyzerUse(analyzer, ThreadUse::ThisThread()) {}
 
  private:
   static constexpr const char* kTheAnalyzer = "the analyzer";
+
+  AnalyzerUse(CPGenAnalyzerImpl& analyzer, const void* self)
+      : parser_(analyzer.logical_parser().thread_use, kTheAnalyzer, self),
+        walker_(analyzer.node_walker().thread_use, kTheAnalyzer, self),
+        hint_walker_(analyzer.type_hint_walker().thread_use, kTheAnalyzer, self) {}
 
   OneThread parser_;
   OneThread walker_;

@@ -127,28 +127,6 @@ void LineObject::UpdateHooks() {
   line_->hooks = seen ? this : nullptr;
 }
 
-void LineObject::HoldsHostObject() {
-  if (self_ != nullptr && !PyObject_GC_IsTracked(self_)) PyObject_GC_Track(self_);
-}
-
-int LineObject::Traverse(visitproc visit, void* arg) const {
-  Py_VISIT(type_.ptr());
-  Py_VISIT(toks_.ptr());
-  Py_VISIT(positions_.ptr());
-  Py_VISIT(tok_types_.ptr());
-  Py_VISIT(equivs_.list.ptr());
-  Py_VISIT(arg_equivs_.list.ptr());
-  return 0;
-}
-
-void LineObject::Clear() {
-  const RecordList equivs = std::exchange(equivs_, {});
-  const RecordList arg_equivs = std::exchange(arg_equivs_, {});
-  const nb::object tok_types = std::move(tok_types_);
-  has_host_tok_types_ = false;
-  UpdateHooks();
-}
-
 void LineObject::SetRow(const Ref<SourceText>& source, const LineRow& row, std::shared_ptr<SharedStore> shared) {
   SetFromRow(*line_, source, row);
   shared_ = std::move(shared);
@@ -188,7 +166,6 @@ void LineObject::SetToks(nb::handle sequence) {
   line_->no_embedded = false;
   if (!token_count_is_set_) line_->token_count = static_cast<int32_t>(source->tokens.size());
   toks_ = std::move(tuple);
-  HoldsHostObject();
   if (!has_host_tok_types_) tok_types_.reset();
 }
 
@@ -210,7 +187,6 @@ nb::object LineObject::GetTokTypes() {
 void LineObject::SetTokTypes(nb::handle list) {
   if (!PyList_Check(list.ptr())) ThrowExpected("list", list);
   tok_types_ = nb::borrow(list);
-  HoldsHostObject();
   has_host_tok_types_ = true;
   UpdateHooks();
 }
@@ -234,7 +210,6 @@ void LineObject::SetPositions(nb::handle sequence) {
   nb::object tuple = TupleOf(sequence);
   LetGo(line_->SetPositions(PositionsOf(tuple)));
   positions_ = std::move(tuple);
-  HoldsHostObject();
 }
 
 void LineObject::SetTokenCount(int32_t count) {
@@ -243,6 +218,7 @@ void LineObject::SetTokenCount(int32_t count) {
 }
 
 void LineObject::Extend(RecordList& records, std::span<const Record> rows) {
+  if (records.made == rows.size()) return;
   const WithoutCollector all_at_once;
   for (; records.made < rows.size(); ++records.made) {
     nb::object pair = nb::steal(PairOf(rows[records.made]));
@@ -276,7 +252,6 @@ void LineObject::SetTypeEquivs(nb::handle list) {
   BuiltinClearDerivedInfo();
   if (!arg_list.is_none()) arg_equivs_ = {arg_list, 0};
   if (!list.is_none()) equivs_ = {nb::borrow(list), 0};
-  HoldsHostObject();
   UpdateHooks();
 }
 
@@ -286,7 +261,6 @@ void LineObject::SetArgTypeEquivs(nb::handle list) {
   BuiltinClearDerivedInfo();
   if (!other_list.is_none()) equivs_ = {other_list, 0};
   if (!list.is_none()) arg_equivs_ = {nb::borrow(list), 0};
-  HoldsHostObject();
   UpdateHooks();
 }
 
@@ -554,7 +528,6 @@ nb::object NewInstance(Args&&... args) {
   new (object) LineObject(std::forward<Args>(args)...);
   nb::inst_mark_ready(instance);
   object->Attach(instance.ptr());
-  PyObject_GC_UnTrack(instance.ptr());
   return instance;
 }
 
@@ -582,20 +555,6 @@ nb::object CutToTuple(const Ref<SourceText>& source, Version version) {
 }
 
 namespace {
-
-int TraverseLine(PyObject* self, visitproc visit, void* arg) {
-  Py_VISIT(Py_TYPE(self));
-  return nb::inst_ready(self) ? nb::inst_ptr<LineObject>(self)->Traverse(visit, arg) : 0;
-}
-
-int ClearLine(PyObject* self) {
-  if (nb::inst_ready(self)) nb::inst_ptr<LineObject>(self)->Clear();
-  return 0;
-}
-
-const PyType_Slot kLineSlots[] = {{Py_tp_traverse, reinterpret_cast<void*>(TraverseLine)},
-                                  {Py_tp_clear, reinterpret_cast<void*>(ClearLine)},
-                                  {0, nullptr}};
 
 void InitLine(nb::pointer_and_handle<LineObject> self, Any type, Any toks, Any positions, Any tok_types, Any parsed,
               Any first_line, Any token_count) {
@@ -657,7 +616,7 @@ void BindLogicalline(nb::module_& tarvex) {
 #include "lines/line_kinds.def"
   m.attr("kErrorTokenPrefix") = "error";
 
-  nb::class_<LineObject> cls(m, "CLogicalLine", nb::type_slots(kLineSlots),
+  nb::class_<LineObject> cls(m, "CLogicalLine",
                              "One logical line of Python: its tokens, and what analysis recorded on it.");
   g.line_type = (PyTypeObject*)cls.ptr();
   cls.def("__init__", &InitLine, nb::arg("type") = nb::str("unknown"), nb::arg("toks") = nb::tuple(),

@@ -123,8 +123,8 @@ class WithoutCollector {
 // one is in the middle of an operation on it; the same thread may come back to it.
 class OneThread {
  public:
-  OneThread(ThreadUse& use, const char* what) : use_(use) {
-    if (!use.Enter()) ThrowInUse(what);
+  OneThread(ThreadUse& use, const char* what, const void* self = ThreadUse::ThisThread()) : use_(use) {
+    if (!use.Enter(self)) ThrowInUse(what);
   }
   ~OneThread() { use_.Leave(); }
   OneThread(const OneThread&) = delete;

@@ -78,10 +78,6 @@ class LineObject final : public LineHooks {
   void BuiltinClearDerivedInfo();
   nb::object BuiltinGetExpLogicals();
 
-  // ---- the collector: a host's list may hold the line that it belongs to ----
-  int Traverse(visitproc visit, void* arg) const;
-  void Clear();
-
   // ---- LineHooks ----
   int GetTokType(LogicalLine& line, int64_t index) override;
   void AppendTypeEquiv(LogicalLine& line, Text name, Text equiv) override;
@@ -104,8 +100,6 @@ class LineObject final : public LineHooks {
   static void Extend(RecordList& records, std::span<const Record> rows);
   void MoveToOwnStore();
   void UpdateHooks();
-  // The host gave the line an object of its own, which may be part of a cycle.
-  void HoldsHostObject();
   bool IsAtEndOfStore() const;
 
   LogicalLine own_;

@@ -119,10 +119,10 @@ void NodeRegistry::DropSomeUnheld() {
     Tidy(nullptr);
 }
 
-void NodeRegistry::LeaveList(CNode* node) {
-  PyObject* list = PeekList(node);
-  if (list == nullptr) return;
-  if (Py_REFCNT(list) != 1) {
+void NodeRegistry::LeaveAnyList(CNode* node) {
+  auto found = lists_.find(node);
+  if (found == lists_.end()) return;
+  if (Py_REFCNT(found->second.list.ptr()) != 1) {
     ++orphans_;
   } else {
     TrySynchronise(node);

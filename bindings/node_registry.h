@@ -68,7 +68,9 @@ class NodeRegistry {
   // calls.
   void DropSomeUnheld();
   // The wrapper that the list belongs to goes.
-  void LeaveList(CNode* node);
+  void LeaveList(CNode* node) {
+    if (!lists_.empty()) LeaveAnyList(node);
+  }
 
   // ---- what pools keep (node_reach.cc) ----
   // Keeps a source that nodes of the pool refer to, or are about to.
@@ -99,6 +101,7 @@ class NodeRegistry {
   static constexpr size_t kFewSources = 64;
   static constexpr size_t kFewOrphans = 16;
 
+  void LeaveAnyList(CNode* node);
   static bool IsCurrent(const CNode* node, const HostList& kept);
   bool TrySynchronise(CNode* node);
   bool SynchroniseTree(CNode* root, size_t most);

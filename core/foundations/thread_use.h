@@ -10,9 +10,15 @@ namespace quillet {
 
 class ThreadUse {
  public:
-  // False, and nothing changed, while another thread is between its Enter and its Leave.
-  bool Enter() {
-    const void* const self = ThisThread();
+  // An address that no other thread that lives has.
+  static const void* ThisThread() {
+    static thread_local char place;
+    return &place;
+  }
+
+  // False, and nothing changed, while another thread than `self`, which is this one, is between its Enter and its
+  // Leave.
+  bool Enter(const void* self) {
     if (depth_ != 0 && user_ != self) [[unlikely]]
       return false;
     user_ = self;
@@ -22,12 +28,6 @@ class ThreadUse {
   void Leave() { --depth_; }
 
  private:
-  // An address that no other thread that lives has.
-  static const void* ThisThread() {
-    static thread_local char place;
-    return &place;
-  }
-
   const void* user_ = nullptr;
   uint32_t depth_ = 0;
 };

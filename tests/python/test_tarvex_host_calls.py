@@ -194,18 +194,6 @@ def test_a_list_in_a_cycle_reaches_its_node_before_it_goes() -> None:
     assert [child.fText for child in top.GetChild(2).fChildren] == ["y", "+", "z", "added"]
 
 
-def test_the_collector_sees_a_line_in_its_own_list() -> None:
-    class Line(CLogicalLine):
-        pass
-
-    before = count_of(Line)
-    for _ in range(100):
-        line = Line("unknown", ("x",), ((0, 0),))
-        line.fTypeEquivs = [line]
-    del line
-    assert count_of(Line) == before
-
-
 # ---- memory of nodes that nobody gives back ----
 
 STATM = Path("/proc/self/statm")
