@@ -182,7 +182,7 @@ nb::object ParseStatement(MatchcaseObject& self, Any toks, Any positions) {
   return Wrap(node, source);
 }
 
-int Traverse(PyObject* self, visitproc visit, void* arg) {
+int TraverseMatchcase(PyObject* self, visitproc visit, void* arg) {
   Py_VISIT(Py_TYPE(self));
   if (!nb::inst_ready(self)) return 0;
   MatchcaseObject* object = nb::inst_ptr<MatchcaseObject>(self);
@@ -193,7 +193,7 @@ int Traverse(PyObject* self, visitproc visit, void* arg) {
 }
 
 // The parser at the other end of a cycle lets go; of the tokens that the host set this has to.
-int Clear(PyObject* self) {
+int ClearMatchcase(PyObject* self) {
   if (!nb::inst_ready(self)) return 0;
   MatchcaseObject* object = nb::inst_ptr<MatchcaseObject>(self);
   const nb::object toks = std::move(object->toks);
@@ -201,8 +201,9 @@ int Clear(PyObject* self) {
   return 0;
 }
 
-const PyType_Slot kSlots[] = {
-    {Py_tp_traverse, reinterpret_cast<void*>(Traverse)}, {Py_tp_clear, reinterpret_cast<void*>(Clear)}, {0, nullptr}};
+const PyType_Slot kMatchcaseSlots[] = {{Py_tp_traverse, reinterpret_cast<void*>(TraverseMatchcase)},
+                                       {Py_tp_clear, reinterpret_cast<void*>(ClearMatchcase)},
+                                       {0, nullptr}};
 
 }  // namespace
 
@@ -214,7 +215,7 @@ nb::object NewMatchcaseObject(std::shared_ptr<CMatchCaseStatementParser> parser,
 }
 
 void BindMatchcase(nb::module_& tarvex) {
-  Class cls(tarvex, "CMatchCaseStatementParser", nb::type_slots(kSlots),
+  Class cls(tarvex, "CMatchCaseStatementParser", nb::type_slots(kMatchcaseSlots),
             "Parses the heads of match and case statements.");
   cls.def(
       "__init__",

@@ -25,24 +25,23 @@ nb::object Checked(PyObject* made) {
 
 // ---- grammars ----
 
-nb::dict DictOf(nb::handle object) {
+// The pairs of a dict as they are now: a number among them may be an object of the host's whose conversion changes it.
+nb::list ItemsOf(nb::handle object) {
   if (!PyDict_Check(object.ptr())) ThrowExpected("dict", object);
-  return nb::borrow<nb::dict>(object);
+  return nb::borrow<nb::list>(Checked(PyDict_Items(object.ptr())));
 }
 
 TokenNames TokenNamesOf(nb::handle tok_number2name, nb::handle op_text2number) {
   TokenNames names = TokenNames::Default();
   if (!tok_number2name.is_none()) {
     names.name2number.clear();
-    for (auto [number, name] : DictOf(tok_number2name)) {
-      names.name2number[std::string(HostText::FromStr(name).text())] = Int32Of(number);
-    }
+    for (nb::handle item : ItemsOf(tok_number2name))
+      names.name2number[std::string(HostText::FromStr(item[1]).text())] = Int32Of(item[0]);
   }
   if (!op_text2number.is_none()) {
     names.op2number.clear();
-    for (auto [text, number] : DictOf(op_text2number)) {
-      names.op2number[std::string(HostText::FromStr(text).text())] = Int32Of(number);
-    }
+    for (nb::handle item : ItemsOf(op_text2number))
+      names.op2number[std::string(HostText::FromStr(item[0]).text())] = Int32Of(item[1]);
   }
   return names;
 }
@@ -211,19 +210,19 @@ class HostParser {
   Engine<HostBuilder> engine_;
 };
 
-int TraverseParser(PyObject* self, visitproc visit, void* arg) {
+int TraverseEngine(PyObject* self, visitproc visit, void* arg) {
   Py_VISIT(Py_TYPE(self));
   return nb::inst_ready(self) ? nb::inst_ptr<HostParser>(self)->Traverse(visit, arg) : 0;
 }
 
-int ClearParser(PyObject* self) {
+int ClearEngine(PyObject* self) {
   if (nb::inst_ready(self)) nb::inst_ptr<HostParser>(self)->ForgetConverter();
   return 0;
 }
 
-PyType_Slot parser_slots[] = {
-    {Py_tp_traverse, reinterpret_cast<void*>(TraverseParser)},
-    {Py_tp_clear, reinterpret_cast<void*>(ClearParser)},
+const PyType_Slot kEngineSlots[] = {
+    {Py_tp_traverse, reinterpret_cast<void*>(TraverseEngine)},
+    {Py_tp_clear, reinterpret_cast<void*>(ClearEngine)},
     {0, nullptr},
 };
 
@@ -270,7 +269,7 @@ void BindOptpgen(nb::module_& tarvex) {
           nb::arg("type"), nb::arg("value").none(), nb::arg("context").none(), nb::arg("children").none(),
           "The node of a token (children None) or of a rule (value None); a subclass says what that is.");
 
-  nb::class_<HostParser>(m, "Parser", nb::type_slots(parser_slots), "Parses one input after the other.")
+  nb::class_<HostParser>(m, "Parser", nb::type_slots(kEngineSlots), "Parses one input after the other.")
       .def("setup", &HostParser::Setup, nb::arg("start"), "Starts a new input at the rule with this number.")
       .def("addtoken", &HostParser::AddToken, nb::arg("type"), nb::arg("value").none(), nb::arg("context"),
            "Feeds one token; ParseError where it is not acceptable.")

@@ -66,6 +66,13 @@ void RecordPair(WalkerObject& self, Any name, Any info) {
   (self.walker.get()->*Operation)(name_text, info_text);
 }
 
+template <void (CNodeWalker::*Process)(const ArgList&)>
+void ProcessArgs(WalkerObject& self, Any arg_list) {
+  const ArgList args = ArgListOf(arg_list);
+  const OperationByName operation(self);
+  (self.walker.get()->*Process)(args);
+}
+
 void BindFrame(nb::class_<WalkerObject>& cls) {
   DefOperation(
       cls, "Walk",
@@ -152,22 +159,9 @@ void BindDefinitions(nb::class_<WalkerObject>& cls) {
   DefVisit<&CNodeWalker::VisitSingleDecorator>(cls, "_VisitSingleDecorator");
   DefVisit<&CNodeWalker::VisitGlobalStmt>(cls, "_VisitGlobalStmt");
   DefVisit<&CNodeWalker::VisitNonlocalStmt>(cls, "_VisitNonlocalStmt");
-  DefOperation(
-      cls, "_ProcessDefiningArgList",
-      [](WalkerObject& self, Any arg_list) {
-        const ArgList args = ArgListOf(arg_list);
-        const OperationByName operation(self);
-        self.walker->ProcessDefiningArgList(args);
-      },
-      nb::arg("arg_list"));
-  DefOperation(
-      cls, "_ProcessLambdaDefiningArgList",
-      [](WalkerObject& self, Any arg_list) {
-        const ArgList args = ArgListOf(arg_list);
-        const OperationByName operation(self);
-        self.walker->ProcessLambdaDefiningArgList(args);
-      },
-      nb::arg("arg_list"));
+  DefOperation(cls, "_ProcessDefiningArgList", &ProcessArgs<&CNodeWalker::ProcessDefiningArgList>, nb::arg("arg_list"));
+  DefOperation(cls, "_ProcessLambdaDefiningArgList", &ProcessArgs<&CNodeWalker::ProcessLambdaDefiningArgList>,
+               nb::arg("arg_list"));
 }
 
 void BindStatements(nb::class_<WalkerObject>& cls) {
@@ -279,14 +273,14 @@ void BindEquivalents(nb::class_<WalkerObject>& cls) {
   DefOperation(cls, "_AddArgNameDefined", &RecordName<&CNodeWalker::AddArgNameDefined>, nb::arg("name"));
 }
 
-int Traverse(PyObject* self, visitproc visit, void* arg) {
+int TraverseWalker(PyObject* self, visitproc visit, void* arg) {
   Py_VISIT(Py_TYPE(self));
   if (!nb::inst_ready(self)) return 0;
   Py_VISIT(nb::inst_ptr<WalkerObject>(self)->handed_in.line.ptr());
   return 0;
 }
 
-int Clear(PyObject* self) {
+int ClearWalker(PyObject* self) {
   if (!nb::inst_ready(self)) return 0;
   auto& object = *nb::inst_ptr<WalkerObject>(self);
   if (object.handed_in.line.is_valid()) object.walker->SetLogical(nullptr);
@@ -294,8 +288,9 @@ int Clear(PyObject* self) {
   return 0;
 }
 
-const PyType_Slot kSlots[] = {
-    {Py_tp_traverse, reinterpret_cast<void*>(Traverse)}, {Py_tp_clear, reinterpret_cast<void*>(Clear)}, {0, nullptr}};
+const PyType_Slot kWalkerSlots[] = {{Py_tp_traverse, reinterpret_cast<void*>(TraverseWalker)},
+                                    {Py_tp_clear, reinterpret_cast<void*>(ClearWalker)},
+                                    {0, nullptr}};
 
 template <class Value, Value CNodeWalker::*Field>
 void DefFlag(nb::class_<WalkerObject>& cls, const char* name) {
@@ -382,7 +377,7 @@ nb::object HostLineOf(LogicalLine* line, const HandedInLine& handed_in) {
 }
 
 void BindWalker(nb::module_& tarvex) {
-  nb::class_<WalkerObject> cls(tarvex, "CNodeWalker", nb::type_slots(kSlots),
+  nb::class_<WalkerObject> cls(tarvex, "CNodeWalker", nb::type_slots(kWalkerSlots),
                                "Turns a statement's tree into records on its logical line.");
   cls.def(
       "__init__",

@@ -43,12 +43,16 @@ NB_MODULE(tarvex_in_owner, tarvex) {
   BindSymbolinfo(tarvex);
   BindLogicalline(tarvex);
   BindOptpgen(tarvex);
-  BindTree(tarvex);
+  BindNodes(tarvex);
+  BindArgs(tarvex);
+  BindFactory(tarvex);
   BindAccessors(tarvex);
+  BindNodeFunctions(tarvex);
   BindText(tarvex);
   BindMatchcase(tarvex);
   BindParser(tarvex);
   BindWalker(tarvex);
+  BindDispatch(tarvex);
   BindHints(tarvex);
   BindAnalysis(tarvex);
   BindHost(tarvex);

@@ -98,6 +98,8 @@ nb::object Wrap(CNode* node, const Ref<SourceText>& source);
 nb::object WrapNeighbour(CNode* node);
 nb::object WrapList(std::span<CNode* const> nodes, const Ref<SourceText>& source);
 nb::object WrapClassInfo(CNodeClassInfo* info);
+// The record of a CNodeClassInfo, null for None; TypeError for anything else.
+CNodeClassInfo* InfoOrNull(nb::handle object);
 nb::object WrapArg(const CArgInfo& arg, const Ref<SourceText>& source);
 nb::object WrapUsedArgs(const UsedArgList& args, const Ref<SourceText>& source);
 // Nested lists stay nested; RecursionError past the host's limit.

@@ -6,20 +6,24 @@
 
 namespace quillet::host {
 
-// The bytes of a str, bytes or bytearray, borrowed from it; any other type is a TypeError "Expected
-// str, got ...". Nothing that runs the host's code may come between this and the last use of a
-// bytearray's bytes.
+// The bytes of a str, bytes or bytearray, borrowed from it; any other type is a TypeError "Expected str, got ...". A
+// bytearray keeps its size meanwhile, as under a memoryview: what is converted next may be the host's code.
 class Utf8Arg {
  public:
   explicit Utf8Arg(nb::handle object) {
     if (PyByteArray_Check(object.ptr())) {
-      // An empty one still has a buffer: the host's static empty string.
-      bytes_ = {PyByteArray_AS_STRING(object.ptr()), static_cast<size_t>(PyByteArray_GET_SIZE(object.ptr()))};
+      if (PyObject_GetBuffer(object.ptr(), &buffer_, PyBUF_SIMPLE) != 0) throw nb::python_error();
+      bytes_ = {static_cast<const char*>(buffer_.buf), static_cast<size_t>(buffer_.len)};
     } else {
       keep_ = HostText::FromStrOrBytes(object);
       bytes_ = keep_.text();
     }
   }
+  ~Utf8Arg() {
+    if (buffer_.obj != nullptr) PyBuffer_Release(&buffer_);
+  }
+  Utf8Arg(const Utf8Arg&) = delete;
+  Utf8Arg& operator=(const Utf8Arg&) = delete;
 
   Text bytes() const { return bytes_; }
   const char* ptr() const { return bytes_.data(); }
@@ -28,6 +32,7 @@ class Utf8Arg {
   int64_t End(nb::handle end_pos) const { return std::min(Int64Of(end_pos), size()); }
 
  private:
+  Py_buffer buffer_{};  // of a bytearray
   Text bytes_;
   HostText keep_;
 };

@@ -5,12 +5,11 @@
 #include <cstring>
 
 #include "foundations/errors.h"
+#include "tokens/token_ends.h"
 
 namespace quillet {
 
 namespace {
-
-bool IsQuote(char byte) { return byte == '"' || byte == '\''; }
 
 // What a byte adds to the depth.
 int NestingOf(char byte) {
