@@ -134,6 +134,10 @@ class NameReader {
 
   // ---- rows ----
   void SetMarks();
+  void ReadRow(const LineRow& row);
+  void ReadPieces(const LineRow& row, uint32_t lost);
+  uint32_t LostDefinition(const LineRow& row) const;
+  const char* BlanksOfLine(const Token& token) const;
   void Row();
   void CommentRow();
   void CloseScopes(const LineRow& row);
@@ -262,7 +266,8 @@ class NameReader {
   std::array<Mark, 256> marks_{};
 
   const char* begin_ = nullptr;  // of the source
-  size_t template_budget_ = 0;   // for searches that may fail
+  TokenSpan tokens_;
+  size_t template_budget_ = 0;  // for searches that may fail
   std::vector<OpenScope> open_;
   uint32_t last_end_ = 0;  // of the last statement
   bool has_future_annotations_ = false;

@@ -448,6 +448,14 @@ TEST(BrokenNames, TheBestRoleThatTokensAllow) {
 TEST(BrokenNames, WhatIsAroundStaysAsItIs) {
   EXPECT_EQ(NamesOf("def f(x:\n  y\ndef g(): x\n"),
             "f=definition/function x=definition/parameter@f y=read+annotation g=definition/function x=read@g^module");
+  // A bracket that is left open swallows lines; a definition at the beginning of one tells so.
+  EXPECT_EQ(NamesOf("class B(\n  def kept(self): pass\n  x = (1,\n   y)\nz\n"),
+            "B=definition/class kept=definition/function@B self=definition/parameter@kept x=write/variable@B "
+            "y=read@B^module z=read");
+  EXPECT_EQ(NamesOf("class B(A:\n  async def kept(self,\n  def other(self): self\nclass C: pass\n"),
+            "B=definition/class A=read+base kept=definition/function@B self=definition/parameter@kept "
+            "other=definition/function@B self=definition/parameter@other self=read@other C=definition/class");
+  EXPECT_EQ(NamesOf("f(x, [y\n  class A:\n    z\n"), "f=call x=read y=read A=definition/class z=read@A^module");
   EXPECT_EQ(NamesOf("def f(x):\n  y = (x\n  return y\n"),
             "f=definition/function x=definition/parameter@f y=write/variable@f x=read@f y=read@f");
 }
