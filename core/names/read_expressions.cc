@@ -221,6 +221,7 @@ bool NameReader::SpecialName(const Token& token, uint32_t text, TokenCode next) 
     case Frame::Names::kTypeParameters: {
       constexpr uint16_t kUse = NameSymbol::kTypeParameter | NameSymbol::kBound;
       head_.parameter = text;
+      symbols_.TypeParameterOf(frame.inner, text);
       operand_ = AddBound(token, text, NameRole::kDefinition, NameKind::kTypeParameter, kUse, frame.inner);
       break;
     }

@@ -27,8 +27,13 @@ uint32_t SymbolTable::Open(const NewScope& scope) {
   if (scope.parent != kNoIndex) {
     if (scope.kind == NameScopeKind::kComprehension) note.walrus_scope = notes_[scope.parent].walrus_scope;
     note.private_class = notes_[scope.parent].private_class;
+    note.mangled_parameters = notes_[scope.parent].mangled_parameters;
   }
-  if (scope.is_private) note.private_class = scope.name;
+  if (scope.is_private) {
+    note.private_class = scope.name;
+    const bool is_body = scope.kind == NameScopeKind::kClass;
+    note.mangled_parameters = is_body || !version_.AtLeast(3, 13) ? kNoIndex : index;
+  }
   notes_.push_back(note);
   return index;
 }
@@ -87,15 +92,31 @@ uint32_t SymbolTable::SpecialSymbolOf(uint32_t scope, uint32_t text) {
   return symbol;
 }
 
-uint32_t SymbolTable::NameInScope(uint32_t scope, uint32_t text) {
-  if ((texts_[text].form & TextTable::kNotAscii) != 0 && normalizer_ != nullptr) {
-    // A normal form is one of its own, so a text is brought into it once a scope at most.
-    buffer_.clear();
-    if (normalizer_(texts_.TextOf(text), buffer_) && !buffer_.empty()) text = texts_.NumberOfCopy(buffer_);
-  }
+uint32_t SymbolTable::TypeParameterOf(uint32_t scope, uint32_t text) {
+  uint32_t name = NormalForm(text);
   const uint32_t class_name = notes_[scope].private_class;
-  if ((texts_[text].form & TextTable::kPrivate) != 0 && class_name != kNoIndex) return Mangle(class_name, text);
-  return text;
+  if ((texts_[name].form & TextTable::kPrivate) != 0 && class_name != kNoIndex) name = Mangle(class_name, name);
+  const uint32_t symbol = SymbolNamed(scope, name);
+  texts_[text].last_scope = scope;
+  texts_[text].last_symbol = symbol;
+  return symbol;
+}
+
+uint32_t SymbolTable::NormalForm(uint32_t text) {
+  if ((texts_[text].form & TextTable::kNotAscii) == 0 || normalizer_ == nullptr) return text;
+  buffer_.clear();
+  return normalizer_(texts_.TextOf(text), buffer_) && !buffer_.empty() ? texts_.NumberOfCopy(buffer_) : text;
+}
+
+uint32_t SymbolTable::NameInScope(uint32_t scope, uint32_t text) {
+  text = NormalForm(text);
+  const Note& note = notes_[scope];
+  if ((texts_[text].form & TextTable::kPrivate) == 0 || note.private_class == kNoIndex) return text;
+  const uint32_t mangled = Mangle(note.private_class, text);
+  if (note.mangled_parameters == kNoIndex) return mangled;
+  const uint32_t found = Find(note.mangled_parameters, mangled);
+  const bool is_parameter = found != kNoIndex && (out_.symbols[found].uses & NameSymbol::kTypeParameter) != 0;
+  return is_parameter ? mangled : text;
 }
 
 // `__x` in the class `_Shop` is `_Shop__x`, and what it is in a class whose name is all underscores.

@@ -68,6 +68,8 @@ class SymbolTable {
     entry.last_symbol = found;
     return found;
   }
+  // The same for a type parameter that the scope declares.
+  uint32_t TypeParameterOf(uint32_t scope, uint32_t text);
   // The same for what the scope calls it.
   uint32_t SymbolNamed(uint32_t scope, uint32_t name);
   // kNoIndex where there is none.
@@ -84,12 +86,15 @@ class SymbolTable {
     uint32_t walrus_scope = 0;
     uint32_t annotation_scope = kNoIndex;
     uint32_t private_class = kNoIndex;  // the name of the class whose private names are mangled
+    // From 3.13 on: the scope of type parameters, in front of the class's body, which alone are mangled.
+    uint32_t mangled_parameters = kNoIndex;
     uint32_t first_child = kNoIndex;
     uint32_t next_sibling = kNoIndex;
   };
   static constexpr size_t kSmallestMangleBudget = size_t{1} << 20;
 
   uint32_t SpecialSymbolOf(uint32_t scope, uint32_t text);
+  uint32_t NormalForm(uint32_t text);
   uint32_t NameInScope(uint32_t scope, uint32_t text);
   uint32_t Mangle(uint32_t class_name, uint32_t text);
   size_t SlotOf(uint32_t scope, uint32_t name) const {

@@ -287,6 +287,17 @@ TEST(Names, PrivateNamesAreSpelledAsTheyStand) {
   EXPECT_EQ(SymbolsOf(binder.Bind("class __:\n  __x = 1\n"), 1), "__x:la");
 }
 
+TEST(Names, PrivateNamesInFrontOfTheBodyOfAClass) {
+  constexpr Text kSource = "class C[T: __p, __U](B[__U], __q): __r\n";
+  NameBinder older(kPy312);
+  EXPECT_EQ(SymbolsOf(older.Bind(kSource), 1), "T:las _C__U:lar B:gr _C__q:gr");
+  EXPECT_EQ(SymbolsOf(older.Bind(kSource), 2), "_C__p:gr");
+  NameBinder newer(Version::Of(3, 13));
+  EXPECT_EQ(SymbolsOf(newer.Bind(kSource), 1), "T:las _C__U:lar B:gr __q:gr");
+  EXPECT_EQ(SymbolsOf(newer.Bind(kSource), 2), "__p:gr");
+  EXPECT_EQ(SymbolsOf(newer.Bind(kSource), 3), "_C__r:gr");
+}
+
 TEST(Names, NamesOfOneNormalFormAreOneSymbol) {
   SetNameNormalizer([](Text name, std::string& normal) {
     normal = name == "\xC2\xB5" ? "\xCE\xBC" : name;  // the micro sign is the Greek letter
