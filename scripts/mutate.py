@@ -44,9 +44,15 @@ ROOT = Path(__file__).resolve().parent.parent
 COPIED = ("core", "tests", "bench", "cmake", "resources", "fuzz", "bindings", "python", "examples")
 FOLDERS = re.findall(r"quillet_library\((\w+)", (ROOT / "core" / "CMakeLists.txt").read_text())
 WANTED = 0.95
+NICENESS = int(os.environ.get("MUTATE_NICENESS", "10"))
 
-# A trial's tests: those of the folder, then those of the folders behind it, which use it, then the rest.
-TESTS = re.findall(r"quillet_core_test\((\w+)/(\w+)", (ROOT / "tests" / "core" / "CMakeLists.txt").read_text())
+# Folder, name, and the last folder that the test is linked with, which reaches all those before it.
+TESTS = [
+    (folder, name, max(library.split(), key=FOLDERS.index))
+    for folder, name, library in re.findall(
+        r"quillet_core_test\((\w+)/(\w+) ([\w ]+)\)", (ROOT / "tests" / "core" / "CMakeLists.txt").read_text()
+    )
+]
 
 
 @dataclass(frozen=True)
@@ -231,11 +237,12 @@ def sample_of(changes: dict[str, list[Change]], count: int, seed: int) -> list[C
 class Workshop:
     """A copy of the tree, its builds, and what they say without a change."""
 
-    def __init__(self, folder: Path, *, jobs: int, python: bool) -> None:
+    def __init__(self, folder: Path, *, folders: list[str], jobs: int, python: bool) -> None:
         self.folder = folder
         self.tree = folder / "tree"
         self.build = folder / "core"
         self.extension = folder / "extension"
+        self.tests = [test for test in TESTS if test[0] in folders]
         self.jobs = jobs
         self.python = python
         self.times: dict[str, float] = {}
@@ -264,9 +271,8 @@ class Workshop:
         ]
         require([*base, "-B", self.build, "-DQUILLET_TESTS=ON", "-DQUILLET_EXTENSION=OFF"])
         say("building the tree as it is")
-        require(self.ninja(self.build, []))
-        require(self.ninja(self.build, ["quillet_digest"]))
-        for name in [test for _, test in TESTS]:
+        require(self.ninja(self.build, [f"{name}_test" for _, name, _ in self.tests] + ["quillet_digest"]))
+        for _, name, _ in self.tests:
             say(f"running {name}_test as it is")
             begin = time.monotonic()
             if self.run_test(name, timeout=1800) != "":
@@ -342,10 +348,10 @@ class Workshop:
     def judge(self, change: Change) -> tuple[str, str]:
         folder = change.file.split("/")[1]
         place = FOLDERS.index(folder)
-        own = [name for test_folder, name in TESTS if test_folder == folder]
-        later = [name for test_folder, name in TESTS if test_folder != folder and FOLDERS.index(test_folder) > place]
+        own = [name for test_folder, name, _ in self.tests if test_folder == folder]
+        others = [name for _, name, last in self.tests if name not in own and FOLDERS.index(last) >= place]
         # The quicker ones first.
-        stages = [own, sorted(later, key=lambda name: self.times[name])]
+        stages = [own, sorted(others, key=lambda name: self.times[name])]
         for stage in stages:
             for name in stage:
                 if not self.builds([f"{name}_test"]):
@@ -382,7 +388,7 @@ def difference(before: str, after: str) -> str:
 def run(command: Sequence[str | Path], timeout: float, **options: object) -> subprocess.CompletedProcess[str]:
     """Runs a command behind everybody else, and keeps what it prints."""
     return subprocess.run(  # type: ignore[call-overload, no-any-return]
-        ["nice", "-n", "10", *map(str, command)],
+        ["nice", "-n", str(NICENESS), *map(str, command)],
         stdout=subprocess.PIPE,
         stderr=subprocess.STDOUT,
         text=True,
@@ -441,7 +447,9 @@ def main() -> int:
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("--sample", type=int, default=150)
     parser.add_argument("--seed", type=int, default=1)
-    parser.add_argument("--folder", action="append", choices=FOLDERS, help="only of this one (may be repeated)")
+    parser.add_argument(
+        "--folder", action="append", choices=FOLDERS, help="only of this one, by its own tests (may be repeated)"
+    )
     parser.add_argument("--work", type=Path, default=ROOT / "build" / "mutate")
     parser.add_argument("--jobs", type=int, default=2)
     parser.add_argument("--python", action="store_true", help="ask the package's tests about survivors")
@@ -475,7 +483,7 @@ def main() -> int:
     if options.show:
         todo = []
     if todo:
-        workshop = Workshop(options.work, jobs=options.jobs, python=options.python)
+        workshop = Workshop(options.work, folders=options.folder or FOLDERS, jobs=options.jobs, python=options.python)
         workshop.prepare()
         begin = time.monotonic()
         for i, change in enumerate(todo):
