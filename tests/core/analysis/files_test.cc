@@ -33,6 +33,27 @@ std::string Repeat(Text text, size_t count) {
   return repeated;
 }
 
+// ---- the head of a file ----
+
+TEST(PrintFunction, IsSwitchedOnForTheFileThatAsksForIt) {
+  FileAnalyzer::Options options = Options(kPy2);
+  options.print_function_grammar_file = options.grammar_file + "-print-function";
+  FileAnalyzer file(options);
+  const auto error_count = [&file](Text source) {
+    file.Analyze(source);
+    return file.errors().size();
+  };
+  const std::string future = "from __future__ import print_function\n";
+  EXPECT_EQ(error_count("print a, b\n"), 0u);
+  EXPECT_EQ(error_count("print(a, file=b)\n"), 1u);
+  EXPECT_EQ(error_count(future + "print a, b\n"), 1u);
+  EXPECT_EQ(error_count(future + "print(a, file=b)\n"), 0u);
+  EXPECT_EQ(error_count("print a, b\n"), 0u) << "behind a file that asks for it";
+  FileAnalyzer without_a_switch(Options(kPy2));
+  without_a_switch.Analyze(future + "print a, b\n");
+  EXPECT_EQ(without_a_switch.errors().size(), 0u);
+}
+
 // ---- memory ----
 
 // What an analysis within a mebibyte says of a source; empty where it is fine.

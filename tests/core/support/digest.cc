@@ -133,7 +133,7 @@ class Analysis {
   static FileAnalyzer::Options OptionsOf(Version version) {
     FileAnalyzer::Options options;
     static_cast<CPGenAnalyzerImpl::Options&>(options) = testing::AnalyzerOptions(version);
-    if (!version.AtLeast(3, 0)) options.print_function_grammar_file = options.grammar_file;
+    if (!version.AtLeast(3, 0)) options.print_function_grammar_file = options.grammar_file + "-print-function";
     return options;
   }
 
