@@ -7,6 +7,8 @@
 #include <chrono>
 #include <cstdio>
 #include <fstream>
+#include <iterator>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -131,6 +133,36 @@ TEST(ParserConstruction, StatesAreNamedAfterTokensAndSymbols) {
   EXPECT_EQ(factory.class_info(tok::RARROW)->fName, "RARROW");
   EXPECT_EQ(factory.class_info(tok::COMMENT)->fName, "COMMENT");
   EXPECT_TRUE(IsNone(factory.class_info(100)->fName));
+}
+
+// A host's grammar may have keywords that the tokeniser has never heard of.
+TEST(ParserConstruction, AGrammarMayHaveKeywordsOfItsOwn) {
+  CPGenParserImpl::Options options = testing::ParserOptions(kPy3);
+  std::ifstream in(options.grammar_file);
+  std::string text{std::istreambuf_iterator<char>(in), {}};
+  const std::string rule = "pass_stmt: 'pass'";
+  ASSERT_NE(text.find(rule), std::string::npos);
+  text.replace(text.find(rule), rule.size(), "pass_stmt: 'pass' | 'skip' NAME");
+  options.grammar_file = ::testing::TempDir() + "quillet_grammar_with_skip";
+  std::ofstream(options.grammar_file) << text;
+  CPGenParserImpl parser(options);
+  std::remove(options.grammar_file.c_str());
+  const auto tree_of = [&parser](Text source) {
+    const testing::CutSource cut(source);
+    const std::unique_ptr<LogicalLine> line = cut.Line(0);
+    try {
+      CNode* node = parser.ParseToNode(*line, false);
+      const std::string shown = testing::ShowTree(node);
+      parser.DiscardNode(node);
+      return shown;
+    } catch (const ParseError& error) {
+      return "error at " + std::to_string(error.context.value);
+    }
+  };
+  EXPECT_EQ(tree_of("skip work"), "pass_stmt(skip work)");
+  EXPECT_EQ(tree_of("skip = work"), "error at 1");
+  EXPECT_EQ(tree_of("work = play"), "expr_stmt(work = play)");
+  EXPECT_EQ(tree_of("pass"), "pass");
 }
 
 TEST(ParserConstruction, AGrammarFileThatIsMissingIsNamed) {
