@@ -7,7 +7,6 @@
 from __future__ import annotations
 
 import base64
-import fcntl
 import json
 import os
 import shutil
@@ -37,6 +36,7 @@ class Browser:
 
     def __init__(self, profile: Path) -> None:
         executable = chromium()
+        fcntl = pytest.importorskip("fcntl")
         to_browser, self._out = os.pipe()
         self._in, from_browser = os.pipe()
         arguments = [

@@ -10,6 +10,7 @@ from collections.abc import Iterator
 from html import unescape
 from html.parser import HTMLParser
 from pathlib import Path
+from random import Random
 
 import pytest
 
@@ -555,6 +556,43 @@ def test_the_site_is_the_same_at_any_number_of_threads_and_with_any_spill(
         contents.append(content_of(tmp_path / "site"))
     assert contents[0] == contents[1] == contents[2]
     assert len(list((tmp_path / "site" / "data").glob("[0-9]*.js"))) > 1
+
+
+def test_pages_of_broken_sources_are_whole(tmp_path: Path) -> None:
+    """Whatever a source is, its page has all of its text, balanced elements, and links that lead somewhere."""
+    odd = ("(", ")", '"""', "f'{x", "'", "\\\n", "\n", "\r\n", "\t", "é", "<b>", "&", "def f", "#", "\x00", ";")
+    pieces = [*SHOP.split(" "), *odd]
+    random = Random(3)
+    sources = []
+    for number in range(200):
+        text = " ".join(SHOP.split(" ")[: random.randrange(60)])
+        text += "".join(random.choice(pieces) + random.choice(" \n") for _ in range(random.randrange(40)))
+        (tmp_path / f"{number}.py").write_bytes(text.encode())
+        sources.append(Source(str(tmp_path / f"{number}.py"), f"{number}.py"))
+    assert write_site(sources, str(tmp_path / "site"), Settings(), reports_that_stop(1000)) == 0
+    lines_seen = links_seen = 0
+    for number in range(200):
+        path = tmp_path / "site" / "files" / f"{number}.html"
+        page = path.read_text()
+        shown = [
+            unescape(re.sub(r"<[^>]*>", "", line))
+            for line in re.findall(r'<p id="L\d+"[^>]*><a[^>]*>\d+</a>(.*?)</p>', page)
+        ]
+        text = (tmp_path / f"{number}.py").read_bytes().decode().replace("\x00", "\u2400")
+        lines = re.split("\r\n|\n|\r", text)
+        assert shown == (lines if lines[-1] else lines[:-1])
+        lines_seen += len(shown)
+        opened = Html(path)
+        for tag in ("a", "b", "p", "div", "main", "nav", "ul", "li"):
+            assert page.count(f"</{tag}>") == sum(name == tag for name, _ in opened.tags), (number, tag)
+        for _, attributes in opened.tags:
+            file, _, anchor = (attributes.get("href") or "").partition("#")
+            if anchor:
+                target = tmp_path / "site" / "files" / file if file else path
+                assert f'<p id="{anchor}"' in target.read_text(), (number, attributes)
+                links_seen += 1
+    assert lines_seen > 2000
+    assert links_seen > 5000
 
 
 @pytest.mark.parametrize("survey", [b"\xff", b"\x05\x01a", b"\x01\x01a\x04\x07\x00\x00\x00\x00", b"\xff" * 12])
