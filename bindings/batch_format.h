@@ -9,7 +9,7 @@
 namespace quillet::host {
 
 struct BatchFormat {
-  std::function<std::unique_ptr<FileWriter>()> make;
+  std::function<std::unique_ptr<FileWriter>(Version version)> make;
 };
 
 }  // namespace quillet::host

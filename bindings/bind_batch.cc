@@ -306,7 +306,8 @@ class FileBatch {
   // width of a character), ("site survey",) or ("site page", site index).
   std::function<std::unique_ptr<FileWriter>()> WriterMaker(Version version) const {
     if (format_.is_none()) return {};
-    if (nb::isinstance<BatchFormat>(format_)) return nb::cast<const BatchFormat&>(format_).make;
+    if (nb::isinstance<BatchFormat>(format_))
+      return [make = nb::cast<const BatchFormat&>(format_).make, version] { return make(version); };
     const auto format = nb::cast<nb::tuple>(format_);
     if (nb::cast<std::string>(format[0]) == "site survey") return [version] { return MakeSiteSurveyWriter(version); };
     if (nb::cast<std::string>(format[0]) == "site page") {

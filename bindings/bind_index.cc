@@ -55,7 +55,7 @@ QuestionObject MakeQuestion(const std::string& match, nb::handle name, Uses uses
   question.has_scope = !scope.is_none();
   if (question.has_scope) question.scope = HostText::FromStr(scope).text();
   question.with_lines = with_lines;
-  made.make = QuestionWriters(question);
+  made.make = [question](Version version) { return MakeQuestionWriter(question, version); };
   return made;
 }
 
@@ -80,8 +80,19 @@ class ShownText {
   nb::object object_;
 };
 
-// The answers of a file as tuples (path, line, column, scope, name, kind, detail, is_parameter, opens), and
+// The answers of a file as tuples (path, line, column, scope, name, kind, detail, is_parameter, opens, role,
+// flags), and
 // for each of them its source line as bytes where lines were asked for.
+nb::object KindWordOf(const Answer& answer, const nb::tuple& kinds) {
+  if (answer.is_record || answer.kind != RecordKind::kOther) return kinds[static_cast<size_t>(answer.kind)];
+  // No kind of record tells of these.
+  return StrOf(NameRoleWords()[answer.role - 1u]);
+}
+
+nb::object RoleOf(const Answer& answer) {
+  return answer.role == 0 ? nb::object(nb::none()) : StrOf(NameRoleWords()[answer.role - 1u]);
+}
+
 nb::tuple Answers(nb::handle written, nb::object path, const nb::tuple& kinds) {
   if (kinds.size() != RecordKindWords().size()) ThrowError(ErrorKind::kValueError, "an object a kind is needed");
   const BufferText buffer(written);
@@ -92,8 +103,8 @@ nb::tuple Answers(nb::handle written, nb::object path, const nb::tuple& kinds) {
   nb::object line_object;
   const bool done = ReadAnswers(buffer.text(), [&](const Answer& answer, Text line) {
     rows.append(nb::make_tuple(path, answer.line, answer.column, scopes(answer.scope), names(answer.name),
-                               kinds[static_cast<size_t>(answer.kind)], details(answer.detail), answer.is_parameter,
-                               answer.opens));
+                               KindWordOf(answer, kinds), details(answer.detail), answer.is_parameter, answer.opens,
+                               RoleOf(answer), answer.flags));
     if (line.data() == nullptr) return;
     if (!line_object.is_valid() || line.data() != line_text.data()) {
       line_text = line;
@@ -174,9 +185,23 @@ void BindIndex(nb::module_& tarvex) {
            "The answers that a question wrote of a file, and their source lines.");
   host.def(
       "HashOfSource", [](nb::handle source) { return HashOfBytes(BufferText(source).text()); }, nb::arg("source"));
-  host.attr("PARAMETER_USE") = kParameterUse;
+  nb::dict bits;
+  for (size_t i = 0; i < RecordKindWords().size(); ++i)
+    bits[StrOf(RecordKindWords()[i])] = UseOfKind(static_cast<RecordKind>(i));
+  nb::dict role_bits;
+  for (size_t i = 0; i < NameRoleWords().size(); ++i)
+    role_bits[StrOf(NameRoleWords()[i])] = UseOfRole(static_cast<NameRole>(i));
+  bits["parameter"] = kParameterUse;
+  bits["decorator"] = kDecoratorUse;
+  bits["base"] = kBaseUse;
+  bits["annotation"] = kAnnotationUse;
+  bits["raise"] = kRaiseUse;
+  bits["define"] = kDefineUse;
+  bits["all"] = kAllUses;
+  host.attr("USES") = bits;
+  host.attr("ROLE_USES") = role_bits;
 
-  host.def("CountsFormat", [] { return BatchFormat{MakeCountsWriter}; });
+  host.def("CountsFormat", [] { return BatchFormat{[](Version) { return MakeCountsWriter(); }}; });
   nb::class_<RecordCounts>(host, "RecordCounts", "The sum of what the counts format wrote of files.")
       .def(nb::init<>())
       .def(

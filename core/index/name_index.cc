@@ -147,17 +147,15 @@ std::vector<uint32_t> NameIndex::FilesFor(const WordNeeds& needs) const {
 
   std::vector<uint32_t> found;
   for (uint32_t file = 0; file < files_.size(); ++file) {
+    // A file that could not be analysed has no answer as long as it is the same one.
+    if (!files_[file].problem.empty()) continue;
     uint32_t held = 0;
-    if (files_[file].problem.empty()) {
-      static_cast<void>(ReadList(lists_[file], words_.size(), uses_, [&](uint32_t word, Uses uses) {
-        for (uint32_t bits = fits[word] & ~held; bits != 0; bits &= bits - 1) {
-          const Uses asked = uses_of_bit[static_cast<size_t>(std::countr_zero(bits))];
-          if (asked == 0 || (asked & uses) != 0) held |= bits & (~bits + 1);
-        }
-      }));
-    } else {
-      held = UINT32_MAX;
-    }
+    static_cast<void>(ReadList(lists_[file], words_.size(), uses_, [&](uint32_t word, Uses uses) {
+      for (uint32_t bits = fits[word] & ~held; bits != 0; bits &= bits - 1) {
+        const Uses asked = uses_of_bit[static_cast<size_t>(std::countr_zero(bits))];
+        if (asked == 0 || (asked & uses) != 0) held |= bits & (~bits + 1);
+      }
+    }));
     if (std::any_of(wanted.begin(), wanted.end(), [&](uint32_t bits) { return (held & bits) == bits; }))
       found.push_back(file);
   }

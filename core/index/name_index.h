@@ -48,7 +48,7 @@ class NameIndex {
   const IndexedFile& operator[](size_t file) const { return files_[file]; }
   std::span<const WordTable::Entry> words() const { return words_; }
 
-  // The files that may answer, in their order. What could not be analysed may hold anything.
+  // The files that may answer, in their order.
   std::vector<uint32_t> FilesFor(const WordNeeds& needs) const;
 
   // Calls `fn(word, uses)` for each word of a file, `word` its number in words().

@@ -2,6 +2,7 @@
 #include "index/question.h"
 
 #include <algorithm>
+#include <unordered_map>
 
 #include "foundations/utf8.h"
 #include "index/bytes.h"
@@ -51,17 +52,33 @@ class Matcher {
       has_member_ = true;
     }
     scope_is_pattern_ = IsPattern(question.scope);
+    last_name_ = question.name;
+    last_name_.remove_prefix(question.name.rfind('.') + 1);
   }
 
   bool Takes(const PlacedRecord& record, Text scope) const {
     if (question_.match == Question::Match::kEverything) return true;
-    return TakesName(record, scope) && (!question_.has_scope || TakesScope(scope));
+    return TakesName(record, scope) && TakesScope(scope);
+  }
+
+  // Whether an occurrence has the name; its dotted name goes to `name` then, and may else.
+  bool HasName(uint32_t index, const Bindings& bindings, std::string& name) const {
+    const Text last = bindings.TextOf(bindings.occurrences[index]);
+    if (question_.match != Question::Match::kGlob && last != last_name_) return false;
+    AppendDotted(index, bindings, name);
+    return IsName(name);
+  }
+
+  bool TakesScope(Text scope) const {
+    if (!question_.has_scope) return true;
+    return scope_is_pattern_ ? FitsGlob(scope, question_.scope) : HoldsNames(scope, question_.scope);
   }
 
  private:
   bool TakesName(const PlacedRecord& record, Text scope) const {
     if ((question_.uses & UseOf(record)) != 0) {
       if (IsName(record.name)) return true;
+      if (record.kind == RecordKind::kFromImport && IsImportedBy(record.detail)) return true;
       if (has_member_ && record.kind == RecordKind::kSet && !record.is_parameter && record.name == member_ &&
           EndsInName(scope, outer_))
         return true;
@@ -84,15 +101,39 @@ class Matcher {
     return true;
   }
 
+  // Whether the name is that of a module and of what is imported from it, which the detail has with a blank
+  // between them.
+  bool IsImportedBy(Text detail) const {
+    const size_t blank = detail.rfind(' ');
+    return has_member_ && blank != Text::npos && detail.substr(0, blank) == outer_ &&
+           detail.substr(blank + 1) == member_;
+  }
+
   bool IsScopeOfName(Text scope) const {
     return question_.match == Question::Match::kGlob ? FitsGlob(scope, name_) : EndsInName(scope, scope_of_name_);
   }
 
-  bool TakesScope(Text scope) const {
-    return scope_is_pattern_ ? FitsGlob(scope, question_.scope) : HoldsNames(scope, question_.scope);
+  static void AppendDotted(uint32_t index, const Bindings& bindings, std::string& name) {
+    chain_.clear();
+    uint32_t at = index;
+    while (at != kNoIndex && chain_.size() < kMostChained) {
+      chain_.push_back(at);
+      at = bindings.ReceiverOf(at);
+    }
+    name.clear();
+    if (at != kNoIndex || bindings.occurrences[chain_.back()].is_attribute) name += '.';
+    for (size_t i = chain_.size(); i-- > 0;) {
+      if (i + 1 != chain_.size()) name += '.';
+      name += bindings.TextOf(bindings.occurrences[chain_[i]]);
+    }
   }
 
+  // Names of a longer chain are known by their ends.
+  static constexpr size_t kMostChained = 64;
+  static thread_local std::vector<uint32_t> chain_;
+
   const Question& question_;
+  Text last_name_;
   Text name_;
   bool is_dotted_suffix_ = false;
   Text scope_of_name_;
@@ -100,6 +141,28 @@ class Matcher {
   Text outer_, member_;
   bool scope_is_pattern_ = false;
 };
+
+thread_local std::vector<uint32_t> Matcher::chain_;
+
+// The kind of record that tells what an occurrence does.
+RecordKind KindOf(const Occurrence& occurrence) {
+  switch (occurrence.role) {
+    case NameRole::kDefinition:
+    case NameRole::kWrite:
+      return RecordKind::kSet;
+    case NameRole::kCall:
+      return RecordKind::kCalled;
+    case NameRole::kImport:
+      return RecordKind::kImport;
+    case NameRole::kRead:
+      return RecordKind::kGet;
+    case NameRole::kDelete:
+    case NameRole::kKeyword:
+    case NameRole::kDeclaration:
+      break;
+  }
+  return RecordKind::kOther;
+}
 
 // A source line, counted from 0, without its end.
 Text LineOf(const SourceText& source, uint32_t line) {
@@ -116,7 +179,8 @@ Text LineOf(const SourceText& source, uint32_t line) {
 
 class QuestionWriter : public FileWriter {
  public:
-  explicit QuestionWriter(const Question& question) : question_(question), matcher_(question_) {}
+  QuestionWriter(const Question& question, Version version)
+      : question_(question), matcher_(question_), binder_(version) {}
 
   void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
              std::string& out) override {
@@ -132,7 +196,12 @@ class QuestionWriter : public FileWriter {
                             record.is_parameter, OpensOf(file, scopes, row, record)});
       }
     }
-    if (question_.match != Question::Match::kEverything) SortAndUnite();
+    if (question_.match != Question::Match::kEverything) {
+      SortAndUnite();
+      AddOccurrences(file, scopes);
+      std::erase_if(answers_, [](const Answer& answer) { return answer.line == 0; });
+      if (answers_.size() != record_count_) SortAndUnite();
+    }
     WriteAnswers(file.source(), out);
   }
 
@@ -152,6 +221,73 @@ class QuestionWriter : public FileWriter {
     if (static_cast<uint32_t>(place.line) + 1 != record.line || static_cast<uint32_t>(place.col) + 1 != record.column)
       return 0;
     return kind == LineKind::kClassDef ? 1 : 2;
+  }
+
+  // The occurrences of the name, each as an answer of its own where no record tells of it.
+  void AddOccurrences(const FileAnalyzer& file, const ScopeNames& scopes) {
+    // Where a record told of what, to the first of its answers; names are those of the question.
+    told_.clear();
+    texts_.Reset();
+    for (uint32_t i = 0; i < answers_.size(); ++i) told_.try_emplace(PlaceOf(answers_[i]), i);
+    record_count_ = answers_.size();
+    const SourceText& source = file.source();
+    const Bindings& bindings = binder_.Bind(source, file.rows());
+    const std::span<const LineRow> rows = file.rows();
+    size_t row = 0;
+    for (uint32_t i = 0; i < bindings.occurrences.size(); ++i) {
+      const Occurrence& occurrence = bindings.occurrences[i];
+      const char* const at = source.begin() + occurrence.begin;
+      while (row + 1 < rows.size() && source.tokens[rows[row + 1].first_token].text <= at) ++row;
+      if (!matcher_.HasName(i, bindings, name_)) continue;
+      uint32_t root = i;
+      for (uint32_t next = i; next != kNoIndex; next = bindings.ReceiverOf(next)) root = next;
+      const Position place = bindings.PositionOf(bindings.occurrences[root].begin);
+      Answer answer;
+      answer.line = static_cast<uint32_t>(place.line) + 1;
+      answer.column = static_cast<uint32_t>(place.col) + 1;
+      answer.role = static_cast<uint8_t>(occurrence.role) + 1;
+      answer.flags = static_cast<uint8_t>(occurrence.flags);
+      answer.name = name_;
+      const bool is_wanted = (question_.uses & UsesOf(occurrence, bindings, source)) != 0;
+      if (TellRole(answer, is_wanted) || !is_wanted) continue;
+      answer.is_parameter = occurrence.kind == NameKind::kParameter;
+      answer.scope = scopes.names()[ScopeAt(bindings.occurrences[root], answer.is_parameter, bindings, scopes, row)];
+      if (!matcher_.TakesScope(answer.scope)) continue;
+      answer.kind = KindOf(occurrence);
+      answer.is_record = false;
+      answer.name = texts_.Copy(name_);
+      answers_.push_back(answer);
+    }
+  }
+
+  // Gives the records of an occurrence its role; false where there are none. Records call a bare decorator
+  // a call, which it is only when the definition is done, so where calls are asked for it is none.
+  bool TellRole(const Answer& occurrence, bool is_wanted) {
+    const auto found = told_.find(PlaceOf(occurrence));
+    bool told = false;
+    for (size_t i = found != told_.end() ? found->second : record_count_;
+         i < record_count_ && PlaceOf(answers_[i]) == PlaceOf(occurrence); ++i) {
+      if (answers_[i].name != occurrence.name) continue;
+      answers_[i].role = occurrence.role;
+      answers_[i].flags = occurrence.flags;
+      const bool is_call = occurrence.role == static_cast<uint8_t>(NameRole::kCall) + 1;
+      if (!is_wanted && !is_call && answers_[i].kind == RecordKind::kCalled) answers_[i].line = 0;
+      told = true;
+    }
+    return told;
+  }
+
+  static uint64_t PlaceOf(const Answer& answer) { return uint64_t{answer.line} << 32 | answer.column; }
+
+  // As records have it: parameters belong to what their statement opens, global names to the module.
+  static uint32_t ScopeAt(const Occurrence& root, bool is_parameter, const Bindings& bindings, const ScopeNames& scopes,
+                          size_t row) {
+    if (root.has_symbol && bindings.IsDeclaredGlobal(bindings.symbols[root.place]) &&
+        root.role != NameRole::kDeclaration)
+      return 0;
+    uint32_t scope = scopes.ScopeOfRow(row);
+    if (is_parameter && scopes.ScopeOpenedBy(row) != ScopeNames::kNone) scope = scopes.ScopeOpenedBy(row);
+    return scopes.scopes()[scope].name;
   }
 
   void SortAndUnite() {
@@ -180,7 +316,9 @@ class QuestionWriter : public FileWriter {
       AppendNumber(answer.line, out);
       AppendNumber(answer.column, out);
       out += static_cast<char>(answer.kind);
-      out += static_cast<char>(answer.opens << 1 | static_cast<uint8_t>(answer.is_parameter));
+      out += static_cast<char>(answer.opens << 2 | answer.is_record << 1 | static_cast<uint8_t>(answer.is_parameter));
+      out += static_cast<char>(answer.role);
+      out += static_cast<char>(answer.flags);
       AppendText(answer.scope, out);
       AppendText(answer.name, out);
       AppendText(answer.detail, out);
@@ -196,7 +334,12 @@ class QuestionWriter : public FileWriter {
 
   const Question question_;
   const Matcher matcher_;
+  NameBinder binder_;
   std::vector<Answer> answers_;
+  std::unordered_map<uint64_t, uint32_t> told_;
+  size_t record_count_ = 0;
+  std::string name_;
+  TextArena texts_;
 };
 
 // ---- the words of a question ----
@@ -312,8 +455,8 @@ bool FitsGlob(Text text, Text pattern) {
   return in_pattern == pattern.size();
 }
 
-std::function<std::unique_ptr<FileWriter>()> QuestionWriters(Question question) {
-  return [question = std::move(question)] { return std::make_unique<QuestionWriter>(question); };
+std::unique_ptr<FileWriter> MakeQuestionWriter(const Question& question, Version version) {
+  return std::make_unique<QuestionWriter>(question, version);
 }
 
 bool ReadAnswers(Text written, const std::function<void(const Answer&, Text line)>& take) {
@@ -328,10 +471,13 @@ bool ReadAnswers(Text written, const std::function<void(const Answer&, Text line
     answer.line = static_cast<uint32_t>(reader.NumberUpTo(UINT32_MAX));
     answer.column = static_cast<uint32_t>(reader.NumberUpTo(UINT32_MAX));
     const uint64_t kind = reader.NumberUpTo(RecordKindWords().size() - 1);
-    const uint64_t flags = reader.NumberUpTo(7);
+    const uint64_t flags = reader.NumberUpTo(15);
     answer.kind = static_cast<RecordKind>(kind);
     answer.is_parameter = (flags & 1) != 0;
-    answer.opens = static_cast<uint8_t>(flags >> 1);
+    answer.is_record = (flags & 2) != 0;
+    answer.opens = static_cast<uint8_t>(flags >> 2);
+    answer.role = static_cast<uint8_t>(reader.NumberUpTo(NameRoleWords().size()));
+    answer.flags = static_cast<uint8_t>(reader.NumberUpTo(63));
     answer.scope = reader.String();
     answer.name = reader.String();
     answer.detail = reader.String();

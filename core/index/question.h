@@ -1,8 +1,9 @@
-// A question for a name: which records answer it, and which words a file must hold to have one.
+// A question for a name: which records and occurrences answer it, and which words a file must hold to have one.
 //
 // Answers are found by analysing files as they are, never by what was stored of them, so a question is a
-// writer of a batch like the formats of output/: it writes the records of a file that answer. Words only
-// save the analysis of files that cannot.
+// writer of a batch like the formats of output/: it writes the records of a file that answer, and the
+// occurrences that none of them tells of, such as a call with keywords or the second read in a statement.
+// Words only save the analysis of files that cannot.
 #pragma once
 
 #include <functional>
@@ -23,8 +24,8 @@ struct Question {
   };
   Match match = Match::kEverything;
   std::string name;
-  Uses uses = kRecordUses;  // that are asked for
-  bool returns = false;     // what functions of the name return and yield, too
+  Uses uses = kAllUses;  // that are asked for
+  bool returns = false;  // what functions of the name return and yield, too
   bool has_scope = false;
   std::string scope;  // around the records, by whole names or as a pattern
   bool with_lines = false;
@@ -47,7 +48,8 @@ WordNeeds WordsNeededBy(const Question& question);
 // Whether a text is as a pattern of * and ? says.
 bool FitsGlob(Text text, Text pattern);
 
-// A record that answers.
+// A record or an occurrence that answers. An occurrence that no record tells of has the kind of record that
+// would, and no detail; its name is dotted as far as names go, and begins with a dot behind anything else.
 struct Answer {
   uint32_t line = 0;    // from 1
   uint32_t column = 0;  // from 1, in UTF-8 bytes
@@ -57,12 +59,16 @@ struct Answer {
   RecordKind kind = RecordKind::kSet;
   bool is_parameter = false;
   uint8_t opens = 0;  // what the name is set to: 1 a class, 2 a function
+  // Of the occurrence that it is: its role + 1 (0 for a record that is none), and bits of NameFlag.
+  uint8_t role = 0;
+  uint8_t flags = 0;
+  bool is_record = true;
 
   friend bool operator==(const Answer&, const Answer&) = default;
 };
 
 // Writes the answers of each file: by line and column and each once, unless everything is asked for.
-std::function<std::unique_ptr<FileWriter>()> QuestionWriters(Question question);
+std::unique_ptr<FileWriter> MakeQuestionWriter(const Question& question, Version version);
 
 // Calls `take(answer, line)` for what such a writer wrote; the texts are views of it. `line` is the source
 // line of the answer where lines were asked for, without its end and cut where it is very long; it has

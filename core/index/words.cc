@@ -28,8 +28,25 @@ uint64_t Mixed(uint64_t hash, uint64_t value) {
   return hash ^ hash >> 32;
 }
 
+// Whether `raise` stands in front of a name, or of what it is an attribute of.
+bool IsRaised(const Occurrence& occurrence, const Bindings& bindings, Text text) {
+  constexpr Text kRaise = "raise";
+  const Occurrence* root = &occurrence;
+  while (true) {
+    const uint32_t receiver = bindings.ReceiverOf(static_cast<uint32_t>(root - bindings.occurrences.data()));
+    if (receiver == kNoIndex) break;
+    root = &bindings.occurrences[receiver];
+  }
+  const Text before = text.substr(0, root->begin);
+  const size_t end = before.find_last_not_of(" \t(") + 1;
+  if (end == before.size() || !before.substr(0, end).ends_with(kRaise)) return false;
+  return end == kRaise.size() || !IsWordByte(before[end - kRaise.size() - 1]);
+}
+
 class WordsWriter : public FileWriter {
  public:
+  explicit WordsWriter(Version version) : binder_(version) {}
+
   void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
              std::string& out) override {
     table_.Clear();
@@ -52,6 +69,9 @@ class WordsWriter : public FileWriter {
         table_[last].uses |= UseOf(record);
       }
     }
+    const Bindings& bindings = binder_.Bind(file.source(), file.rows());
+    for (const Occurrence& occurrence : bindings.occurrences)
+      table_[table_.NumberOf(WordOf(bindings.TextOf(occurrence)))].uses |= UsesOf(occurrence, bindings, file.source());
     for (const Text scope : scopes.names()) {
       const Text own_name = scope.substr(scope.rfind('.') + 1);
       if (own_name.empty()) continue;
@@ -71,10 +91,42 @@ class WordsWriter : public FileWriter {
   }
 
  private:
+  static Text WordOf(Text name) { return name.substr(0, kMaxWordSize); }
+
   WordTable table_;
+  NameBinder binder_;
 };
 
 }  // namespace
+
+Uses UsesOf(const Occurrence& occurrence, const Bindings& bindings, const SourceText& source) {
+  Uses uses = 0;
+  if (occurrence.role != NameRole::kDefinition) {
+    uses = UseOfRole(occurrence.role);
+  } else {
+    switch (occurrence.kind) {
+      case NameKind::kParameter:
+        uses = kParameterUse;
+        break;
+      case NameKind::kClass:
+      case NameKind::kFunction:
+      case NameKind::kTypeAlias:
+        uses = UseOfRole(NameRole::kDefinition) | kDefineUse;
+        break;
+      case NameKind::kImport:
+        uses = UseOfRole(NameRole::kDefinition) | UseOfRole(NameRole::kImport);
+        break;
+      default:
+        uses = UseOfRole(NameRole::kDefinition);
+    }
+  }
+  if ((occurrence.flags & kNameDecorator) != 0) uses |= kDecoratorUse;
+  if ((occurrence.flags & kNameBase) != 0) uses |= kBaseUse;
+  if ((occurrence.flags & kNameAnnotation) != 0) uses |= kAnnotationUse;
+  const bool is_used = occurrence.role == NameRole::kRead || occurrence.role == NameRole::kCall;
+  if (is_used && IsRaised(occurrence, bindings, source.text())) uses |= kRaiseUse;
+  return uses;
+}
 
 uint64_t HashOfBytes(Text bytes) {
   uint64_t hash = bytes.size() * kFactor;
@@ -124,7 +176,7 @@ void WordTable::Grow() {
   }
 }
 
-std::unique_ptr<FileWriter> MakeWordsWriter() { return std::make_unique<WordsWriter>(); }
+std::unique_ptr<FileWriter> MakeWordsWriter(Version version) { return std::make_unique<WordsWriter>(version); }
 
 bool ReadFileWords(Text written, FileWords& words) {
   ByteReader reader(written);

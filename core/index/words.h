@@ -1,8 +1,8 @@
-// The words of names, and what the records of a file say of each of them: what an index keeps of a file.
+// The words of names, and what a file does with each of them: what an index keeps of a file.
 //
 // A word is a run of letters, digits, underscores and bytes of 0x80 and above, such as `os`, `path` and
-// `join` of `os.path.join`; a name without any, such as `*`, is a word itself. What a record says of its
-// name is kept with the last word, and for the others only that they occur. So a question for a name can
+// `join` of `os.path.join`; a name without any, such as `*`, is a word itself. What a record or an occurrence
+// says of its name is kept with the last word, and for the others only that they occur. So a question for a name can
 // concern only the files that hold all words of it, the last one in a use that is asked for.
 // The trap: names are views of each other (a, a.b, a.b.c), so to look each of them through from its start
 // would take the square of a long one.
@@ -17,21 +17,33 @@
 #include "analysis/batch.h"
 #include "foundations/arena.h"
 #include "foundations/utf8.h"
+#include "names/binder.h"
 
 namespace quillet {
 
-// In what ways the records of a file use a word, a bit each: the kinds of records, of which a set
-// parameter is one of its own, and that a scope has the name.
+// In what ways a file uses a word, a bit each: the kinds of records, of which a set parameter is one of its
+// own, and that a scope has the name.
 using Uses = uint32_t;
 
 constexpr Uses UseOfKind(RecordKind kind) { return Uses{1} << static_cast<unsigned>(kind); }
 inline constexpr Uses kParameterUse = Uses{1} << 16;
 inline constexpr Uses kScopeUse = Uses{1} << 17;
-inline constexpr Uses kRecordUses = (Uses{1} << 17) - 1;
+// What occurrences of a name do: a bit a role, where a definition is that of a variable unless it has a bit of
+// its own; and where they stand.
+constexpr Uses UseOfRole(NameRole role) { return Uses{1} << (18 + static_cast<unsigned>(role)); }
+inline constexpr Uses kDecoratorUse = Uses{1} << 26;
+inline constexpr Uses kBaseUse = Uses{1} << 27;
+inline constexpr Uses kAnnotationUse = Uses{1} << 28;
+inline constexpr Uses kRaiseUse = Uses{1} << 29;
+inline constexpr Uses kDefineUse = Uses{1} << 30;  // a class, a function or a type alias
+inline constexpr Uses kAllUses = ~kScopeUse;
 
 inline Uses UseOf(const PlacedRecord& record) {
   return record.is_parameter && record.kind == RecordKind::kSet ? kParameterUse : UseOfKind(record.kind);
 }
+
+// All uses that an occurrence is.
+Uses UsesOf(const Occurrence& occurrence, const Bindings& bindings, const SourceText& source);
 
 // A longer word is cut to its beginning.
 inline constexpr size_t kMaxWordSize = 100;
@@ -97,7 +109,7 @@ struct FileWords {
 };
 
 // Writes the words of each file that is analysed.
-std::unique_ptr<FileWriter> MakeWordsWriter();
+std::unique_ptr<FileWriter> MakeWordsWriter(Version version);
 
 // Reads what that wrote; the words are views of it. False where it is something else.
 bool ReadFileWords(Text written, FileWords& words);

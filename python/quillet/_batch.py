@@ -12,13 +12,10 @@ from collections.abc import Generator, Iterable, Iterator, Sequence
 from types import TracebackType
 from typing import NamedTuple, Union, cast, overload
 
-from quillet._keywords import keywords_of
+from quillet._languages import available_cores, decode_source, native_language_of
 from quillet._names import FileBindings
 from quillet._records import KINDS, RecordKind
-from quillet._source import SourceEncodingError, to_utf8
-from quillet.config import GetNorvaFilename
-from quillet.host import PY2_PRINT_FUNCTION_GRAMMAR, language_version
-from quillet.tarvex import _host, kPy2DefaultGrammar, kPy3DefaultGrammar
+from quillet.tarvex import _host
 
 StrPath = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
 
@@ -336,40 +333,6 @@ def jobs_of(jobs: int | None) -> int:
     return jobs
 
 
-def available_cores() -> int:
-    """The cores that this process may use, which may be fewer than the machine has."""
-    if hasattr(os, "sched_getaffinity"):
-        return len(os.sched_getaffinity(0))
-    return os.cpu_count() or 1
-
-
-def decode_source(source: bytes) -> tuple[bytes | None, str | None]:
-    """The UTF-8 of a source that names its encoding, or why there is none."""
-    try:
-        return to_utf8(source), None
-    except SourceEncodingError as error:
-        return None, str(error)
-
-
-def native_language_of(version: tuple[int, ...] | None = None) -> _host.Language:
-    """What native analyzers of a version are built from; None is the running interpreter's."""
-    language = language_version(version)
-    python_3 = language >= (3, 0)
-    grammar = kPy3DefaultGrammar if python_3 else kPy2DefaultGrammar
-    return _host.Language(
-        (*language, 0),
-        grammar_file=_grammar_path(grammar),
-        hint_grammar_file=_grammar_path(kPy3DefaultGrammar),
-        keyword_seq=list(keywords_of(language)),
-        py3_grammar=python_3,
-        print_function_grammar_file="" if python_3 else _grammar_path(PY2_PRINT_FUNCTION_GRAMMAR),
-    )
-
-
 def native_batch(version: tuple[int, ...] | None = None) -> _host.NativeBatch:
     """Sources in memory through the native path, for measuring: counts and no objects."""
     return _host.NativeBatch(native_language_of(version))
-
-
-def _grammar_path(grammar_file: str) -> str:
-    return GetNorvaFilename("resources/pgen-grammars/" + grammar_file)

@@ -9,13 +9,14 @@ expensive to build and serves one thread, so each thread keeps one a version.
 from __future__ import annotations
 
 import re
-import sys
 import threading
 from collections.abc import Iterator, Sequence
 from functools import cached_property
 from typing import overload
 
 from quillet._keywords import keywords_of
+from quillet._languages import PY2_PRINT_FUNCTION_GRAMMAR
+from quillet._languages import language_version as language_version
 from quillet._records import Record, decode_record
 from quillet._source import to_utf8
 from quillet.logicalline import CLogicalLine
@@ -29,32 +30,12 @@ _BOM = b"\xef\xbb\xbf"
 _Row = tuple[CLogicalLine, int, int, int, bool, bool]
 
 
-# The grammar of 2.7 for a source that imports the print function.
-PY2_PRINT_FUNCTION_GRAMMAR = kPy2DefaultGrammar + "-print-function"
-
-
 class _Analyzers(threading.local):
     def __init__(self) -> None:
         self.by_language: dict[tuple[tuple[int, int], bool], CPGenAnalyzerImpl] = {}
 
 
 _analyzers = _Analyzers()
-
-
-def language_version(version: tuple[int, ...] | None = None) -> tuple[int, int]:
-    """The (major, minor) of a version tuple, and the running interpreter's for None.
-
-    Raises `TypeError` for anything but a tuple of two or three integers, `ValueError` for a version
-    that is neither 2.7 nor 3.x.
-    """
-    if version is None:
-        return sys.version_info[:2]
-    if not isinstance(version, tuple) or not 2 <= len(version) <= 3 or not all(isinstance(n, int) for n in version):
-        raise TypeError(f"version must be a tuple such as (3, 12), not {version!r}")
-    major, minor = version[:2]
-    if (major, minor) != (2, 7) and not (major == 3 and 0 <= minor < 256):
-        raise ValueError(f"version must be (2, 7) or (3, x), not {version!r}")
-    return major, minor
 
 
 def analyzer_for(version: tuple[int, ...] | None = None, *, print_function: bool = False) -> CPGenAnalyzerImpl:

@@ -797,7 +797,8 @@ class _host:  # a module at run time
     ) -> tuple[list[tuple[Any, ...]], list[bytes]]: ...
     @staticmethod
     def HashOfSource(source: bytes) -> int: ...
-    PARAMETER_USE: int
+    USES: dict[str, int]
+    ROLE_USES: dict[str, int]
 
     class RecordCounts:
         def __init__(self) -> None: ...

@@ -81,6 +81,9 @@ def test_json_is_an_object_a_record(shop: Path) -> None:
         "is_parameter": False,
         "source": "        return os.path.join('shop', name)",
         "changed": False,
+        "role": "call",
+        "flags": [],
+        "receiver": "os.path",
     }
 
 
@@ -132,6 +135,102 @@ def test_nothing_found_says_what_is_near(shop: Path, arguments: list[str], near:
     result = run("find", *arguments, cwd=shop)
     assert (result.returncode, result.stdout) == (1, "")
     assert result.stderr == (f"quillet: nothing found; try: {near}\n" if near else "")
+
+
+USES = """\
+import os.path, a.b as c
+from x.y import z as w, q
+@deco.rate(3)
+@plain
+class A(Base, k.M, metaclass=Meta):
+    def f(self, a: int = D):
+        self.x += a.b[0].c(d=1)
+        del self.y
+        raise Err.Sub(1) from e
+        return super().f(x=1)[0].g() + g(k=1) + g(*a) + g(1)
+x = x + x
+try: raise Bare
+except (E, F.G) as h: raise
+y = lambda p: p
+z: "List[int]" = 1
+def n():
+    global t
+    t = 1
+"""
+
+
+@pytest.mark.parametrize(
+    ("arguments", "places"),
+    [
+        (["g", "--call"], ["10:40", "10:49", "10:57"]),
+        ([".g", "--call"], ["10:34"]),
+        (["g", "--call", "--any"], ["10:34", "10:40", "10:49", "10:57"]),
+        ([".f", "--call"], ["10:24"]),
+        (["super", "--call"], ["10:16"]),
+        (["plain", "--call"], []),
+        (["plain", "--decorator"], ["4:2"]),
+        (["plain", "--get"], ["4:2"]),
+        (["deco.rate", "--decorator"], ["3:2"]),
+        (["deco.rate", "--call"], ["3:2"]),
+        (["Base", "--base"], ["5:9"]),
+        (["k.M", "--base"], ["5:15"]),
+        (["Meta", "--base"], []),
+        (["metaclass", "--keyword"], ["5:20"]),
+        (["d", "--keyword"], ["7:28"]),
+        (["k", "--keyword"], ["10:42"]),
+        (["x", "--keyword"], ["10:26"]),
+        (["x", "--get"], ["11:5", "11:9"]),
+        (["x", "--set"], ["11:1"]),
+        (["self.x", "--set"], ["7:9"]),
+        (["self.y", "--delete"], ["8:13"]),
+        (["Err.Sub", "--raise"], ["9:15"]),
+        (["Bare", "--raise"], ["12:12"]),
+        (["e", "--raise"], []),
+        (["int", "--annotation"], ["6:20", "15:10"]),
+        (["D", "--annotation"], []),
+        (["A", "--def"], ["5:7"]),
+        (["f", "--def"], ["6:9"]),
+        (["x", "--def"], []),
+        (["p", "--param"], ["14:12"]),
+        (["x.y", "--import"], ["2:6"]),
+        (["x.y.z", "--import"], ["2:22"]),
+        (["os", "--import"], ["1:8"]),
+        (["os.path", "--import"], ["1:8"]),
+        (["a.b", "--import"], ["1:17"]),
+        (["F.G", "--get"], ["13:12"]),
+        (["t", "--set", "--scope", "n"], []),
+        (["t", "--set", "--scope", ""], ["18:5"]),
+        (["g", "--call", "--scope", "A.f"], ["10:40", "10:49", "10:57"]),
+        (["g", "--call", "--path", "b*"], []),
+        (["g", "--call", "--path", "a.py"], ["10:40", "10:49", "10:57"]),
+    ],
+)
+def test_every_occurrence_is_found_by_what_it_does(tmp_path: Path, arguments: list[str], places: list[str]) -> None:
+    make_index(tmp_path, a=USES)
+    assert found(*arguments, cwd=tmp_path) == places
+
+
+def test_answers_can_be_counted_and_their_files_named(tmp_path: Path) -> None:
+    make_index(tmp_path, a="x = x\n", b="x(1)\n", c="y = 1\n")
+    assert run("find", "x", "-c", cwd=tmp_path).stdout == "3\n"
+    assert run("find", "x", "--files", cwd=tmp_path).stdout == "a.py\nb.py\n"
+    assert run("find", "nothing", "-c", cwd=tmp_path).stdout == "0\n"
+    assert run("find", "x", "-c", "-l", cwd=tmp_path).returncode == 2
+
+
+def test_calls_agree_with_the_standard_library(tmp_path: Path) -> None:
+    import ast
+
+    source = Path(ast.__file__).read_text(encoding="utf-8")
+    (tmp_path / "a.py").write_text(source, encoding="utf-8")
+    expected = set()
+    for node in ast.walk(ast.parse(source)):
+        if isinstance(node, ast.Call) and isinstance(node.func, ast.Name | ast.Attribute):
+            name = node.func.id if isinstance(node.func, ast.Name) else node.func.attr
+            expected.add((node.func.end_lineno, name))
+    result = run("find", "*", "--call", "--json", cwd=tmp_path)
+    rows = [json.loads(line) for line in result.stdout.splitlines()]
+    assert {(row["line"], row["name"].rpartition(".")[2]) for row in rows} == expected
 
 
 def test_a_star_import_is_found_by_its_name(tmp_path: Path) -> None:
@@ -257,6 +356,7 @@ def test_a_question_does_not_load_click(shop: Path) -> None:
         ["total", "--set", "--get"],
         ["--call", "--import", "--param", "os.path.join", "--hint", "--return"],
         ["--scope", "Shop", "-l", "add", "--json", "--match", "suffix"],
+        ["add", "--any", "--count", "--path", "src/*", "--def"],
         ["add", "--long", "--index", "other.index"],
         ["--index", "a", "--index", "b", "add"],
         ["test_*"],

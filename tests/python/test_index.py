@@ -18,7 +18,7 @@ import pytest
 from indexing import COMMAND, ENVIRONMENT, ODD_NAMES, SHOP, content, make_index, run
 from quillet import RecordKind, analyze_files
 from quillet.index.questions import Index
-from quillet.index.store import KINDS, read_index
+from quillet.index.store import KINDS, read_index, settings_text
 from quillet.tarvex import _host
 
 OLD = 1_500_000_000
@@ -317,6 +317,15 @@ def test_an_unknown_encoding_is_told_at_every_run(tmp_path: Path) -> None:
         assert "nothing-such" in result.stderr
 
 
+def test_a_file_that_can_be_read_again_is_found_again(tmp_path: Path) -> None:
+    (tmp_path / "a.py").symlink_to("later.txt")
+    (tmp_path / "b.py").write_text("y = 1\n")
+    run("index", ".", cwd=tmp_path)
+    (tmp_path / "later.txt").write_text("x = 1\n")
+    assert run("index", ".", cwd=tmp_path).returncode == 0
+    assert run("find", "x", cwd=tmp_path).stdout == "a.py:1:1: x = 1\n"
+
+
 def test_a_binary_file_is_indexed_without_harm(tmp_path: Path) -> None:
     (tmp_path / "a.py").write_bytes(random.Random(1).randbytes(5000))
     assert run("index", "a.py", "-q", cwd=tmp_path).returncode in (0, 1)
@@ -346,7 +355,7 @@ def test_a_damaged_index_is_told_in_one_line_and_made_anew(tmp_path: Path, comma
     make_index(tmp_path, shop=SHOP * 50)
     good = index_path(tmp_path).read_bytes()
     data = bytearray(good)
-    data[300:] = b"\xa5" * (len(data) - 300)
+    data[100:] = b"\xa5" * (len(data) - 100)
     index_path(tmp_path).write_bytes(data)
     result = run(*command, cwd=tmp_path)
     assert result.returncode == 2
@@ -471,12 +480,11 @@ def plant(folder: Path, *paths: bytes, roots: tuple[str, ...] = (".",)) -> None:
     words = written_words(b"SECRET = 1\n")
     for path in paths:
         writer.Add(path, 11, 5, 1, 0, None, words)
-    settings = stored.settings._replace(roots=roots)._asdict()
-    index_path(folder).write_bytes(writer.Finish(json.dumps(settings).encode()))
+    index_path(folder).write_bytes(writer.Finish(settings_text(stored.settings._replace(roots=roots))))
 
 
 def written_words(source: bytes) -> bytes:
-    from quillet._batch import decode_source, native_language_of
+    from quillet._languages import decode_source, native_language_of
 
     batch = _host.Batch(native_language_of(), [(b"a.py", source, None)], 1, decode_source, _host.WordsFormat(), False)
     return bytes(memoryview(batch.Next()))

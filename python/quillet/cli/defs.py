@@ -5,7 +5,7 @@ from __future__ import annotations
 import os
 
 from quillet.cli.files import problem_of
-from quillet.cli.find import fail, show_hits
+from quillet.cli.find import Form, fail, show_hits
 from quillet.cli.show import Style
 from quillet.cli.streams import quiet_output
 from quillet.index.questions import FileFacts, Folder, Index, Sources, definitions_in, row_of
@@ -23,7 +23,7 @@ def run(path: str, *, index: str | None, as_json: bool, imports: bool) -> int:
     hits.sort(key=lambda hit: (hit.line, hit.column))
     with quiet_output() as out:
         shown = facts._replace(hits=hits, source_lines=[lines[hit] for hit in hits])
-        show_hits(out, shown_path(path), shown, Style.of_stdout(), as_json=as_json, long=False)
+        show_hits(out, shown_path(path), shown, Style.of_stdout(), Form(as_json=as_json))
     return 0 if hits else 1
 
 

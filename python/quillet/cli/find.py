@@ -11,12 +11,12 @@ import sys
 import time
 from collections.abc import Iterator, Sequence
 from itertools import groupby
-from typing import TextIO
+from typing import NamedTuple, TextIO
 
 from quillet.cli.find_options import ROLES
 from quillet.cli.show import Style, printable
 from quillet.cli.streams import quiet_output
-from quillet.index.questions import FileFacts, Folder, Hit, Index, Query, Sources, match_of
+from quillet.index.questions import FLAGS, FileFacts, Folder, Hit, Index, Query, Sources, match_of
 from quillet.index.store import IndexProblem, find_index
 
 # As much of a source line is shown, in characters.
@@ -29,14 +29,27 @@ _SLOW = 1.0
 _MOST_ALIKE = 5
 
 
+class Form(NamedTuple):
+    """How answers are written."""
+
+    as_json: bool = False
+    long: bool = False
+    count_only: bool = False
+    files_only: bool = False
+
+
 def ask(
     name: str,
     *,
     returns: bool,
     scope: str | None,
     match: str | None,
+    any_receiver: bool,
+    path: str | None,
     as_json: bool,
     long: bool,
+    count: bool,
+    files: bool,
     index: str | None,
     roots: Sequence[str],
     **roles: bool,
@@ -44,12 +57,16 @@ def ask(
     """Runs the command with the parameters of `find_options` and returns its exit code."""
     if not name.strip("."):
         return fail(ValueError("NAME is empty"))
+    if as_json + long + count + files > 1:
+        return fail(ValueError("--json, --long, --count and --files are one instead of the other"))
     wanted = tuple(role for role in ROLES if roles[f"role_{role}"])
-    query = Query(name, match or match_of(name), wanted, returns, scope)
-    return run(query, index=index, roots=roots, as_json=as_json, long=long)
+    if any_receiver and match is None:
+        match = "suffix"
+    query = Query(name, match or match_of(name), wanted, returns, scope, path)
+    return run(query, index=index, roots=roots, form=Form(as_json, long, count, files))
 
 
-def run(query: Query, *, index: str | None, roots: Sequence[str], as_json: bool, long: bool) -> int:
+def run(query: Query, *, index: str | None, roots: Sequence[str], form: Form) -> int:
     """Runs the command and returns its exit code."""
     start = time.monotonic()
     try:
@@ -57,7 +74,7 @@ def run(query: Query, *, index: str | None, roots: Sequence[str], as_json: bool,
     except IndexProblem as problem:
         return fail(problem)
     with quiet_output() as out:
-        found = show_answers(out, sources, sources.answers(query.native(with_lines=True)), as_json=as_json, long=long)
+        found = show_answers(out, sources, sources.answers(query, with_lines=True), form)
     if isinstance(sources, Index):
         say_outside(sources)
     elif time.monotonic() - start > _SLOW:
@@ -96,30 +113,36 @@ def say_outside(index: Index) -> None:
         )
 
 
-def show_answers(out: TextIO, sources: Sources, answers: Iterator[FileFacts], *, as_json: bool, long: bool) -> bool:
+def show_answers(out: TextIO, sources: Sources, answers: Iterator[FileFacts], form: Form) -> bool:
     """Writes answers as they come, and returns whether there were any."""
     style = Style.of_stdout()
-    found = False
+    places = 0
     flushed = 0.0
     for facts in answers:
-        found = True
-        show_hits(out, sources.shown_path(facts.row.path), facts, style, as_json=as_json, long=long)
+        places += len({hit[1:3] for hit in facts.hits})
+        path = sources.shown_path(facts.row.path)
+        if form.files_only:
+            out.write(f"{printable(path)}\n")
+        elif not form.count_only:
+            show_hits(out, path, facts, style, form)
         if time.monotonic() - flushed > _PATIENCE:
             out.flush()
             flushed = time.monotonic()
-    return found
+    if form.count_only:
+        out.write(f"{places}\n")
+    return places > 0
 
 
-def show_hits(out: TextIO, path: str, facts: FileFacts, style: Style, *, as_json: bool, long: bool) -> None:
-    """Writes the records of a file by their places, each with its source line."""
+def show_hits(out: TextIO, path: str, facts: FileFacts, style: Style, form: Form) -> None:
+    """Writes the answers of a file by their places, each with its source line."""
     pairs = zip(facts.hits, facts.source_lines, strict=True)
-    if as_json:
+    if form.as_json:
         out.writelines(_json(path, hit, source) for hit, source in pairs)
         return
     for (line, column), records in groupby(pairs, key=lambda pair: (pair[0].line, pair[0].column)):
         group = list(records)
         out.write(place_text(path, line, column, group[0][1], style))
-        if long:
+        if form.long:
             out.writelines(_detail_text(hit, style) for hit, _ in group)
 
 
@@ -135,14 +158,26 @@ def place_text(path: str, line: int, column: int, source: bytes, style: Style) -
 def _detail_text(hit: Hit, style: Style) -> str:
     from quillet._records import Record, RecordKind, describe
 
-    said = describe(Record(hit.name, RecordKind(hit.kind), hit.detail, hit.is_parameter))
+    if hit.kind == "called" and not hit.detail:
+        said = "called"
+    elif hit.kind in _ROLE_PHRASES:
+        said = _ROLE_PHRASES[hit.kind]
+    elif hit.kind == "import" and not hit.detail:
+        said = "imported"
+    else:
+        said = describe(Record(hit.name, RecordKind(hit.kind), hit.detail, hit.is_parameter))
     where = f"  in {printable(hit.scope)}" if hit.scope else ""
     return f"    {style.name(printable(hit.name))}  {printable(said)}{where}\n"
+
+
+# What roles that no kind of record has are called.
+_ROLE_PHRASES = {"delete": "deleted", "keyword": "passed as a keyword", "declaration": "declared"}
 
 
 def _json(path: str, hit: Hit, source: bytes) -> str:
     import json
 
+    receiver, dot, _ = hit.name.rpartition(".")
     row = {
         "type": "record",
         "path": path,
@@ -155,6 +190,9 @@ def _json(path: str, hit: Hit, source: bytes) -> str:
         "is_parameter": hit.is_parameter,
         "source": source.decode("utf-8", "backslashreplace"),
         "changed": False,
+        "role": hit.role,
+        "flags": [word for bit, word in enumerate(FLAGS) if hit.flags >> bit & 1],
+        "receiver": receiver if dot else None,
     }
     return json.dumps(row, ensure_ascii=True, separators=(",", ":")) + "\n"
 
@@ -175,6 +213,8 @@ def nearby(sources: Sources, query: Query) -> Iterator[str]:
 def _neighbours(sources: Sources, query: Query) -> Iterator[Query]:
     if query.scope is not None:
         yield query._replace(scope=None)
+    if query.path is not None:
+        yield query._replace(path=None)
     names = [query]
     if query.match == "exact":
         names.append(query._replace(name=f".{query.name}", match="suffix"))
@@ -196,6 +236,8 @@ def _typed(query: Query) -> str:
         parts.append("--return")
     if query.scope is not None:
         parts.append(f"--scope {query.scope}")
+    if query.path is not None:
+        parts.append(f"--path '{query.path}'")
     if query.match != match_of(query.name):
         parts.append(f"--match {query.match}")
     return " ".join(parts)

@@ -31,12 +31,19 @@ class Option(NamedTuple):
 
 
 ROLES = {
-    "set": "Where it is set (parameters: --param).",
+    "set": "Where it is set, also by += (parameters: --param).",
     "get": "Where it is read.",
-    "call": "Where it is called, with arguments by position alone.",
-    "import": "Where it is imported.",
+    "call": "Where it is called.",
+    "import": "Where it is imported; a module by its dotted name.",
     "param": "Where it is a parameter.",
     "hint": "Where it has a type hint.",
+    "def": "Where a class, a function or a type of this name is defined.",
+    "delete": "Where it is deleted.",
+    "keyword": "Where an argument is passed by this keyword.",
+    "decorator": "Where it decorates.",
+    "base": "Where a class inherits from it.",
+    "raise": "Where it is raised.",
+    "annotation": "Where an annotation names it.",
 }
 INDEX_OPTION = Option(
     ("--index",),
@@ -56,8 +63,12 @@ OPTIONS = (
     Option(("--return",), "returns", "What the functions of this name return and yield."),
     Option(("--scope",), "scope", "Only in this class or function, such as Shop or Shop.add.", metavar="SCOPE"),
     Option(("--match",), "match", "How NAME is meant; without it by its form.", choices=("exact", "suffix", "glob")),
-    Option(("--json",), "as_json", "A JSON object a record."),
-    Option(("-l", "--long"), "long", "Below each place what is said of the name there."),
+    Option(("--any",), "any_receiver", "NAME and everything that ends in .NAME; the same as --match suffix."),
+    Option(("--path",), "path", "Only in files whose path, or the end of it, is like this.", metavar="GLOB"),
+    Option(("--json",), "as_json", "A JSON object an answer."),
+    Option(("--long",), "long", "Below each place what is said of the name there."),
+    Option(("-c", "--count"), "count", "Only the number of places."),
+    Option(("-l", "--files"), "files", "Only the names of the files."),
     INDEX_OPTION,
     ROOT_OPTION,
 )

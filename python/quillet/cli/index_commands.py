@@ -24,7 +24,10 @@ def _options(options: Sequence[Option]) -> Callable[[Callable[..., None]], Calla
             if option.choices:
                 settings["type"] = click.Choice(option.choices)
             elif option.takes_value:
-                settings |= {"metavar": option.metavar, "type": str if option.metavar == "SCOPE" else click.Path()}
+                settings |= {
+                    "metavar": option.metavar,
+                    "type": str if option.metavar in ("SCOPE", "GLOB") else click.Path(),
+                }
                 if option.repeated:
                     settings["multiple"] = True
             else:

@@ -25,7 +25,10 @@ def json_lines(index: Index, base: str) -> Iterator[str]:
             file["problem"] = facts.problem
         yield encode(file)
         for hit in facts.hits:
-            yield encode({"type": "record", **hit._asdict(), "path": path, "opens": _OPENS[hit.opens]})
+            row = {"type": "record", **hit._asdict(), "path": path, "opens": _OPENS[hit.opens]}
+            # What occurrences are is no part of a record.
+            del row["role"], row["flags"]
+            yield encode(row)
         for line, column, message in facts.errors:
             yield encode({"type": "error", "path": path, "line": line, "column": column, "message": message})
 

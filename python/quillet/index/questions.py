@@ -16,23 +16,48 @@ from quillet.index.paths import Places, StoredPaths, stored_path
 from quillet.index.store import CLASS, FUNCTION, KINDS, read_index
 from quillet.tarvex import _host
 
-_BIT = {kind: 1 << number for number, kind in enumerate(KINDS)}
-# What the options of `quillet find` ask for. A record is wanted when one of the roles takes it.
+_USES: dict[str, int] = _host.USES
+
+
+def _uses(records: str, occurrences: str = "") -> int:
+    """The bits of what records and occurrences say of a name."""
+    found = 0
+    for word in records.split():
+        found |= _USES[word]
+    for word in occurrences.split():
+        found |= _host.ROLE_USES[word]
+    return found
+
+
+# What the options of `quillet find` ask for.
 ROLES = {
-    "set": _BIT["set"] | _BIT["within_expr"],
-    "get": _BIT["get"],
-    "call": _BIT["called"],
-    "import": _BIT["import"] | _BIT["from_import"] | _BIT["import_as"],
-    "param": _host.PARAMETER_USE,
-    "hint": _BIT["hint"],
+    "set": _uses("set within_expr", "definition write"),
+    "get": _uses("get", "read call"),
+    "call": _uses("called", "call"),
+    "import": _uses("import from_import import_as", "import"),
+    "param": _uses("parameter"),
+    "hint": _uses("hint"),
+    "def": _uses("define"),
+    "delete": _uses("", "delete"),
+    "keyword": _uses("", "keyword"),
+    "decorator": _uses("decorator"),
+    "base": _uses("base"),
+    "raise": _uses("raise"),
+    "annotation": _uses("annotation"),
 }
-_ALL_USES = sum(_BIT.values()) | _host.PARAMETER_USE
+_ALL_USES = _USES["all"]
+# Where an occurrence stands, by the bits of `Hit.flags`.
+FLAGS: tuple[str, ...] = _host.NAME_FLAG_WORDS
 # A thread of its own is worth while for so much source.
 _BYTES_A_THREAD = 1 << 19
 
 
 class Hit(NamedTuple):
-    """A record that answers a question. `path` is as stored; lines and columns count from 1."""
+    """A record or an occurrence that answers a question. `path` is as stored; lines and columns count from 1.
+
+    `kind` is that of the record, and of an occurrence that no record tells of the kind of the record that
+    would, or its role. `role` is None where there is no occurrence of the name.
+    """
 
     path: bytes
     line: int
@@ -43,6 +68,8 @@ class Hit(NamedTuple):
     detail: str
     is_parameter: bool
     opens: int
+    role: str | None
+    flags: int
 
 
 class FileRow(NamedTuple):
@@ -60,13 +87,14 @@ class FileRow(NamedTuple):
 
 
 class Query(NamedTuple):
-    """A question for a name. `match` is exact, suffix or glob; no roles means every record."""
+    """A question for a name. `match` is exact, suffix or glob; no roles means all of them."""
 
     name: str
     match: str
     roles: tuple[str, ...] = ()
     returns: bool = False
     scope: str | None = None
+    path: str | None = None
 
     def native(self, *, with_lines: bool = False) -> _host.Question:
         uses = 0
@@ -131,12 +159,16 @@ class Sources:
 
     def find(self, query: Query) -> Iterator[Hit]:
         """The records that a question asks for, by path, line and column, as they are found."""
-        for facts in self.answers(query.native()):
+        for facts in self.answers(query):
             yield from facts.hits
 
-    def answers(self, question: _host.Question) -> Iterator[FileFacts]:
+    def answers(self, query: Query, *, with_lines: bool = False) -> Iterator[FileFacts]:
         """The same a file, with the files that hold an answer alone."""
-        for facts in self.facts(self.candidates(question), question):
+        question = query.native(with_lines=with_lines)
+        rows = self.candidates(question)
+        if query.path is not None:
+            rows = [row for row in rows if is_like(self.shown_path(row.path), query.path)]
+        for facts in self.facts(rows, question):
             if facts.hits:
                 yield facts
 
@@ -155,7 +187,7 @@ class Sources:
 
     def analysed(self, rows: list[FileRow], form: _host.Format) -> Iterator[tuple[FileRow, _host.FileResult]]:
         """What a format writes of files, on as many threads as they are worth."""
-        from quillet._batch import available_cores, decode_source, native_language_of
+        from quillet._languages import available_cores, decode_source, native_language_of
 
         if not rows:
             return
@@ -309,6 +341,14 @@ def is_as_known(path: str, status: os.stat_result, row: FileRow) -> bool:
             return _host.HashOfSource(file.read()) == row.hash
     except OSError:
         return False
+
+
+def is_like(path: str, pattern: str) -> bool:
+    """Whether a path, or the end of it from a separator on, fits a pattern."""
+    from fnmatch import fnmatchcase
+
+    path = path.replace(os.sep, "/")
+    return fnmatchcase(path, pattern) or fnmatchcase(path, f"*/{pattern}")
 
 
 def definitions_in(hits: Iterable[Hit], *, imports: bool = False) -> list[Hit]:

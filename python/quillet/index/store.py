@@ -10,7 +10,6 @@ is only ever a hint where to look.
 
 from __future__ import annotations
 
-import json
 import os
 import stat
 import sys
@@ -91,13 +90,13 @@ def read_index(path: str) -> Stored:
     try:
         native = _host.NameIndex(data)
         return Stored(native, _settings_of(native.settings))
-    except (ValueError, KeyError, TypeError) as error:
+    except ValueError as error:
         raise StaleIndex(f"{path}: the index is damaged; make it anew with: quillet index") from error
 
 
 def write_index(path: str, writer: _host.NameIndexWriter, settings: Settings) -> None:
     """Puts a new index in the place of an old one. The caller holds the lock. Raises `IndexProblem`."""
-    data = writer.Finish(json.dumps(settings._asdict(), separators=(",", ":")).encode())
+    data = writer.Finish(settings_text(settings))
     unfinished = path + ".new"
     with explained(path):
         with suppress(FileNotFoundError):
@@ -148,15 +147,20 @@ def explained(path: str) -> Iterator[None]:
         raise IndexProblem(f"{path}: {error.strerror or error}") from error
 
 
+def settings_text(settings: Settings) -> bytes:
+    """Settings as an index keeps them. No path holds a NUL."""
+    version = "{}.{}".format(*settings.python)
+    parts = (version, str(int(settings.gitignore)), settings.made_by, *settings.roots)
+    return "\0".join(parts).encode("utf-8", "surrogateescape")
+
+
 def _settings_of(text: bytes) -> Settings:
-    values = json.loads(text)
-    roots = tuple(str(root) for root in values["roots"])
-    major, minor = values["python"]
-    if not (isinstance(major, int) and isinstance(minor, int)):
-        raise TypeError("a version is two numbers")
-    if (major, minor) != (2, 7) and not (major == 3 and 0 <= minor < 100):
+    version, gitignore, made_by, *roots = text.decode("utf-8", "surrogateescape").split("\0")
+    major, _, minor = version.partition(".")
+    python = int(major), int(minor)
+    if python != (2, 7) and not (python[0] == 3 and 0 <= python[1] < 100):
         raise ValueError("a version that there is not")
-    return Settings(roots, (major, minor), bool(values["gitignore"]), str(values["made_by"]))
+    return Settings(tuple(roots), python, gitignore == "1", made_by)
 
 
 # ---- the lock ----

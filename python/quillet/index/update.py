@@ -15,7 +15,7 @@ from collections.abc import Callable, Iterator
 from contextlib import suppress
 from typing import NamedTuple
 
-from quillet._batch import available_cores, decode_source, native_language_of
+from quillet._languages import available_cores, decode_source, native_language_of
 from quillet.cli.files import find_files, problem_of
 from quillet.index.git import keep_out_of_git
 from quillet.index.paths import StoredPaths, full_path, is_below, stored_path
@@ -245,8 +245,8 @@ class _Run:
                 if problem is not None:
                     self._report(file.path, problem)
                 errors = len(result.errors) + len(result.reports)
-                # What was read counts, if it is another file than the one that was looked at.
-                mtime_ns = file.mtime_ns if problem is not None or result.byte_count == file.size else _UNTRUSTED
+                # A file that could not be read, or is another one by now, is looked at again next time.
+                mtime_ns = file.mtime_ns if result.byte_count == file.size else _UNTRUSTED
                 records += writer.Add(file.stored, file.size, mtime_ns, result.line_count, errors, problem, result)
                 self._reports.advance()
         finally:

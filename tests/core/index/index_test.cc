@@ -69,7 +69,7 @@ TEST(Words, TablesNumberWordsInOrder) {
 }
 
 TEST(Words, OfAFileHaveTheUsesOfTheirRecords) {
-  const auto writer = MakeWordsWriter();
+  const auto writer = MakeWordsWriter(testing::kPy3);
   const std::string written =
       Written(*writer, "import os.path\nclass Shop:\n  def add(self, item):\n    self.items.append(1)\n");
   FileWords words;
@@ -81,9 +81,11 @@ TEST(Words, OfAFileHaveTheUsesOfTheirRecords) {
     }
     return Uses{0};
   };
-  EXPECT_EQ(uses_of("os"), UseOfKind(RecordKind::kSet) | UseOfKind(RecordKind::kImport));
-  EXPECT_EQ(uses_of("Shop"), UseOfKind(RecordKind::kSet) | kScopeUse);
-  EXPECT_EQ(uses_of("add"), UseOfKind(RecordKind::kSet) | kScopeUse);
+  EXPECT_EQ(uses_of("os"), UseOfKind(RecordKind::kSet) | UseOfKind(RecordKind::kImport) | UseOfRole(NameRole::kImport));
+  const Uses defined = UseOfKind(RecordKind::kSet) | kScopeUse | UseOfRole(NameRole::kDefinition) | kDefineUse;
+  EXPECT_EQ(uses_of("Shop"), defined);
+  EXPECT_EQ(uses_of("add"), defined);
+  EXPECT_EQ(uses_of("path"), UseOfRole(NameRole::kImport));
   EXPECT_NE(uses_of("item") & kParameterUse, 0u);
   EXPECT_NE(uses_of("append") & UseOfKind(RecordKind::kCalled), 0u);
   EXPECT_FALSE(ReadFileWords(Text(written).substr(0, written.size() - 1), words));
@@ -164,7 +166,7 @@ constexpr Text kShop =
     "    def path(self, name):\n"
     "        return os.path.join('shop', name)\n";
 
-Question QuestionFor(Match match, Text name, Uses uses = kRecordUses) {
+Question QuestionFor(Match match, Text name, Uses uses = kAllUses) {
   Question question;
   question.match = match;
   question.name = name;
@@ -174,7 +176,7 @@ Question QuestionFor(Match match, Text name, Uses uses = kRecordUses) {
 
 // The answers as "line:column name", in their order.
 std::vector<std::string> AnswersIn(Text source, const Question& question) {
-  const auto writer = QuestionWriters(question)();
+  const auto writer = MakeQuestionWriter(question, testing::kPy3);
   std::vector<std::string> found;
   EXPECT_TRUE(ReadAnswers(Written(*writer, source), [&](const Answer& answer, Text) {
     found.push_back(std::to_string(answer.line) + ":" + std::to_string(answer.column) + " " + std::string(answer.name));
@@ -212,6 +214,20 @@ TEST(Questions, FindWhatFunctionsReturn) {
   EXPECT_EQ(AnswersIn(kShop, question), Found{});
 }
 
+TEST(Questions, FindOccurrencesThatNoRecordTellsOf) {
+  const Text source = "@plain\nclass A(plain.B, k=1):\n  x = f(a=1) + f(2) + f(*x) + g().f(b=3)\n  raise plain(E)\n";
+  EXPECT_EQ(AnswersIn(source, QuestionFor(Match::kExact, "f", UseOfRole(NameRole::kCall))),
+            (Found{"3:7 f", "3:16 f", "3:23 f"}));
+  EXPECT_EQ(AnswersIn(source, QuestionFor(Match::kSuffix, ".f", UseOfRole(NameRole::kCall))), Found{"3:35 .f"});
+  EXPECT_EQ(AnswersIn(source, QuestionFor(Match::kExact, "plain", kDecoratorUse)), Found{"1:2 plain"});
+  EXPECT_EQ(AnswersIn(source, QuestionFor(Match::kExact, "plain.B", kBaseUse)), Found{"2:9 plain.B"});
+  EXPECT_EQ(AnswersIn(source, QuestionFor(Match::kExact, "plain", kRaiseUse)), Found{"4:9 plain"});
+  EXPECT_EQ(AnswersIn(source, QuestionFor(Match::kGlob, "?", UseOfRole(NameRole::kKeyword))),
+            (Found{"2:18 k", "3:9 a", "3:37 b"}));
+  const Uses calls = UseOfKind(RecordKind::kCalled) | UseOfRole(NameRole::kCall);
+  EXPECT_EQ(AnswersIn(source, QuestionFor(Match::kExact, "plain", calls)), Found{"4:9 plain"});
+}
+
 TEST(Questions, StayInAScope) {
   Question question = QuestionFor(Match::kExact, "name");
   question.has_scope = true;
@@ -229,7 +245,7 @@ TEST(Questions, HandOnTheSourceLineCutWhereItIsLong) {
   Question question = QuestionFor(Match::kExact, "x");
   question.with_lines = true;
   const std::string source = "x = 1; x = 2\r\ny\nx = '" + std::string(9000, 'a') + "'";
-  const auto writer = QuestionWriters(question)();
+  const auto writer = MakeQuestionWriter(question, testing::kPy3);
   std::vector<std::string> lines;
   const std::string written = Written(*writer, source);
   ASSERT_TRUE(ReadAnswers(written, [&](const Answer&, Text line) { lines.emplace_back(line); }));
@@ -247,7 +263,7 @@ struct Repository {
   NameIndexWriter writer;
 
   void Add(const std::string& path, Text source, int64_t time = 7) {
-    const auto words = MakeWordsWriter();
+    const auto words = MakeWordsWriter(testing::kPy3);
     IndexedFile file;
     file.path = path;
     file.size = source.size();
@@ -293,24 +309,23 @@ TEST(Index, HoldsWhatWasPutIn) {
 TEST(Index, NamesTheFilesThatMayAnswer) {
   const std::string bytes = SmallIndex();
   const NameIndex index(bytes);
-  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "LIMIT")), (Found{"bad.py", "shop.py"}));
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "LIMIT")), Found{"shop.py"});
   EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "total", UseOfKind(RecordKind::kSet))),
-            (Found{"b/x.py", "b/y.py", "bad.py"}));
-  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "total", UseOfKind(RecordKind::kGet))),
-            (Found{"b/y.py", "bad.py"}));
-  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "x.total.y")), (Found{"b/y.py", "bad.py"}));
-  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kGlob, "tot*")), (Found{"b/x.py", "b/y.py", "bad.py"}));
-  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kGlob, "*MI?")), (Found{"bad.py", "shop.py"}));
-  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kGlob, "*")).size(), 4u);
+            (Found{"b/x.py", "b/y.py"}));
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "total", UseOfKind(RecordKind::kGet))), Found{"b/y.py"});
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kExact, "x.total.y")), Found{"b/y.py"});
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kGlob, "tot*")), (Found{"b/x.py", "b/y.py"}));
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kGlob, "*MI?")), Found{"shop.py"});
+  EXPECT_EQ(PathsFor(index, QuestionFor(Match::kGlob, "*")).size(), 3u);
   Question question = QuestionFor(Match::kExact, "total", 0);
   question.returns = true;
-  EXPECT_EQ(PathsFor(index, question), (Found{"b/x.py", "bad.py"}));
+  EXPECT_EQ(PathsFor(index, question), Found{"b/x.py"});
   question = QuestionFor(Match::kExact, "self");
   question.has_scope = true;
   question.scope = "Shop.add";
-  EXPECT_EQ(PathsFor(index, question), (Found{"bad.py", "shop.py"}));
+  EXPECT_EQ(PathsFor(index, question), Found{"shop.py"});
   question.scope = "Shop.nothing";
-  EXPECT_EQ(PathsFor(index, question), Found{"bad.py"});
+  EXPECT_EQ(PathsFor(index, question), Found{});
 }
 
 TEST(Index, NeverMissesAFileThatAnswers) {
@@ -329,8 +344,7 @@ TEST(Index, NeverMissesAFileThatAnswers) {
     for (const Match match : {Match::kExact, Match::kSuffix, Match::kGlob}) {
       for (const std::string& form : {name, "*" + name, name + "*", "?" + name.substr(1), "." + name}) {
         for (const bool returns : {false, true}) {
-          for (const Uses uses :
-               {kRecordUses, UseOfKind(RecordKind::kSet), UseOfKind(RecordKind::kHint), kParameterUse}) {
+          for (const Uses uses : {kAllUses, UseOfKind(RecordKind::kSet), UseOfKind(RecordKind::kHint), kParameterUse}) {
             Question question = QuestionFor(match, form, uses);
             question.returns = returns;
             const Found candidates = PathsFor(index, question);
@@ -382,7 +396,7 @@ TEST(Index, ManyUsesAndWordsSurvive) {
   for (int i = 0; i < 40; ++i) repository.Add(std::to_string(i), Text(source).substr(0, source.size() * i / 40));
   const std::string bytes = repository.writer.Finish("");
   const NameIndex index(bytes);
-  const auto words = MakeWordsWriter();
+  const auto words = MakeWordsWriter(testing::kPy3);
   const std::string written = Written(*words, Text(source).substr(0, source.size() * 39 / 40));
   FileWords expected;
   ASSERT_TRUE(ReadFileWords(written, expected));
