@@ -13,6 +13,7 @@ left that no rule explains:
 from __future__ import annotations
 
 import argparse
+import ast
 import json
 import re
 import subprocess
@@ -36,7 +37,7 @@ from survey import NOT_THE_LIBRARY, Library, libraries
 ORACLE = Path(__file__).resolve().parent / "names_oracle.py"
 DOCUMENT = Path(__file__).resolve().parent.parent.parent / "docs" / "names-agreement.md"
 TABLE = re.compile(r"(?<=<!-- counts -->\n).*?(?=<!-- end of counts -->)", re.DOTALL)
-VERSIONS = ((2, 7), (3, 8), (3, 11), (3, 12), (3, 13))
+VERSIONS = ((2, 7), (3, 8), (3, 9), (3, 10), (3, 11), (3, 12), (3, 13))
 QUESTIONS = (
     "is_parameter", "is_global", "is_declared_global", "is_nonlocal", "is_local", "is_free", "is_imported",
     "is_assigned", "is_referenced", "is_annotated", "is_namespace",
@@ -545,7 +546,12 @@ class NamesComparison:
         symbol = own[occurrence.scope].get(variable.name)
         if symbol is None:
             # Mentioned only by annotations that are never evaluated.
-            return "" if "annotation" in occurrence.flags else "in no table"
+            if "annotation" in occurrence.flags:
+                return ""
+            # `(x): int` says nothing of x.
+            front = self._said["rows"][occurrence.line - 1][: occurrence.column - 1].rstrip()
+            is_bare = (occurrence.role, occurrence.kind) == ("definition", "variable")
+            return "" if is_bare and front.endswith(b"(") else "in no table"
         if self._is_of_class(occurrence.scope, variable):
             return ""
         if symbol.is_free():
@@ -579,7 +585,11 @@ class NamesComparison:
             # The parameters of a generic class, its bases and their bounds are private to the class itself.
             below = self._scopes[scope]
             if below.kind == "type parameters" and self._opens_class(scope):
-                return self._private(below.name, name)
+                mangled = self._private(below.name, name)
+                # From 3.13 on only the names of the parameters are private there.
+                own = {symbol.name for symbol in below.symbols if symbol.is_assigned()}
+                if self._version < (3, 13) or mangled in own:
+                    return mangled
             scope = below.parent
         return name if scope is None else self._private(self._scopes[scope].name, name)
 
@@ -602,7 +612,7 @@ class NamesComparison:
             (index, occurrence) for index, occurrence in enumerate(self._all)
             if occurrence.flags & {"comment", "string"}
         ]  # fmt: skip
-        self._report.counts["names in type comments"] += sum("comment" in o.flags for _, o in rest)
+        self._compare_comments([o for _, o in rest if "comment" in o.flags])
         strings = [(i, o) for i, o in rest if "comment" not in o.flags]
         at = 0
         self._report.counts["names in strings"] += len(strings)
@@ -625,6 +635,24 @@ class NamesComparison:
                 text = f"{sorted(found)}, not {names}"
                 self._differ("strings of annotations", "other names", line, column, text)
         self._report.counts["names in strings beside annotations"] += len(strings) - at
+
+    def _compare_comments(self, found: list[Occurrence]) -> None:
+        """The names in a type comment are those of what its text is to `ast`."""
+        by_line: dict[int, list[str]] = {}
+        for occurrence in found:
+            by_line.setdefault(occurrence.line, []).append(unicodedata.normalize("NFKC", occurrence.text))
+        for line, names in by_line.items():
+            self._report.count("type comments with names")
+            row = self._said["rows"][line - 1].decode("utf-8")
+            text = row[row.index("type:", row.index("#")) + len("type:") :].partition("#")[0].strip()
+            try:
+                tree = ast.parse(text, mode="func_type" if "->" in text else "eval")
+            except SyntaxError:
+                self._differ("type comments with names", "no expression", line, 0, text)
+                continue
+            expected = [getattr(node, "id", None) or getattr(node, "attr", "") for node in ast.walk(tree)]
+            if sorted(names) != sorted(filter(None, expected)):
+                self._differ("type comments with names", "other names", line, 0, f"{names}: {text}")
 
 
 # ---- files and libraries ----

@@ -1,5 +1,6 @@
 """What quillet says of names is what `symtable` and `ast` say, over a sample of the running Python's own library.
 
+The sources in tests/names hold what libraries hardly do: each kind of scope in each other, names in every place.
 QUILLET_FULL=1 takes the whole libraries of all Pythons that are found; docs/names-agreement.md shows the counts.
 """
 
@@ -17,6 +18,16 @@ from survey import Library, libraries, library_of
 
 FULL = os.environ.get("QUILLET_FULL") == "1"
 EACH_NTH_FILE = 40
+
+# With the first version that takes them.
+SOURCES = {
+    "places.py": (3, 8),
+    "scopes.py": (3, 8),
+    "future_annotations.py": (3, 8),
+    "type_parameters.py": (3, 12),
+    "python_2.py": (2, 7),
+}
+SOURCES_FOLDER = Path(__file__).resolve().parent.parent / "names"
 
 # The files of the library that ask most of a reader of names, where they are there.
 TRICKY = """
@@ -48,6 +59,17 @@ def test_the_library_is_bound_alike() -> None:
     library = library_of(sys.executable)
     assert library is not None
     check(compare_library(library, sample_of(library)))
+
+
+@pytest.mark.parametrize("version", VERSIONS, ids=lambda version: ".".join(map(str, version)))
+def test_what_libraries_hardly_hold_is_bound_alike(version: tuple[int, int]) -> None:
+    library = libraries().get(version)
+    if library is None:
+        pytest.skip("this Python is not here")
+    files = [SOURCES_FOLDER / name for name, first in SOURCES.items() if first[0] == version[0] and first <= version]
+    report = compare_library(library, files)
+    assert report.left == {}
+    assert (report.files, report.refused) == (len(files), 0)
 
 
 @pytest.mark.parametrize("version", VERSIONS, ids=lambda version: ".".join(map(str, version)))
