@@ -664,7 +664,7 @@ def strings_of_type(node, inside=False):
 
 
 def names_of_text(text):
-    """The names of a text, sorted, where it is an expression, otherwise None."""
+    """The names of a text and of the strings in it, sorted, where it is an expression, otherwise None."""
     try:
         # `*args: "*Ts"` is a type as well.
         tree = ast.parse(text.strip(" \t*"), mode="eval").body
@@ -678,6 +678,9 @@ def names_of_text(text):
             found.append(node.attr)
         elif isinstance(node, (ast.keyword, ast.arg)) and node.arg:
             found.append(node.arg)
+    for string in strings_of_type(tree):
+        if string is not tree:
+            found += names_of_text(string.value) or []
     return sorted(found)
 
 
