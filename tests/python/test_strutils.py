@@ -291,3 +291,16 @@ def test_a_place_inside_a_text():
     assert place != 7
     place.lineno = 3
     assert repr(place) == "TextPosInfo(lineno=3, char_col=-1, utf8_col=7)"
+
+
+def test_a_bytearray_keeps_its_size_while_a_number_behind_it_is_converted() -> None:
+    buffer = bytearray(b"abc " * 1000)
+
+    class End:
+        def __index__(self) -> int:
+            with pytest.raises(BufferError):
+                buffer.clear()
+            return 4000
+
+    assert strutils.IsSpaceAtUtf8Pos(buffer, 3, End())
+    buffer.clear()
