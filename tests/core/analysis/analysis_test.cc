@@ -123,6 +123,18 @@ class FlowWithHooks : public ::testing::Test {
   std::unique_ptr<LogicalLine> line_;
 };
 
+// The tokens cannot be told then, as a host's join would say.
+TEST_F(FlowWithHooks, AFailureOfAWalkOverRemovedTokensIsReportedAsThat) {
+  hooks_.on_append = [] { ThrowError(ErrorKind::kKeyError, "k"); };
+  std::vector<Token> toks(line_->toks.begin(), line_->toks.end());
+  toks.insert(toks.begin() + 1, Token{});
+  line_->SetPositions({{0, 0}, {0, 1}, {0, 2}, {0, 4}});
+  line_->toks = toks;
+  line_->token_count = 4;
+  EXPECT_EQ(AnalyzeLine(*line_).error, "");
+  EXPECT_EQ(ReportedErrors(), Names{"TypeError('sequence item 1: expected str instance, NoneType found')"});
+}
+
 TEST_F(FlowWithHooks, AnyOtherFailureOfAWalkIsReportedWithTheLinesTokens) {
   hooks_.on_append = [] { ThrowError(ErrorKind::kKeyError, "k"); };
   EXPECT_EQ(AnalyzeLine(*line_).error, "");
