@@ -38,7 +38,8 @@ std::string Full(Text source, TextOptions options = {}, Version version = kPy3) 
 TEST(DottedNames, AChainOfAttributesIsItsSource) { EXPECT_EQ(Plain("a.b.c", kDotted), "a.b.c"); }
 
 TEST(DottedNames, CallsSubscriptsAndNumbersHaveNone) {
-  for (const Text source : {"a.b()", "a[0]", "1", "'s'", "a + b", "[a]", "(a, b)", "not a", "()"}) {
+  for (const Text source : {"a.b()", "a[0]", "1", "'s'", "a + b", "[a]", "(a, b)", "not a", "()", "[a].b", "(a, b).c",
+                            "(a + b).c", "{a: b}.c.d", "(lambda: a).b", "'s'.a", "f().a"}) {
     EXPECT_EQ(Plain(source, kDotted), "<none>") << source;
     EXPECT_EQ(Full(source, kDotted), "<none>") << source;
   }
