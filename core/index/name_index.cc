@@ -199,19 +199,26 @@ std::string NameIndexWriter::Finish(Text settings) {
                            [](const File& a, const File& b) { return a.file.path == b.file.path; }),
                files_.end());
 
-  // Numbers by the number of files, then by first use: so files that share no words with others have
-  // theirs one behind the other, and the same files give the same bytes whatever run found them.
+  // Numbers by the number of files, then by the first of them: so words that no other file has stand one
+  // behind the other; then by their bytes, so that the same files give the same index whatever runs made it.
   const size_t all = words_.entries().size();
   std::vector<uint32_t> file_counts(all, 0);
   std::vector<uint32_t> order;
   order.reserve(all);
   std::vector<std::pair<Uses, uint32_t>> uses;
-  for (const File& file : files_) {
-    for (const Occurrence& word : file.words) {
-      if (file_counts[word.word]++ == 0) order.push_back(word.word);
+  std::vector<uint32_t> first_files(all, 0);
+  for (uint32_t file = 0; file < files_.size(); ++file) {
+    for (const Occurrence& word : files_[file].words) {
+      if (file_counts[word.word]++ != 0) continue;
+      first_files[word.word] = file;
+      order.push_back(word.word);
     }
   }
-  std::stable_sort(order.begin(), order.end(), [&](uint32_t a, uint32_t b) { return file_counts[a] > file_counts[b]; });
+  std::sort(order.begin(), order.end(), [&](uint32_t a, uint32_t b) {
+    if (file_counts[a] != file_counts[b]) return file_counts[a] > file_counts[b];
+    if (first_files[a] != first_files[b]) return first_files[a] < first_files[b];
+    return words_[a].word < words_[b].word;
+  });
   std::vector<uint32_t> numbers(all, 0);
   for (uint32_t i = 0; i < order.size(); ++i) numbers[order[i]] = i;
 

@@ -381,6 +381,21 @@ TEST(Index, TakesFilesOverAndForgetsWordsThatAreGone) {
   EXPECT_EQ(fresh.writer.Finish("settings"), again);
 }
 
+TEST(Index, IsTheSameWhateverCameBefore) {
+  const std::string sources[] = {"zebra = apple = 1\nmango(apple)\n", "kiwi = fig\nzebra = date\n",
+                                 "pear.plum = kiwi\n"};
+  Repository fresh, first, second;
+  for (int i = 0; i < 3; ++i) fresh.Add(std::to_string(i), sources[i]);
+  const std::string expected = fresh.writer.Finish("");
+  first.Add("2", sources[2]);
+  first.Add("0", sources[0]);
+  const std::string bytes = first.writer.Finish("");
+  const NameIndex before(bytes);
+  second.Add("1", sources[1]);
+  for (size_t i = 0; i < before.size(); ++i) second.writer.Keep(before, i, before[i].size, before[i].time);
+  EXPECT_EQ(second.writer.Finish(""), expected);
+}
+
 TEST(Index, ManyUsesAndWordsSurvive) {
   Repository repository;
   std::string source;
