@@ -6,6 +6,7 @@
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/errors.h"
+#include "bindings/interpreter_lock.h"
 #include "bindings/utf8_arg.h"
 #include "tokens/bits.h"
 #include "tokens/clock.h"
@@ -161,7 +162,7 @@ constexpr const char* kClockName = "__TimeFunc";
 
 // The host's clock is looked up at each call, since a test may put another in its place.
 double HostSeconds() {
-  const nb::gil_scoped_acquire lock;
+  const Locked lock;
   const nb::object seconds = nb::module_::import_(kClockModule).attr(kClockName)();
   const double value = PyFloat_AsDouble(seconds.ptr());
   if (value == -1.0 && PyErr_Occurred()) throw nb::python_error();

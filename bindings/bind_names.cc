@@ -8,7 +8,9 @@
 
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
+#include "bindings/interpreter_lock.h"
 #include "bindings/names_object.h"
+#include "bindings/signals.h"
 #include "names/binder.h"
 
 namespace quillet::host {
@@ -47,7 +49,9 @@ nb::object IndexOf(uint32_t index) {
   return index == kNoIndex ? nb::object(nb::none()) : nb::steal(PyLong_FromUnsignedLong(index));
 }
 
+// The host's code, which may run whenever an object is made, may have shortened the list.
 nb::object ItemOf(const nb::list& list, size_t i) {
+  if (i >= list.size()) ThrowError(ErrorKind::kValueError, "an object a symbol is needed");
   return nb::borrow(PyList_GET_ITEM(list.ptr(), static_cast<Py_ssize_t>(i)));
 }
 
@@ -75,7 +79,7 @@ class Places {
 
 // NFKC by the host's own tables, which are those that the language goes by.
 bool NormalFormOf(Text name, std::string& normal_form) {
-  nb::gil_scoped_acquire lock;
+  const Locked lock;
   try {
     const nb::object text = nb::steal(PyUnicode_DecodeUTF8(name.data(), static_cast<Py_ssize_t>(name.size()), nullptr));
     if (!text.is_valid()) throw nb::python_error();
@@ -93,7 +97,8 @@ std::unique_ptr<FileNames> BoundNames(nb::handle version, nb::handle source) {
   if (text.text().size() > SourceText::kMaxSize) ThrowError(ErrorKind::kValueError, "the source is too large");
   std::shared_ptr<const Bindings> bindings;
   {
-    nb::gil_scoped_release unlocked;
+    const Unlocked unlocked;
+    const ThreadStopQuestion signals(HandlesSignals());
     bindings = std::make_shared<Bindings>(NameBinder(language).Bind(text.text()));
   }
   return std::make_unique<FileNames>(std::move(bindings));

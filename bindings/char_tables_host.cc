@@ -4,8 +4,7 @@
 // loader takes the lock by itself. It runs a handful of times in a process.
 #include "bindings/char_tables_host.h"
 
-#include <Python.h>
-
+#include "bindings/interpreter_lock.h"
 #include "foundations/char_tables.h"
 
 namespace quillet {
@@ -39,9 +38,8 @@ uint8_t HostClassOf(Py_UCS4 code_point) {
 }
 
 void LoadHostPage(uint32_t first, uint8_t* classes) {
-  const PyGILState_STATE state = PyGILState_Ensure();
+  const host::Locked lock;
   for (uint32_t i = 0; i < kCharPageSize; ++i) classes[i] = HostClassOf(first + i);
-  PyGILState_Release(state);
 }
 
 }  // namespace

@@ -9,6 +9,8 @@
 #include "bindings/convert.h"
 #include "bindings/errors.h"
 #include "bindings/host_call.h"
+#include "bindings/interpreter_lock.h"
+#include "bindings/signals.h"
 #include "foundations/console.h"
 #include "foundations/errors.h"
 
@@ -16,9 +18,15 @@ namespace quillet::host {
 namespace {
 
 void PrintWithHost(Text line) {
-  nb::gil_scoped_acquire lock;
+  const Locked lock;
   const HostCall under_way;
-  nb::module_::import_("builtins").attr("print")(StrOf(line));
+  try {
+    nb::module_::import_("builtins").attr("print")(StrOf(line));
+  } catch (nb::python_error& error) {
+    // An interrupt that came meanwhile is no failure of the walk that has something to say.
+    if (error.matches(PyExc_Exception)) throw;
+    throw StoppedByHost(error);
+  }
 }
 
 // Makes the exception the one that is being handled while it lives, as an except clause does.
@@ -44,14 +52,14 @@ class Handling {
 };
 
 void ReportToHost(const std::exception_ptr& exception, bool suppress_gui) {
-  nb::gil_scoped_acquire lock;
+  const Locked lock;
   const HostCall under_way;
   Handling handling(exception);
   nb::module_::import_("quillet.reflect").attr("ReportCurrentException")(nb::arg("suppress_gui") = suppress_gui);
 }
 
 std::string DescribeByHost(const std::exception_ptr& exception) {
-  nb::gil_scoped_acquire lock;
+  const Locked lock;
   const HostCall under_way;
   try {
     std::rethrow_exception(exception);
@@ -84,7 +92,7 @@ nb::object TracebackOf(const std::exception_ptr& exception) {
 }
 
 std::exception_ptr ReplaceByHost(const std::string& message, const std::exception_ptr& failure) {
-  nb::gil_scoped_acquire lock;
+  const Locked lock;
   try {
     CallingHost([&] {
       const nb::object error = nb::handle(PyExc_ValueError)(StrOf(message));

@@ -27,6 +27,7 @@
 
 #include "bindings/bindings.h"
 #include "bindings/errors.h"
+#include "bindings/interpreter_lock.h"
 #include "foundations/ref.h"
 #include "foundations/thread_use.h"
 
@@ -53,7 +54,10 @@ inline bool IsAnotherUnderWay() { return under_way::count.load(std::memory_order
 class HostCall {
  public:
   HostCall() { under_way::Add(1); }
-  ~HostCall() { under_way::Add(-1); }
+  ~HostCall() {
+    WaitIfThreadWasEnded();
+    under_way::Add(-1);
+  }
   HostCall(const HostCall&) = delete;
   HostCall& operator=(const HostCall&) = delete;
 };

@@ -47,6 +47,13 @@ class LineObject final : public LineHooks {
   // Fills the line from a row of a cut source.
   void SetRow(const Ref<SourceText>& source, const LineRow& row, std::shared_ptr<SharedStore> shared);
 
+  // Says that the row was analysed already, and which records of the shared store are its.
+  void SetAnalyzed(uint32_t begin, uint32_t end, uint32_t arg_begin, uint32_t arg_end) {
+    line_->ReadFrom(&shared_->store, begin, end, arg_begin, arg_end);
+    line_->parsed = true;
+    writes_to_shared_ = true;
+  }
+
   // ---- fields ----
   nb::object GetType() const;
   void SetType(nb::handle text);

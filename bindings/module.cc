@@ -1,7 +1,7 @@
 // The entry of quillet.tarvex: defines its classes and exposes them to the host.
 //
-// The module's state (type objects, the map from nodes to their wrappers) is the process's, so it
-// serves one interpreter: a load into a second one is an ImportError.
+// The module's state (type objects, the map from nodes to their wrappers) is the process's, so it serves
+// one interpreter, the main one: a load into any other is an ImportError, whichever comes first.
 #include <string>
 
 #include "bindings/bindings.h"
@@ -9,13 +9,9 @@
 namespace quillet::host {
 namespace {
 
-constexpr const char* kOneInterpreter = "quillet.tarvex is in use by another interpreter of this process";
+constexpr const char* kMainAlone = "quillet.tarvex serves the main interpreter of a process alone";
 
-// True for the interpreter that loaded the module first.
-bool IsOwner() {
-  static PyInterpreterState* owner = PyInterpreterState_Get();
-  return owner == PyInterpreterState_Get();
-}
+bool IsMainInterpreter() { return PyInterpreterState_Get() == PyInterpreterState_Main(); }
 
 }  // namespace
 
@@ -30,9 +26,9 @@ nb::module_ SiblingModule(nb::module_& tarvex, const char* name) {
 
 }  // namespace quillet::host
 
-NB_MODULE(tarvex_in_owner, tarvex) {
+NB_MODULE(tarvex_in_main, tarvex) {
   using namespace quillet::host;
-  if (!IsOwner()) throw nb::import_error(kOneInterpreter);
+  if (!IsMainInterpreter()) throw nb::import_error(kMainAlone);
   // Classes and shared objects are the process's and stay to its end on purpose.
   nb::set_leak_warnings(false);
   tarvex.attr("__doc__") = "Per-statement analysis of Python code.";
@@ -65,9 +61,9 @@ NB_MODULE(tarvex_in_owner, tarvex) {
 
 extern "C" NB_EXPORT PyObject* PyInit_tarvex(void);
 extern "C" PyObject* PyInit_tarvex(void) {
-  if (!quillet::host::IsOwner()) {
-    PyErr_SetString(PyExc_ImportError, quillet::host::kOneInterpreter);
+  if (!quillet::host::IsMainInterpreter()) {
+    PyErr_SetString(PyExc_ImportError, quillet::host::kMainAlone);
     return nullptr;
   }
-  return PyInit_tarvex_in_owner();
+  return PyInit_tarvex_in_main();
 }

@@ -2,6 +2,7 @@
 // become str once.
 #pragma once
 
+#include <utility>
 #include <vector>
 
 #include "analysis/record_table.h"
@@ -45,27 +46,36 @@ class ShownTexts {
   std::vector<nb::object> shown_;
 };
 
-// A tuple under construction. Its size and type are the caller's affair.
+// A tuple under construction. It is made with all values at hand: the host's code may run whenever an object is made,
+// and could find a tuple that lacks some.
 class TupleFiller {
  public:
-  TupleFiller(nb::handle type, Py_ssize_t size)
-      : tuple_(Checked(nb::steal(reinterpret_cast<PyTypeObject*>(type.ptr())
-                                     ->tp_alloc(reinterpret_cast<PyTypeObject*>(type.ptr()), size)))) {}
+  // `type` is tuple, or passes CheckRowClass.
+  TupleFiller(nb::handle type, size_t size) : type_(reinterpret_cast<PyTypeObject*>(type.ptr())) {
+    values_.reserve(size);
+  }
 
-  void Add(nb::object value) { PyTuple_SET_ITEM(tuple_.ptr(), next_++, Checked(std::move(value)).release().ptr()); }
+  void Add(nb::object value) { values_.push_back(Checked(std::move(value))); }
   void Add(size_t number) { Add(nb::steal(PyLong_FromSize_t(number))); }
-  nb::object Take() { return std::move(tuple_); }
+  nb::object Take() {
+    nb::object tuple = Checked(nb::steal(type_->tp_alloc(type_, static_cast<Py_ssize_t>(values_.size()))));
+    for (size_t i = 0; i < values_.size(); ++i) PyTuple_SET_ITEM(tuple.ptr(), i, values_[i].release().ptr());
+    return tuple;
+  }
 
  private:
-  nb::object tuple_;
-  Py_ssize_t next_ = 0;
+  PyTypeObject* type_;
+  std::vector<nb::object> values_;
 };
 
-// TypeError for what is no class whose instances TupleFiller can make.
+// TypeError for what is no class whose instances TupleFiller can make. The interpreter itself says whether a class is
+// laid out as tuple is: one of named fields that it made, such as os.stat_result, is not.
 inline void CheckRowClass(nb::handle row_class) {
   if (!PyType_Check(row_class.ptr()) ||
       !PyType_IsSubtype(reinterpret_cast<PyTypeObject*>(row_class.ptr()), &PyTuple_Type))
     ThrowError(ErrorKind::kTypeError, "a class that derives from tuple is needed");
+  if (row_class.ptr() != reinterpret_cast<PyObject*>(&PyTuple_Type))
+    nb::handle(&PyTuple_Type).attr("__new__")(row_class);
 }
 
 }  // namespace quillet::host

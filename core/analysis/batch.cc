@@ -161,7 +161,7 @@ size_t BatchResult::ByteSize() const {
 // ---- the batch ----
 
 BatchAnalyzer::BatchAnalyzer(Options options, std::vector<BatchInput> inputs)
-    : options_(std::move(options)), inputs_(std::move(inputs)), ring_(new Ring(*this, 0, false)) {}
+    : options_(std::move(options)), inputs_(std::move(inputs)), ring_(new Ring(*this, false)) {}
 
 BatchAnalyzer::~BatchAnalyzer() {
   Ring* const ring = ring_;
@@ -172,15 +172,18 @@ BatchAnalyzer::Ring& BatchAnalyzer::TheRing() {
   Ring* ring = ring_;
   if (ring->IsOfThisProcess()) [[likely]]
     return *ring;
-  auto own = std::make_unique<Ring>(*this, handed_out_, was_cancelled_);
+  auto own = std::make_unique<Ring>(*this, false);
   if (ring_.compare_exchange_strong(ring, own.get())) return *own.release();
   return *ring;  // another thread was first
 }
 
 BatchAnalyzer::Wait BatchAnalyzer::Next(BatchResult& result, std::chrono::milliseconds patience) {
-  const Wait wait = TheRing().Next(result, patience);
-  if (wait == Wait::kResult) handed_out_.fetch_add(1);
-  return wait;
+  while (true) {
+    Ring& ring = TheRing();
+    const Wait wait = ring.Next(result, patience);
+    if (wait != Wait::kEnd || !ring.is_dismissed()) return wait;
+    ring_.wait(&ring);
+  }
 }
 
 bool BatchAnalyzer::Next(BatchResult& result) {
@@ -195,15 +198,25 @@ void BatchAnalyzer::Cancel() {
   TheRing().Cancel();
 }
 
+void BatchAnalyzer::DismissThreads() {
+  Ring& ring = TheRing();
+  ring.Dismiss();
+  // The old one stays: readers may still be on their way out of it.
+  ring_ = new Ring(*this, true);
+  ring_.notify_all();
+}
+
 // ---- the ring ----
 
-BatchAnalyzer::Ring::Ring(const BatchAnalyzer& batch, size_t first, bool is_cancelled)
+BatchAnalyzer::Ring::Ring(BatchAnalyzer& batch, bool reader_works)
     : batch_(batch),
       process_(ThisProcess()),
-      next_to_take_(first),
-      next_to_hand_out_(first),
+      next_to_take_(batch.handed_out_),
+      next_to_hand_out_(batch.handed_out_),
       waiting_(std::max<size_t>(batch.options_.most_waiting, 1)),
-      cancelled_(is_cancelled) {}
+      cancelled_(batch.was_cancelled_.load()),
+      started_(reader_works),
+      reader_works_(reader_works) {}
 
 BatchAnalyzer::Ring::~Ring() { Cancel(); }
 
@@ -296,7 +309,7 @@ BatchAnalyzer::Wait BatchAnalyzer::Ring::Next(BatchResult& result, std::chrono::
     result = std::move(*NextSlot());
     NextSlot().reset();
     waiting_bytes_ -= std::min(waiting_bytes_, result.ByteSize());
-    ++next_to_hand_out_;
+    HandedOut();
     wakes_another_reader = IsOver() || NextSlot().has_value();
   }
   may_take_.notify_all();
@@ -314,8 +327,13 @@ BatchAnalyzer::Wait BatchAnalyzer::Ring::NextByReader(BatchResult& result) {
     if (cancelled_) return Wait::kEnd;
     throw;
   }
-  ++next_to_hand_out_;
+  HandedOut();
   return Wait::kResult;
+}
+
+void BatchAnalyzer::Ring::Dismiss() {
+  dismissed_ = true;
+  Cancel();
 }
 
 void BatchAnalyzer::Ring::Cancel() {

@@ -116,13 +116,17 @@ class BatchAnalyzer {
   // Stops, in the middle of a file as well, and waits for that. For any thread but those of the batch.
   void Cancel();
 
+  // Ends the threads, for good: the reader does the work that is left. For a process that is about to lose what
+  // the threads need.
+  void DismissThreads();
+
  private:
   class Worker;
 
   // The threads, and the results that wait for the reader.
   class Ring {
    public:
-    Ring(const BatchAnalyzer& batch, size_t first, bool is_cancelled);
+    Ring(BatchAnalyzer& batch, bool reader_works);
     ~Ring();
     Ring(const Ring&) = delete;
     Ring& operator=(const Ring&) = delete;
@@ -130,6 +134,9 @@ class BatchAnalyzer {
     void Start();
     Wait Next(BatchResult& result, std::chrono::milliseconds patience);
     void Cancel();
+    // Cancels it for another ring that takes its place.
+    void Dismiss();
+    bool is_dismissed() const { return dismissed_; }
     bool IsOfThisProcess() const;
 
    private:
@@ -144,9 +151,10 @@ class BatchAnalyzer {
     std::optional<size_t> Take();
     void Deliver(BatchResult&& result);
     bool IsOver() const { return cancelled_ || next_to_hand_out_ >= batch_.inputs_.size(); }
+    void HandedOut() { batch_.handed_out_ = ++next_to_hand_out_; }
     std::optional<BatchResult>& NextSlot() { return waiting_[next_to_hand_out_ % waiting_.size()]; }
 
-    const BatchAnalyzer& batch_;
+    BatchAnalyzer& batch_;
     const int64_t process_;
 
     std::mutex mutex_;
@@ -157,8 +165,9 @@ class BatchAnalyzer {
     size_t waiting_bytes_ = 0;
     std::vector<std::optional<BatchResult>> waiting_;  // a ring, by index
     std::atomic<bool> cancelled_;
-    bool started_ = false;
-    bool reader_works_ = false;  // no thread could be started
+    std::atomic<bool> dismissed_{false};
+    bool started_;
+    bool reader_works_;
 
     std::mutex join_mutex_;
     std::vector<std::thread> threads_;
@@ -169,6 +178,7 @@ class BatchAnalyzer {
   // The ring of this process. A fork copies a ring without its threads, and with locks that they may hold
   // for ever: the copy is left as it is, for good, and the child goes on with a ring of its own.
   Ring& TheRing();
+  Wait NextOf(Ring& ring, BatchResult& result, std::chrono::milliseconds patience);
 
   const Options options_;
   const std::vector<BatchInput> inputs_;

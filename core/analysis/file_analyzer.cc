@@ -71,7 +71,7 @@ void FileAnalyzer::Analyze(Text bytes) {
   Reset(bytes);
   Cut();
   CPGenAnalyzerImpl& analyzer = AnalyzerForSource();
-  analyzer.set_spells_error_texts(false);
+  analyzer.set_spells_error_texts(options_.keeps_whole_errors);
   const NodePool& pool = analyzer.logical_parser().factory().pool();
   const size_t nodes_before = pool.node_count();
   found_.results.reserve(found_.rows.size());
@@ -89,6 +89,7 @@ void FileAnalyzer::Reset(Text bytes) {
   DropIfHuge(found_.rows);
   DropIfHuge(found_.results);
   DropIfHuge(found_.errors);
+  found_.whole_errors.clear();
   DropIfHuge(found_.store.rows);
   DropIfHuge(found_.store.arg_rows);
   DropIfHuge(found_.source->tokens);
@@ -137,6 +138,7 @@ void FileAnalyzer::AddError(const SyntaxError& error) {
   const std::string& text = *found_.error_texts.insert(error.message()).first;
   const auto from_1 = [](int64_t number) { return static_cast<int32_t>(std::max<int64_t>(number, 1)); };
   found_.errors.push_back({&text, {from_1(error.lineno), from_1(error.offset)}});
+  if (options_.keeps_whole_errors) found_.whole_errors.push_back(error);
 }
 
 size_t FileAnalyzer::MostMemoryOf(const LineRow& row) const {

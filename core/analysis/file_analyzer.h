@@ -49,6 +49,8 @@ class FileAnalyzer {
     // no such switch.
     std::string print_function_grammar_file;
     size_t least_memory_limit = kLeastMemoryLimit;
+    // Whether errors are kept whole as well, with the texts of their lines.
+    bool keeps_whole_errors = false;
   };
 
   explicit FileAnalyzer(const Options& options);
@@ -61,6 +63,7 @@ class FileAnalyzer {
     RecordStore store;
     std::vector<Failure> errors;
     std::unordered_set<std::string> error_texts;  // that those refer to
+    std::vector<SyntaxError> whole_errors;        // the same, where they are kept
   };
 
   // Results stand until the next call. The bytes are copied. OverflowError for a source that takes more

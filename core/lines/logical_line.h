@@ -183,6 +183,15 @@ class LogicalLine {
     row_count_ = arg_row_count_ = 0;
   }
 
+  // Makes the line have rows of a shared store.
+  void ReadFrom(RecordStore* shared, uint32_t begin, uint32_t end, uint32_t arg_begin, uint32_t arg_end) {
+    store_ = shared;
+    row_begin_ = begin;
+    row_count_ = end - begin;
+    arg_row_begin_ = arg_begin;
+    arg_row_count_ = arg_end - arg_begin;
+  }
+
  private:
   RecordStore& store() {
     if (!store_) [[unlikely]]

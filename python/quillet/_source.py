@@ -7,6 +7,7 @@ an encoding line counts on the second line only where the first holds nothing bu
 
 from __future__ import annotations
 
+import codecs
 import re
 
 _BOM = b"\xef\xbb\xbf"
@@ -17,6 +18,9 @@ _WIDE_MARKS = (
     (b"\xfe\xff", "utf-16"),
 )
 _COOKIE = re.compile(rb"[ \t\f]*#[^\r\n]*?coding[:=][ \t]*([-\w.]+)")
+# An escape of three octal digits that is no byte, and a backslash that escapes nothing.
+_ODD_ESCAPE = re.compile(rb"""\\(?:([4-7][0-7]{2})|([^\n\\'"abfnrtvxuUN0-7])|.)""", re.DOTALL)
+_LONGEST_SHOWN = 120
 _COMMENT_OR_BLANK = re.compile(rb"[ \t\f]*(?:#[^\r\n]*)?(?:\r\n|\r|\n)")
 
 
@@ -59,10 +63,35 @@ def to_utf8(source: bytes | bytearray | memoryview | str) -> bytes:
         return source
     try:
         # Some editors append the kind of line end to the name.
-        text = source.decode(re.sub(r"-(?:unix|dos|mac)$", "", name), "replace")
-    except (LookupError, UnicodeError) as error:
-        raise SourceEncodingError(f"cannot read the source as {name!r}: {error}") from error
+        text = _decode(source, re.sub(r"-(?:unix|dos|mac)$", "", name))
+    except Exception as error:  # whatever a codec raises
+        raise SourceEncodingError(f"cannot read the source as {_short(repr(name))}: {_reason(error)}") from error
     return text.encode("utf-8", "surrogatepass")
+
+
+def _decode(source: bytes, encoding: str) -> str:
+    if getattr(codecs.lookup(encoding), "name", None) == "unicode-escape":
+        # Its decoder warns of these, and reads them as what they are replaced by here.
+        source = _ODD_ESCAPE.sub(_plain_escape, source)
+    return source.decode(encoding, "replace")
+
+
+def _plain_escape(match: re.Match[bytes]) -> bytes:
+    if match[1]:
+        return b"\\u%04x" % int(match[1], 8)
+    return b"\\" + match[0] if match[2] else match[0]
+
+
+def _reason(error: Exception) -> str:
+    """An exception in one line of moderate length."""
+    text = "".join(str(error).splitlines()[:1])
+    if not isinstance(error, (LookupError, UnicodeError)):
+        text = f"{type(error).__name__}: {text}".rstrip(": ")
+    return _short(text)
+
+
+def _short(text: str) -> str:
+    return text if len(text) <= _LONGEST_SHOWN else text[:_LONGEST_SHOWN] + "\N{HORIZONTAL ELLIPSIS}"
 
 
 def _is_utf8(name: str) -> bool:

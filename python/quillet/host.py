@@ -1,9 +1,9 @@
 """A whole source at once: bytes or text in, its statements and what each says of names out.
 
-The source becomes UTF-8 (`_source`), is cut into logical lines by the core, and each line is analysed
-where it stands. Nothing becomes a Python object of its own before it is read: a `Line` is made when
-`Analysis.lines` is asked for it, its records are decoded when `Line.records` is. An analyzer is
-expensive to build and serves one thread, so each thread keeps one a version.
+The source becomes UTF-8 (`_source`), and the core analyses all of it in one call. Nothing becomes a Python
+object of its own before it is read: a `Line` is made when `Analysis.lines` is asked for it, its records
+when `Line.records` is. The analyzers of those calls are the core's own. One that a host may look into
+(`analyzer_for`) serves one thread, so each thread keeps one a version.
 """
 
 from __future__ import annotations
@@ -15,19 +15,15 @@ from functools import cached_property
 from typing import overload
 
 from quillet._keywords import keywords_of
-from quillet._languages import PY2_PRINT_FUNCTION_GRAMMAR
+from quillet._languages import PY2_PRINT_FUNCTION_GRAMMAR, native_language_of
 from quillet._languages import language_version as language_version
-from quillet._records import Record, decode_record
+from quillet._records import KINDS, Record
 from quillet._source import to_utf8
 from quillet.logicalline import CLogicalLine
 from quillet.tarvex import CPGenAnalyzerImpl, _host, kPy2DefaultGrammar, kPy3DefaultGrammar
 
 _LINE_END = re.compile(rb"\r\n|\r|\n")
 _BOM = b"\xef\xbb\xbf"
-
-# A line as the core cuts it: the record, its first and last physical line (from 0), the width of its
-# indentation, whether it stands in an `async def`, and whether it is the first of a function's body.
-_Row = tuple[CLogicalLine, int, int, int, bool, bool]
 
 
 class _Analyzers(threading.local):
@@ -92,25 +88,36 @@ class Line:
     from the line's own first line, see `error_position`.
     """
 
-    __slots__ = ("_records", "error", "first_in_def", "first_line", "in_async_def", "indent", "last_line", "logical")
+    __slots__ = (
+        "_index",
+        "_native",
+        "_records",
+        "error",
+        "first_in_def",
+        "first_line",
+        "in_async_def",
+        "indent",
+        "last_line",
+        "logical",
+    )
 
-    def __init__(self, row: _Row, error: SyntaxError | None) -> None:
-        self.logical: CLogicalLine = row[0]
-        self.first_line: int = row[1] + 1
-        self.last_line: int = row[2] + 1
-        self.indent: int = row[3]
-        self.in_async_def: bool = row[4]
-        self.first_in_def: bool = row[5]
-        self.error = error
+    logical: CLogicalLine
+    error: SyntaxError | None
+
+    def __init__(self, native: _host.AnalyzedSource, index: int) -> None:
+        self._native = native
+        self._index = index
+        self.logical, first_line, last_line, self.indent, self.in_async_def, self.first_in_def = native.At(index)
+        self.first_line = first_line + 1
+        self.last_line = last_line + 1
+        self.error = native.ErrorAt(index)
         self._records: tuple[Record, ...] | None = None
 
     @property
     def records(self) -> tuple[Record, ...]:
         """What the line says of names, in the order in which it was found; parameters come last."""
         if self._records is None:
-            found = [decode_record(name, info, False) for name, info in self.logical.fTypeEquivs or ()]
-            found += [decode_record(name, info, True) for name, info in self.logical.fArgTypeEquivs or ()]
-            self._records = tuple(found)
+            self._records = self._native.RecordsAt(self._index, Record, KINDS)
         return self._records
 
     @property
@@ -127,13 +134,12 @@ class Line:
 class _Lines(Sequence[Line]):
     """Lines that are made when they are asked for, and then kept."""
 
-    def __init__(self, rows: list[_Row], errors: dict[int, SyntaxError]) -> None:
-        self._rows = rows
-        self._errors = errors
+    def __init__(self, native: _host.AnalyzedSource) -> None:
+        self._native = native
         self._made: dict[int, Line] = {}
 
     def __len__(self) -> int:
-        return len(self._rows)
+        return len(self._native)
 
     @overload
     def __getitem__(self, index: int) -> Line: ...
@@ -142,18 +148,18 @@ class _Lines(Sequence[Line]):
     def __getitem__(self, index: slice) -> Sequence[Line]: ...
 
     def __getitem__(self, index: int | slice) -> Line | Sequence[Line]:
-        places = range(len(self._rows))[index]
+        places = range(len(self))[index]
         if isinstance(places, int):
             return self._at(places)
         return [self._at(place) for place in places]
 
     def __iter__(self) -> Iterator[Line]:
-        return map(self._at, range(len(self._rows)))
+        return map(self._at, range(len(self)))
 
     def _at(self, index: int) -> Line:
         line = self._made.get(index)
         if line is None:
-            line = self._made[index] = Line(self._rows[index], self._errors.get(index))
+            line = self._made[index] = Line(self._native, index)
         return line
 
 
@@ -163,20 +169,12 @@ class Analysis:
     def __init__(self, source: bytes, version: tuple[int, int]) -> None:
         self.version = version
         self._source = source
-        cut = _host.CutSource(source, (*version, 0))
-        self._rows: list[_Row] = list(cut)
-        self._errors: dict[int, SyntaxError] = {}
-        self._print_function: bool = cut.print_function
-        analyze_line = self.analyzer.AnalyzeSingleLogical
-        for index, (logical, _, _, _, in_async_def, first_in_def) in enumerate(self._rows):
-            error = analyze_line(logical, in_async_def, first_in_def)
-            if error is not None:
-                self._errors[index] = error
+        self._native = _host.AnalyzedSource(native_language_of(version), source)
 
     @property
     def analyzer(self) -> CPGenAnalyzerImpl:
         """The calling thread's analyzer for sources such as this one."""
-        return analyzer_for(self.version, print_function=self._print_function)
+        return analyzer_for(self.version, print_function=self._native.print_function)
 
     @property
     def source(self) -> bytes:
@@ -186,12 +184,12 @@ class Analysis:
     @cached_property
     def lines(self) -> Sequence[Line]:
         """The logical lines, in order; together they cover the source."""
-        return _Lines(self._rows, self._errors)
+        return _Lines(self._native)
 
     @property
     def errors(self) -> list[Line]:
         """The lines that have an error, in order."""
-        return [self.lines[index] for index in self._errors]
+        return [self.lines[index] for index in self._native.rows_with_error]
 
     def source_line(self, number: int) -> bytes:
         """A physical line, counted from 1, as UTF-8 without its end; empty past the last one."""

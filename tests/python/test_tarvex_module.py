@@ -139,7 +139,7 @@ def test_no_operation_takes_none_for_an_object_of_its_own() -> None:
         lambda: tarvex.CAtom.GetInitialBracket(None),
         lambda: logicalline.IsScopeStartLogical(None),
         lambda: logicalline.GetLogicalsFromText(None),
-        lambda: tarvex._host.CutSource(None, (3, 8)),
+        lambda: tarvex._host.AnalyzedSource(None, None),
     ]
     for call in calls:
         with pytest.raises(TypeError):

@@ -362,6 +362,25 @@ TEST(Batch, SeveralReadersShareTheResults) {
   EXPECT_EQ(sum, 200u * 201 / 2);
 }
 
+TEST(Batch, WithoutItsThreadsTheReaderGoesOn) {
+  for (const size_t before : {0u, 1u, 40u}) {
+    BatchAnalyzer batch(Options(3), ManySources(100));
+    BatchResult result;
+    std::vector<size_t> seen;
+    std::thread reader([&] {
+      while (batch.Next(result)) {
+        seen.push_back(result.index);
+        EXPECT_EQ(result.table.NameAt(0), "name" + std::to_string(result.index));
+        if (seen.size() == before) batch.DismissThreads();
+      }
+    });
+    if (before == 0) batch.DismissThreads();
+    reader.join();
+    ASSERT_EQ(seen.size(), 100u);
+    for (size_t i = 0; i < seen.size(); ++i) EXPECT_EQ(seen[i], i);
+  }
+}
+
 #ifdef __GLIBC__
 // While it lives no thread can be started: its stack would be larger than the memory there is.
 class NoThreads {

@@ -1,0 +1,200 @@
+// What a batch's threads and its readers do with the host: take its lock, call it, hear of its signals.
+#include "bindings/file_batch.h"
+
+#include <algorithm>
+#include <chrono>
+
+#include "bindings/batch_format.h"
+#include "bindings/convert.h"
+#include "bindings/interpreter_lock.h"
+#include "bindings/signals.h"
+#include "bindings/site_object.h"
+#include "foundations/utf8.h"
+#include "names/batch_binder.h"
+#include "output/json_lines.h"
+#include "output/text_lines.h"
+
+namespace quillet::host {
+
+namespace {
+
+constexpr unsigned kMostJobs = 1024;
+
+// Set at the end of the interpreter.
+bool g_without_threads = false;
+
+// All batches, while they live. Changed with the interpreter lock held.
+std::vector<FileBatch*>& LiveBatches() {
+  static auto& batches = *new std::vector<FileBatch*>;
+  return batches;
+}
+
+std::vector<BatchInput> InputsOf(nb::handle sequence) {
+  std::vector<BatchInput> inputs;
+  for (nb::handle item : nb::borrow<nb::tuple>(TupleOf(sequence))) {
+    const nb::object parts = TupleOf(item);
+    if (nb::len(parts) != 3) ThrowError(ErrorKind::kValueError, "an input is a path, a source and a problem");
+    const auto text = [&parts](Py_ssize_t i) { return HostText::FromBytes(PyTuple_GET_ITEM(parts.ptr(), i)); };
+    const auto is_there = [&parts](Py_ssize_t i) { return PyTuple_GET_ITEM(parts.ptr(), i) != Py_None; };
+    BatchInput& input = inputs.emplace_back();
+    input.path = text(0).text();
+    if (is_there(1)) input.bytes = text(1).text();
+    if (is_there(2)) input.problem = text(2).text();
+  }
+  return inputs;
+}
+
+// An exception as one line.
+std::string LineOf(nb::python_error& error) {
+  constexpr size_t kLongest = 200;
+  std::string line;
+  try {
+    line = nb::str(error.type().attr("__name__")).c_str();
+    if (const std::string message = nb::str(error.value()).c_str(); !message.empty()) line += ": " + message;
+  } catch (const std::exception&) {  // it cannot even be described
+    if (line.empty()) line = "an exception";
+  }
+  line.resize(std::min(line.size(), line.find_first_of("\r\n")));
+  if (line.size() <= kLongest) return line;
+  size_t size = kLongest;
+  while (!IsUtf8LeadByte(line[size])) --size;
+  return line.substr(0, size) + "\xE2\x80\xA6";
+}
+
+}  // namespace
+
+FileBatch::FileBatch(const Language& language, nb::handle inputs, unsigned jobs, nb::object decode, nb::object format,
+                     bool bindings)
+    : decode_(std::move(decode)),
+      format_(std::move(format)),
+      batch_(
+          std::make_unique<BatchAnalyzer>(OptionsOf(language, std::min(jobs, kMostJobs), bindings), InputsOf(inputs))) {
+  if (g_without_threads) batch_->DismissThreads();
+  LiveBatches().push_back(this);
+}
+
+FileBatch::~FileBatch() {
+  std::erase(LiveBatches(), this);
+  Cancel();
+}
+
+void FileBatch::DismissAllThreads() {
+  g_without_threads = true;
+  // Each may go, and take others with it, while its threads end.
+  for (const std::vector<FileBatch*> all = LiveBatches(); FileBatch* const batch : all) {
+    if (std::find(LiveBatches().begin(), LiveBatches().end(), batch) == LiveBatches().end()) continue;
+    const nb::object keeps_it = nb::find(*batch);
+    const Unlocked unlocked;
+    batch->batch_->DismissThreads();
+  }
+}
+
+void FileBatch::Cancel() {
+  const Unlocked unlocked;
+  batch_->Cancel();
+}
+
+bool FileBatch::Next(BatchResult& result) {
+  constexpr std::chrono::milliseconds kPatience(100);
+  while (true) {
+    BatchAnalyzer::Wait wait;
+    {
+      const Unlocked unlocked;
+      const ThreadStopQuestion signals(HandlesSignals());
+      wait = batch_->Next(result, kPatience);
+    }
+    if (wait == BatchAnalyzer::Wait::kResult && result.problem.empty()) return true;
+    const Locked lock;
+    if (wait == BatchAnalyzer::Wait::kResult) problems_.emplace_back(result.index, result.problem);
+    RaiseFailure();
+    if (wait != BatchAnalyzer::Wait::kTimeout) return wait == BatchAnalyzer::Wait::kResult;
+    HandleSignals();
+  }
+}
+
+nb::list FileBatch::Problems() const {
+  nb::list list;
+  // By index: making a tuple may run code that prolongs them.
+  for (size_t i = 0; i < problems_.size(); ++i)
+    list.append(nb::make_tuple(problems_[i].first, StrOf(problems_[i].second)));
+  return list;
+}
+
+BatchAnalyzer::Options FileBatch::OptionsOf(const Language& language, unsigned jobs, bool bindings) {
+  BatchAnalyzer::Options options;
+  options.analyzer = language.options();
+  options.jobs = jobs;
+  options.decode = [this](Text bytes, std::string& utf8) { return Decode(bytes, utf8); };
+  const Version version = options.analyzer.version;
+  if (bindings) options.make_binder = [version] { return MakeFileBinder(version); };
+  options.make_writer = WriterMaker(version);
+  return options;
+}
+
+bool FileBatch::Decode(Text bytes, std::string& utf8) {
+  const Locked lock;
+  try {
+    const nb::object answer = TupleOf(decode_(BytesOf(bytes)));
+    if (nb::len(answer) != 2) ThrowError(ErrorKind::kTypeError, "a decoder gives a source and a reason");
+    const nb::handle source = PyTuple_GET_ITEM(answer.ptr(), 0);
+    const nb::handle reason = PyTuple_GET_ITEM(answer.ptr(), 1);
+    utf8 = reason.is_none() ? HostText::FromBytes(source).text() : HostText::FromStr(reason).text();
+    return reason.is_none();
+  } catch (nb::python_error& error) {
+    utf8 = Failed(error);
+    return false;
+  }
+}
+
+std::function<std::unique_ptr<FileWriter>()> FileBatch::WriterMaker(Version version) {
+  if (format_.is_none()) return {};
+  if (nb::isinstance<BatchFormat>(format_))
+    return [make = nb::cast<const BatchFormat&>(format_).make, version] { return make(version); };
+  const nb::object format = TupleOf(format_);
+  const auto part = [&format](Py_ssize_t i) -> nb::handle {
+    if (i >= PyTuple_GET_SIZE(format.ptr())) ThrowError(ErrorKind::kValueError, "the format lacks a part");
+    return PyTuple_GET_ITEM(format.ptr(), i);
+  };
+  const HostText kind = HostText::FromStr(part(0));
+  if (kind.text() == "site survey") return [version] { return MakeSiteSurveyWriter(version); };
+  if (kind.text() == "site page") {
+    auto& site = nb::cast<SiteObject&>(part(1));
+    site.is_shared = true;
+    return
+        [index = std::shared_ptr<const SiteIndex>(site.index), version] { return MakeSitePageWriter(index, version); };
+  }
+  const bool errors_only = part(1).is(Py_True);
+  if (kind.text() == "jsonl") {
+    const JsonLinesOptions options{errors_only};
+    return [options] { return MakeJsonLinesWriter(options); };
+  }
+  if (kind.text() != "text") ThrowError(ErrorKind::kValueError, "no such format");
+  TextLinesOptions options{errors_only, part(2).is(Py_True), {}};
+  const nb::handle width_of = part(3);
+  format_ = format;  // it may have been given as a list
+  options.width_of = [this, width_of](uint32_t code_point) {
+    const Locked lock;
+    try {
+      return static_cast<uint32_t>(std::clamp(Int32Of(width_of(code_point)), 0, 2));
+    } catch (nb::python_error& error) {
+      ThrowError(ErrorKind::kRuntimeError, Failed(error));
+    }
+  };
+  return [options] { return MakeTextLinesWriter(options); };
+}
+
+std::string FileBatch::Failed(nb::python_error& error) {
+  std::string line = LineOf(error);
+  // What does not derive from Exception is meant to end the run.
+  if (!failure_ && !error.matches(PyExc_Exception)) failure_.emplace(std::move(error));
+  return line;
+}
+
+void FileBatch::RaiseFailure() {
+  if (!failure_) return;
+  nb::python_error failure = std::move(*failure_);
+  failure_.reset();
+  throw std::move(failure);
+}
+
+}  // namespace quillet::host

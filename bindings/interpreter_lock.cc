@@ -1,0 +1,77 @@
+// A thread that is ended is noticed by a destructor: nothing but the unwinding of its stack runs one in front of
+// the end of the call that takes the lock.
+#include "bindings/interpreter_lock.h"
+
+#include <chrono>
+#include <thread>
+
+namespace quillet::host {
+
+namespace {
+
+[[noreturn]] void WaitForEndOfProcess() {
+  while (true) std::this_thread::sleep_for(std::chrono::hours(1));
+}
+
+PyThreadState* CurrentThreadState() {
+#if PY_VERSION_HEX >= 0x030D0000
+  return PyThreadState_GetUnchecked();
+#else
+  return _PyThreadState_UncheckedGet();
+#endif
+}
+
+// Around a call that takes the lock.
+class Taking {
+ public:
+  Taking() = default;
+  ~Taking() {
+    if (!taken) WaitForEndOfProcess();
+  }
+  Taking(const Taking&) = delete;
+  Taking& operator=(const Taking&) = delete;
+
+  bool taken = false;
+};
+
+}  // namespace
+
+// Up to 3.11 the current state is that of whichever thread has the lock, later the calling thread's own.
+bool HasInterpreterLock() {
+  PyThreadState* const current = CurrentThreadState();
+#if PY_VERSION_HEX >= 0x030C0000
+  return current != nullptr;
+#else
+  return current != nullptr && current == PyGILState_GetThisThreadState();
+#endif
+}
+
+void WaitIfThreadWasEnded() {
+  if (!HasInterpreterLock()) [[unlikely]]
+    WaitForEndOfProcess();
+}
+
+Locked::Locked() : takes_(!HasInterpreterLock()) {
+  if (!takes_) return;
+  if (!Py_IsInitialized()) WaitForEndOfProcess();
+  Taking taking;
+  state_ = PyGILState_Ensure();
+  taking.taken = true;
+}
+
+Locked::~Locked() {
+  WaitIfThreadWasEnded();
+  if (!takes_) return;
+  Taking taking;
+  PyGILState_Release(state_);
+  taking.taken = true;
+}
+
+Unlocked::~Unlocked() {
+  if (state_ == nullptr) return;
+  Taking taking;
+  PyEval_RestoreThread(state_);
+  taking.taken = true;
+}
+
+}  // namespace quillet::host
