@@ -57,6 +57,7 @@ NB_MODULE(tarvex_in_main, tarvex) {
   BindIndex(tarvex);
   BindBatch(tarvex);
   BindSite(tarvex);
+  BindWorkspace(tarvex);
 }
 
 extern "C" NB_EXPORT PyObject* PyInit_tarvex(void);

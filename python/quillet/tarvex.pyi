@@ -655,6 +655,10 @@ class _host:  # a module at run time
     @staticmethod
     def DescribeRecord(kind: str, detail: str, is_parameter: bool) -> str: ...
 
+    class IgnoreRules:
+        def __init__(self, text: bytes) -> None: ...
+        def Verdict(self, path: bytes, is_folder: bool) -> bool | None: ...
+
     class Language:
         def __init__(
             self,

@@ -31,6 +31,7 @@ def run(
     errors_only: bool,
     strict: bool,
     gitignore: bool,
+    exclude: tuple[str, ...],
     stdin_filename: str,
     jobs: int | None,
 ) -> int:
@@ -40,7 +41,7 @@ def run(
     with quiet_output() as out:
         write = _bytes_writer(out)
         write(memoryview(output_header(form, version)))
-        found = list(find_files(paths, gitignore=gitignore))
+        found = list(find_files(paths, gitignore=gitignore, exclude=exclude))
         inputs = [_input_of(item, stdin_filename) for item in found]
         results = write_files(inputs, version=version, jobs=jobs, form=output_format(form, errors_only))
         # The line is for a person who waits: where the data itself runs over the terminal, there is none.

@@ -10,7 +10,7 @@ import sys
 import click
 
 from quillet.cli.index_commands import COMMANDS
-from quillet.cli.options import python_option
+from quillet.cli.options import PathArgument, exclude_option, python_option
 
 _stdin_filename = click.option(
     "--stdin-filename",
@@ -27,7 +27,7 @@ def group() -> None:
 
 
 @group.command()
-@click.argument("paths", nargs=-1, required=True, metavar="PATH...")
+@click.argument("paths", nargs=-1, required=True, metavar="PATH...", type=PathArgument())
 @click.option(
     "--format",
     "form",
@@ -40,6 +40,7 @@ def group() -> None:
 @click.option("--errors-only", is_flag=True, help="Show syntax errors alone.")
 @click.option("--strict", is_flag=True, help="Exit with 1 where a syntax error was found.")
 @click.option("--no-gitignore", is_flag=True, help="Analyse what .gitignore files exclude, too.")
+@exclude_option
 @click.option(
     "--jobs",
     type=click.IntRange(1, 1024),
@@ -54,6 +55,7 @@ def analyze(
     errors_only: bool,
     strict: bool,
     no_gitignore: bool,
+    exclude: tuple[str, ...],
     jobs: int | None,
     stdin_filename: str,
 ) -> None:
@@ -72,6 +74,7 @@ def analyze(
             errors_only=errors_only,
             strict=strict,
             gitignore=not no_gitignore,
+            exclude=exclude,
             stdin_filename=stdin_filename,
             jobs=jobs,
         )
@@ -79,7 +82,7 @@ def analyze(
 
 
 @group.command()
-@click.argument("target", metavar="FILE[:LINE]")
+@click.argument("target", metavar="FILE[:LINE]", type=PathArgument())
 @python_option
 @_stdin_filename
 def tree(target: str, version: tuple[int, int] | None, stdin_filename: str) -> None:

@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import re
+from typing import Any
 
 import click
 
@@ -20,9 +21,25 @@ class PythonVersion(click.ParamType):  # type: ignore[type-arg,unused-ignore]
         return int(major), int(minor)
 
 
+class PathArgument(click.Path):
+    """The name of a file or folder. An empty one is a mistake, such as a variable that is not set."""
+
+    def convert(self, value: Any, param: click.Parameter | None, ctx: click.Context | None) -> Any:
+        if not value:
+            self.fail("a path is empty", param, ctx)
+        return super().convert(value, param, ctx)
+
+
 python_option = click.option(
     "--python",
     "version",
     type=PythonVersion(),
     help="The version of Python that the source is written for; that of the running interpreter without it.",
+)
+
+exclude_option = click.option(
+    "--exclude",
+    metavar="PATTERN",
+    multiple=True,
+    help="Leave out what fits this line of a .gitignore file; may be given more than once.",
 )
