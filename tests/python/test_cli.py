@@ -240,7 +240,155 @@ def test_links_to_folders_are_not_followed(tmp_path: Path) -> None:
     assert files_read(tmp_path) == ["./pkg/a.py"]
 
 
+def test_folders_that_are_nobodys_source_are_left_out_unless_named(tmp_path: Path) -> None:
+    source = "x = 1\n"
+    make(tmp_path, {f"{name}/a.py": source for name in (".venv/lib", "node_modules", "sub/__pycache__", "kept")})
+    assert files_read(tmp_path) == ["./kept/a.py"]
+    assert files_read(tmp_path, "--no-gitignore") == ["./kept/a.py"]
+    assert files_read(tmp_path, "--exclude", "!.venv") == ["./.venv/lib/a.py", "./kept/a.py"]
+    assert files_read(tmp_path / ".venv") == ["./lib/a.py"]
+    assert files_read(tmp_path / "node_modules") == ["./a.py"]
+
+
+def test_exclude_takes_lines_of_a_gitignore_file(tmp_path: Path) -> None:
+    source = "x = 1\n"
+    make(
+        tmp_path, {".gitignore": "gen.py\n"} | dict.fromkeys(("a.py", "gen.py", "#b.py", "t/a.py", "t/u/c.py"), source)
+    )
+    assert files_read(tmp_path, "--exclude", "/a.py", "--exclude", "#b.py", "--exclude", "u/") == ["./t/a.py"]
+    assert files_read(tmp_path, "--exclude", "!gen.py", "--exclude", "t/**/c.py", "--exclude", "[a]*") == [
+        "./#b.py",
+        "./gen.py",
+    ]
+    assert len(jsonl("a.py", "--exclude", "a.py", cwd=tmp_path)) == 2
+
+
+def test_a_repository_within_has_rules_of_its_own(tmp_path: Path) -> None:
+    source = "x = 1\n"
+    make(
+        tmp_path,
+        {
+            ".git/HEAD": "",
+            ".gitignore": "a.py\n",
+            "a.py": source,
+            "sub/.git": "gitdir: ../.git/modules/sub\n",
+            ".git/modules/sub/info/exclude": "b.py\n",
+            "sub/a.py": source,
+            "sub/b.py": source,
+        },
+    )
+    assert files_read(tmp_path) == ["./sub/a.py"]
+    assert files_read(tmp_path / "sub") == ["./a.py"]
+
+
+def test_stars_of_a_gitignore_file_cost_no_more_than_text(tmp_path: Path) -> None:
+    make(tmp_path, {".gitignore": "*a" * 16 + "b\n!\nx\\\n[z-a].py\n", "a" * 200 + ".py": "x = 1\n", "m.py": "x = 1\n"})
+    assert len(files_read(tmp_path)) == 2
+
+
+def test_a_link_counts_where_its_file_is_among_what_was_named(tmp_path: Path) -> None:
+    make(tmp_path, {"in/a.py": "x = 1\n", "in/data.txt": "x = 1\n", "out/b.py": "x = 1\n"})
+    (tmp_path / "in" / "0.py").symlink_to("a.py")
+    (tmp_path / "in" / "1.py").symlink_to("data.txt")
+    (tmp_path / "in" / "2.py").symlink_to("data.txt")
+    (tmp_path / "in" / "3.py").symlink_to("../out/b.py")
+    (tmp_path / "in" / "4.py").symlink_to("/dev/zero")
+    assert files_read(tmp_path / "in") == ["./a.py", "./1.py"]
+    rows = jsonl("in", "out", cwd=tmp_path)
+    assert [row["path"] for row in rows[1:]] == ["in/a.py", "out/b.py", "in/1.py"]
+    assert len(jsonl("in/3.py", cwd=tmp_path)) == 2
+
+
+def test_a_link_that_leads_nowhere_is_named_and_the_rest_is_served(tmp_path: Path) -> None:
+    make(tmp_path, {"good.py": "x = 1\n"})
+    (tmp_path / "a").symlink_to("b")
+    (tmp_path / "b").symlink_to("a")
+    (tmp_path / "long").symlink_to("n" * 300)
+    (tmp_path / "below.py").symlink_to("good.py/below")
+    (tmp_path / "gone").symlink_to("nowhere")
+    (tmp_path / ".gitignore").symlink_to(".gitignore")
+    result = run("analyze", ".", cwd=tmp_path)
+    assert result.returncode == 1
+    assert result.stdout.startswith(b"./good.py:1: x = 1")
+    assert result.stderr.decode().splitlines() == [
+        "quillet: ./a: Too many levels of symbolic links",
+        "quillet: ./b: Too many levels of symbolic links",
+        "quillet: ./below.py: Not a directory",
+        "quillet: ./long: File name too long",
+        "quillet: 4 files could not be read",
+    ]
+
+
+@pytest.mark.skipif(not hasattr(os, "geteuid") or os.geteuid() == 0, reason="root may enter every folder")
+def test_a_link_into_a_closed_folder_is_named(tmp_path: Path) -> None:
+    make(tmp_path, {"closed/a.py": "x = 1\n", "good.py": "x = 1\n"})
+    (tmp_path / "a").symlink_to("closed/a.py")
+    (tmp_path / "closed").chmod(0)
+    try:
+        result = run("analyze", ".", cwd=tmp_path)
+    finally:
+        (tmp_path / "closed").chmod(0o700)
+    assert result.returncode == 1
+    assert b"good.py" in result.stdout
+    assert len(result.stderr.splitlines()) == 3
+
+
+def test_what_is_no_regular_file_is_opened_only_when_named(tmp_path: Path) -> None:
+    make(tmp_path, {"good.py": "x = 1\n", "sub/good.py": "x = 1\n"})
+    for name in ("pipe.py", "pipe", ".gitignore", "sub/.gitignore"):
+        os.mkfifo(tmp_path / name)
+    assert files_read(tmp_path) == ["./good.py", "./sub/good.py"]
+    with subprocess.Popen(["sh", "-c", f"echo 'y = 1' > {tmp_path}/pipe.py"]) as writer:
+        assert [row["path"] for row in jsonl("pipe.py", cwd=tmp_path)[1:]] == ["pipe.py"]
+        writer.wait(timeout=60)
+
+
+def test_a_device_is_not_read_to_its_end(tmp_path: Path) -> None:
+    (tmp_path / "zero.py").symlink_to("/dev/zero")
+    for command in ("analyze", "tree"):
+        result = run(command, "zero.py", cwd=tmp_path)
+        assert result.returncode == 1
+        assert b"quillet: zero.py: is a device" in result.stderr
+        with open("/dev/zero", "rb") as zero:
+            result = subprocess.run(
+                [sys.executable, "-m", "quillet", command, "-"],
+                stdin=zero,
+                capture_output=True,
+                timeout=60,
+                check=False,
+            )
+        assert result.returncode == 1
+        assert b"is a device" in result.stderr
+    assert run("analyze", "/dev/null").returncode == 0
+    assert b"/dev/stdin:1: x = 1" in run("analyze", "/dev/stdin", stdin=b"x = 1\n").stdout
+
+
 # ---- how it ends ----
+
+
+@pytest.mark.parametrize(
+    "arguments",
+    [
+        ["analyze", ""],
+        ["analyze", ".", ""],
+        ["tree", ""],
+        ["index", ""],
+        ["index", ".", "-o", ""],
+        ["find", "x", "--index", ""],
+        ["defs", ""],
+        ["outline", ""],
+        ["stats", "--index", ""],
+        ["export", "tags", "-o", ""],
+        ["report", "-o", ""],
+        ["report", "", "-o", "site"],
+    ],
+)
+def test_an_empty_path_is_wrong_usage(arguments: list[str], tmp_path: Path) -> None:
+    make(tmp_path, {"a.py": "x = 1\n"})
+    result = run(*arguments, cwd=tmp_path)
+    assert result.returncode == 2
+    assert b"a path is empty" in result.stderr
+    assert os.listdir(tmp_path) == ["a.py"]
 
 
 def test_strict_fails_on_a_syntax_error() -> None:

@@ -10,13 +10,12 @@ from __future__ import annotations
 
 import io
 import os
-import sys
 from collections.abc import Callable
 from contextlib import closing
 from typing import TextIO
 
 from quillet._batch import BatchInput, write_files
-from quillet.cli.files import Found, find_files
+from quillet.cli.files import Found, find_files, problem_of, read_file
 from quillet.cli.output import output_format, output_header
 from quillet.cli.progress import Progress, is_terminal, say
 from quillet.cli.show import printable
@@ -63,7 +62,10 @@ def run(
 
 def _input_of(item: Found, stdin_filename: str) -> BatchInput:
     if item.path == "-" and item.problem is None:
-        return os.fsencode(stdin_filename), sys.stdin.buffer.read(), None
+        try:
+            return os.fsencode(stdin_filename), read_file("-"), None
+        except OSError as error:
+            item = Found(stdin_filename, problem_of(error))
     problem = item.problem.encode("utf-8", "backslashreplace") if item.problem is not None else None
     return os.fsencode(item.path), None, problem
 

@@ -49,8 +49,8 @@ def find_files(paths: Sequence[str], *, gitignore: bool, exclude: Iterable[str] 
 
 
 def read_file(path: str) -> bytes:
-    """The bytes of a file. Raises OSError."""
-    with open(path, "rb") as file:
+    """The bytes of a file, of standard input for "-". Raises OSError."""
+    with open(0 if path == "-" else path, "rb", closefd=path != "-") as file:
         problem = device_problem(file.fileno())
         if problem is not None:
             raise OSError(errno.EINVAL, problem)

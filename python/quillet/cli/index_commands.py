@@ -12,7 +12,7 @@ from typing import Any
 import click
 
 from quillet.cli.find_options import INDEX_OPTION, OPTIONS, ROOT_OPTION, Option
-from quillet.cli.options import python_option
+from quillet.cli.options import PathArgument, python_option
 
 
 def _options(options: Sequence[Option]) -> Callable[[Callable[..., None]], Callable[..., None]]:
@@ -26,7 +26,7 @@ def _options(options: Sequence[Option]) -> Callable[[Callable[..., None]], Calla
             elif option.takes_value:
                 settings |= {
                     "metavar": option.metavar,
-                    "type": str if option.metavar in ("SCOPE", "GLOB") else click.Path(),
+                    "type": str if option.metavar in ("SCOPE", "GLOB") else PathArgument(),
                 }
                 if option.repeated:
                     settings["multiple"] = True
@@ -43,8 +43,8 @@ _index_options = _options([INDEX_OPTION, ROOT_OPTION])
 
 
 @click.command()
-@click.argument("paths", nargs=-1, metavar="[PATH]...", type=click.Path())
-@click.option("-o", "--output", metavar="FILE", type=click.Path(), help="The index; .quillet-index without it.")
+@click.argument("paths", nargs=-1, metavar="[PATH]...", type=PathArgument())
+@click.option("-o", "--output", metavar="FILE", type=PathArgument(), help="The index; .quillet-index without it.")
 @click.option(
     "--format",
     "form",
@@ -115,7 +115,7 @@ def find(name: str, **parameters: Any) -> None:
 
 
 @click.command()
-@click.argument("file", type=click.Path())
+@click.argument("file", type=PathArgument())
 @click.option("--imports", is_flag=True, help="The names that imports bind, too.")
 @click.option("--json", "as_json", is_flag=True, help="A JSON object a record.")
 @_index_option
@@ -133,7 +133,7 @@ def defs(file: str, imports: bool, as_json: bool, index: str | None) -> None:
 
 
 @click.command()
-@click.argument("file", type=click.Path())
+@click.argument("file", type=PathArgument())
 @_index_option
 def outline(file: str, index: str | None) -> None:
     """Shows the classes and functions of FILE as a tree, with parameters and hints.
@@ -162,7 +162,7 @@ def stats(as_json: bool, index: str | None, roots: tuple[str, ...]) -> None:
 
 @click.command()
 @click.argument("form", metavar="FORMAT", type=click.Choice(["tags", "scip", "jsonl", "sqlite", "parquet"]))
-@click.option("-o", "--output", metavar="FILE", type=click.Path(), help='Where to; "-" is standard output.')
+@click.option("-o", "--output", metavar="FILE", type=PathArgument(), help='Where to; "-" is standard output.')
 @_index_options
 def export(form: str, output: str | None, index: str | None, roots: tuple[str, ...]) -> None:
     """Writes what the files of the index say: as tags (for editors), scip (for code intelligence servers),
@@ -183,8 +183,8 @@ def export(form: str, output: str | None, index: str | None, roots: tuple[str, .
 
 
 @click.command()
-@click.argument("paths", nargs=-1, metavar="[PATH]...", type=click.Path())
-@click.option("-o", "--output", metavar="DIR", type=click.Path(), required=True, help="The folder of the site.")
+@click.argument("paths", nargs=-1, metavar="[PATH]...", type=PathArgument())
+@click.option("-o", "--output", metavar="DIR", type=PathArgument(), required=True, help="The folder of the site.")
 @python_option
 @click.option(
     "-j",

@@ -19,8 +19,7 @@ def run(target: str, *, version: tuple[int, int] | None, stdin_filename: str) ->
     path, number = split_target(target)
     shown = stdin_filename if path == "-" else path
     try:
-        source = sys.stdin.buffer.read() if path == "-" else read_file(path)
-        analysis = analyze(source, version=version)
+        analysis = analyze(read_file(path), version=version)
     except OSError as error:
         return _fail(path, problem_of(error))
     except SourceEncodingError as error:
