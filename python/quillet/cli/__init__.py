@@ -1,6 +1,7 @@
 """The command `quillet`. What it does is in the modules beside this one, a command each.
 
-Exit codes: 0 done, 1 a file could not be read (or, with --strict, has a syntax error), 2 wrong usage.
+Exit codes: 0 done, 1 a file could not be read (or, with --strict, has a syntax error), 2 wrong usage or an
+output that cannot be written, 130 interrupted.
 """
 
 from __future__ import annotations
@@ -15,6 +16,15 @@ PROGRAM = "quillet"
 def main(arguments: Sequence[str] | None = None) -> None:
     """Runs the command with `arguments`, those of the process without any, and ends by SystemExit."""
     given = list(sys.argv[1:] if arguments is None else arguments)
+    try:
+        from quillet.cli.streams import run_to_end
+
+        run_to_end(lambda: _run(given))
+    except KeyboardInterrupt:  # before the streams were in place
+        sys.exit(130)
+
+
+def _run(given: list[str]) -> None:
     if given[:1] == ["find"] and "_QUILLET_COMPLETE" not in os.environ:
         from quillet.cli.find_options import plain_parameters
 
@@ -23,6 +33,15 @@ def main(arguments: Sequence[str] | None = None) -> None:
             from quillet.cli.find import ask
 
             sys.exit(ask(**parameters))
+    import click
+
     from quillet.cli.commands import group
 
-    group.main(given, prog_name=PROGRAM)
+    try:
+        code = group.main(given, prog_name=PROGRAM, standalone_mode=False)
+    except click.Abort as error:  # what click makes of an interrupt
+        raise KeyboardInterrupt from error
+    except click.ClickException as error:
+        error.show()
+        code = error.exit_code
+    sys.exit(code if isinstance(code, int) else 0)

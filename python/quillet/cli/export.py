@@ -45,6 +45,8 @@ def run(form: str, *, output: str | None, index: str | None, roots: Sequence[str
     except IndexProblem as problem:
         return fail(problem)
     except OSError as error:
+        if target == "-":
+            raise
         print(f"quillet: {printable(target)}: {error.strerror or error}", file=sys.stderr)
         return 2
     return 0

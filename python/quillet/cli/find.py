@@ -59,6 +59,9 @@ def ask(
         return fail(ValueError("NAME is empty"))
     if as_json + long + count + files > 1:
         return fail(ValueError("--json, --long, --count and --files are one instead of the other"))
+    for text in (name, scope or ""):
+        if any("\ud800" <= char <= "\udfff" for char in text):
+            return fail(ValueError(f"{text}: is no UTF-8, which every name is"))
     wanted = tuple(role for role in ROLES if roles[f"role_{role}"])
     if any_receiver and match is None:
         match = "suffix"
@@ -73,6 +76,7 @@ def run(query: Query, *, index: str | None, roots: Sequence[str], form: Form) ->
         sources = sources_to_ask(index, roots)
     except IndexProblem as problem:
         return fail(problem)
+    found = True  # where the reader went away: something was written
     with quiet_output() as out:
         found = show_answers(out, sources, sources.answers(query, with_lines=True), form)
     if isinstance(sources, Index):

@@ -87,7 +87,11 @@ def plain_parameters(arguments: Sequence[str]) -> dict[str, Any] | None:
             parameters["name"] = argument
         elif option.takes_value:
             value = next(rest, "-")
-            if value.startswith("-") or (not value and option is INDEX_OPTION) or (option.choices and value not in option.choices):
+            if (
+                value.startswith("-")
+                or (not value and option is INDEX_OPTION)
+                or (option.choices and value not in option.choices)
+            ):
                 return None
             parameters[option.parameter] = (*parameters[option.parameter], value) if option.repeated else value
         else:

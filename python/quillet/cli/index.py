@@ -5,6 +5,8 @@ from __future__ import annotations
 import os
 import sys
 import time
+from collections.abc import Iterator
+from typing import TYPE_CHECKING
 
 from quillet.cli.files import find_files
 from quillet.cli.progress import Progress, say
@@ -13,8 +15,13 @@ from quillet.index.paths import stored_path
 from quillet.index.store import DEFAULT_NAME, IndexProblem, find_index
 from quillet.index.update import Outcome, Reports, Settings, update
 
-# How often the watch looks at the files, in seconds.
-_INTERVAL = 0.5
+if TYPE_CHECKING:
+    from quillet.index.update import Watched
+
+# How often the watch looks at the files where nobody tells of changes, in seconds, and where somebody
+# does, in milliseconds: some file systems tell of nothing.
+_INTERVAL = 2.0
+_RARE_LOOK_MS = 30_000
 
 
 def run(settings: Settings, *, output: str | None, form: str, watch: bool, quiet: bool) -> int:
@@ -46,7 +53,7 @@ def _tables(settings: Settings, form: str, target: str, *, quiet: bool) -> int:
     start = time.perf_counter()
     found: list[str] = []
     unread = 0
-    for item in find_files(settings.paths, gitignore=settings.gitignore is not False):
+    for item in find_files(settings.paths, gitignore=settings.gitignore is not False, exclude=settings.exclude):
         if item.problem is None:
             found.append(os.path.relpath(item.path))
         else:
@@ -106,22 +113,38 @@ def _say_unread(path: str, problem: str) -> None:
 
 def _watch(index: str, settings: Settings, *, quiet: bool) -> None:
     """Updates the index whenever a file came, went or changed; ends by an interrupt."""
-    from quillet.index.update import watched_paths
+    from quillet.index.update import watched_files
 
-    paths, gitignore = watched_paths(index, settings)
-    before = _look(paths, gitignore)
-    while True:
-        time.sleep(_INTERVAL)
-        now = _look(paths, gitignore)
+    watched = watched_files(index, settings)
+    before = _look(watched)
+    for _ in _moments(watched.paths):
+        now = _look(watched)
         if now != before:
             _update(index, settings, quiet=quiet)
             before = now
 
 
-def _look(paths: tuple[str, ...], gitignore: bool) -> dict[str, tuple[int, int, int]]:
+def _moments(paths: tuple[str, ...]) -> Iterator[object]:
+    """The moments at which something may have changed: those that the system tells, or else many."""
+    try:
+        from watchfiles import watch
+    except ImportError:
+        say(f"looks at all files every {_INTERVAL:g} s; to be told of changes: pip install watchfiles")
+        while True:
+            time.sleep(_INTERVAL)
+            yield None
+    # Editors put a new file in the place of an old one, which its folder tells.
+    folders = {path if os.path.isdir(path) else os.path.dirname(path) or "." for path in paths}
+    # What changed between the first look and the begin of the watch is seen by the next rare look.
+    yield from watch(
+        *sorted(folders), watch_filter=None, raise_interrupt=True, yield_on_timeout=True, rust_timeout=_RARE_LOOK_MS
+    )
+
+
+def _look(watched: Watched) -> dict[str, tuple[int, int, int]]:
     """Each file that is there, by what tells that it changed."""
     seen = {}
-    for item in find_files(paths, gitignore=gitignore):
+    for item in find_files(watched.paths, gitignore=watched.gitignore, exclude=watched.exclude):
         try:
             status = os.stat(item.path)
         except (OSError, ValueError):

@@ -12,7 +12,7 @@ from typing import Any
 import click
 
 from quillet.cli.find_options import INDEX_OPTION, OPTIONS, ROOT_OPTION, Option
-from quillet.cli.options import PathArgument, python_option
+from quillet.cli.options import PathArgument, exclude_option, python_option
 
 
 def _options(options: Sequence[Option]) -> Callable[[Callable[..., None]], Callable[..., None]]:
@@ -62,6 +62,7 @@ _index_options = _options([INDEX_OPTION, ROOT_OPTION])
     help="Threads that analyse; one a core without it.",
 )
 @click.option("--no-gitignore/--gitignore", default=None, help="Index what .gitignore files exclude, too.")
+@exclude_option
 @click.option("--force", is_flag=True, help="Analyse all files again, also those that seem not to have changed.")
 @click.option("--watch", is_flag=True, help="Go on, and update the index when a file changes.")
 @click.option("-q", "--quiet", is_flag=True, help="Say nothing of what was done.")
@@ -72,6 +73,7 @@ def index(
     version: tuple[int, int] | None,
     jobs: int | None,
     no_gitignore: bool | None,
+    exclude: tuple[str, ...],
     force: bool,
     watch: bool,
     quiet: bool,
@@ -90,7 +92,7 @@ def index(
     from quillet.index.update import Settings
 
     gitignore = None if no_gitignore is None else not no_gitignore
-    settings = Settings(paths=paths, version=version, jobs=jobs, gitignore=gitignore, force=force)
+    settings = Settings(paths=paths, version=version, jobs=jobs, gitignore=gitignore, force=force, exclude=exclude)
     sys.exit(run(settings, output=output, form=form, watch=watch, quiet=quiet))
 
 
@@ -194,8 +196,14 @@ def export(form: str, output: str | None, index: str | None, roots: tuple[str, .
     help="Threads that read and write; one a core without it.",
 )
 @click.option("--no-gitignore", is_flag=True, help="Show what .gitignore files exclude, too.")
+@exclude_option
 def report(
-    paths: tuple[str, ...], output: str, version: tuple[int, int] | None, jobs: int | None, no_gitignore: bool
+    paths: tuple[str, ...],
+    output: str,
+    version: tuple[int, int] | None,
+    jobs: int | None,
+    no_gitignore: bool,
+    exclude: tuple[str, ...],
 ) -> None:
     """Writes a static site that is read from disk: files, source with linked names, syntax errors.
 
@@ -209,7 +217,7 @@ def report(
     from quillet.cli.report import run
     from quillet.report.site import Settings
 
-    sys.exit(run(paths, output, Settings(version, jobs), gitignore=not no_gitignore))
+    sys.exit(run(paths, output, Settings(version, jobs), gitignore=not no_gitignore, exclude=exclude))
 
 
 @click.command()

@@ -10,6 +10,7 @@ from __future__ import annotations
 import os
 import sys
 import time
+from contextlib import suppress
 from types import TracebackType
 from typing import TextIO
 
@@ -93,7 +94,8 @@ def say(text: str) -> None:
     if Progress._on_screen is not None:
         Progress._on_screen.clear()
     if sys.stderr is not None:
-        print(f"quillet: {text}", file=sys.stderr)
+        with suppress(OSError):  # nobody is left to be told
+            print(f"quillet: {text}", file=sys.stderr)
 
 
 def line_of(label: str, done: int, total: int | None, width: int) -> str:

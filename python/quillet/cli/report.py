@@ -11,14 +11,14 @@ from quillet.report.folder import SiteProblem
 from quillet.report.site import Reports, Settings, Source, write_site
 
 
-def run(paths: tuple[str, ...], folder: str, settings: Settings, *, gitignore: bool) -> int:
+def run(paths: tuple[str, ...], folder: str, settings: Settings, *, gitignore: bool, exclude: tuple[str, ...]) -> int:
     """Runs the command and returns its exit code."""
     paths = paths or (".",)
     if "-" in paths or "" in paths:
         say("standard input and empty paths have no place in a report; name files or folders")
         return 2
     try:
-        sources, lost = _sources(paths, gitignore)
+        sources, lost = _sources(paths, gitignore, exclude)
         if not sources:
             say(f"{' '.join(map(printable, paths))}: there are no Python files; name a folder that holds some")
             return 2
@@ -38,17 +38,12 @@ def run(paths: tuple[str, ...], folder: str, settings: Settings, *, gitignore: b
     return 1 if lost else 0
 
 
-def _sources(paths: tuple[str, ...], gitignore: bool) -> tuple[list[Source], int]:
-    """The files to show, each once, and how many cannot be. What a link leads to must be named, too."""
-    roots = [os.path.realpath(path) for path in paths]
+def _sources(paths: tuple[str, ...], gitignore: bool, exclude: tuple[str, ...]) -> tuple[list[Source], int]:
+    """The files to show, each once, and how many cannot be."""
     sources: dict[str, Source] = {}
     lost = 0
-    for found in find_files(paths, gitignore=gitignore):
+    for found in find_files(paths, gitignore=gitignore, exclude=exclude):
         problem = found.problem
-        if problem is None and found.path not in paths and os.path.islink(found.path):
-            real = os.path.realpath(found.path)
-            if not any(os.path.commonpath((real, root)) == root for root in roots):
-                problem = "a link that leads out of what was named; left out"
         if problem is not None:
             _say_of(found.path, problem)
             lost += 1

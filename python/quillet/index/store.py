@@ -49,6 +49,7 @@ class Settings(NamedTuple):
     python: tuple[int, int]
     gitignore: bool
     made_by: str
+    exclude: tuple[str, ...] = ()
 
 
 class Stored(NamedTuple):
@@ -150,17 +151,18 @@ def explained(path: str) -> Iterator[None]:
 def settings_text(settings: Settings) -> bytes:
     """Settings as an index keeps them. No path holds a NUL."""
     version = "{}.{}".format(*settings.python)
-    parts = (version, str(int(settings.gitignore)), settings.made_by, *settings.roots)
+    parts = (version, str(int(settings.gitignore)), settings.made_by, "\n".join(settings.exclude), *settings.roots)
     return "\0".join(parts).encode("utf-8", "surrogateescape")
 
 
 def _settings_of(text: bytes) -> Settings:
-    version, gitignore, made_by, *roots = text.decode("utf-8", "surrogateescape").split("\0")
+    version, gitignore, made_by, exclude, *roots = text.decode("utf-8", "surrogateescape").split("\0")
     major, _, minor = version.partition(".")
     python = int(major), int(minor)
     if python != (2, 7) and not (python[0] == 3 and 0 <= python[1] < 100):
         raise ValueError("a version that there is not")
-    return Settings(tuple(roots), python, gitignore == "1", made_by)
+    patterns = tuple(exclude.split("\n")) if exclude else ()
+    return Settings(tuple(roots), python, gitignore == "1", made_by, patterns)
 
 
 # ---- the lock ----

@@ -46,6 +46,15 @@ class Settings(NamedTuple):
     jobs: int | None = None
     gitignore: bool | None = None
     force: bool = False
+    exclude: tuple[str, ...] = ()  # without any, those of the last run
+
+
+class Watched(NamedTuple):
+    """The files that a run looks at, as `find_files` takes them."""
+
+    paths: tuple[str, ...]
+    gitignore: bool
+    exclude: tuple[str, ...]
 
 
 class Outcome(NamedTuple):
@@ -98,11 +107,12 @@ def engine_version() -> str:
         return "0"
 
 
-def watched_paths(index: str, settings: Settings) -> tuple[tuple[str, ...], bool]:
-    """What a run with these settings looks at: the paths, and whether .gitignore files count."""
+def watched_files(index: str, settings: Settings) -> Watched:
+    """What a run with these settings looks at."""
     base = os.path.dirname(os.path.abspath(index))
     remembered = read_index(index).settings
-    return settings.paths or _trusted_roots(remembered.roots, base)[0], remembered.gitignore
+    paths = settings.paths or _trusted_roots(remembered.roots, base)[0]
+    return Watched(paths, remembered.gitignore, remembered.exclude)
 
 
 def _trusted_roots(stored: tuple[str, ...], base: str) -> tuple[tuple[str, ...], tuple[str, ...]]:
@@ -130,13 +140,14 @@ class _Run:
         self._gitignore = settings.gitignore
         if self._gitignore is None:
             self._gitignore = remembered is None or remembered.gitignore
+        self._exclude = settings.exclude or (remembered.exclude if remembered else ())
         self._version = settings.version or (remembered.python if remembered else sys.version_info[:2])
         self._jobs = settings.jobs or available_cores()
 
         named = [os.path.abspath(path) for path in settings.paths]
         roots = [root for root in dict.fromkeys([*inside, *outside, *named]) if os.path.exists(root)]
         kept = tuple(os.fsdecode(stored_path(root, self._base)) for root in roots)
-        self._settings = StoredSettings(kept, self._version, self._gitignore, engine_mark())
+        self._settings = StoredSettings(kept, self._version, self._gitignore, engine_mark(), self._exclude)
         # What another engine found, or this one in another language, is found again, wherever it lies.
         self._anew = settings.force or (
             remembered is not None
@@ -196,7 +207,7 @@ class _Run:
         stored_of = StoredPaths(self._base)
         seen: set[bytes] = set()
         now = time.time_ns()
-        for item in find_files(self._paths, gitignore=bool(self._gitignore)):
+        for item in find_files(self._paths, gitignore=bool(self._gitignore), exclude=self._exclude):
             if item.problem is not None:
                 self._report(item.path, item.problem)
                 continue
