@@ -661,3 +661,15 @@ def test_odd_file_names_are_indexed_and_shown_on_one_line(tmp_path: Path) -> Non
     assert all(line.endswith(":1:1: x = 1") for line in lines)
     rows = [json.loads(line) for line in run("find", "x", "--json", cwd=tmp_path).stdout.splitlines()]
     assert {os.fsencode(row["path"]) for row in rows} == {os.fsencode(name) for name in ODD_NAMES}
+
+
+def test_what_was_left_out_stays_out_of_later_runs(tmp_path: Path) -> None:
+    (tmp_path / "kept.py").write_text("total = 1\n")
+    (tmp_path / "gen.py").write_text("total = 2\n")
+    assert run("index", ".", "--exclude", "gen.py", "--exclude", "x y", cwd=tmp_path).returncode == 0
+    (tmp_path / "gen.py").write_text("total = 3\n")
+    assert run("index", cwd=tmp_path).returncode == 0
+    settings = read_index(str(tmp_path / ".quillet-index")).settings
+    assert settings.exclude == ("gen.py", "x y")
+    assert "gen.py" not in run("find", "total", cwd=tmp_path).stdout
+    assert "kept.py" in run("find", "total", cwd=tmp_path).stdout

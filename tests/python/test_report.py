@@ -406,7 +406,7 @@ def test_nothing_is_written_outside_the_folder(tmp_path: Path) -> None:
 
 
 def test_nothing_to_show_is_wrong_usage(tmp_path: Path) -> None:
-    for arguments in ([], [""], ["-"]):
+    for arguments in ([], ["-"]):
         result = run("report", *arguments, "-o", "site", cwd=tmp_path)
         assert result.returncode == 2
         assert len(result.stderr.splitlines()) == 1
