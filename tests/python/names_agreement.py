@@ -30,6 +30,7 @@ from typing import Any
 if __name__ == "__main__":
     sys.path.insert(0, str(Path(__file__).resolve().parent.parent.parent / "scripts"))
 
+from names_oracle import names_of_text, strings_of_type
 from quillet import FileBindings, Occurrence, Symbol, bind
 from quillet._source import to_utf8
 from survey import NOT_THE_LIBRARY, Library, libraries
@@ -651,6 +652,9 @@ class NamesComparison:
                 self._differ("type comments with names", "no expression", line, 0, text)
                 continue
             expected = [getattr(node, "id", None) or getattr(node, "attr", "") for node in ast.walk(tree)]
+            types = [*tree.argtypes, tree.returns] if isinstance(tree, ast.FunctionType) else [tree.body]
+            for string in (string for part in types for string in strings_of_type(part)):
+                expected += names_of_text(string.value) or []
             if sorted(names) != sorted(filter(None, expected)):
                 self._differ("type comments with names", "other names", line, 0, f"{names}: {text}")
 
