@@ -391,8 +391,9 @@ void NameReader::Equal() {
       } else if (head_.kind == Head::Kind::kAlias && in_row_) {
         BeginHeadAnnotation();
       } else if (operand_ != kNoIndex && out_.occurrences[operand_].role == NameRole::kRead) {
-        // Where no assignment may stand, as in the condition of a statement.
-        candidates_.push_back(operand_);
+        // Where no assignment may stand, as in the condition of a statement. A candidate ("del x = 1") is one no
+        // longer, or its role would change twice.
+        if (candidates_.empty() || candidates_.back() != operand_) candidates_.push_back(operand_);
         MakeWrites(static_cast<uint32_t>(candidates_.size()) - 1, NameRole::kWrite, 0);
       }
       break;

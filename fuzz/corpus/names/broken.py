@@ -48,6 +48,8 @@ lambda:
 
 with a as
 del
+del a, (b) = c
+del a as b = c.d = e
 return return x
 
 def f(x:

@@ -454,6 +454,9 @@ TEST(BrokenNames, TheBestRoleThatTokensAllow) {
             "x=definition/parameter@lambda x=definition/parameter@lambda y=definition/parameter@lambda");
   EXPECT_EQ(NamesOf("[x for x\n"), "x=read@comprehension x=write/variable@comprehension");
   EXPECT_EQ(NamesOf("with a as\ndel\nreturn return x\n"), "a=read x=read");
+  EXPECT_EQ(NamesOf("del a, b = c, d\n"), "a=delete b=write/variable c=delete d=delete");
+  EXPECT_EQ(NamesOf("del (a) = b\ndel a.b = c\n"), "a=write/variable b=delete a=read b=write<a c=delete");
+  EXPECT_EQ(NamesOf("del a as b = c\n"), "a=delete b=write/variable c=delete");
 }
 
 TEST(BrokenNames, WhatIsAroundStaysAsItIs) {
