@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <charconv>
+#include <optional>
 
 #include "foundations/shown_text.h"
 #include "foundations/stop.h"
@@ -69,18 +70,49 @@ void PlacedRecords::SetPlace(const LineRow& row, Text name, PlacedRecord& placed
   placed.column = static_cast<uint32_t>(position.col) + 1;
 }
 
-// Copies come in the order of their tokens, so the search goes on where the last one was found, and
-// gives up after a while.
+// Whether the tokens from `first` on spell a name. The name may be of any length: its beginning is enough.
+bool PlacedRecords::Spells(TokenSpan toks, size_t first, Text name) {
+  constexpr size_t kMaxCompared = 200;
+  const bool is_cut = name.size() > kMaxCompared;
+  name = name.substr(0, kMaxCompared);
+  for (size_t i = first; i < toks.size(); ++i) {
+    if (IsSkipCode(toks[i].code)) continue;
+    const Text token = toks[i].view();
+    name.remove_prefix(std::min(name.find_first_not_of(' '), name.size()));
+    if (is_cut && token.starts_with(name)) return true;
+    if (!name.starts_with(token)) return false;
+    name.remove_prefix(token.size());
+    if (name.empty()) return true;
+  }
+  return false;
+}
+
+// A copy stands where the tokens spell it, and one that is spelled another way where they spell its
+// first part, which is no attribute of something else. Copies come in the order of their tokens, so the
+// search goes on where the last one was found, and gives up after a while.
 const char* PlacedRecords::PlaceOfCopy(const LineRow& row, Text name) {
   constexpr uint32_t kMaxTokensSearched = 500;
   const TokenSpan toks = TokenSpan(file_->source().tokens).subspan(row.first_token, row.token_count);
   const Text root = RootOfName(name);
   const auto count = static_cast<uint32_t>(toks.size());
+  std::optional<uint32_t> found;
+  TokenCode before = tok::COMMENT;
   for (uint32_t i = 0; i < std::min(count, kMaxTokensSearched); ++i) {
     const uint32_t token = (spelled_at_ + i) % count;
-    if (toks[token].view() != root) continue;
-    spelled_at_ = token;
-    return toks[token].text;
+    if (token == 0) before = tok::COMMENT;
+    if (IsSkipCode(toks[token].code)) continue;
+    const bool is_attribute = before == tok::DOT;
+    before = toks[token].code;
+    if (is_attribute) continue;
+    if (Spells(toks, token, name)) {
+      found = token;
+      break;
+    }
+    if (!found && toks[token].view() == root) found = token;
+  }
+  if (found) {
+    spelled_at_ = *found;
+    return toks[*found].text;
   }
   const auto first = std::find_if(toks.begin(), toks.end(), [](const Token& tok) { return !IsSkipCode(tok.code); });
   return (first != toks.end() ? *first : toks.front()).text;

@@ -52,6 +52,7 @@ class PlacedRecords {
   void SetPlace(const LineRow& row, Text name, PlacedRecord& placed);
   bool FindSignature(size_t row);
   Text ShownArgument(Text name);
+  static bool Spells(TokenSpan toks, size_t first, Text name);
   const char* PlaceOfCopy(const LineRow& row, Text name);
   Text Cut(Text text);
   Text Shown(Text text);

@@ -241,10 +241,13 @@ bool CTypeHintWalker::GetHintInfoStr(CNode* node, std::string& info) {
 
 void CTypeHintWalker::AddSymInfo(Text name, Text istr, bool is_arg) {
   LogicalLine& logical = RequireLogical();
+  // A name that stands in the source is kept as a view, which tells its place.
+  if (!logical.source || !logical.source->Holds(name.data())) name = logical.texts().Copy(name);
+  istr = logical.texts().Copy(istr);
   if (is_arg)
-    logical.AppendArgTypeEquiv(name, istr);
+    logical.AppendStableArgTypeEquiv(name, istr);
   else
-    logical.AppendTypeEquiv(name, istr);
+    logical.AppendStableTypeEquiv(name, istr);
 }
 
 // ---- comments ----

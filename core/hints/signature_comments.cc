@@ -20,18 +20,24 @@ constexpr Token kDummyColon{":", 1, tok::COLON};
 
 std::string SignatureText(Text hint) { return std::string(kSignatureFront).append(hint).append(1, ':'); }
 
+using CopiedRecords = std::vector<std::pair<std::string, std::string>>;
+
 // Names of the real function's parameters, in order, as the general walker recorded them; false
-// where the host sees no list of parameters at all.
-bool ParameterNames(LogicalLine& logical, std::vector<std::string>& names) {
-  std::vector<std::pair<std::string, std::string>> host_records;
-  if (logical.hooks != nullptr && logical.hooks->GetHostArgRecords(logical, host_records)) {
-    for (auto& [name, info] : host_records)
-      if (info == kSetPrefix) names.push_back(std::move(name));
-    return true;
+// where the host sees no list of parameters at all. A host may clear its line before the names are
+// used, so they are those of copies in `copied`; otherwise they tell where they stand in the source.
+bool ParameterNames(LogicalLine& logical, CopiedRecords& copied, std::vector<Text>& names) {
+  const auto add = [&names](Text name, Text info) {
+    if (info == kSetPrefix) names.push_back(name);
+  };
+  if (logical.hooks == nullptr) {
+    for (const Record& record : logical.arg_type_equivs()) add(record.name(), record.info());
+    return !logical.arg_type_equivs().empty();
   }
-  for (const Record& record : logical.arg_type_equivs())
-    if (record.info() == kSetPrefix) names.emplace_back(record.name());
-  return !logical.arg_type_equivs().empty();
+  const bool is_host_list = logical.hooks->GetHostArgRecords(logical, copied);
+  if (!is_host_list)
+    for (const Record& record : logical.arg_type_equivs()) copied.emplace_back(record.name(), record.info());
+  for (const auto& [name, info] : copied) add(name, info);
+  return is_host_list || !copied.empty();
 }
 
 // Whether a list of parameters can hold an annotation: only annotated parameters (and tuples of the
@@ -144,14 +150,15 @@ void CTypeHintWalker::ProcessFuncdefComment(Text hint, int32_t tok_i, LogicalLin
   if (!isa<CFuncdefStmt>(node)) return hint_parser_->DiscardNode(node);
   UseHintTree(node, [&] {
     const CFuncdefStmt* signature = cast<CFuncdefStmt>(node);
-    std::vector<std::string> real_names;
-    const bool has_parameter_list = funcdef_logical == nullptr || ParameterNames(*funcdef_logical, real_names);
+    CopiedRecords copied;
+    std::vector<Text> real_names;
+    const bool has_parameter_list = funcdef_logical == nullptr || ParameterNames(*funcdef_logical, copied, real_names);
     const auto record = [&](Text name, CNode* type_expr) {
       if (GetHintInfoStr(type_expr, info_buffer_)) AddSymInfo(name, info_buffer_, is_arg);
     };
 
     size_t i = 0;
-    std::string name;
+    std::string dummy;
     for (const ArgEntry& entry : GetDefiningArgInfoList(signature->GetParameters())) {
       if (entry.is_list) continue;
       CNode* type_expr = entry.arg.type_expr;
@@ -159,12 +166,13 @@ void CTypeHintWalker::ProcessFuncdefComment(Text hint, int32_t tok_i, LogicalLin
       if (type_expr == nullptr) continue;
       RequireGeneralWalker().Walk(type_expr, fLogical);
       if (!has_parameter_list) ThrowError(ErrorKind::kTypeError, "object of type 'NoneType' has no len()");
-      name.clear();
-      if (index < real_names.size())
-        name = real_names[index];
-      else
-        AppendArgInfo(static_cast<int64_t>(index), kNoText, name);
-      record(name, type_expr);
+      if (index < real_names.size()) {
+        record(real_names[index], type_expr);
+      } else {
+        dummy.clear();
+        AppendArgInfo(static_cast<int64_t>(index), kNoText, dummy);
+        record(dummy, type_expr);
+      }
     }
     if (CNode* returned = signature->GetReturnType()) {
       RequireGeneralWalker().Walk(returned, fLogical);

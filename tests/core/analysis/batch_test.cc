@@ -97,6 +97,27 @@ TEST(Places, TheHintOfAParameterStandsAtTheParameter) {
   EXPECT_EQ(RecordsOf("def f(a, b: int): pass\n", "b"), (Strings{"arg 1:10 f|b set", "arg 1:10 f|b hint int"}));
 }
 
+TEST(Places, ANameWithAHintStandsWhereTheHintIsAndNowhereElse) {
+  EXPECT_EQ(RecordsOf("y: T = f(1)[\n z].y\n", "y"),
+            (Strings{"1:1 |y set", "1:1 |y equal f(1)[z].y", "1:1 |y hint T"}));
+  EXPECT_EQ(RecordsOf("def f(b: a, a: int): pass\n", "a"),
+            (Strings{"1:10 |a get", "arg 1:13 f|a set", "arg 1:13 f|a hint int"}));
+  EXPECT_EQ(RecordsOf("def f(b=a, a=1):  # type: (int, str) -> None\n  pass\n", "a"),
+            (Strings{"1:9 |a get", "arg 1:12 f|a set", "arg 1:12 f|a literal int: 1", "arg 1:12 f|a hint str"}));
+  EXPECT_EQ(RecordsOf("z.a, a = 1, 2  # type: int, str\n", "a").back(), "1:6 |a hint str");
+}
+
+TEST(Places, ANameWithBlanksBetweenItsPartsStandsWhereTheStatementSpellsIt) {
+  EXPECT_EQ(RecordsOf("x = x.  y(1)\n", "x.y"), (Strings{"1:5 |x.y called (1)", "1:5 |x.y get"}));
+  EXPECT_EQ(RecordsOf("q.x = x.z, x.\\\n y\n", "x.y"), (Strings{"1:12 |x.y get"}));
+  EXPECT_EQ(RecordsOf("x(x, 'a'  .join)\n", "'a'.join"), (Strings{"1:6 |'a'.join get"}));
+  // Spelled with brackets that the name lacks: where its first part is, which no dot is in front of.
+  EXPECT_EQ(RecordsOf("q.x + x[(1)] .y\n", "x[1].y"), (Strings{"1:7 |x[1].y get"}));
+  const std::string arguments(300, 'a');
+  EXPECT_EQ(RecordsOf("x[0]; x + x[" + arguments + "] .y\n", "x[" + arguments + "].y"),
+            (Strings{"1:11 |x[" + arguments + "].y get"}));
+}
+
 TEST(Places, ANameThatTheStatementDoesNotSpellStandsAtItsFirstToken) {
   EXPECT_EQ(RecordsOf("if a: return (\\\n 1)\n", "return"), (Strings{"1:7 |return literal int: 1"}));
   EXPECT_EQ(RecordsOf("x\n  \\\n y\ndef f(a) -> int: pass\n", "return"), (Strings{"arg 4:1 f|return hint int"}));
