@@ -39,9 +39,10 @@ void NameReader::Fields(const Token& string) {
   operand_ = kNoIndex;
 }
 
-// Whether the name is the prefix of a template string, whose string is the next token.
+// Whether the name is the prefix of a template string, whose string is the next token (no comment between).
 bool NameReader::IsTemplatePrefix(const Token& prefix) const {
-  if (!version_.AtLeast(3, 14) || at_ + 1 >= end_ || at_[1].text != prefix.end()) return false;
+  if (!version_.AtLeast(3, 14) || at_ + 1 >= end_) return false;
+  if (at_[1].code != tok::STRING || at_[1].text != prefix.end()) return false;
   const auto is_letter = [&](size_t i, char letter) { return (prefix.text[i] | 0x20) == letter; };
   if (prefix.length == 1) return is_letter(0, 't');
   return prefix.length == 2 && ((is_letter(0, 't') && is_letter(1, 'r')) || (is_letter(0, 'r') && is_letter(1, 't')));

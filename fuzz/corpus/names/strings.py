@@ -12,6 +12,10 @@ x = '{a}' + rb'{b}'
 
 t'{a}' + T
 
+(t#{a}
+'{b}' + t\
+'{c}')
+
 x: 'List[a.B]' = y
 
 def f(a: 'A', b='B') -> 'C': pass

@@ -242,6 +242,9 @@ TEST(Names, FormattedStrings) {
   EXPECT_EQ(NamesOf("t'{a}' + T\n", kPy314), "a=read T=read");
   EXPECT_EQ(NamesOf("x = tR\"{a[\"b\"]} {c}\".d\n", kPy314), "x=write/variable a=read c=read d=read<");
   EXPECT_EQ(NamesOf("f(t'{a', b)\n", kPy314), "f=call a=read b=read");
+  // A prefix touches its string.
+  EXPECT_EQ(NamesOf("(t#{a}\n'{b}' + c)\n", kPy314), "t=read c=read");
+  EXPECT_EQ(NamesOf("(t\\\n'{b}' + c)\n", kPy314), "t=read c=read");
 }
 
 TEST(Names, AnnotationsInStrings) {
