@@ -270,7 +270,7 @@ def test_outline_is_a_tree_with_parameters_and_hints(shop: Path) -> None:
         " 7 class Item",
         "10     def __init__(self, price: D) -> None",
         "14 class Shop",
-        "15     def add(self, item: Item, count)",
+        "15     def add(self, item: Item, count=1)",
         "20     def path(self, name)",
         "24 def main()",
     ]
@@ -281,12 +281,46 @@ def test_outline_has_broken_definitions_marked(tmp_path: Path) -> None:
     (tmp_path / "shop.py").write_text(source + "class Broken(A)\n    def kept(self): pass\n")
     assert run("outline", "shop.py", cwd=tmp_path).stdout.splitlines() == [
         "1 class Basket",
-        "2     def add(self, item, count)  syntax error",
+        "2     def add(self, item, count=1)  syntax error",
         "3         def inner()",
         "5     def total(self)",
         "6 class Broken  syntax error",
         "7     def kept(self)",
     ]
+
+
+def test_outline_has_signatures_as_the_source_has_them(tmp_path: Path) -> None:
+    source = """\
+async def f(a, *args, b=1, **kw): pass
+def g[T: int](
+    a: T, /,  # a comment: with (brackets
+    *,
+    b="x: (",
+    c=(lambda q: {q: 1}),
+) -> dict[str,
+          T]: pass
+def commented(a, *b, c=1):
+    # type: (int, str, bytes) -> None
+    pass
+def broken(a, *b, c=1) = 3
+def open(a, *b,
+def long(%s): pass
+"""
+    (tmp_path / "a.py").write_text("\ufeff" + source % ", ".join(f"a{i}=0" for i in range(100)), encoding="utf-8")
+    lines = run("outline", "a.py", cwd=tmp_path).stdout.splitlines()
+    assert lines[:3] == [
+        " 1 async def f(a, *args, b=1, **kw)",
+        ' 2 def g[T: int](a: T, /, *, b="x: (", c=(lambda q: {q: 1})) -> dict[str, T]',
+        " 9 def commented(a, *b, c=1)",
+    ]
+    assert lines[-1].startswith("14 def long(a0=0, a1=0, ")
+    assert lines[-1].endswith("…")
+    assert len(lines[-1]) == len("14 def long") + 160
+
+
+def test_outline_has_hints_of_comments(tmp_path: Path) -> None:
+    (tmp_path / "a.py").write_text("def f(a, b=1, *c):  # type: (int, str, bytes) -> None\n    pass\n")
+    assert run("outline", "a.py", cwd=tmp_path).stdout == "1 def f(a: int, b: str=1, *c: bytes) -> None\n"
 
 
 @pytest.mark.parametrize("command", ["defs", "outline"])

@@ -1,42 +1,72 @@
-"""`quillet outline`: the classes and functions of a file as a tree, with their parameters.
+"""`quillet outline`: the classes and functions of a file as a tree, with their signatures.
 
-The definitions are those of the file's names, so one that has a syntax error is among them, and marked. The hints
-are those of its records.
+The definitions are those of the file's names, so one that has a syntax error is among them, and marked. A signature
+is what the source has between the name and the colon, on one line; hints that only a comment gives are those of the
+records. A head whose brackets its line leaves open and that has a syntax error may go anywhere, so of that one the
+names of the parameters are shown.
 """
 
 from __future__ import annotations
 
+import os
+import re
 from collections.abc import Iterator
 
 from quillet._batch import analyze_files
 from quillet._names import FileBindings, Occurrence
+from quillet._source import SourceEncodingError, to_utf8
 from quillet.cli.defs import facts_of, version_of
+from quillet.cli.files import problem_of, read_file
 from quillet.cli.find import fail
 from quillet.cli.show import Style, printable
 from quillet.cli.streams import quiet_output
 from quillet.index.questions import FileFacts, Hit
 from quillet.index.store import CLASS, FUNCTION, IndexProblem
 
+# How much of a signature is shown, in characters, and how far a head is read for it, in bytes.
+_WINDOW = 160
+_MOST_READ = 1 << 14
+_TOKEN = re.compile(
+    rb"""(?P<gap>(?:[ \t\f\r\n]|\\\r?\n|\#[^\r\n]*)+)
+    |(?P<text>[bBfFrRtTuU]{0,2}(?:\'\'\'(?:\\.|[^\\])*?\'\'\'|\"\"\"(?:\\.|[^\\])*?\"\"\"
+        |'(?:\\.|[^'\\\r\n])*'|"(?:\\.|[^"\\\r\n])*"))
+    |(?P<word>[\w\x80-\xff]+)|(?P<open>[(\[{])|(?P<close>[)\]}])|(?P<arrow>->)|\*\*|.""",
+    re.VERBOSE | re.DOTALL,
+)
+_ASYNC = re.compile(rb"\basync[ \t\f]+def[ \t\f]+\Z")
+
 
 def run(path: str, *, index: str | None) -> int:
     """Runs the command and returns its exit code."""
     try:
         facts = facts_of(path, index, with_lines=False)
-        [result] = analyze_files([path], version=version_of(index), jobs=1, bindings=True)
+        source = _source_of(path)
+        [result] = analyze_files([(path, source)], version=version_of(index), jobs=1, bindings=True)
         if result.problem is not None:
             raise IndexProblem(f"{path}: {result.problem}")
     except IndexProblem as problem:
         return fail(problem)
     found = False
     with quiet_output() as out:
-        for line in outline(facts, result.bindings, Style.of_stdout()):
+        for line in outline(facts, result.bindings, to_utf8(source), Style.of_stdout()):
             found = True
             out.write(line)
     return 0 if found else 1
 
 
-def outline(facts: FileFacts, bindings: FileBindings, style: Style) -> Iterator[str]:
-    """The lines of the tree, each with the line number in front."""
+def _source_of(path: str) -> bytes:
+    try:
+        source = read_file(os.path.abspath(path))
+        to_utf8(source)
+    except (OSError, SourceEncodingError) as error:
+        raise IndexProblem(f"{path}: {problem_of(error)}") from error
+    return source
+
+
+def outline(facts: FileFacts, bindings: FileBindings, source: bytes, style: Style) -> Iterator[str]:
+    """The lines of the tree, each with the line number in front. `source` is UTF-8."""
+    source = source.removeprefix(b"\xef\xbb\xbf")
+    starts = [0, *(match.end() for match in re.finditer(rb"\r\n|\r|\n", source))]
     occurrences = list(bindings.occurrences)
     digits = len(str(facts.lines))
     recorded = {(hit.line, hit.column): place for place, hit in enumerate(facts.hits) if hit.opens in (CLASS, FUNCTION)}
@@ -44,16 +74,20 @@ def outline(facts: FileFacts, bindings: FileBindings, style: Style) -> Iterator[
         if occurrence.role != "definition" or occurrence.kind not in ("class", "function"):
             continue
         place = recorded.get((occurrence.line, occurrence.column))
-        signature = mark = ""
-        if place is not None:
-            hit = facts.hits[place]
-            if hit.opens == FUNCTION:
-                signature = _signature(facts.hits, place, f"{hit.scope}.{hit.name}" if hit.scope else hit.name)
-        else:
-            mark = "  " + style.error("syntax error")
-            if occurrence.kind == "function":
+        mark = "" if place is not None else "  " + style.error("syntax error")
+        word, signature = "class", ""
+        if occurrence.kind == "function":
+            hints = _hints(facts.hits, place) if place is not None else {}
+            start = starts[occurrence.line - 1]
+            is_async = _ASYNC.search(source, start, start + occurrence.column - 1)
+            word = "async def" if is_async else "def"
+            behind = start + occurrence.end_column - 1
+            head = source[behind : behind + _MOST_READ]
+            signature = _signature(head, hints, one_line=place is None)
+            if not signature:
                 signature = f"({', '.join(_parameters(bindings, occurrences, index))})"
-        word = "class" if occurrence.kind == "class" else "def"
+            if len(signature) > _WINDOW:
+                signature = signature[: _WINDOW - 1] + "…"
         what = f"{word} {style.name(printable(occurrence.text))}{printable(signature)}{mark}"
         yield f"{style.place(f'{occurrence.line:>{digits}}')} {'    ' * _depth(bindings, occurrence)}{what}\n"
 
@@ -83,19 +117,62 @@ def _parameters(bindings: FileBindings, occurrences: list[Occurrence], index: in
                 yield occurrence.text
 
 
-def _signature(records: list[Hit], place: int, inner: str) -> str:
-    """The parameters and hints of a function, which follow its own record in the records of its statement."""
+def _hints(records: list[Hit], place: int) -> dict[str, str]:
+    """The hints of a function, which follow its own record in the records of its statement."""
+    function = records[place]
+    if function.opens != FUNCTION:
+        return {}
+    inner = f"{function.scope}.{function.name}" if function.scope else function.name
     hints: dict[str, str] = {}
-    parameters = []
     for hit in records[place + 1 :]:
-        if hit.opens or (hit.is_parameter and hit.scope != inner):
+        if hit.opens or hit.is_parameter != (hit.scope == inner):
             break
-        if hit.is_parameter and hit.kind == "set":
-            parameters.append(hit.name)
-        elif hit.is_parameter and hit.kind == "hint":
+        if hit.is_parameter and hit.kind == "hint":
             hints[hit.name] = hit.detail
-        elif not hit.is_parameter and hit.scope == inner:
+    return hints
+
+
+def _signature(head: bytes, hints: dict[str, str], *, one_line: bool) -> str:
+    """What stands in `head` in front of the colon, on one line, with `hints` for what has none there. It is empty
+    where `one_line` is asked for and the first line ends within brackets.
+    """
+    shown: list[str] = []
+    opened: list[bytes] = []
+    before = b""  # the last token that is no gap
+    gap = False
+    unsaid = ""  # the hint of the parameter just named, unless its own follows
+    has_arrow = False
+    for match in _TOKEN.finditer(head):
+        token = match[0]
+        if match["gap"]:
+            breaks = b"\n" in token or b"\r" in token
+            if breaks and one_line and opened:
+                return ""
+            if breaks and not opened and b"\\" not in token:
+                break
+            gap = True
+            continue
+        if token == b":" and not opened:
             break
-    shown = ", ".join(f"{name}: {hints[name]}" if name in hints else name for name in parameters)
-    returned = f" -> {hints['return']}" if "return" in hints else ""
-    return f"({shown}){returned}"
+        if unsaid and token != b":":
+            shown.append(f": {unsaid}")
+        unsaid = ""
+        if match["close"]:
+            if before == b"," and opened == [b"("]:
+                shown.pop()
+            if opened:
+                opened.pop()
+        elif gap and before not in (b"", b"(", b"[", b"{"):
+            shown.append(" ")
+        gap = False
+        shown.append(token.decode("utf-8", "replace"))
+        if match["open"]:
+            opened.append(token)
+        elif match["word"] and opened == [b"("] and before in (b"(", b",", b"*", b"**"):
+            unsaid = hints.get(shown[-1], "")
+        has_arrow = has_arrow or match["arrow"] is not None
+        before = token
+    if one_line and opened:
+        return ""
+    returned = f" -> {hints['return']}" if "return" in hints and not has_arrow else ""
+    return "".join(shown) + returned
