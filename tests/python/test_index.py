@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import fcntl
+import importlib.util
 import json
 import os
 import random
@@ -271,6 +272,8 @@ def test_watch_follows_the_files(tmp_path: Path) -> None:
     assert process.stderr is not None
     try:
         assert "1 files" in process.stderr.readline()
+        if importlib.util.find_spec("watchfiles") is None:
+            assert "pip install watchfiles" in process.stderr.readline()
         time.sleep(1)  # the watch has seen the folder as it is
         (tmp_path / "b.py").write_text("y = 1\n")
         assert "2 files" in process.stderr.readline()
