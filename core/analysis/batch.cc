@@ -55,10 +55,23 @@ std::string MessageOf(const std::exception_ptr& exception) {
 
 std::string DescribeException(const std::exception_ptr& exception) { return MessageOf(exception); }
 
+// A walk that ended at a limit prints a line for those who know the walkers; here it is said to all others.
+// It is empty for what only those want to know: that a tree was too deep to be given back node by node.
+std::string InWords(Text line) {
+  if (line == "depth too great") return {};
+  if (!line.starts_with("RuntimeError raised in ")) return std::string(line);
+  const bool is_deep = line.find("recurs") != Text::npos;
+  return std::string(is_deep ? "too deeply nested" : "too long") + " to be read whole; its records may be incomplete";
+}
+
 Console CollectingConsole() {
   return {
-      [](Text line) { reports_of_thread.Add(std::string(line)); },
-      [](const std::exception_ptr& exception, bool) { reports_of_thread.Add(MessageOf(exception)); },
+      [](Text line) {
+        if (std::string words = InWords(line); !words.empty()) reports_of_thread.Add(std::move(words));
+      },
+      [](const std::exception_ptr& exception, bool) {
+        reports_of_thread.Add("could not be read whole, by an internal error: " + MessageOf(exception));
+      },
       DescribeException,
   };
 }

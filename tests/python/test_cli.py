@@ -487,3 +487,22 @@ def test_tree_of_a_line_that_is_not_there(tmp_path: Path) -> None:
     assert (result.returncode, result.stdout) == (2, b"")
     assert result.stderr.decode() == f"quillet: {path}: there is no line 9\n"
     assert run("tree", "missing.py").returncode == 1
+
+
+def test_what_was_not_read_whole_is_said_in_words_with_its_line(tmp_path: Path) -> None:
+    nested = "f(" * 60 + ")" * 60
+    sources = {
+        "deep.py": f"y\nx = {nested}\n",
+        "wide.py": "x = " + "a + " * 20_000 + "a\n",
+        "odd.py": "\n\nmatch ...:\n",
+    }
+    for name, source in sources.items():
+        (tmp_path / name).write_text(source)
+    result = run("analyze", *sources, cwd=tmp_path)
+    assert result.returncode == 0
+    assert result.stderr.decode().splitlines()[:2] == [
+        "quillet: deep.py:2: too deeply nested to be read whole; its records may be incomplete",
+        "quillet: wide.py:1: too long to be read whole; its records may be incomplete",
+    ]
+    [odd] = result.stderr.decode().splitlines()[2:]
+    assert odd.startswith("quillet: odd.py:3: could not be read whole, by an internal error: ")

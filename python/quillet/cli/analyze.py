@@ -50,8 +50,8 @@ def run(
                 if result.problem is not None:
                     unread += 1
                     _complain(out, path, result.problem)
-                for _, _, message in result.reports:
-                    _complain(out, path, message)
+                for line, _, message in result.reports:
+                    _complain(out, path, message, line)
                 errors += len(result.errors)
                 write(memoryview(result))
                 progress.advance()
@@ -70,11 +70,12 @@ def _input_of(item: Found, stdin_filename: str) -> BatchInput:
     return os.fsencode(item.path), None, problem
 
 
-def _complain(out: TextIO, path: str, reason: str) -> None:
+def _complain(out: TextIO, path: str, reason: str, line: int | None = None) -> None:
     # The lines before it come first where both streams go to one place.
     out.flush()
     first_line = reason.partition("\n")[0]
-    say(f"{printable(path)}: {printable(first_line)}")
+    place = printable(path) if line is None else f"{printable(path)}:{line}"
+    say(f"{place}: {printable(first_line)}")
 
 
 def _bytes_writer(out: TextIO) -> Callable[[memoryview], object]:
