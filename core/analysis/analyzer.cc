@@ -9,6 +9,7 @@
 #include <exception>
 #include <utility>
 
+#include "analysis/error_words.h"
 #include "foundations/console.h"
 #include "foundations/stop.h"
 #include "lines/syntax_error.h"
@@ -95,8 +96,9 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeSingleLogical(LogicalLine& 
     return std::nullopt;
   } catch (const ParseError& error) {
     logical.ClearDerivedInfo();
-    return spells_error_texts_ ? CreateSyntaxError("invalid syntax", logical, error.context)
-                               : CreateTextlessSyntaxError("invalid syntax", logical, error.context);
+    const std::string message = explains_errors_ ? ExplainedSyntaxError(logical.toks, error) : "invalid syntax";
+    return spells_error_texts_ ? CreateSyntaxError(message, logical, error.context)
+                               : CreateTextlessSyntaxError(message, logical, error.context);
   } catch (const SyntaxError& error) {
     logical.ClearDerivedInfo();
     return error;

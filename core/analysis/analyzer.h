@@ -50,6 +50,9 @@ class CPGenAnalyzerImpl {
   // one: true unless nobody is going to show it.
   void set_spells_error_texts(bool spells) { spells_error_texts_ = spells; }
 
+  // Whether returned errors say what the parser waited for (error_words.h) instead of "invalid syntax" alone.
+  void set_explains_errors(bool explains) { explains_errors_ = explains; }
+
   CPGenParserImpl& logical_parser() const { return *logical_parser_; }
   CNodeWalker& node_walker() const { return *node_walker_; }
   CTypeHintWalker& type_hint_walker() const { return *type_hint_walker_; }
@@ -59,6 +62,7 @@ class CPGenAnalyzerImpl {
   std::unique_ptr<CNodeWalker> node_walker_;
   std::unique_ptr<CTypeHintWalker> type_hint_walker_;
   bool spells_error_texts_ = true;
+  bool explains_errors_ = false;
 };
 
 }  // namespace quillet

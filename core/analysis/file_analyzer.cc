@@ -72,6 +72,7 @@ void FileAnalyzer::Analyze(Text bytes) {
   Cut();
   CPGenAnalyzerImpl& analyzer = AnalyzerForSource();
   analyzer.set_spells_error_texts(options_.keeps_whole_errors);
+  analyzer.set_explains_errors(true);
   const NodePool& pool = analyzer.logical_parser().factory().pool();
   const size_t nodes_before = pool.node_count();
   found_.results.reserve(found_.rows.size());

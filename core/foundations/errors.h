@@ -85,6 +85,7 @@ class ParseError : public Error {
   bool has_value;
   std::string value;
   Context context;
+  uint8_t needed = 0;  // code of the token without which the rule that was open cannot end; 0 where none is known
 };
 
 // Code that is rejected, in the form of the host's SyntaxError: line and offset count from 1, the

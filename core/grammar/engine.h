@@ -67,7 +67,7 @@ class Engine {
     const Tables& tables = *tables_;
     const Cell cell = Descend(tables.column_of_label[label]);
     if (cell >= Tables::kFirstSpecial) [[unlikely]]
-      ThrowUnacceptable(cell, type, token, context);
+      ThrowUnacceptable(cell, tables.needed[pending_], type, token, context);
     const Move move = tables.moves[cell];
     if (!promote_ && move.enters) [[unlikely]]
       WrapUpTo(move.prefix);
@@ -166,7 +166,7 @@ class Engine {
         ReduceChildren(entry);
         row = entry.prefix != Tables::kNoPrefix ? entry.prefix : entries_.Top().row;
       } else {
-        if (!promote_) [[unlikely]]
+        if (!promote_ || cell >= Tables::kFirstSpecial) [[unlikely]]
           pending_ = row;
         return cell;
       }
@@ -197,12 +197,14 @@ class Engine {
     children_.PushReserved(node);
   }
 
-  [[noreturn, gnu::noinline, gnu::cold]] static void ThrowUnacceptable(Cell cell, int type, const Token& token,
-                                                                       int32_t context) {
+  [[noreturn, gnu::noinline, gnu::cold]] static void ThrowUnacceptable(Cell cell, TokenCode needed, int type,
+                                                                       const Token& token, int32_t context) {
     const char* message = cell == Tables::kBadToken       ? "bad token"
                           : cell == Tables::kTooMuchInput ? "too much input"
                                                           : "bad input";
-    throw ParseError(message, type, token.view(), Context::Index(context));
+    ParseError error(message, type, token.view(), Context::Index(context));
+    error.needed = needed;
+    throw error;
   }
 
   void DropNodes() {
@@ -212,8 +214,9 @@ class Engine {
   Builder builder_;
   const bool promote_;
   const std::shared_ptr<const Tables> tables_;
-  Row row_ = Tables::kDeadRow;      // where the parse stands
-  Row pending_ = Tables::kDeadRow;  // without promotion: the chain's row that the last cell was from
+  Row row_ = Tables::kDeadRow;  // where the parse stands
+  // The row that the last cell was from: of a token that is not taken and, without promotion, of any.
+  Row pending_ = Tables::kDeadRow;
   Stack<Entry> entries_;
   Stack<Node> children_;
 };

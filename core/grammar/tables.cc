@@ -84,6 +84,47 @@ class Builder {
     return known->second;
   }
 
+  // A child that can only begin in one way begins with a terminal that counts as the rule's own.
+  int FirstLabelOf(int label) const {
+    while (label >= Grammar::kFirstSymbol) {
+      const Grammar::State& start = grammar_.rules[RuleIndex(label)].states[0];
+      if (start.arcs.size() != 1) break;
+      label = start.arcs[0].label;
+    }
+    return label;
+  }
+
+  // Whether a rule can go from a state to its end past all children that begin with this terminal.
+  bool EndsWithout(size_t from, int label) const {
+    const std::vector<Grammar::State>& states = grammar_.rules[rule_of_state_[from]].states;
+    std::vector<bool> is_reached(states.size());
+    std::vector<size_t> reached{from - first_state_[rule_of_state_[from]]};
+    is_reached[reached[0]] = true;
+    for (size_t i = 0; i < reached.size(); ++i) {
+      const Grammar::State& state = states[reached[i]];
+      if (state.accepting) return true;
+      for (const Grammar::Arc& arc : state.arcs) {
+        const auto target = static_cast<size_t>(arc.target);
+        if (FirstLabelOf(arc.label) == label || is_reached[target]) continue;
+        is_reached[target] = true;
+        reached.push_back(target);
+      }
+    }
+    return false;
+  }
+
+  // Of a state that does not end its rule: see Tables::needed.
+  TokenCode NeededIn(size_t state) const {
+    for (const Grammar::Arc& arc : states_[state]->arcs) {
+      const int label = FirstLabelOf(arc.label);
+      if (label >= Grammar::kFirstSymbol || EndsWithout(state, label)) continue;
+      const auto& [type, keyword, spelling] = grammar_.labels[static_cast<size_t>(label)];
+      if (!keyword.empty()) return CodeOfName(keyword.data(), keyword.size());
+      return static_cast<TokenCode>(type);
+    }
+    return tok::ENDMARKER;
+  }
+
   // The chain of rules that `label` enters where a child of this rule is to begin with it.
   uint32_t ChainInto(size_t rule, size_t label) {
     const auto [known, is_new] = entered_chains_.emplace(std::pair(rule, label), 0);
@@ -126,6 +167,7 @@ class Builder {
     wide_cells_.assign(row_count * wide_columns_, Tables::kBadInput);
     for (size_t row = 0; row < row_count; ++row) WideCell(row, Tables::kBadTokenColumn) = Tables::kBadToken;
     tables_->symbol.resize(row_count);
+    tables_->needed.resize(row_count, tok::ENDMARKER);
     tables_->prefix.resize(row_count, Tables::kNoPrefix);
     for (const uint32_t state : first_state_) tables_->start_row.push_back(RowOfState(state));
   }
@@ -144,6 +186,7 @@ class Builder {
     const Row prefix_row = RowOfChain(prefix);
     tables_->symbol[row] = SymbolOfState(state);
     tables_->prefix[row] = prefix_row;
+    tables_->needed[row] = states_[state]->accepting ? tables_->needed[prefix_row] : NeededIn(state);
     // Where the last rule ends, its prefix decides; below the first one there is none.
     const auto below = [&](size_t column) { return prefix == 0 ? Tables::kVanish : WideCell(prefix_row, column); };
     for (size_t label = 0; label < label_count_; ++label) {
@@ -158,6 +201,7 @@ class Builder {
   void FillStateRow(size_t state) {
     const Row row = RowOfState(static_cast<uint32_t>(state));
     tables_->symbol[row] = SymbolOfState(state);
+    if (!states_[state]->accepting) tables_->needed[row] = NeededIn(state);
     for (size_t label = 0; label < label_count_; ++label) {
       const size_t column = Tables::kFirstLabelColumn + label;
       const Step& step = steps_[state * label_count_ + label];

@@ -68,6 +68,9 @@ struct Grammar::Tables {
   std::vector<uint16_t> symbol;  // by row: the rule of the state, or of the chain's last state
   std::vector<Row> prefix;       // by row: the chain without its last state, or kNoPrefix
   std::vector<Row> start_row;    // by symbol - kFirstSymbol
+  // By row: the code of the token that may come here and without which the rule that cannot end here
+  // never ends; tok::ENDMARKER where there is none. For messages.
+  std::vector<TokenCode> needed;
 };
 
 namespace pgen {

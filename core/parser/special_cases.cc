@@ -117,7 +117,13 @@ CNode* CPGenParserImpl::ParenthesizedWith(TokenRun run, bool in_async_def, const
   copy.Blank(open_i);
   copy.Blank(close_i);
   if (prev_i < run.count() && run.toks[prev_i].code == tok::COMMA) copy.Blank(prev_i);
-  return ParseRunImpl(copy.run(), in_async_def, &positions);
+  try {
+    return ParseRunImpl(copy.run(), in_async_def, &positions);
+  } catch (ParseError& error) {
+    // What is missing without the bracket need not be missing within it.
+    if (error.context.value < run.IndexOf(close_i)) error.needed = tok::ENDMARKER;
+    throw;
+  }
 }
 
 // `except*:` without a type is left to the grammar to reject.

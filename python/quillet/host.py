@@ -84,8 +84,9 @@ class Line:
     `fArgTypeEquivs`. `first_line` and `last_line` count physical lines from 1, both inclusive; `indent`
     is the width of the indentation, tabs to multiples of 8. `in_async_def` and `first_in_def` are what
     the line was analysed with: whether it stands directly in the body of an `async def`, and whether it
-    is the first of a function's body. `error` is the line's SyntaxError or None; its `lineno` counts
-    from the line's own first line, see `error_position`.
+    is the first of a function's body. `error` is the line's SyntaxError or None; its `msg` names
+    what is missing where that is certain, its `lineno` counts from the line's own first line, see
+    `error_position`.
     """
 
     __slots__ = (

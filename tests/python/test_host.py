@@ -4,6 +4,7 @@ from __future__ import annotations
 
 import sys
 import threading
+from pathlib import Path
 
 import pytest
 from hypothesis import given
@@ -12,6 +13,7 @@ from hypothesis import strategies as st
 import quillet
 from quillet import RecordKind, SourceEncodingError, analyze
 from quillet.config import GetNorvaFilename
+from quillet.logicalline import GetLogicalsFromText
 from quillet.optpgen import ParserGenerator
 
 
@@ -316,6 +318,38 @@ def test_an_error_has_its_place_in_the_source() -> None:
     assert line.error.msg == "invalid syntax"
     assert line.error_position == (3, 5)
     assert line.records == ()
+
+
+@pytest.mark.parametrize(
+    ("source", "missing"),
+    [
+        ("def add(self, item, count=1)\n    pass\n", "expected ':'"),
+        ("x = f(a\n", "'(' was never closed"),
+        ("x = (a]\n", "expected ')'"),
+        ("for x y:\n", "expected 'in'"),
+    ],
+)
+def test_an_error_says_what_is_missing(source: str, missing: str, tmp_path: Path) -> None:
+    analysis = analyze(source)
+    (line,) = analysis.errors
+    assert line.error is not None
+    assert line.error.msg == f"invalid syntax: {missing}"
+    path = tmp_path / "a.py"
+    path.write_text(source)
+    (result,) = quillet.analyze_files([path])
+    assert result.errors == [(*(line.error_position or ()), line.error.msg)]
+
+    # An analyzer of quillet.tarvex has the same error without those words.
+    head = GetLogicalsFromText(source)[0]
+    bare = analysis.analyzer.AnalyzeSingleLogical(head, False)
+    assert bare is not None
+    assert bare.msg == "invalid syntax"
+    assert (bare.filename, bare.lineno, bare.offset, bare.text) == (
+        line.error.filename,
+        line.error.lineno,
+        line.error.offset,
+        line.error.text,
+    )
 
 
 def test_a_bad_statement_spoils_no_other() -> None:

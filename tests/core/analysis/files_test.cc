@@ -33,6 +33,105 @@ std::string Repeat(Text text, size_t count) {
   return repeated;
 }
 
+// ---- what an error says ----
+
+struct Broken {
+  std::string source;
+  std::string message = "";  // without "invalid syntax"
+  Version version = kPy3;
+};
+
+TEST(Messages, SayWhatIsMissingWhereThatIsCertain) {
+  const std::vector<Broken> table = {
+      // The colon of a head.
+      {"def add(self, item, count=1)\n", "1:29: expected ':'"},
+      {"def add(self, item) -> int  # adds\n", "1:35: expected ':'"},
+      {"if a and b[1:2]\n", "1:16: expected ':'"},
+      {"class Basket(Base)\n", "1:19: expected ':'"},
+      {"else\n", "1:5: expected ':'"},
+      {"try\n", "1:4: expected ':'"},
+      {"except (A, B) as e\n", "1:19: expected ':'"},
+      {"with (open(a) as b)\n", "1:20: expected ':'"},
+      {"def f[T](a)\n", "1:12: expected ':'"},
+      {"async with a as b\n", "1:18: expected ':'"},
+      {"def f(a) return a\n", "1:10: expected ':'"},
+      {"if f(lambda x): pass\n", "1:14: expected ':'"},
+      {"x = {a: b, c}\n", "1:13: expected ':'"},
+      // Other words and signs.
+      {"for x y:\n", "1:7: expected 'in'"},
+      {"x = [y for y z]\n", "1:14: expected 'in'"},
+      {"x = a if b\n", "1:11: expected 'else'"},
+      {"from a\n", "1:7: expected 'import'"},
+      {"a not b\n", "1:7: expected 'in'"},
+      {"def f:\n", "1:6: expected '('"},
+      {"def f a):\n", "1:7: expected '('"},
+      // Brackets.
+      {"x = f(a, g(b)\n", "1:14: '(' was never closed"},
+      {"x = (a,\n     [b, c)\n", "2:11: expected ']'"},
+      {"x = {\n", "1:6: '{' was never closed"},
+      {"f(a\ndef g(): pass\n", "1:4: '(' was never closed"},
+      {"x = [1 +\n", "1:9: '[' was never closed"},
+      {"f(a b\n", "1:5: '(' was never closed"},
+      {"class C[T: pass\n", "1:8: '[' was never closed"},
+      {"@f(a\n", "1:5: '(' was never closed"},
+      {"x = (a]\n", "1:7: expected ')'"},
+      {"print `a\n", "1:9: expected '`'", kPy2},
+      {"print a if b\n", "1:13: expected 'else'", kPy2},
+  };
+  for (const auto& [source, message, version] : table) {
+    FileAnalyzer file(Options(version));
+    file.Analyze(source);
+    ASSERT_EQ(file.errors().size(), 1u) << source;
+    const auto& [text, place] = file.errors()[0];
+    const std::string at = std::to_string(place.line) + ":" + std::to_string(place.col);
+    const size_t split = message.find(": ");
+    EXPECT_EQ(at + " " + *text, message.substr(0, split) + " invalid syntax" + message.substr(split)) << source;
+  }
+}
+
+TEST(Messages, SayNoMoreWhereItIsNot) {
+  const std::vector<Broken> table = {
+      {"x = = 1\n"},
+      {"x =\n"},
+      {"x y\n"},
+      {"if x = 1: pass\n"},  // the colon is there
+      {"f(a b)\n"},          // the bracket is closed, and a comma may be missing as well
+      {"f(a b]\n"},          // two things are wrong
+      {"for x y in z: pass\n"},
+      {"x = a if b c else d\n"},
+      {"from a b import c\n"},
+      {"x = 1)\n"},
+      {"def (a): pass\n"},
+      {"x = a if\n"},  // an expression comes first
+      {"x = (a ? b)\n"},
+      {"f('a, b)\n"},  // the string may hold the bracket
+      {"f(a b, 'c)\n"},
+      {"with (a := b): pass\n"},  // without its brackets it would end at the sign
+      {"with (a := b)\n"},
+      {"except A, B):\n"},  // the bracket in front is missing
+      {"if a b] < c:\n"},
+      {"x = (a if b] else c)\n"},
+      {"@a or b\n"},
+      {"case a +:\n"},
+      {"def f[1](): pass\n"},
+      {"import\n"},
+      {"print 'a'\n"},
+      {"x: int = 1\n", "", kPy2},
+  };
+  for (const Broken& broken : table) {
+    FileAnalyzer file(Options(broken.version));
+    file.Analyze(broken.source);
+    ASSERT_EQ(file.errors().size(), 1u) << broken.source;
+    EXPECT_EQ(file.errors()[0].message(), "invalid syntax") << broken.source;
+  }
+}
+
+TEST(Messages, OfALoneAnalyzerAreBare) {
+  for (const Text source : {"def f(a)\n", "f(a\n", "x = (a]\n"}) {
+    EXPECT_TRUE(testing::Analyze(source).error.ends_with(" invalid syntax")) << source;
+  }
+}
+
 // ---- the head of a file ----
 
 TEST(PrintFunction, IsSwitchedOnForTheFileThatAsksForIt) {
