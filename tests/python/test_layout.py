@@ -7,7 +7,7 @@ ROOT = Path(__file__).parents[2]
 INCLUDE = re.compile(r'^\s*#\s*include\s*(["<])([^">]+)[">]', re.MULTILINE)
 
 
-def stages():
+def stages() -> list[str]:
     """The folders of the core in the order in which core/CMakeLists.txt names them."""
     listed = (ROOT / "core/CMakeLists.txt").read_text()
     return re.findall(r"^quillet_library\((\w+)", listed, re.MULTILINE)
@@ -47,3 +47,9 @@ def test_the_core_sees_no_interpreter():
         if re.match(r"Python\.h|nanobind|bindings/", name)
     ]
     assert not wrong
+
+
+def test_no_binding_is_longer_than_a_reader_can_hold() -> None:
+    lengths = {path.name: path.read_text().count("\n") for path in (ROOT / "bindings").iterdir()}
+    assert len(lengths) > 20
+    assert {name: length for name, length in lengths.items() if length > 400} == {}
