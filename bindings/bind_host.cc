@@ -16,7 +16,9 @@
 #include "bindings/line_object.h"
 #include "bindings/rows.h"
 #include "bindings/signals.h"
+#include "lines/cutter.h"
 #include "lines/future_imports.h"
+#include "lines/scopes.h"
 #include "vocabulary/symbolinfo.h"
 
 namespace quillet::host {
@@ -109,6 +111,24 @@ class AnalyzedSource {
   std::vector<size_t> rows_with_error_;
 };
 
+// The lines of a source, not yet analysed, as AnalyzedSource::At has them: for hosts that do that themselves.
+nb::list CutSource(Any source, Any version_triple) {
+  const HostText text = HostText::FromBytes(source);
+  const Version version = VersionOf(version_triple);
+  const Ref<SourceText> held = SourceText::Copy(text.text());
+  const auto store = std::make_shared<SharedStore>();
+  std::vector<LineRow> rows;
+  CutLines(*held, version, rows);
+  nb::list lines;
+  ScopeTracker scopes;
+  for (const LineRow& row : rows) {
+    const LinePlace place = scopes.Next(row);
+    lines.append(nb::make_tuple(NewLineObject(held, row, store), row.first_line, row.last_line, row.indent,
+                                place.in_async_def, place.first_in_def));
+  }
+  return lines;
+}
+
 void BindLanguage(nb::module_& host) {
   nb::class_<Language>(host, "Language", "What an analyzer is built from. Grammar files are absolute paths.")
       .def(nb::init<nb::handle, std::string, std::string, std::vector<std::string>, bool, std::string>(),
@@ -123,6 +143,9 @@ void BindHost(nb::module_& tarvex) {
   tarvex.attr("_host") = host;
   InstallInterrupts();
   BindLanguage(host);
+  host.def("CutSource", &CutSource, nb::arg("source"), nb::arg("version_triple"),
+           "The lines of a UTF-8 source, not yet analysed: (logical, first_line, last_line, indent, in_async_def, "
+           "first_in_def), with lines from 0.");
   nb::class_<AnalyzedSource>(host, "AnalyzedSource",
                              "A UTF-8 source: its logical lines, and what each was found to say.")
       .def(

@@ -649,6 +649,9 @@ def CreateSyntaxError(
 # ---- for the package itself ----
 
 class _host:  # a module at run time
+    @staticmethod
+    def CutSource(source: bytes, version_triple: _Version) -> list[tuple[CLogicalLine, int, int, int, bool, bool]]: ...
+
     RECORD_KIND_WORDS: tuple[str, ...]
     @staticmethod
     def DecodeRecord(name: bytes, info: bytes) -> tuple[str, int, str]: ...
