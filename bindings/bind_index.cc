@@ -8,6 +8,7 @@
 
 #include "bindings/batch_format.h"
 #include "bindings/bindings.h"
+#include "bindings/buffer_text.h"
 #include "bindings/convert.h"
 #include "foundations/errors.h"
 #include "index/counts.h"
@@ -18,22 +19,6 @@
 namespace quillet::host {
 
 namespace {
-
-// The bytes of any object with a buffer, for as long as this lives.
-class BufferText {
- public:
-  explicit BufferText(nb::handle object) {
-    if (PyObject_GetBuffer(object.ptr(), &view_, PyBUF_SIMPLE) != 0) throw nb::python_error();
-  }
-  ~BufferText() { PyBuffer_Release(&view_); }
-  BufferText(const BufferText&) = delete;
-  BufferText& operator=(const BufferText&) = delete;
-
-  Text text() const { return {static_cast<const char*>(view_.buf), static_cast<size_t>(view_.len)}; }
-
- private:
-  Py_buffer view_;
-};
 
 // ---- questions ----
 

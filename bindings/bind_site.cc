@@ -3,31 +3,12 @@
 #include <nanobind/stl/vector.h>
 
 #include "bindings/bindings.h"
+#include "bindings/buffer_text.h"
 #include "bindings/convert.h"
 #include "bindings/site_object.h"
 #include "foundations/errors.h"
 
 namespace quillet::host {
-
-namespace {
-
-// The bytes of any object with a buffer, for as long as this lives.
-class BufferText {
- public:
-  explicit BufferText(nb::handle object) {
-    if (PyObject_GetBuffer(object.ptr(), &view_, PyBUF_SIMPLE) != 0) throw nb::python_error();
-  }
-  ~BufferText() { PyBuffer_Release(&view_); }
-  BufferText(const BufferText&) = delete;
-  BufferText& operator=(const BufferText&) = delete;
-
-  Text text() const { return {static_cast<const char*>(view_.buf), static_cast<size_t>(view_.len)}; }
-
- private:
-  Py_buffer view_;
-};
-
-}  // namespace
 
 void BindSite(nb::module_& tarvex) {
   nb::module_ host = SiblingModule(tarvex, "host");
