@@ -9,6 +9,7 @@
 #include <utility>
 #include <vector>
 
+#include "analysis/source_bytes.h"
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/file_batch.h"
@@ -121,6 +122,7 @@ nb::object StreamCapsule(nb::object batch, Export export_stream) {
 
 void BindBatch(nb::module_& tarvex) {
   nb::module_ host = SiblingModule(tarvex, "host");
+  host.attr("MOST_BYTES_READ") = kMostBytesRead;
   nb::class_<NativeBatch>(host, "NativeBatch", "Sources through the native path, without an object a line.")
       .def(nb::init<Language&>(), nb::arg("language"), nb::keep_alive<1, 2>())
       .def("Analyze", &NativeBatch::Analyze, nb::arg("sources"),

@@ -26,41 +26,49 @@ constexpr size_t kReadSize = size_t{1} << 16;
 
 std::string ReasonOf(int error) { return std::generic_category().message(error); }
 
-// Calls `read(at, size)`, which gives the number of bytes read, 0 at the end, or -1, until the end;
-// false where it failed. `expected` is what the size of the file is thought to be.
+std::string TooLarge(size_t most_bytes) {
+  return "the source is too large: more than " + std::to_string(most_bytes >> 20) + " MiB";
+}
+
+// Calls `read(at, size)`, which gives the number of bytes read, 0 at the end, or -1, until the end. Empty, or
+// why there is none. `expected` is what the size of the file is thought to be.
 template <class Function>
-bool ReadAll(size_t expected, std::string& bytes, Function&& read) {
+std::string ReadAll(size_t expected, size_t most_bytes, std::string& bytes, Function&& read) {
+  if (expected > most_bytes) return TooLarge(most_bytes);
   size_t size = 0;
   // One byte more than expected, so that the end is met without growing.
   bytes.resize(std::max(expected + 1, kReadSize));
   while (true) {
     const auto count = read(bytes.data() + size, bytes.size() - size);
     CountSteps(count / 16);
-    if (count < 0) return false;
+    if (count < 0) return ReasonOf(errno);
     if (count == 0) break;
     size += static_cast<size_t>(count);
-    if (size == bytes.size()) bytes.resize(size * 2);
+    if (size > most_bytes) {
+      std::string().swap(bytes);
+      return TooLarge(most_bytes);
+    }
+    if (size == bytes.size()) bytes.resize(std::min(size * 2, most_bytes + 1));
   }
   bytes.resize(size);
-  return true;
+  return {};
 }
 
 }  // namespace
 
 #ifdef _WIN32
 
-std::string ReadSourceFile(const std::string& path, std::string& bytes) {
+std::string ReadSourceFile(const std::string& path, std::string& bytes, size_t most_bytes) {
   if (path.find('\0') != std::string::npos) return "embedded null byte";
   const std::filesystem::path wide(std::u8string(path.begin(), path.end()));
   std::FILE* file = _wfopen(wide.c_str(), L"rb");
   if (file == nullptr) return ReasonOf(errno);
-  const bool done = ReadAll(0, bytes, [&](char* at, size_t size) -> int64_t {
+  std::string problem = ReadAll(0, most_bytes, bytes, [&](char* at, size_t size) -> int64_t {
     const size_t count = std::fread(at, 1, size, file);
     return count == 0 && std::ferror(file) ? -1 : static_cast<int64_t>(count);
   });
-  const int error = errno;
   std::fclose(file);
-  return done ? std::string() : ReasonOf(error);
+  return problem;
 }
 
 #else
@@ -96,7 +104,7 @@ void WaitForInput(int descriptor) {
 
 }  // namespace
 
-std::string ReadSourceFile(const std::string& path, std::string& bytes) {
+std::string ReadSourceFile(const std::string& path, std::string& bytes, size_t most_bytes) {
   if (path.find('\0') != std::string::npos) return "embedded null byte";
   const OpenFile file(path);
   if (file.get() < 0) return ReasonOf(errno);
@@ -105,14 +113,13 @@ std::string ReadSourceFile(const std::string& path, std::string& bytes) {
   if (S_ISDIR(info.st_mode)) return ReasonOf(EISDIR);
   const bool is_regular = S_ISREG(info.st_mode);
   const size_t expected = is_regular ? static_cast<size_t>(info.st_size) : 0;
-  const bool done = ReadAll(expected, bytes, [&](char* at, size_t size) -> ssize_t {
+  return ReadAll(expected, most_bytes, bytes, [&](char* at, size_t size) -> ssize_t {
     while (true) {
       if (!is_regular) WaitForInput(file.get());
       const ssize_t count = read(file.get(), at, size);
       if (count >= 0 || (errno != EINTR && errno != EAGAIN)) return count;
     }
   });
-  return done ? std::string() : ReasonOf(errno);
 }
 
 #endif

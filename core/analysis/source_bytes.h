@@ -6,15 +6,19 @@
 // be stoppable.
 #pragma once
 
+#include <cstddef>
 #include <string>
 
 #include "foundations/text.h"
 
 namespace quillet {
 
+// What is longer is not read: a pipe need not have an end.
+constexpr size_t kMostBytesRead = size_t{1} << 30;
+
 // Reads a whole file into `bytes`, whose memory is kept. Empty, or why it could not be read, as one
 // phrase. `path` is as the operating system spells it (UTF-8 on Windows). May be stopped (stop.h).
-std::string ReadSourceFile(const std::string& path, std::string& bytes);
+std::string ReadSourceFile(const std::string& path, std::string& bytes, size_t most_bytes = kMostBytesRead);
 
 // Whether a source names an encoding other than UTF-8 for itself.
 bool NeedsHostDecoding(Text bytes);

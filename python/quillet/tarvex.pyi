@@ -773,6 +773,7 @@ class _host:  # a module at run time
         def OccurrenceStream(self) -> object: ...
         def Cancel(self) -> None: ...
 
+    MOST_BYTES_READ: int
     SITE_PAGE_HEAD_SIZE: int
     SITE_MOST_BYTES: int
     SITE_MOST_BYTES_OF_LINE: int

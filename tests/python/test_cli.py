@@ -363,6 +363,32 @@ def test_a_device_is_not_read_to_its_end(tmp_path: Path) -> None:
     assert b"/dev/stdin:1: x = 1" in run("analyze", "/dev/stdin", stdin=b"x = 1\n").stdout
 
 
+LIMITED = """
+import sys
+from quillet.tarvex import _host
+_host.MOST_BYTES_READ = 3 << 20
+from quillet.__main__ import main
+main()
+"""
+
+
+def test_a_pipe_is_read_up_to_a_limit(tmp_path: Path) -> None:
+    for command, size, said in (
+        ("analyze", 3 << 20, b""),
+        ("analyze", (3 << 20) + 1, b"quillet: -: the source is too large: more than 3 MiB\n"),
+        ("tree", (3 << 20) + 1, b"quillet: -: the source is too large: more than 3 MiB\n"),
+    ):
+        result = subprocess.run(
+            [sys.executable, "-c", LIMITED, command, "-"],
+            input=b"#" * size,
+            capture_output=True,
+            timeout=60,
+            check=False,
+        )
+        assert result.stderr.startswith(said)
+        assert result.returncode == (1 if said else 0), result.stderr
+
+
 # ---- how it ends ----
 
 

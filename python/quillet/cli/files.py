@@ -26,6 +26,7 @@ _SUFFIXES = (".py", ".pyi", ".pyw")
 _SHEBANG = re.compile(rb"#!.*\bpython[0-9.]*\b")
 # What is never anybody's source: left out below a folder, as if a rule behind all others said so.
 _LEFT_OUT = b".venv/\nnode_modules/\n__pycache__/\n"
+_PIECE = 1 << 20
 _DANGLING = (errno.ENOENT, errno.ENOTDIR)
 
 
@@ -48,13 +49,49 @@ def find_files(paths: Sequence[str], *, gitignore: bool, exclude: Iterable[str] 
     return _Walk(paths, gitignore, exclude).files()
 
 
+class Exclusion:
+    """Which files patterns leave out of a folder that is not walked. `excludes` takes a path from the folder on, with
+    slashes.
+    """
+
+    def __init__(self, patterns: Iterable[str]) -> None:
+        from quillet.tarvex import _host
+
+        self._rules = _host.IgnoreRules(_lines_of(patterns))
+        self._folders: dict[bytes, bool] = {}
+
+    def excludes(self, path: bytes) -> bool:
+        """Whether a file is left out, itself or with a folder around it."""
+        folder = path.rpartition(b"/")[0]
+        known = self._folders.get(folder)
+        if known is None:
+            ends = (match.start() for match in re.finditer(rb"/", path))
+            known = self._folders[folder] = any(self._rules.Verdict(path[:end], True) for end in ends)
+        return known or self._rules.Verdict(path, False) is True
+
+
+def _lines_of(patterns: Iterable[str]) -> bytes:
+    """Patterns as the text of a .gitignore file; one is never a comment."""
+    lines = [f"\\{pattern}" if pattern.startswith("#") else pattern for pattern in patterns]
+    return b"\n".join(map(os.fsencode, lines))
+
+
 def read_file(path: str) -> bytes:
-    """The bytes of a file, of standard input for "-". Raises OSError."""
+    """The bytes of a file, of standard input for "-". Raises OSError, also for more than the core reads of a file."""
+    from quillet.tarvex import _host
+
     with open(0 if path == "-" else path, "rb", closefd=path != "-") as file:
         problem = device_problem(file.fileno())
         if problem is not None:
             raise OSError(errno.EINVAL, problem)
-        return file.read()
+        pieces = []
+        size = 0
+        while piece := file.read(_PIECE):
+            pieces.append(piece)
+            size += len(piece)
+            if size > _host.MOST_BYTES_READ:
+                raise OSError(errno.EFBIG, f"the source is too large: more than {_host.MOST_BYTES_READ >> 20} MiB")
+        return b"".join(pieces)
 
 
 def problem_of(error: OSError | ValueError) -> str:
@@ -186,9 +223,7 @@ class _Walk:
     def __init__(self, paths: Sequence[str], gitignore: bool, exclude: Iterable[str]) -> None:
         self._paths = paths
         self._gitignore = gitignore
-        # A pattern of an option is never a comment.
-        lines = [f"\\{pattern}" if pattern.startswith("#") else pattern for pattern in exclude]
-        self._exclude = b"\n".join(map(os.fsencode, lines))
+        self._exclude = _lines_of(exclude)
         self._roots: list[bytes] = []
         self._met: set[bytes] = set()
         self._links: list[tuple[str, bytes]] = []

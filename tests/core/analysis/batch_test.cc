@@ -350,6 +350,30 @@ TEST(Batch, CancellingWakesAReaderThatWaits) {
   std::remove(pipe.c_str());
 }
 
+TEST(Batch, AFileIsReadUpToALimit) {
+  constexpr size_t kMost = size_t{3} << 20;
+  const std::string path = ::testing::TempDir() + "/quillet_batch_large";
+  std::remove(path.c_str());
+  ASSERT_EQ(std::system(("truncate -s " + std::to_string(kMost) + " " + path).c_str()), 0);
+  std::string bytes;
+  EXPECT_EQ(ReadSourceFile(path, bytes, kMost), "");
+  EXPECT_EQ(bytes.size(), kMost);
+  EXPECT_EQ(ReadSourceFile(path, bytes, kMost - 1), "the source is too large: more than 2 MiB");
+  std::remove(path.c_str());
+  // One whose size nobody knows before.
+  ASSERT_EQ(std::system(("mkfifo " + path).c_str()), 0);
+  for (const size_t most : {kMost, kMost - 1}) {
+    std::thread writer([&path] {
+      std::ofstream pipe(path, std::ios::binary);
+      pipe << std::string(kMost, 'x');
+    });
+    EXPECT_EQ(ReadSourceFile(path, bytes, most), most == kMost ? "" : "the source is too large: more than 2 MiB");
+    EXPECT_EQ(bytes.size(), most == kMost ? kMost : 0);
+    writer.join();
+  }
+  std::remove(path.c_str());
+}
+
 // ---- how it ends, whatever happens to the process ----
 
 // A source of one statement that takes long.
