@@ -323,6 +323,68 @@ def test_outline_has_hints_of_comments(tmp_path: Path) -> None:
     assert run("outline", "a.py", cwd=tmp_path).stdout == "1 def f(a: int, b: str=1, *c: bytes) -> None\n"
 
 
+def test_outline_as_objects(tmp_path: Path) -> None:
+    source = "class A:\n    class B:\n        async def f(self,\n            a=1): return lambda: [0 for _ in a]\n"
+    long = ", ".join(f"a{i}" for i in range(100))
+    (tmp_path / "a.py").write_text(f"{source}def long({long}): pass\ndef broken(b c): pass\n")
+    rows = [json.loads(line) for line in run("outline", "a.py", "--json", cwd=tmp_path).stdout.splitlines()]
+    assert rows[1:3] == [
+        {
+            "type": "definition",
+            "path": "a.py",
+            "line": 2,
+            "column": 11,
+            "scope": "A",
+            "name": "B",
+            "kind": "class",
+            "signature": "",
+            "depth": 1,
+            "is_broken": False,
+        },
+        {
+            "type": "definition",
+            "path": "a.py",
+            "line": 3,
+            "column": 19,
+            "scope": "A.B",
+            "name": "f",
+            "kind": "async function",
+            "signature": "(self, a=1)",
+            "depth": 2,
+            "is_broken": False,
+        },
+    ]
+    assert (rows[3]["kind"], rows[3]["is_broken"]) == ("function", False)
+    assert rows[3]["signature"].endswith(", a99)")
+    assert (rows[4]["name"], rows[4]["is_broken"]) == ("broken", True)
+    assert [run("outline", name, "--json", cwd=tmp_path).returncode for name in ("a.py", "none.py")] == [0, 2]
+
+
+def test_exclude_leaves_files_out_with_an_index_and_without(tmp_path: Path) -> None:
+    for name in ("a.py", "tests/a.py", "lib/tests/b.py", "lib/#c.py", "gen.py"):
+        (tmp_path / name).parent.mkdir(parents=True, exist_ok=True)
+        (tmp_path / name).write_text("x = 1\n")
+    (tmp_path / ".gitignore").write_text("gen.py\n")
+
+    def files(*exclude: str) -> list[str]:
+        return run("find", "x", "-l", *(f"--exclude={pattern}" for pattern in exclude), cwd=tmp_path).stdout.split()
+
+    assert files("!gen.py", "lib") == ["a.py", "gen.py", "tests/a.py"]
+    for _ in range(2):
+        assert files() == ["a.py", "lib/#c.py", "lib/tests/b.py", "tests/a.py"]
+        assert files("tests/") == ["a.py", "lib/#c.py"]
+        assert files("/tests", "#c.py") == ["a.py", "lib/tests/b.py"]
+        assert files("*.py", "!a.py") == ["a.py", "tests/a.py"]
+        assert files("lib/*", "!lib/tests") == ["a.py", "lib/tests/b.py", "tests/a.py"]
+        plain = run("find", "x", "-l", "--exclude", "a.py", "--exclude", "b.py", cwd=tmp_path)
+        assert plain.stdout.split() == ["lib/#c.py"]
+        assert run("find", "x", "--exclude", "*", cwd=tmp_path).returncode == 1
+        make_index(tmp_path)
+    (tmp_path / "sub").mkdir()
+    result = run("find", "x", "-l", "--exclude", "/tests/", "--exclude", "lib", cwd=tmp_path / "sub")
+    assert result.stdout.split() == [str(tmp_path / "a.py")]
+
+
 @pytest.mark.parametrize("command", ["defs", "outline"])
 def test_a_file_need_not_be_in_the_index(shop: Path, command: str) -> None:
     (shop / "other.py").write_text("def later(): pass\n")

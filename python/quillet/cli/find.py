@@ -52,6 +52,7 @@ def ask(
     files: bool,
     index: str | None,
     roots: Sequence[str],
+    exclude: Sequence[str],
     **roles: bool,
 ) -> int:
     """Runs the command with the parameters of `find_options` and returns its exit code."""
@@ -66,14 +67,14 @@ def ask(
     if any_receiver and match is None:
         match = "suffix"
     query = Query(name, match or match_of(name), wanted, returns, scope, path)
-    return run(query, index=index, roots=roots, form=Form(as_json, long, count, files))
+    return run(query, index=index, roots=roots, exclude=exclude, form=Form(as_json, long, count, files))
 
 
-def run(query: Query, *, index: str | None, roots: Sequence[str], form: Form) -> int:
+def run(query: Query, *, index: str | None, roots: Sequence[str], exclude: Sequence[str], form: Form) -> int:
     """Runs the command and returns its exit code."""
     start = time.monotonic()
     try:
-        sources = sources_to_ask(index, roots)
+        sources = sources_to_ask(index, roots, exclude)
     except IndexProblem as problem:
         return fail(problem)
     found = True  # where the reader went away: something was written
@@ -90,14 +91,14 @@ def run(query: Query, *, index: str | None, roots: Sequence[str], form: Form) ->
     return 0 if found else 1
 
 
-def sources_to_ask(index: str | None, roots: Sequence[str]) -> Sources:
+def sources_to_ask(index: str | None, roots: Sequence[str], exclude: Sequence[str]) -> Sources:
     """The index that is named or that is nearest, and without one the working folder. Raises `IndexProblem`."""
     if index is None:
         try:
             index = find_index()
         except IndexProblem:
-            return Folder(".")
-    return Index(index, roots)
+            return Folder(".", exclude=exclude)
+    return Index(index, roots, exclude=exclude)
 
 
 def fail(problem: Exception) -> int:

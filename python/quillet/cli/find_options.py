@@ -58,6 +58,13 @@ ROOT_OPTION = Option(
     metavar="DIR",
     repeated=True,
 )
+EXCLUDE_OPTION = Option(
+    ("--exclude",),
+    "exclude",
+    "Leave out what fits this line of a .gitignore file; may be given more than once.",
+    metavar="PATTERN",
+    repeated=True,
+)
 OPTIONS = (
     *(Option((f"--{role}",), f"role_{role}", text) for role, text in ROLES.items()),
     Option(("--return",), "returns", "What the functions of this name return and yield."),
@@ -65,6 +72,7 @@ OPTIONS = (
     Option(("--match",), "match", "How NAME is meant; without it by its form.", choices=("exact", "suffix", "glob")),
     Option(("--any",), "any_receiver", "NAME and everything that ends in .NAME; the same as --match suffix."),
     Option(("--path",), "path", "Only in files whose path, or the end of it, is like this.", metavar="GLOB"),
+    EXCLUDE_OPTION,
     Option(("--json",), "as_json", "A JSON object an answer."),
     Option(("--long",), "long", "Below each place what is said of the name there."),
     Option(("-c", "--count"), "count", "Only the number of places."),

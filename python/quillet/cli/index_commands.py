@@ -26,7 +26,7 @@ def _options(options: Sequence[Option]) -> Callable[[Callable[..., None]], Calla
             elif option.takes_value:
                 settings |= {
                     "metavar": option.metavar,
-                    "type": str if option.metavar in ("SCOPE", "GLOB") else PathArgument(),
+                    "type": PathArgument() if option.metavar in ("FILE", "DIR") else str,
                 }
                 if option.repeated:
                     settings["multiple"] = True
@@ -136,8 +136,9 @@ def defs(file: str, imports: bool, as_json: bool, index: str | None) -> None:
 
 @click.command()
 @click.argument("file", type=PathArgument())
+@click.option("--json", "as_json", is_flag=True, help="A JSON object a class or function.")
 @_index_option
-def outline(file: str, index: str | None) -> None:
+def outline(file: str, as_json: bool, index: str | None) -> None:
     """Shows the classes and functions of FILE as a tree, with parameters and hints.
 
     \b
@@ -145,7 +146,7 @@ def outline(file: str, index: str | None) -> None:
     """
     from quillet.cli.outline import run
 
-    sys.exit(run(file, index=index))
+    sys.exit(run(file, index=index, as_json=as_json))
 
 
 @click.command()

@@ -7,6 +7,8 @@ from typing import Any
 
 import click
 
+from quillet.cli.find_options import EXCLUDE_OPTION
+
 
 class PythonVersion(click.ParamType):  # type: ignore[type-arg,unused-ignore]
     """A version such as 2.7 or 3.12, as the tuple that the host API takes."""
@@ -38,8 +40,5 @@ python_option = click.option(
 )
 
 exclude_option = click.option(
-    "--exclude",
-    metavar="PATTERN",
-    multiple=True,
-    help="Leave out what fits this line of a .gitignore file; may be given more than once.",
+    *EXCLUDE_OPTION.flags, metavar=EXCLUDE_OPTION.metavar, multiple=True, help=EXCLUDE_OPTION.help
 )

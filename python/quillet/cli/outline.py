@@ -8,14 +8,16 @@ names of the parameters are shown.
 
 from __future__ import annotations
 
+import json
 import os
 import re
 from collections.abc import Iterator
+from typing import NamedTuple
 
 from quillet._batch import analyze_files
 from quillet._names import FileBindings, Occurrence
 from quillet._source import SourceEncodingError, to_utf8
-from quillet.cli.defs import facts_of, version_of
+from quillet.cli.defs import facts_of, shown_path, version_of
 from quillet.cli.files import problem_of, read_file
 from quillet.cli.find import fail
 from quillet.cli.show import Style, printable
@@ -23,7 +25,7 @@ from quillet.cli.streams import quiet_output
 from quillet.index.questions import FileFacts, Hit
 from quillet.index.store import CLASS, FUNCTION, IndexProblem
 
-# How much of a signature is shown, in characters, and how far a head is read for it, in bytes.
+# How much of a signature is shown to people, in characters, and how far a head is read for it, in bytes.
 _WINDOW = 160
 _MOST_READ = 1 << 14
 _TOKEN = re.compile(
@@ -36,7 +38,20 @@ _TOKEN = re.compile(
 _ASYNC = re.compile(rb"\basync[ \t\f]+def[ \t\f]+\Z")
 
 
-def run(path: str, *, index: str | None) -> int:
+class Definition(NamedTuple):
+    """A class or function. `kind` is "class", "function" or "async function", `scopes` are the names of the classes
+    and functions around, from the outermost on."""
+
+    line: int
+    column: int
+    scopes: tuple[str, ...]
+    name: str
+    kind: str
+    signature: str
+    is_broken: bool
+
+
+def run(path: str, *, index: str | None, as_json: bool) -> int:
     """Runs the command and returns its exit code."""
     try:
         facts = facts_of(path, index, with_lines=False)
@@ -48,9 +63,11 @@ def run(path: str, *, index: str | None) -> int:
         return fail(problem)
     found = False
     with quiet_output() as out:
-        for line in outline(facts, result.bindings, to_utf8(source), Style.of_stdout()):
+        style = Style.of_stdout()
+        digits = len(str(facts.lines))
+        for definition in outline(facts, result.bindings, to_utf8(source)):
             found = True
-            out.write(line)
+            out.write(_json(shown_path(path), definition) if as_json else _line(definition, digits, style))
     return 0 if found else 1
 
 
@@ -63,44 +80,71 @@ def _source_of(path: str) -> bytes:
     return source
 
 
-def outline(facts: FileFacts, bindings: FileBindings, source: bytes, style: Style) -> Iterator[str]:
-    """The lines of the tree, each with the line number in front. `source` is UTF-8."""
+def _line(definition: Definition, digits: int, style: Style) -> str:
+    """A line of the tree, with the line number in front."""
+    signature = definition.signature
+    if len(signature) > _WINDOW:
+        signature = signature[: _WINDOW - 1] + "…"
+    word = definition.kind.replace("function", "def")
+    mark = "  " + style.error("syntax error") if definition.is_broken else ""
+    place = style.place(f"{definition.line:>{digits}}")
+    name = style.name(printable(definition.name))
+    return f"{place} {'    ' * len(definition.scopes)}{word} {name}{printable(signature)}{mark}\n"
+
+
+def _json(path: str, definition: Definition) -> str:
+    row = {
+        "type": "definition",
+        "path": path,
+        "line": definition.line,
+        "column": definition.column,
+        "scope": ".".join(definition.scopes),
+        "name": definition.name,
+        "kind": definition.kind,
+        "signature": definition.signature,
+        "depth": len(definition.scopes),
+        "is_broken": definition.is_broken,
+    }
+    return json.dumps(row, ensure_ascii=True, separators=(",", ":")) + "\n"
+
+
+def outline(facts: FileFacts, bindings: FileBindings, source: bytes) -> Iterator[Definition]:
+    """The definitions, in the order of the source, which is UTF-8."""
     source = source.removeprefix(b"\xef\xbb\xbf")
     starts = [0, *(match.end() for match in re.finditer(rb"\r\n|\r|\n", source))]
     occurrences = list(bindings.occurrences)
-    digits = len(str(facts.lines))
     recorded = {(hit.line, hit.column): place for place, hit in enumerate(facts.hits) if hit.opens in (CLASS, FUNCTION)}
     for index, occurrence in enumerate(occurrences):
         if occurrence.role != "definition" or occurrence.kind not in ("class", "function"):
             continue
         place = recorded.get((occurrence.line, occurrence.column))
-        mark = "" if place is not None else "  " + style.error("syntax error")
-        word, signature = "class", ""
+        kind, signature = "class", ""
         if occurrence.kind == "function":
             hints = _hints(facts.hits, place) if place is not None else {}
             start = starts[occurrence.line - 1]
             is_async = _ASYNC.search(source, start, start + occurrence.column - 1)
-            word = "async def" if is_async else "def"
+            kind = "async function" if is_async else "function"
             behind = start + occurrence.end_column - 1
             head = source[behind : behind + _MOST_READ]
             signature = _signature(head, hints, one_line=place is None)
             if not signature:
                 signature = f"({', '.join(_parameters(bindings, occurrences, index))})"
-            if len(signature) > _WINDOW:
-                signature = signature[: _WINDOW - 1] + "…"
-        what = f"{word} {style.name(printable(occurrence.text))}{printable(signature)}{mark}"
-        yield f"{style.place(f'{occurrence.line:>{digits}}')} {'    ' * _depth(bindings, occurrence)}{what}\n"
+        scopes = _scopes_around(bindings, occurrence)
+        yield Definition(
+            occurrence.line, occurrence.column, scopes, occurrence.text, kind, signature, is_broken=place is None
+        )
 
 
-def _depth(bindings: FileBindings, occurrence: Occurrence) -> int:
-    """How many classes and functions stand around a name."""
-    depth = 0
+def _scopes_around(bindings: FileBindings, occurrence: Occurrence) -> tuple[str, ...]:
+    """The names of the classes and functions that stand around a name."""
+    names: list[str] = []
     at: int | None = occurrence.scope
     while at is not None:
         scope = bindings.scopes[at]
-        depth += scope.kind in ("class", "function")
+        if scope.kind in ("class", "function"):
+            names.append(scope.name)
         at = scope.parent
-    return depth
+    return tuple(reversed(names))
 
 
 def _parameters(bindings: FileBindings, occurrences: list[Occurrence], index: int) -> Iterator[str]:

@@ -9,7 +9,7 @@ names the folder.
 from __future__ import annotations
 
 import os
-from collections.abc import Iterable, Iterator
+from collections.abc import Iterable, Iterator, Sequence
 from typing import NamedTuple
 
 from quillet.index.paths import Places, StoredPaths, stored_path
@@ -217,14 +217,18 @@ class Sources:
 
 
 class Index(Sources):
-    """An open index, to be asked for files of its folder and of `roots`. Raises `IndexProblem`."""
+    """An open index, to be asked for files of its folder and of `roots`. Raises `IndexProblem`.
 
-    def __init__(self, path: str, roots: Iterable[str] = ()) -> None:
+    What fits `exclude`, lines of a .gitignore file in its folder, is no candidate.
+    """
+
+    def __init__(self, path: str, roots: Iterable[str] = (), *, exclude: Sequence[str] = ()) -> None:
         self.path = os.path.abspath(path)
         stored = read_index(path)
         super().__init__(os.path.dirname(self.path), stored.settings.python)
         self._native = stored.native
         self._places = Places(self.base, roots)
+        self._exclude = exclude
         self._files: list[FileRow] | None = None
         self.outside = 0
 
@@ -256,6 +260,11 @@ class Index(Sources):
                 continue
             if self._places.holds(path):
                 found.append(row._replace(size=status.st_size))
+        if self._exclude:
+            from quillet.cli.files import Exclusion
+
+            exclusion = Exclusion(self._exclude)
+            found = [row for row in found if not exclusion.excludes(row.path.lstrip(b"/"))]
         return found
 
     def words_alike(self, word: str, /) -> list[str]:
@@ -299,18 +308,19 @@ class Index(Sources):
 
 
 class Folder(Sources):
-    """The files of a folder, without an index."""
+    """The files of a folder, without an index; `exclude` as in `find_files`."""
 
-    def __init__(self, path: str, version: tuple[int, int] | None = None) -> None:
+    def __init__(self, path: str, version: tuple[int, int] | None = None, *, exclude: Sequence[str] = ()) -> None:
         super().__init__(os.path.abspath(path), version)
         self._path = path
+        self._exclude = exclude
 
     def files(self) -> list[FileRow]:
         from quillet.cli.files import find_files
 
         stored = StoredPaths(self.base)
         sizes = {}
-        for item in find_files((self._path,), gitignore=True):
+        for item in find_files((self._path,), gitignore=True, exclude=self._exclude):
             if item.problem is None:
                 try:
                     sizes[stored(item.path)] = os.stat(item.path).st_size
