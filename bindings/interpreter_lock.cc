@@ -43,6 +43,31 @@ template <class Take>
   taking.taken = true;
 }
 
+// The calling thread's state in the interpreter, where `Locked` made it: kept to the end of the thread, since making
+// one is slow, and up to 3.11 a fork in the middle of it may leave the child with a lock that nobody gives back.
+class KeptThreadState {
+ public:
+  KeptThreadState() = default;
+  ~KeptThreadState() {
+    if (!is_kept_) return;
+    const Locked lock;
+    PyGILState_Release(PyGILState_LOCKED);
+  }
+  KeptThreadState(const KeptThreadState&) = delete;
+  KeptThreadState& operator=(const KeptThreadState&) = delete;
+
+  // With the lock, behind the call that made the state.
+  void Keep() {
+    PyGILState_Ensure();
+    is_kept_ = true;
+  }
+
+ private:
+  bool is_kept_ = false;
+};
+
+thread_local KeptThreadState kept_thread_state;
+
 }  // namespace
 
 // Up to 3.11 the current state is that of whichever thread has the lock, later the calling thread's own.
@@ -63,7 +88,9 @@ void WaitIfThreadWasEnded() {
 Locked::Locked() : takes_(!HasInterpreterLock()) {
   if (!takes_) return;
   if (!Py_IsInitialized()) WaitForEndOfProcess();
+  const bool is_new = PyGILState_GetThisThreadState() == nullptr;
   TakeLock([this] { state_ = PyGILState_Ensure(); });
+  if (is_new) kept_thread_state.Keep();
 }
 
 Locked::~Locked() {

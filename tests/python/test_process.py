@@ -387,3 +387,33 @@ def test_the_codec_of_escapes_does_not_warn() -> None:
     """
     expected = ascii("str: '\\d\u0100\\ A'")
     assert output_of(script, env={**os.environ, "PYTHONWARNINGS": "error"}) == f"{expected} 2\n"
+
+
+def test_a_codec_meets_each_thread_once() -> None:
+    """What it keeps a thread stays until the thread ends, and goes with it."""
+    script = """
+        import codecs, threading
+        import quillet
+
+        class Kept:
+            made = gone = 0
+            def __init__(self):
+                Kept.made += 1
+            def __del__(self):
+                Kept.gone += 1
+
+        of_thread = threading.local()
+        def decode(source, errors="strict"):
+            if not hasattr(of_thread, "kept"):
+                of_thread.kept = Kept()
+            return bytes(source).decode("latin-1"), len(source)
+        codecs.register(lambda name: codecs.CodecInfo(decode, decode, name=name) if name == "kept" else None)
+        for _ in range(3):
+            assert sum(1 for _ in quillet.analyze_files([("a.py", b"# coding: kept\\n")] * 50, jobs=2)) == 50
+        assert 3 <= Kept.made <= 6, Kept.made
+        assert Kept.gone == Kept.made, (Kept.gone, Kept.made)
+        results = quillet.analyze_files([("a.py", b"# coding: kept\\n")] * 50, jobs=2)
+        next(results)
+        print("left to the end of the process")
+    """
+    assert output_of(script) == "left to the end of the process\n"
