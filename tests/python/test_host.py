@@ -271,8 +271,10 @@ def test_lines_are_a_sequence_of_kept_objects() -> None:
 
 def test_the_raw_records_stay_reachable() -> None:
     line = analyze("x = 1").lines[0]
-    assert line.logical.fTypeEquivs[0][0] == b"x"
-    assert all(type(name) is bytes and type(info) is bytes for name, info in line.logical.fTypeEquivs)
+    records = line.logical.fTypeEquivs
+    assert records is not None
+    assert records[0][0] == b"x"
+    assert all(type(name) is bytes and type(info) is bytes for name, info in records)
 
 
 # ---- records ----
@@ -305,7 +307,8 @@ def test_records_are_decoded(source: str, expected: tuple[str, str, str, bool]) 
 
 
 def test_a_kind_is_its_text() -> None:
-    assert RecordKind.SET == "set"
+    text: str = RecordKind.SET
+    assert text == "set"
 
 
 # ---- errors ----
