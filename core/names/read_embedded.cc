@@ -53,7 +53,7 @@ bool NameReader::IsTemplatePrefix(const Token& prefix) const {
 void NameReader::Template(const Token& prefix) {
   const char* const row_end = end_[-1].end();
   const char* string_end = (++at_)->end();
-  if (in_row_ && template_budget_ > 0) {
+  if (template_budget_ > 0) {
     const bool is_raw = prefix.length == 2;
     const char* stop;
     const char* const found = NestedFormattedStringEnd(at_->text, row_end, is_raw, stop);

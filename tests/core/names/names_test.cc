@@ -242,6 +242,7 @@ TEST(Names, FormattedStrings) {
   EXPECT_EQ(NamesOf("t'{a}' + T\n", kPy314), "a=read T=read");
   EXPECT_EQ(NamesOf("x = tR\"{a[\"b\"]} {c}\".d\n", kPy314), "x=write/variable a=read c=read d=read<");
   EXPECT_EQ(NamesOf("f(t'{a', b)\n", kPy314), "f=call a=read b=read");
+  EXPECT_EQ(NamesOf("t\"{t'{a['c']}'}{b}\" f\"{t'{d['e']}'}\"\n", kPy314), "a=read b=read d=read");
   // A prefix touches its string.
   EXPECT_EQ(NamesOf("(t#{a}\n'{b}' + c)\n", kPy314), "t=read c=read");
   EXPECT_EQ(NamesOf("(t\\\n'{b}' + c)\n", kPy314), "t=read c=read");
@@ -427,6 +428,15 @@ TEST(Names, ScopesKnowTheirPlace) {
 }
 
 // ---- broken code ----
+
+TEST(BrokenNames, AWordOfTheLanguageIsNoNameWhereverItStands) {
+  EXPECT_EQ(NamesOf("x = nonlocal + y\n"), "x=write/variable y=read");
+  EXPECT_EQ(NamesOf("x = nonlocal + y\n", kPy27), "x=write/variable nonlocal=read y=read");
+}
+
+TEST(BrokenNames, ADefinitionWithoutParametersMayReturnAType) {
+  EXPECT_EQ(NamesOf("def f -> 'A': pass\n"), "f=definition/function A=read+annotation+string");
+}
 
 TEST(BrokenNames, DefinitionsKeepTheirScope) {
   EXPECT_EQ(NamesOf("class A:\n  def add(self, item, count=1)\n    self.items(item)\n  x = 1\n"),
