@@ -191,6 +191,8 @@ TEST(Scopes, ASignatureCommentOfAMethodMayLeaveOutTheObject) {
   EXPECT_EQ(RecordsOf(head + "A, int) -> bool\n    pass\n", "a").back(), "arg 3:5 A.f|a hint int");
   EXPECT_EQ(RecordsOf("def f():\n  # type: (int) -> bool\n  pass\n", "<argument 0>"),
             (Strings{"arg 2:3 f|<argument 0> hint int"}));
+  EXPECT_EQ(RecordsOf("def f():\n  # type: (int, str) -> bool\n  pass\n", "<argument 1>"),
+            (Strings{"arg 2:3 f|<argument 1> hint str"}));
 }
 
 TEST(Scopes, DefinitionsAreListedWithTheirExtent) {
@@ -676,6 +678,22 @@ TEST(Formats, TextIsSafeToShow) {
   EXPECT_EQ(PlainText("x = '\x1b'\n", "a\n\xFF.py"),
             "a\\n\\udcff.py:1: x = '\\x1b'\n    x                   set\n    x                   = '\\x1b' (str)\n");
   EXPECT_EQ(PlainText("\ty = = \xE2\x80\xAE\n"), "a.py:1:6: invalid syntax\n    \ty = = \\u202e\n    \t    ^\n");
+  EXPECT_EQ(PlainText("y = ="), "a.py:1:5: invalid syntax\n    y = =\n        ^\n");
+}
+
+TEST(Formats, WhatIsNoUtf8IsReplacedByTheLongestBeginningOfACharacter) {
+  const auto shown = [](const std::string& bytes) {
+    const std::string text = PlainText("y = = " + bytes + "|\n");
+    const size_t begin = text.find("= = ") + 4;
+    return text.substr(begin, text.find('|', begin) - begin);
+  };
+  const std::string one = "\xEF\xBF\xBD";
+  for (const char* bytes : {"\xF0\x9F\x98", "\xF4\x8F\xBF", "\xE6\xBC", "\xED\x9F", "\xFF"})
+    EXPECT_EQ(shown(bytes), one);
+  EXPECT_EQ(shown("\xF4\x90"), one + one);
+  EXPECT_EQ(shown("\xED\xA0\x80"), one + one + one);
+  EXPECT_EQ(shown("\xE0\x9F"), one + one);
+  EXPECT_EQ(shown("\xF0\x8F\xBF"), one + one + one);
 }
 
 TEST(Formats, ManyStatementsOnALongLineTakeLinearTime) {
@@ -706,6 +724,8 @@ TEST(Columns, HoldTheRecordsOfAllFiles) {
   ASSERT_EQ(stream.get_schema(&stream, &schema), 0);
   ASSERT_EQ(schema.n_children, 8);
   EXPECT_STREQ(schema.children[4]->name, "name");
+  for (int64_t i = 0; i < schema.n_children; ++i)
+    EXPECT_EQ(schema.children[i]->dictionary != nullptr, i == 0 || i == 5) << schema.children[i]->name;
   schema.release(&schema);
   EXPECT_EQ(schema.release, nullptr);
 
@@ -731,6 +751,22 @@ TEST(Columns, HoldTheRecordsOfAllFiles) {
   stream.release(&stream);
   EXPECT_EQ(text_at(&moved, 0), "x");
   moved.release(&moved);
+}
+
+TEST(Columns, OfOccurrencesHaveDictionariesWhereWordsRepeat) {
+  ArrowArrayStream stream;
+  ExportOccurrenceStream(std::make_unique<OneSource>(std::vector<BatchInput>{}), &stream);
+  ArrowSchema schema;
+  ASSERT_EQ(stream.get_schema(&stream, &schema), 0);
+  Strings with_dictionary, that_may_be_null;
+  for (int64_t i = 0; i < schema.n_children; ++i) {
+    if (schema.children[i]->dictionary != nullptr) with_dictionary.emplace_back(schema.children[i]->name);
+    if (schema.children[i]->flags != 0) that_may_be_null.emplace_back(schema.children[i]->name);
+  }
+  EXPECT_EQ(with_dictionary, (Strings{"path", "role", "kind"}));
+  EXPECT_EQ(that_may_be_null, (Strings{"kind", "receiver", "symbol", "symbol_name"}));
+  schema.release(&schema);
+  stream.release(&stream);
 }
 
 TEST(Columns, HaveTheSameDictionariesInAllBatches) {

@@ -3,11 +3,13 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "hints/hint_walker.h"
 #include "lines/type_comment.h"
 #include "tests/core/support/analyzer_helper.h"
+#include "tests/core/support/expect_error.h"
 #include "tests/core/support/tree_text.h"
 
 namespace quillet {
@@ -209,6 +211,25 @@ TEST(DispatchWalker, AnAbsentChildIsAnAttributeError) {
   } catch (const Error& error) {
     EXPECT_EQ(error.kind(), ErrorKind::kAttributeError);
   }
+}
+
+TEST(TypeHintWalker, AnAbsentChildIsAnAttributeError) {
+  const ParsedLine line("assert a, b\n");
+  CNode* const kept = std::exchange(line.root()->children[0], nullptr);
+  test::ExpectError(ErrorKind::kAttributeError, "'NoneType' object has no attribute 'fChildren'",
+                    [&] { HintWalker().Walk(line.root(), &line.line(), false); });
+  line.root()->children[0] = kept;
+}
+
+TEST(TypeHintWalker, AContextOutsideOfTheTokensIsAnIndexError) {
+  const ParsedLine line("x = y  # type: int\n");
+  CNode* leaf = line.root();
+  while (!leaf->IsLeaf()) leaf = leaf->ChildAt(-1);
+  const Context kept = leaf->fContext;
+  leaf->fContext = Context::Index(-100);
+  test::ExpectError(ErrorKind::kIndexError, "list index out of range",
+                    [&] { HintWalker().Walk(line.root(), &line.line(), false); });
+  leaf->fContext = kept;
 }
 
 // ---- annotations ----

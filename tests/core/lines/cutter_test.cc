@@ -87,6 +87,12 @@ TEST(FutureImports, OnlyThoseOfTheFutureSwitchThePrintFunctionOn) {
 
 // ---- lines ----
 
+TEST(Lines, ABodyOnTheLineOfItsHeadIsWhatItWouldBeAlone) {
+  EXPECT_EQ(Cut("def f(a=g(1)): x[0] = 1\n").Kinds(), (Texts{"def", "assignment"}));
+  EXPECT_EQ(Cut("class A(f(1)): x[(0)]: int\n").Kinds(), (Texts{"class", "assignment"}));
+  EXPECT_EQ(Cut("def f(): g(x=1)\n").Kinds(), (Texts{"def", "unknown"}));
+}
+
 TEST(Lines, BracketsAndBackslashesJoin) {
   EXPECT_EQ(LinesOf("a = (1,\n  2)\nb = \\\n  3\nc"), (Texts{"a = ( 1 , 2 )", "b = \\ 3", "c"}));
 }

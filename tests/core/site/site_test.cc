@@ -187,6 +187,13 @@ TEST(Index, DefinitionsStandByNameWithTheirScopes) {
   EXPECT_NE(site.Places().find("1:[\"f\",[2,0,0,0,0,0,0,0,0],[0,2,\"A\"],"), std::string::npos);
 }
 
+TEST(Index, AnAttributeIsDefinedInMethodsAlone) {
+  EXPECT_EQ(Site({"def f(self): self.x = 1\n"}).index->DefinitionsScript(),
+            "quillet.take([\"\"],[\n[\"f\",\"f\",0,0,1]]);\n");
+  EXPECT_EQ(Site({"class A:\n  def f[T](self): self.x = 1\n"}).index->DefinitionsScript().substr(0, 20),
+            "quillet.take([\"\",\"A\"]");
+}
+
 TEST(Index, WhatIsNoSurveyIsToldAndDoesNoHarm) {
   SiteIndex index({"a.py"}, {});
   for (const char* survey : {"\xFF", "\x05",

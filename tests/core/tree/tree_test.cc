@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <initializer_list>
+#include <set>
 #include <string>
 #include <unordered_map>
 #include <vector>
@@ -599,6 +600,16 @@ TEST_F(TreeTest, StraysAreTakenBackAndWhatIsReachedStays) {
   pool_->host_views = 0;
   pool_->HostViewsDropped();
   EXPECT_EQ(FreeListLength(NodeKind::kCExprStmt), 2u);
+}
+
+TEST_F(TreeTest, WhatIsKeptForAnotherUseIsNoStray) {
+  CNode* nodes[] = {factory_.NewBare<CPatternNode>(), factory_.NewBare<CMatchStmt>(),
+                    factory_.NewBare<CTypeParameter>()};
+  for (CNode* node : nodes) FinishedWithNode(node);
+  pool_->TakeBackStrays(0);
+  std::set<CNode*> used;
+  for (int i = 0; i < 6; ++i) used.insert(factory_.NewBare<CPatternNode>());
+  EXPECT_EQ(used.size(), 6u);
 }
 
 TEST_F(TreeTest, AFreeListThatIsARingHoldsNoStrays) {
