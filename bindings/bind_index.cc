@@ -4,15 +4,21 @@
 #include <nanobind/stl/string.h>
 #include <nanobind/stl/vector.h>
 
+#include <new>
 #include <optional>
+#include <string>
+#include <utility>
+#include <vector>
 
 #include "bindings/batch_format.h"
 #include "bindings/bindings.h"
 #include "bindings/buffer_text.h"
 #include "bindings/convert.h"
 #include "foundations/errors.h"
+#include "index/answer_lines.h"
 #include "index/counts.h"
 #include "index/name_index.h"
+#include "index/places.h"
 #include "index/question.h"
 #include "index/words.h"
 
@@ -39,9 +45,32 @@ QuestionObject MakeQuestion(const std::string& match, nb::handle name, Uses uses
   question.returns = returns;
   question.has_scope = !scope.is_none();
   if (question.has_scope) question.scope = HostText::FromStr(scope).text();
-  question.with_lines = with_lines;
-  made.make = [question](Version version) { return MakeQuestionWriter(question, version); };
+  made.make = [question, with_lines](Version version) {
+    return MakeQuestionWriter(question, version, MakeAnswerBytes(with_lines));
+  };
   return made;
+}
+
+BatchFormat MakeLinesFormat(const QuestionObject& asked, const std::string& form, bool colours, nb::handle folder) {
+  using Form = AnswerLinesOptions::Form;
+  AnswerLinesOptions options;
+  options.form = form == "places" ? Form::kPlaces
+                 : form == "long" ? Form::kLong
+                 : form == "json" ? Form::kJson
+                                  : Form::kNone;
+  options.colours = colours;
+  options.folder = HostText::FromBytes(folder).text();
+  return {[question = asked.question, options](Version version) {
+    return MakeQuestionWriter(question, version, MakeAnswerLines(options));
+  }};
+}
+
+// The number of places, and the bytes.
+nb::tuple LinesOf(nb::handle written) {
+  const BufferText buffer(written);
+  const std::optional<AnswerLines> lines = ReadAnswerLines(buffer.text());
+  if (!lines) ThrowError(ErrorKind::kValueError, "these are no lines of answers");
+  return nb::make_tuple(lines->place_count, BytesOf(lines->lines));
 }
 
 nb::object Checked(PyObject* made) {
@@ -68,10 +97,9 @@ class ShownText {
 // The answers of a file as tuples (path, line, column, scope, name, kind, detail, is_parameter, opens, role,
 // flags), and
 // for each of them its source line as bytes where lines were asked for.
-nb::object KindWordOf(const Answer& answer, const nb::tuple& kinds) {
+nb::object KindOf(const Answer& answer, const nb::tuple& kinds) {
   if (answer.is_record || answer.kind != RecordKind::kOther) return kinds[static_cast<size_t>(answer.kind)];
-  // No kind of record tells of these.
-  return StrOf(NameRoleWords()[answer.role - 1u]);
+  return StrOf(KindWordOf(answer));
 }
 
 nb::object RoleOf(const Answer& answer) {
@@ -88,7 +116,7 @@ nb::tuple Answers(nb::handle written, nb::object path, const nb::tuple& kinds) {
   nb::object line_object;
   const bool done = ReadAnswers(buffer.text(), [&](const Answer& answer, Text line) {
     rows.append(nb::make_tuple(path, answer.line, answer.column, scopes(answer.scope), names(answer.name),
-                               KindWordOf(answer, kinds), details(answer.detail), answer.is_parameter, answer.opens,
+                               KindOf(answer, kinds), details(answer.detail), answer.is_parameter, answer.opens,
                                RoleOf(answer), answer.flags));
     if (line.data() == nullptr) return;
     if (!line_object.is_valid() || line.data() != line_text.data()) {
@@ -131,13 +159,43 @@ bool IsAlike(Text a, Text b) {
          std::equal(a.begin(), a.end(), b.begin(), [](char x, char y) { return LowerOf(x) == LowerOf(y); });
 }
 
+nb::tuple FileOf(const IndexObject& self, size_t number, uint64_t size) {
+  const IndexedFile& file = self.index[number];
+  return nb::make_tuple(number, BytesOf(file.path), size, file.time, file.hash, file.lines, file.records, file.errors,
+                        file.problem.empty() ? nb::object(nb::none()) : StrOf(file.problem));
+}
+
 nb::list FilesOf(const IndexObject& self) {
   nb::list files;
+  for (size_t i = 0; i < self.index.size(); ++i) files.append(FileOf(self, i, self.index[i].size));
+  return files;
+}
+
+Places MakePlaces(nb::handle base, nb::handle roots) {
+  std::vector<std::string> texts;
+  for (nb::handle root : nb::borrow<nb::tuple>(TupleOf(roots))) texts.emplace_back(HostText::FromBytes(root).text());
+  return {std::string(HostText::FromBytes(base).text()), std::move(texts)};
+}
+
+nb::list FilesIn(const IndexObject& self, Places& places) {
+  nb::list files;
   for (size_t i = 0; i < self.index.size(); ++i) {
-    const IndexedFile& file = self.index[i];
-    files.append(nb::make_tuple(i, BytesOf(file.path), file.size, file.time, file.hash, file.lines, file.records,
-                                file.errors, file.problem.empty() ? nb::object(nb::none()) : StrOf(file.problem)));
+    const std::optional<std::string> path = places.PathOf(self.index[i].path);
+    if (path && places.Holds(*path)) files.append(FileOf(self, i, self.index[i].size));
   }
+  return files;
+}
+
+size_t CountOutside(const IndexObject& self, const Places& places) {
+  size_t outside = 0;
+  for (size_t i = 0; i < self.index.size(); ++i) outside += !places.PathOf(self.index[i].path);
+  return outside;
+}
+
+nb::list CandidatesIn(const IndexObject& self, const QuestionObject& question, Places& places) {
+  nb::list files;
+  for (const CandidateFile& file : CandidatesFor(self.index, WordsNeededBy(question.question), places))
+    files.append(FileOf(self, file.number, file.size));
   return files;
 }
 
@@ -165,9 +223,17 @@ void BindIndex(nb::module_& tarvex) {
   nb::class_<QuestionObject, BatchFormat>(host, "Question", "A question for a name, as a format of a batch.");
   host.def("MakeQuestion", &MakeQuestion, nb::arg("match"), nb::arg("name"), nb::arg("uses"), nb::arg("returns"),
            nb::arg("scope").none(), nb::arg("with_lines"));
+  host.def("LinesFormat", &MakeLinesFormat, nb::arg("question"), nb::arg("form"), nb::arg("colours"), nb::arg("folder"),
+           "The answers of a question as places, long, json, or none at all.");
+  host.def("LinesOf", &LinesOf, nb::arg("written"), "The number of places, and the lines of them.");
   host.def("WordsFormat", [] { return BatchFormat{MakeWordsWriter}; });
   host.def("Answers", &Answers, nb::arg("written"), nb::arg("path"), nb::arg("kinds"),
            "The answers that a question wrote of a file, and their source lines.");
+  nb::class_<Places>(host, "Places", "The folders whose files may be shown, by absolute paths.")
+      .def(
+          "__init__",
+          [](Places* self, nb::handle base, nb::handle roots) { new (self) Places(MakePlaces(base, roots)); },
+          nb::arg("base"), nb::arg("roots"));
   host.def(
       "HashOfSource", [](nb::handle source) { return HashOfBytes(BufferText(source).text()); }, nb::arg("source"));
   nb::dict bits;
@@ -216,6 +282,10 @@ void BindIndex(nb::module_& tarvex) {
           nb::arg("data"), "fine, foreign, other schema or damaged.")
       .def_prop_ro("settings", [](const IndexObject& self) { return BytesOf(self.index.settings()); })
       .def("Files", &FilesOf, "Tuples (number, path, size, time, hash, lines, records, errors, problem) by path.")
+      .def("FilesIn", &FilesIn, nb::arg("places"), "The files that may be shown.")
+      .def("Outside", &CountOutside, nb::arg("places"), "How many files have paths that lead elsewhere.")
+      .def("CandidatesIn", &CandidatesIn, nb::arg("question"), nb::arg("places"),
+           "The files that may answer as they are now, each with its size of now.")
       .def(
           "WordsOf",
           [](const IndexObject& self, size_t number) {

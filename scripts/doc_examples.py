@@ -92,15 +92,13 @@ def working_folder(folder: str) -> Iterator[None]:
 
 def find_view(source: str, version: tuple[int, int], name: str) -> str:
     """What `quillet find NAME --long` prints of the source as shop.py."""
-    from quillet.cli.find import Form, show_answers
+    from quillet.cli.find import show_answers
     from quillet.index.questions import Folder, Query, match_of
 
     with tempfile.TemporaryDirectory() as folder, working_folder(folder):
         Path("shop.py").write_text(source, encoding="utf-8")
-        sources = Folder(".", version)
-        answers = sources.answers(Query(name, match_of(name)), with_lines=True)
         out = io.StringIO()
-        show_answers(out, sources, answers, Form(long=True))
+        show_answers(out, Folder(".", version), Query(name, match_of(name)), "long")
     return out.getvalue()
 
 

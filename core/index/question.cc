@@ -164,25 +164,12 @@ RecordKind KindOf(const Occurrence& occurrence) {
   return RecordKind::kOther;
 }
 
-// A source line, counted from 0, without its end.
-Text LineOf(const SourceText& source, uint32_t line) {
-  const std::vector<uint32_t>& starts = source.line_starts;
-  if (line >= starts.size()) return {};
-  const size_t end = line + 1 < starts.size() ? starts[line + 1] : source.size();
-  Text text = source.text().substr(starts[line], end - starts[line]);
-  text = text.substr(0, text.find_last_not_of("\r\n") + 1);
-  if (text.size() <= kMaxLineSize) return text;
-  size_t size = kMaxLineSize;
-  while (size > 0 && !IsUtf8LeadByte(text[size])) --size;
-  return text.substr(0, size);
-}
-
 class QuestionWriter : public FileWriter {
  public:
-  QuestionWriter(const Question& question, Version version)
-      : question_(question), matcher_(question_), binder_(version) {}
+  QuestionWriter(const Question& question, Version version, std::unique_ptr<AnswerFormat> format)
+      : question_(question), matcher_(question_), binder_(version), format_(std::move(format)) {}
 
-  void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
+  void Write(const BatchInput& input, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
              std::string& out) override {
     answers_.clear();
     placed.Begin(file, scopes);
@@ -202,7 +189,7 @@ class QuestionWriter : public FileWriter {
       std::erase_if(answers_, [](const Answer& answer) { return answer.line == 0; });
       if (answers_.size() != record_count_) SortAndUnite();
     }
-    WriteAnswers(file.source(), out);
+    format_->Write(input, file.source(), answers_, out);
   }
 
  private:
@@ -309,10 +296,27 @@ class QuestionWriter : public FileWriter {
     answers_.resize(kept);
   }
 
-  void WriteAnswers(const SourceText& source, std::string& out) const {
-    AppendNumber(answers_.size(), out);
+  static constexpr size_t kMostCompared = 1000;
+
+  const Question question_;
+  const Matcher matcher_;
+  NameBinder binder_;
+  const std::unique_ptr<AnswerFormat> format_;
+  std::vector<Answer> answers_;
+  std::unordered_map<uint64_t, uint32_t> told_;
+  size_t record_count_ = 0;
+  std::string name_;
+  TextArena texts_;
+};
+
+class AnswerBytes : public AnswerFormat {
+ public:
+  explicit AnswerBytes(bool with_lines) : with_lines_(with_lines) {}
+
+  void Write(const BatchInput&, const SourceText& source, std::span<const Answer> answers, std::string& out) override {
+    AppendNumber(answers.size(), out);
     uint32_t line = 0;
-    for (const Answer& answer : answers_) {
+    for (const Answer& answer : answers) {
       AppendNumber(answer.line, out);
       AppendNumber(answer.column, out);
       out += static_cast<char>(answer.kind);
@@ -322,24 +326,16 @@ class QuestionWriter : public FileWriter {
       AppendText(answer.scope, out);
       AppendText(answer.name, out);
       AppendText(answer.detail, out);
-      if (question_.with_lines && answer.line != line) {
+      if (with_lines_ && answer.line != line) {
         line = answer.line;
-        AppendText(LineOf(source, line - 1), out);
+        AppendText(SourceLineOf(source, answer), out);
       }
     }
-    out += static_cast<char>(question_.with_lines);
+    out += static_cast<char>(with_lines_);
   }
 
-  static constexpr size_t kMostCompared = 1000;
-
-  const Question question_;
-  const Matcher matcher_;
-  NameBinder binder_;
-  std::vector<Answer> answers_;
-  std::unordered_map<uint64_t, uint32_t> told_;
-  size_t record_count_ = 0;
-  std::string name_;
-  TextArena texts_;
+ private:
+  const bool with_lines_;
 };
 
 // ---- the words of a question ----
@@ -455,8 +451,29 @@ bool FitsGlob(Text text, Text pattern) {
   return in_pattern == pattern.size();
 }
 
-std::unique_ptr<FileWriter> MakeQuestionWriter(const Question& question, Version version) {
-  return std::make_unique<QuestionWriter>(question, version);
+std::unique_ptr<FileWriter> MakeQuestionWriter(const Question& question, Version version,
+                                               std::unique_ptr<AnswerFormat> format) {
+  return std::make_unique<QuestionWriter>(question, version, std::move(format));
+}
+
+Text KindWordOf(const Answer& answer) {
+  if (answer.is_record || answer.kind != RecordKind::kOther) return RecordKindWords()[static_cast<size_t>(answer.kind)];
+  return NameRoleWords()[answer.role - 1u];
+}
+
+std::unique_ptr<AnswerFormat> MakeAnswerBytes(bool with_lines) { return std::make_unique<AnswerBytes>(with_lines); }
+
+Text SourceLineOf(const SourceText& source, const Answer& answer) {
+  const std::vector<uint32_t>& starts = source.line_starts;
+  if (answer.line == 0 || answer.line > starts.size()) return {};
+  const uint32_t begin = starts[answer.line - 1];
+  const size_t end = answer.line < starts.size() ? starts[answer.line] : source.size();
+  Text text = source.text().substr(begin, end - begin);
+  text = text.substr(0, text.find_last_not_of("\r\n") + 1);
+  if (text.size() <= kMaxLineSize) return text;
+  size_t size = kMaxLineSize;
+  while (size > 0 && !IsUtf8LeadByte(text[size])) --size;
+  return text.substr(0, size);
 }
 
 bool ReadAnswers(Text written, const std::function<void(const Answer&, Text line)>& take) {

@@ -8,6 +8,7 @@
 
 #include <functional>
 #include <memory>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -28,7 +29,6 @@ struct Question {
   bool returns = false;  // what functions of the name return and yield, too
   bool has_scope = false;
   std::string scope;  // around the records, by whole names or as a pattern
-  bool with_lines = false;
 };
 
 // A part of a word that a file must hold, in one of these uses.
@@ -67,12 +67,30 @@ struct Answer {
   friend bool operator==(const Answer&, const Answer&) = default;
 };
 
-// Writes the answers of each file: by line and column and each once, unless everything is asked for.
-std::unique_ptr<FileWriter> MakeQuestionWriter(const Question& question, Version version);
+// The word of an answer's kind; where no kind of record tells of it, of what the occurrence does.
+Text KindWordOf(const Answer& answer);
 
-// Calls `take(answer, line)` for what such a writer wrote; the texts are views of it. `line` is the source
-// line of the answer where lines were asked for, without its end and cut where it is very long; it has
-// the same data as the one before where it is the same line. False where it is something else.
+// How the answers of a file are written down.
+class AnswerFormat {
+ public:
+  virtual ~AnswerFormat() = default;
+  virtual void Write(const BatchInput& input, const SourceText& source, std::span<const Answer> answers,
+                     std::string& out) = 0;
+};
+
+// Writes the answers of each file: by line and column and each once, unless everything is asked for.
+std::unique_ptr<FileWriter> MakeQuestionWriter(const Question& question, Version version,
+                                               std::unique_ptr<AnswerFormat> format);
+
+// The source line of an answer, without its end and cut where it is very long.
+Text SourceLineOf(const SourceText& source, const Answer& answer);
+
+// For ReadAnswers; with the source lines where they are asked for.
+std::unique_ptr<AnswerFormat> MakeAnswerBytes(bool with_lines);
+
+// Calls `take(answer, line)` for what such a format wrote; the texts are views of it. `line` is the source
+// line of the answer where lines were asked for; it has the same data as the one before where it is the
+// same line. False where it is something else.
 bool ReadAnswers(Text written, const std::function<void(const Answer&, Text line)>& take);
 
 }  // namespace quillet

@@ -19,10 +19,6 @@ constexpr size_t kWindow = 160;
 constexpr Text kEllipsis = "\xE2\x80\xA6";
 constexpr Text kReplacement = "\xEF\xBF\xBD";
 
-constexpr Text kPlaceColour = "36";
-constexpr Text kNameColour = "1";
-constexpr Text kErrorColour = "1;31";
-
 bool IsUnsafe(uint32_t c) {
   if (c < 0x20) return c != '\t';
   if (c < 0x7F) return false;
@@ -192,14 +188,7 @@ class TextLinesWriter : public FileWriter {
     place_.assign(path_).append(":").append(std::to_string(line.first_line + 1)).append(":");
     AppendColoured(kPlaceColour, place_, out);
     out += ' ';
-    const std::string source = Decoded(FirstBytes(PhysicalLine(file.source(), line.first_line)));
-    text_.clear();
-    AppendPrintable(Stripped(source), text_);
-    if (CharCountOfUtf8(text_) > kWindow) {
-      out.append(FirstChars(text_, kWindow - 1)).append(kEllipsis);
-    } else {
-      out += text_;
-    }
+    AppendSourceLine(PhysicalLine(file.source(), line.first_line), out);
     if (line.last_line > line.first_line) out.append(" ").append(kEllipsis);
     out += '\n';
     for (const PlacedRecord& record : records) {
@@ -218,10 +207,10 @@ class TextLinesWriter : public FileWriter {
   }
 
   void AppendColoured(Text colour, Text text, std::string& out) const {
-    if (!options_.colours || text.empty()) {
-      out += text;
+    if (options_.colours) {
+      quillet::AppendColoured(colour, text, out);
     } else {
-      out.append("\x1b[").append(colour).append("m").append(text).append("\x1b[0m");
+      out += text;
     }
   }
 
@@ -270,6 +259,32 @@ void AppendPrintable(Text text, std::string& out) {
     at += length;
   }
   out.append(safe, end);
+}
+
+void AppendSourceLine(Text line, std::string& out) {
+  const bool is_plain = std::all_of(line.begin(), line.end(), [](char c) { return c >= 0x20 && c < 0x7F; });
+  if (is_plain) [[likely]] {
+    line = line.substr(std::min(line.find_first_not_of(' '), line.size()));
+    line = line.substr(0, line.find_last_not_of(' ') + 1);
+    if (line.size() <= kWindow) {
+      out += line;
+    } else {
+      out.append(line.substr(0, kWindow - 1)).append(kEllipsis);
+    }
+    return;
+  }
+  std::string text;
+  const std::string decoded = Decoded(FirstBytes(line));
+  AppendPrintable(Stripped(decoded), text);
+  if (CharCountOfUtf8(text) > kWindow) {
+    out.append(FirstChars(text, kWindow - 1)).append(kEllipsis);
+  } else {
+    out += text;
+  }
+}
+
+void AppendColoured(Text colour, Text text, std::string& out) {
+  if (!text.empty()) out.append("\x1b[").append(colour).append("m").append(text).append("\x1b[0m");
 }
 
 std::unique_ptr<FileWriter> MakeTextLinesWriter(const TextLinesOptions& options) {

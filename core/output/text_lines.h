@@ -18,6 +18,15 @@ namespace quillet {
 // them: one line, safe to show. Tabs are kept.
 void AppendPrintable(Text text, std::string& out);
 
+// Appends what is shown of a source line: without white space at both ends, safe, and cut where it is long.
+void AppendSourceLine(Text line, std::string& out);
+
+// Appends a text in a colour, which is the number of a terminal's escape, where it is not empty.
+inline constexpr Text kPlaceColour = "36";
+inline constexpr Text kNameColour = "1";
+inline constexpr Text kErrorColour = "1;31";
+void AppendColoured(Text colour, Text text, std::string& out);
+
 struct TextLinesOptions {
   bool errors_only = false;
   bool colours = false;

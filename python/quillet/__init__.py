@@ -7,8 +7,8 @@ name of a source is. `quillet.tarvex` is the engine below, which takes one logic
 
 from __future__ import annotations
 
-from typing import TYPE_CHECKING
-
+# As typing has it, which takes longer to load than a question to answer.
+TYPE_CHECKING = False
 if TYPE_CHECKING:
     from quillet._batch import Definition, FileAnalyses, FileAnalysis, FileRecord, FileRecords, analyze_files
     from quillet._names import FileBindings, FileOccurrences, Occurrence, Scope, Symbol, bind

@@ -7,7 +7,6 @@ from __future__ import annotations
 
 import os
 import sys
-from functools import lru_cache
 
 from quillet._keywords import keywords_of
 from quillet.config import GetNorvaFilename
@@ -35,11 +34,16 @@ def language_version(version: tuple[int, ...] | None = None) -> tuple[int, int]:
 
 def native_language_of(version: tuple[int, ...] | None = None) -> _host.Language:
     """What native analyzers of a version are built from; None is the running interpreter's."""
-    return _native_language(language_version(version))
+    language = language_version(version)
+    if language not in _languages:
+        _languages[language] = _make_language(language)
+    return _languages[language]
 
 
-@lru_cache
-def _native_language(language: tuple[int, int]) -> _host.Language:
+_languages: dict[tuple[int, int], _host.Language] = {}
+
+
+def _make_language(language: tuple[int, int]) -> _host.Language:
     python_3 = language >= (3, 0)
     grammar = kPy3DefaultGrammar if python_3 else kPy2DefaultGrammar
     return _host.Language(

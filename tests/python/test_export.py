@@ -244,7 +244,7 @@ def test_parquet_names_what_it_cannot_read_or_write(shop: Path) -> None:
     assert result.stderr == "quillet: gone.py: No such file or directory\nquillet: 1 file could not be read\n"
     result = run("index", ".", "--format", "parquet", "-o", "missing/out.parquet", cwd=shop)
     assert result.returncode == 1
-    assert result.stderr == "quillet: missing/out.parquet: No such file or directory\n"
+    assert result.stderr == f"quillet: missing/out.parquet: there is no folder {shop / 'missing'} to hold it\n"
 
 
 def test_tables_can_be_asked_by_sql(shop: Path) -> None:

@@ -483,7 +483,8 @@ def plant(folder: Path, *paths: bytes, roots: tuple[str, ...] = (".",)) -> None:
     words = written_words(b"SECRET = 1\n")
     for path in paths:
         writer.Add(path, 11, 5, 1, 0, None, words)
-    index_path(folder).write_bytes(writer.Finish(settings_text(stored.settings._replace(roots=roots))))
+    stored.settings.roots = roots
+    index_path(folder).write_bytes(writer.Finish(settings_text(stored.settings)))
 
 
 def written_words(source: bytes) -> bytes:

@@ -8,7 +8,10 @@ from __future__ import annotations
 
 import os
 import sys
-from collections.abc import Sequence
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Sequence
 
 PROGRAM = "quillet"
 

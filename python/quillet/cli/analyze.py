@@ -8,9 +8,7 @@ away ends the run without a word.
 
 from __future__ import annotations
 
-import io
 import os
-from collections.abc import Callable
 from contextlib import closing
 from typing import TextIO
 
@@ -19,7 +17,7 @@ from quillet.cli.files import Found, find_files, problem_of, read_file
 from quillet.cli.output import output_format, output_header
 from quillet.cli.progress import Progress, is_terminal, say
 from quillet.cli.show import printable
-from quillet.cli.streams import quiet_output
+from quillet.cli.streams import bytes_writer, quiet_output
 
 
 def run(
@@ -38,7 +36,7 @@ def run(
     unread = 0
     errors = 0
     with quiet_output() as out:
-        write = _bytes_writer(out)
+        write = bytes_writer(out)
         write(memoryview(output_header(form, version)))
         found = list(find_files(paths, gitignore=gitignore, exclude=exclude))
         inputs = [_input_of(item, stdin_filename) for item in found]
@@ -76,12 +74,3 @@ def _complain(out: TextIO, path: str, reason: str, line: int | None = None) -> N
     first_line = reason.partition("\n")[0]
     place = printable(path) if line is None else f"{printable(path)}:{line}"
     say(f"{place}: {printable(first_line)}")
-
-
-def _bytes_writer(out: TextIO) -> Callable[[memoryview], object]:
-    """Writes UTF-8 to a text stream: as it is where that is the stream's encoding."""
-    if isinstance(out, io.TextIOWrapper) and out.encoding.lower().replace("_", "-") in ("utf-8", "utf8"):
-        out.flush()
-        binary = out.buffer
-        return lambda data: binary.write(data)
-    return lambda data: out.write(str(data, "utf-8", "surrogatepass"))

@@ -2,14 +2,19 @@
 
 from __future__ import annotations
 
+import json
 import os
 
 from quillet.cli.files import problem_of
-from quillet.cli.find import Form, fail, show_hits
-from quillet.cli.show import Style
+from quillet.cli.find import fail
+from quillet.cli.show import Style, printable
 from quillet.cli.streams import quiet_output
-from quillet.index.questions import FileFacts, Folder, Index, Sources, definitions_in, row_of
+from quillet.index.facts import FileFacts, Hit, definitions_in, row_of
+from quillet.index.questions import FLAGS, Folder, Index, Sources
 from quillet.index.store import IndexProblem, find_index
+
+# As much of a source line is shown, in characters.
+_WINDOW = 160
 
 
 def run(path: str, *, index: str | None, as_json: bool, imports: bool) -> int:
@@ -21,10 +26,45 @@ def run(path: str, *, index: str | None, as_json: bool, imports: bool) -> int:
     lines = dict(zip(facts.hits, facts.source_lines, strict=True))
     hits = definitions_in(facts.hits, imports=imports)
     hits.sort(key=lambda hit: (hit.line, hit.column))
+    style = Style.of_stdout()
+    place = None
     with quiet_output() as out:
-        shown = facts._replace(hits=hits, source_lines=[lines[hit] for hit in hits])
-        show_hits(out, shown_path(path), shown, Style.of_stdout(), Form(as_json=as_json))
+        for hit in hits:
+            if as_json:
+                out.write(_json(shown_path(path), hit, lines[hit]))
+            elif (hit.line, hit.column) != place:
+                place = hit.line, hit.column
+                out.write(_place_text(shown_path(path), hit, lines[hit], style))
     return 0 if hits else 1
+
+
+def _place_text(path: str, hit: Hit, source: bytes, style: Style) -> str:
+    text = printable(source.decode("utf-8", "replace").strip())
+    if len(text) > _WINDOW:
+        text = text[: _WINDOW - 1] + "…"
+    place = style.place(f"{printable(path)}:{hit.line}:{hit.column}:")
+    return f"{place} {text}".rstrip() + "\n"
+
+
+def _json(path: str, hit: Hit, source: bytes) -> str:
+    receiver, dot, _ = hit.name.rpartition(".")
+    row = {
+        "type": "record",
+        "path": path,
+        "line": hit.line,
+        "column": hit.column,
+        "scope": hit.scope,
+        "name": hit.name,
+        "kind": hit.kind,
+        "detail": hit.detail,
+        "is_parameter": hit.is_parameter,
+        "source": source.decode("utf-8", "backslashreplace"),
+        "changed": False,
+        "role": hit.role,
+        "flags": [word for bit, word in enumerate(FLAGS) if hit.flags >> bit & 1],
+        "receiver": receiver if dot else None,
+    }
+    return json.dumps(row, ensure_ascii=True, separators=(",", ":")) + "\n"
 
 
 def facts_of(path: str, index: str | None, *, with_lines: bool) -> FileFacts:

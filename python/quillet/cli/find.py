@@ -7,35 +7,27 @@ jump there. Answers are written as they are found. Exit codes are those of grep:
 
 from __future__ import annotations
 
+import os
 import sys
 import time
-from collections.abc import Iterator, Sequence
-from itertools import groupby
-from typing import NamedTuple, TextIO
 
 from quillet.cli.find_options import ROLES
 from quillet.cli.show import Style, printable
-from quillet.cli.streams import quiet_output
-from quillet.index.questions import FLAGS, FileFacts, Folder, Hit, Index, Query, Sources, match_of
+from quillet.cli.streams import bytes_writer, quiet_output
+from quillet.index.questions import Folder, Index, Query, Sources, match_of
 from quillet.index.store import IndexProblem, find_index
 
-# As much of a source line is shown, in characters.
-_WINDOW = 160
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Iterator, Sequence
+    from typing import TextIO
+
 # How long written lines may wait for more of them, in seconds.
 _PATIENCE = 0.1
 # A search without an index that takes longer could be faster with one.
 _SLOW = 1.0
 # How many words that differ by case are tried where nothing is found.
 _MOST_ALIKE = 5
-
-
-class Form(NamedTuple):
-    """How answers are written."""
-
-    as_json: bool = False
-    long: bool = False
-    count_only: bool = False
-    files_only: bool = False
 
 
 def ask(
@@ -58,7 +50,8 @@ def ask(
     """Runs the command with the parameters of `find_options` and returns its exit code."""
     if not name.strip("."):
         return fail(ValueError("NAME is empty"))
-    if as_json + long + count + files > 1:
+    forms = {"json": as_json, "long": long, "count": count, "files": files}
+    if sum(forms.values()) > 1:
         return fail(ValueError("--json, --long, --count and --files are one instead of the other"))
     for text in (name, scope or ""):
         if any("\ud800" <= char <= "\udfff" for char in text):
@@ -67,11 +60,12 @@ def ask(
     if any_receiver and match is None:
         match = "suffix"
     query = Query(name, match or match_of(name), wanted, returns, scope, path)
-    return run(query, index=index, roots=roots, exclude=exclude, form=Form(as_json, long, count, files))
+    form = next((form for form, wanted in forms.items() if wanted), "places")
+    return run(query, index=index, roots=roots, exclude=exclude, form=form)
 
 
-def run(query: Query, *, index: str | None, roots: Sequence[str], exclude: Sequence[str], form: Form) -> int:
-    """Runs the command and returns its exit code."""
+def run(query: Query, *, index: str | None, roots: Sequence[str], exclude: Sequence[str], form: str) -> int:
+    """Runs the command and returns its exit code. `form` is places, long, json, count or files."""
     start = time.monotonic()
     try:
         sources = sources_to_ask(index, roots, exclude)
@@ -79,7 +73,7 @@ def run(query: Query, *, index: str | None, roots: Sequence[str], exclude: Seque
         return fail(problem)
     found = True  # where the reader went away: something was written
     with quiet_output() as out:
-        found = show_answers(out, sources, sources.answers(query, with_lines=True), form)
+        found = show_answers(out, sources, query, form)
     if isinstance(sources, Index):
         say_outside(sources)
     elif time.monotonic() - start > _SLOW:
@@ -118,88 +112,25 @@ def say_outside(index: Index) -> None:
         )
 
 
-def show_answers(out: TextIO, sources: Sources, answers: Iterator[FileFacts], form: Form) -> bool:
+def show_answers(out: TextIO, sources: Sources, query: Query, form: str) -> bool:
     """Writes answers as they come, and returns whether there were any."""
-    style = Style.of_stdout()
-    places = 0
+    write = bytes_writer(out)
+    native_form = form if form in ("places", "long", "json") else "none"
+    colours = form != "json" and Style.of_stdout().on
+    total = 0
     flushed = 0.0
-    for facts in answers:
-        places += len({hit[1:3] for hit in facts.hits})
-        path = sources.shown_path(facts.row.path)
-        if form.files_only:
-            out.write(f"{printable(path)}\n")
-        elif not form.count_only:
-            show_hits(out, path, facts, style, form)
+    for path, places, lines in sources.lines(query, native_form, colours=colours):
+        total += places
+        if form == "files":
+            write(os.fsencode(printable(path)) + b"\n")
+        else:
+            write(lines)
         if time.monotonic() - flushed > _PATIENCE:
             out.flush()
             flushed = time.monotonic()
-    if form.count_only:
-        out.write(f"{places}\n")
-    return places > 0
-
-
-def show_hits(out: TextIO, path: str, facts: FileFacts, style: Style, form: Form) -> None:
-    """Writes the answers of a file by their places, each with its source line."""
-    pairs = zip(facts.hits, facts.source_lines, strict=True)
-    if form.as_json:
-        out.writelines(_json(path, hit, source) for hit, source in pairs)
-        return
-    for (line, column), records in groupby(pairs, key=lambda pair: (pair[0].line, pair[0].column)):
-        group = list(records)
-        out.write(place_text(path, line, column, group[0][1], style))
-        if form.long:
-            out.writelines(_detail_text(hit, style) for hit, _ in group)
-
-
-def place_text(path: str, line: int, column: int, source: bytes, style: Style) -> str:
-    """A place and its source line."""
-    text = printable(source.decode("utf-8", "replace").strip())
-    if len(text) > _WINDOW:
-        text = text[: _WINDOW - 1] + "…"
-    place = style.place(f"{printable(path)}:{line}:{column}:")
-    return f"{place} {text}".rstrip() + "\n"
-
-
-def _detail_text(hit: Hit, style: Style) -> str:
-    from quillet._records import Record, RecordKind, describe
-
-    if hit.kind == "called" and not hit.detail:
-        said = "called"
-    elif hit.kind in _ROLE_PHRASES:
-        said = _ROLE_PHRASES[hit.kind]
-    elif hit.kind == "import" and not hit.detail:
-        said = "imported"
-    else:
-        said = describe(Record(hit.name, RecordKind(hit.kind), hit.detail, hit.is_parameter))
-    where = f"  in {printable(hit.scope)}" if hit.scope else ""
-    return f"    {style.name(printable(hit.name))}  {printable(said)}{where}\n"
-
-
-# What roles that no kind of record has are called.
-_ROLE_PHRASES = {"delete": "deleted", "keyword": "passed as a keyword", "declaration": "declared"}
-
-
-def _json(path: str, hit: Hit, source: bytes) -> str:
-    import json
-
-    receiver, dot, _ = hit.name.rpartition(".")
-    row = {
-        "type": "record",
-        "path": path,
-        "line": hit.line,
-        "column": hit.column,
-        "scope": hit.scope,
-        "name": hit.name,
-        "kind": hit.kind,
-        "detail": hit.detail,
-        "is_parameter": hit.is_parameter,
-        "source": source.decode("utf-8", "backslashreplace"),
-        "changed": False,
-        "role": hit.role,
-        "flags": [word for bit, word in enumerate(FLAGS) if hit.flags >> bit & 1],
-        "receiver": receiver if dot else None,
-    }
-    return json.dumps(row, ensure_ascii=True, separators=(",", ":")) + "\n"
+    if form == "count":
+        write(b"%d\n" % total)
+    return total > 0
 
 
 # ---- where nothing is found ----
@@ -207,31 +138,32 @@ def _json(path: str, hit: Hit, source: bytes) -> str:
 
 def nearby(sources: Sources, query: Query) -> Iterator[str]:
     """Questions near to one without an answer, as one types them, of those that have one."""
-    seen = {query}
+    seen = {_typed(query)}
     for near in _neighbours(sources, query):
-        if near not in seen:
-            seen.add(near)
-            if next(sources.find(near), None) is not None:
-                yield _typed(near)
+        typed = _typed(near)
+        if typed not in seen:
+            seen.add(typed)
+            if next(sources.lines(near, "none"), None) is not None:
+                yield typed
 
 
 def _neighbours(sources: Sources, query: Query) -> Iterator[Query]:
     if query.scope is not None:
-        yield query._replace(scope=None)
+        yield query.but(scope=None)
     if query.path is not None:
-        yield query._replace(path=None)
+        yield query.but(path=None)
     names = [query]
     if query.match == "exact":
-        names.append(query._replace(name=f".{query.name}", match="suffix"))
+        names.append(query.but(name=f".{query.name}", match="suffix"))
         outer, dot, tail = query.name.rpartition(".")
         for word in sources.words_alike(tail)[:_MOST_ALIKE]:
-            names.append(query._replace(name=outer + dot + word))
+            names.append(query.but(name=outer + dot + word))
     elif query.match == "suffix":
-        names.append(query._replace(name=query.name.lstrip("."), match="exact"))
+        names.append(query.but(name=query.name.lstrip("."), match="exact"))
     yield from names
     if query.roles or query.returns:
         for near in names:
-            yield near._replace(roles=(), returns=False)
+            yield near.but(roles=(), returns=False)
 
 
 def _typed(query: Query) -> str:

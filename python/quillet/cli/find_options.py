@@ -6,19 +6,31 @@ spelt out) is read here. Everything else goes to click: help, mistakes, completi
 
 from __future__ import annotations
 
-from collections.abc import Sequence
-from typing import Any, NamedTuple
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Sequence
+    from typing import Any
 
 
-class Option(NamedTuple):
+class Option:
     """An option and the parameter that it sets: a flag, or with `metavar` or `choices` one that takes a value."""
 
-    flags: tuple[str, ...]
-    parameter: str
-    help: str
-    metavar: str = ""
-    choices: tuple[str, ...] = ()
-    repeated: bool = False
+    def __init__(
+        self,
+        flags: tuple[str, ...],
+        parameter: str,
+        text: str,
+        *,
+        metavar: str = "",
+        choices: tuple[str, ...] = (),
+        repeated: bool = False,
+    ) -> None:
+        self.flags = flags
+        self.parameter = parameter
+        self.help = text
+        self.metavar = metavar
+        self.choices = choices
+        self.repeated = repeated
 
     @property
     def takes_value(self) -> bool:

@@ -22,7 +22,7 @@ from quillet.cli.files import problem_of, read_file
 from quillet.cli.find import fail
 from quillet.cli.show import Style, printable
 from quillet.cli.streams import quiet_output
-from quillet.index.questions import FileFacts, Hit
+from quillet.index.facts import FileFacts, Hit
 from quillet.index.store import CLASS, FUNCTION, IndexProblem
 
 # How much of a signature is shown to people, in characters, and how far a head is read for it, in bytes.

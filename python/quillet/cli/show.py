@@ -8,25 +8,25 @@ width that the text in front of it has on a terminal.
 from __future__ import annotations
 
 import os
-import re
 import sys
-import unicodedata
-from typing import TYPE_CHECKING
 
+TYPE_CHECKING = False
 if TYPE_CHECKING:
     from quillet.host import Analysis, Line
 
 # Everything that moves a terminal's cursor, changes its state or reverses its text; tabs are kept.
-_UNSAFE = re.compile(
-    r"[\x00-\x08\x0a-\x1f\x7f-\x9f\u061c\u200e\u200f\u2028\u2029\u202a-\u202e\u2066-\u2069\ud800-\udfff]"
-)
+_UNSAFE = r"[\x00-\x08\x0a-\x1f\x7f-\x9f\u061c\u200e\u200f\u2028\u2029\u202a-\u202e\u2066-\u2069\ud800-\udfff]"
 # How much of a long line is shown, in characters: the error stands within it.
 _WINDOW = 160
 
 
 def printable(text: str) -> str:
     """`text` with control characters as escapes; one line, safe to show."""
-    return _UNSAFE.sub(lambda match: match[0].encode("unicode_escape", "surrogatepass").decode("ascii"), text)
+    if text.isprintable():
+        return text
+    import re
+
+    return re.sub(_UNSAFE, lambda match: match[0].encode("unicode_escape", "surrogatepass").decode("ascii"), text)
 
 
 class Style:
@@ -55,6 +55,8 @@ class Style:
 
 def width(text: str) -> int:
     """The cells that `text` takes on a terminal; it holds no tab."""
+    import unicodedata
+
     cells = 0
     for char in text:
         if char.isascii():

@@ -10,9 +10,12 @@ from __future__ import annotations
 import io
 import os
 import sys
-from collections.abc import Callable, Iterator
-from contextlib import contextmanager, suppress
-from typing import TextIO
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable
+    from types import TracebackType
+    from typing import TextIO
 
 INTERRUPTED = 130
 FAILED = 2
@@ -63,33 +66,54 @@ def open_streams() -> None:
         sys.stderr = io.TextIOWrapper(io.BufferedWriter(io.FileIO(2, "w", closefd=False)), line_buffering=True)
 
 
-@contextmanager
-def quiet_output() -> Iterator[TextIO]:
+class quiet_output:
     """Standard output, flushed at the end. A reader that went away ends the block, and no more.
 
     A character that the output's encoding lacks is written as an escape.
     """
-    out = sys.stdout
-    if isinstance(out, io.TextIOWrapper):
-        out.reconfigure(errors="backslashreplace")
-    try:
-        yield out
+
+    def __enter__(self) -> TextIO:
+        out = sys.stdout
+        if isinstance(out, io.TextIOWrapper):
+            out.reconfigure(errors="backslashreplace")
+        return out
+
+    def __exit__(
+        self, kind: type[BaseException] | None, error: BaseException | None, traceback: TracebackType | None
+    ) -> bool:
+        try:
+            if error is None:
+                sys.stdout.flush()
+        except BrokenPipeError:
+            _drop_output()
+        if isinstance(error, BrokenPipeError):
+            _drop_output()
+            return True
+        return False
+
+
+def bytes_writer(out: TextIO) -> Callable[[bytes | memoryview], object]:
+    """Writes UTF-8 to a text stream: as it is where that is the stream's encoding."""
+    if isinstance(out, io.TextIOWrapper) and out.encoding.lower().replace("_", "-") in ("utf-8", "utf8"):
         out.flush()
-    except BrokenPipeError:
-        _drop_output()
+        binary = out.buffer
+        return lambda data: binary.write(data)
+    return lambda data: out.write(str(data, "utf-8", "surrogatepass"))
 
 
 def _flush() -> None:
-    with suppress(ValueError):  # closed by whoever called
+    if sys.stdout is not None and not sys.stdout.closed:  # by whoever called
         sys.stdout.flush()
 
 
 def _drop_output() -> None:
     """Lets what is still buffered go nowhere: the interpreter flushes once more when it ends."""
-    with suppress(OSError, ValueError):
+    try:
         null = os.open(os.devnull, os.O_WRONLY)
         os.dup2(null, sys.stdout.fileno())
         os.close(null)
+    except (OSError, ValueError):
+        pass
 
 
 def _complain(error: OSError) -> None:

@@ -4,17 +4,24 @@ Answers are found by analysing files as they are now. An index only says which f
 that changed since it was made is analysed whatever it says. So an answer is never of yesterday, and never
 of a file that the index should not know of: what lies outside its folder is left out unless the caller
 names the folder.
+
+Little is loaded here (no typing, no collections), since a question that one types has to be answered before
+one notices.
 """
 
 from __future__ import annotations
 
 import os
-from collections.abc import Iterable, Iterator, Sequence
-from typing import NamedTuple
 
-from quillet.index.paths import Places, StoredPaths, stored_path
-from quillet.index.store import CLASS, FUNCTION, KINDS, read_index
+from quillet.index.store import KINDS, read_index
 from quillet.tarvex import _host
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Iterable, Iterator, Sequence
+    from typing import Any
+
+    from quillet.index.facts import Counts, FileFacts, FileRow, Hit
 
 _USES: dict[str, int] = _host.USES
 
@@ -52,79 +59,42 @@ FLAGS: tuple[str, ...] = _host.NAME_FLAG_WORDS
 _BYTES_A_THREAD = 1 << 19
 
 
-class Hit(NamedTuple):
-    """A record or an occurrence that answers a question. `path` is as stored; lines and columns count from 1.
-
-    `kind` is that of the record, and of an occurrence that no record tells of the kind of the record that
-    would, or its role. `role` is None where there is no occurrence of the name.
-    """
-
-    path: bytes
-    line: int
-    column: int
-    scope: str
-    name: str
-    kind: str
-    detail: str
-    is_parameter: bool
-    opens: int
-    role: str | None
-    flags: int
-
-
-class FileRow(NamedTuple):
-    """What is known of a file without a look at it. Without an index, only its path and size."""
-
-    number: int
-    path: bytes
-    size: int
-    mtime_ns: int
-    hash: int
-    lines: int
-    records: int
-    errors: int
-    problem: str | None
-
-
-class Query(NamedTuple):
+class Query:
     """A question for a name. `match` is exact, suffix or glob; no roles means all of them."""
 
-    name: str
-    match: str
-    roles: tuple[str, ...] = ()
-    returns: bool = False
-    scope: str | None = None
-    path: str | None = None
+    def __init__(
+        self,
+        name: str,
+        match: str,
+        roles: tuple[str, ...] = (),
+        returns: bool = False,
+        scope: str | None = None,
+        path: str | None = None,
+    ) -> None:
+        self.name = name
+        self.match = match
+        self.roles = roles
+        self.returns = returns
+        self.scope = scope
+        self.path = path
 
-    def native(self, *, with_lines: bool = False) -> _host.Question:
+    def but(self, **changes: Any) -> Query:
+        """The same question but for these parts."""
+        return Query(**{**self.__dict__, **changes})
+
+    def native(self) -> _host.Question:
+        """The question as the core takes it."""
         uses = 0
         for role in self.roles:
             uses |= ROLES[role]
         if not self.roles and not self.returns:
             uses = _ALL_USES
-        return _host.MakeQuestion(self.match, self.name, uses, self.returns, self.scope, with_lines)
+        return _host.MakeQuestion(self.match, self.name, uses, self.returns, self.scope, False)
 
 
-class FileFacts(NamedTuple):
-    """What a file says as it is now. `problem` says why it could not be analysed."""
-
-    row: FileRow
-    hits: list[Hit]
-    source_lines: list[bytes]  # of the hits, where they were asked for
-    errors: list[tuple[int, int, str]]
-    lines: int
-    problem: str | None
-
-
-class Counts(NamedTuple):
-    """Totals of files as they are now. `kinds` and `names` are the most frequent ones first."""
-
-    files: int
-    lines: int
-    records: int
-    errors: int
-    kinds: list[tuple[str, int]]
-    names: list[tuple[str, int]]
+# A file as the core has it: the fields of `FileRow`, of which these are looked at here.
+_PATH = 1
+_SIZE = 2
 
 
 class Sources:
@@ -139,8 +109,8 @@ class Sources:
         """All files, by path."""
         raise NotImplementedError
 
-    def candidates(self, question: _host.Question, /) -> list[FileRow]:
-        """The files that may answer."""
+    def candidates(self, question: _host.Question, /) -> Sequence[tuple[Any, ...]]:
+        """The files that may answer, each with the fields of a `FileRow`."""
         raise NotImplementedError
 
     def words_alike(self, word: str, /) -> list[str]:
@@ -159,40 +129,56 @@ class Sources:
 
     def find(self, query: Query) -> Iterator[Hit]:
         """The records that a question asks for, by path, line and column, as they are found."""
-        for facts in self.answers(query):
+        question = query.native()
+        for facts in self.facts(self._asked(query, question), question):
             yield from facts.hits
 
-    def answers(self, query: Query, *, with_lines: bool = False) -> Iterator[FileFacts]:
-        """The same a file, with the files that hold an answer alone."""
-        question = query.native(with_lines=with_lines)
+    def lines(self, query: Query, form: str, *, colours: bool = False) -> Iterator[tuple[str, int, bytes]]:
+        """The answers as they are shown: a file's path, how many places it has, and their lines.
+
+        `form` is places, long or json, or none for who counts. Files without an answer are passed over.
+        """
+        question = query.native()
+        native = _host.LinesFormat(question, form, colours, os.fsencode(self._working_folder))
+        for row, result in self.analysed(self._asked(query, question), native):
+            if result.problem is None:
+                places, lines = _host.LinesOf(result)
+                if places:
+                    yield self.shown_path(row[_PATH]), places, lines
+
+    def _asked(self, query: Query, question: _host.Question) -> Sequence[tuple[Any, ...]]:
         rows = self.candidates(question)
         if query.path is not None:
-            rows = [row for row in rows if is_like(self.shown_path(row.path), query.path)]
-        for facts in self.facts(rows, question):
-            if facts.hits:
-                yield facts
+            rows = [row for row in rows if is_like(self.shown_path(row[_PATH]), query.path)]
+        return rows
 
-    def facts(self, rows: list[FileRow], question: _host.Question | None = None) -> Iterator[FileFacts]:
+    def facts(self, rows: Iterable[tuple[Any, ...]], question: _host.Question | None = None) -> Iterator[FileFacts]:
         """What files say, one after the other, in their order: all records, or those that answer."""
+        from quillet.index.facts import FileFacts, FileRow, Hit
+
         for row, result in self.analysed(rows, question or self.everything()):
             problem = result.problem
-            hits, lines = ([], []) if problem is not None else _host.Answers(result, row.path, KINDS)
+            hits, lines = ([], []) if problem is not None else _host.Answers(result, row[_PATH], KINDS)
             errors = sorted([*result.errors, *result.reports])
-            yield FileFacts(row, list(map(Hit._make, hits)), lines, errors, result.line_count, problem)
+            found = list(map(Hit._make, hits))
+            yield FileFacts(FileRow._make(row), found, lines, errors, result.line_count, problem)
 
     @staticmethod
     def everything(*, with_lines: bool = False) -> _host.Question:
         """The question that all records of a file answer."""
         return _host.MakeQuestion("everything", "", _ALL_USES, False, None, with_lines)
 
-    def analysed(self, rows: list[FileRow], form: _host.Format) -> Iterator[tuple[FileRow, _host.FileResult]]:
+    def analysed(
+        self, rows: Iterable[tuple[Any, ...]], form: _host.Format
+    ) -> Iterator[tuple[tuple[Any, ...], _host.FileResult]]:
         """What a format writes of files, on as many threads as they are worth."""
         from quillet._languages import available_cores, decode_source, native_language_of
 
+        rows = list(rows)
         if not rows:
             return
-        inputs = [(os.fsencode(self.full_path(row.path)), None, None) for row in rows]
-        jobs = min(available_cores(), 1 + sum(row.size for row in rows) // _BYTES_A_THREAD)
+        inputs = [(os.fsencode(self.full_path(row[_PATH])), None, None) for row in rows]
+        jobs = min(available_cores(), 1 + sum(row[_SIZE] for row in rows) // _BYTES_A_THREAD)
         batch = _host.Batch(native_language_of(self.version), inputs, jobs, decode_source, form, False)
         try:
             while (result := batch.Next()) is not None:
@@ -227,10 +213,9 @@ class Index(Sources):
         stored = read_index(path)
         super().__init__(os.path.dirname(self.path), stored.settings.python)
         self._native = stored.native
-        self._places = Places(self.base, roots)
+        named = tuple(os.fsencode(os.path.abspath(root)) for root in roots)
+        self._places = _host.Places(os.fsencode(self.base), named)
         self._exclude = exclude
-        self._files: list[FileRow] | None = None
-        self.outside = 0
 
     def __enter__(self) -> Index:
         return self
@@ -239,32 +224,23 @@ class Index(Sources):
         pass
 
     def files(self) -> list[FileRow]:
-        """All files that may be shown, by path. `outside` counts the others behind it."""
-        if self._files is None:
-            rows = list(map(FileRow._make, self._native.Files()))
-            self._files = [row for row in rows if self._places.path_of(row.path) is not None]
-            self.outside = len(rows) - len(self._files)
-        return [row for row in self._files if self._places.holds(self.full_path(row.path))]
+        """All files that may be shown, by path."""
+        from quillet.index.facts import FileRow
 
-    def candidates(self, question: _host.Question, /) -> list[FileRow]:
-        self.files()
-        wanted = set(self._native.FilesFor(question))
-        found = []
-        for row in self._files or ():
-            path = self.full_path(row.path)
-            try:
-                status = os.stat(path)
-            except OSError:
-                continue  # gone since
-            if row.number not in wanted and is_as_known(path, status, row):
-                continue
-            if self._places.holds(path):
-                found.append(row._replace(size=status.st_size))
+        return list(map(FileRow._make, self._native.FilesIn(self._places)))
+
+    @property
+    def outside(self) -> int:
+        """The number of files whose paths lead to where nothing may be shown."""
+        return self._native.Outside(self._places)
+
+    def candidates(self, question: _host.Question, /) -> Sequence[tuple[Any, ...]]:
+        found: Sequence[tuple[Any, ...]] = self._native.CandidatesIn(question, self._places)
         if self._exclude:
             from quillet.cli.files import Exclusion
 
             exclusion = Exclusion(self._exclude)
-            found = [row for row in found if not exclusion.excludes(row.path.lstrip(b"/"))]
+            found = [row for row in found if not exclusion.excludes(row[_PATH].lstrip(b"/"))]
         return found
 
     def words_alike(self, word: str, /) -> list[str]:
@@ -272,6 +248,8 @@ class Index(Sources):
 
     def file(self, path: str) -> FileRow | None:
         """A file by a path as a person names it, or None where the index does not have it."""
+        from quillet.index.paths import stored_path
+
         stored = stored_path(path, self.base)
         return next((row for row in self.files() if row.path == stored), None)
 
@@ -290,6 +268,8 @@ class Index(Sources):
 
     def counts_now(self, names: int) -> Counts:
         """Totals of the files as they are now, with so many of the names that most records are of."""
+        from quillet.index.facts import Counts
+
         sums = _host.RecordCounts()
         files = lines = errors = 0
         for _, result in self.analysed(self.files(), _host.CountsFormat()):
@@ -317,6 +297,8 @@ class Folder(Sources):
 
     def files(self) -> list[FileRow]:
         from quillet.cli.files import find_files
+        from quillet.index.facts import row_of
+        from quillet.index.paths import StoredPaths
 
         stored = StoredPaths(self.base)
         sizes = {}
@@ -328,29 +310,11 @@ class Folder(Sources):
                     continue
         return [row_of(path, sizes[path], number) for number, path in enumerate(sorted(sizes))]
 
-    def candidates(self, _: _host.Question, /) -> list[FileRow]:
+    def candidates(self, _: _host.Question, /) -> Sequence[tuple[Any, ...]]:
         return self.files()
 
     def words_alike(self, _: str, /) -> list[str]:
         return []
-
-
-def row_of(path: bytes, size: int = 0, number: int = 0) -> FileRow:
-    """A file of which nothing is known but that it is there."""
-    return FileRow(number, path, size, 0, 0, 0, 0, 0, None)
-
-
-def is_as_known(path: str, status: os.stat_result, row: FileRow) -> bool:
-    """Whether a file's content is what it was: by size and time, and for another time by its hash."""
-    if row.size != status.st_size:
-        return False
-    if row.mtime_ns == status.st_mtime_ns:
-        return True
-    try:
-        with open(path, "rb") as file:
-            return _host.HashOfSource(file.read()) == row.hash
-    except OSError:
-        return False
 
 
 def is_like(path: str, pattern: str) -> bool:
@@ -359,31 +323,6 @@ def is_like(path: str, pattern: str) -> bool:
 
     path = path.replace(os.sep, "/")
     return fnmatchcase(path, pattern) or fnmatchcase(path, f"*/{pattern}")
-
-
-def definitions_in(hits: Iterable[Hit], *, imports: bool = False) -> list[Hit]:
-    """What a file defines, out of its records: its classes and functions, and the names set in its module
-    and classes; names that an import binds are another file's, and come with `imports`.
-    """
-    hits = list(hits)
-    imported = {} if imports else imports_in(hits)
-    inside = {""}
-    found = []
-    for hit in hits:
-        if hit.opens == CLASS:
-            inside.add(f"{hit.scope}.{hit.name}" if hit.scope else hit.name)
-        if hit.kind != "set" or hit.is_parameter or (hit.line, hit.column) in imported:
-            continue
-        if hit.opens in (CLASS, FUNCTION) or hit.scope in inside:
-            found.append(hit)
-    return found
-
-
-def imports_in(hits: Iterable[Hit]) -> dict[tuple[int, int], str]:
-    """The places where an import binds a name, by line and column, and whether it names a module or what is in
-    one: "import" or "from_import".
-    """
-    return {(hit.line, hit.column): hit.kind for hit in hits if hit.kind in ("import", "from_import")}
 
 
 def match_of(name: str) -> str:

@@ -1,23 +1,21 @@
-"""The file of an index: how it is found, read and written, and who may write it.
+"""The file of an index: how it is found and read.
 
 The file says which files hold which words; the core makes and reads its bytes, and docs/index.md
-describes them. It is written beside itself and then put in its place, so whatever moment a run ends at,
-the index is the old one or the new one, and who asks never waits. One run writes at a time, by a lock on
-a file beside the index that the system drops with the process. The trap: an index may have come with a
-repository that somebody else made. No link is followed where something is written, and what the file says
-is only ever a hint where to look.
+describes them. What it says is only ever a hint where to look, since it may have come with a repository that
+somebody else made.
+
+Little is loaded here, since a question that one types has to be answered before one notices.
 """
 
 from __future__ import annotations
 
 import os
-import stat
-import sys
-from collections.abc import Callable, Iterator
-from contextlib import contextmanager, suppress
-from typing import NamedTuple
 
 from quillet.tarvex import _host
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from types import TracebackType
 
 DEFAULT_NAME = ".quillet-index"
 # The kinds of records in the order in which the core numbers them.
@@ -42,21 +40,30 @@ class StaleIndex(IndexProblem):
     """An index that a run makes anew: damaged, or of another version."""
 
 
-class Settings(NamedTuple):
-    """What the last run was asked to do."""
+class Settings:
+    """What the last run was asked to do. `roots` are as the index keeps paths."""
 
-    roots: tuple[str, ...]  # as the index keeps paths
-    python: tuple[int, int]
-    gitignore: bool
-    made_by: str
-    exclude: tuple[str, ...] = ()
+    def __init__(
+        self,
+        roots: tuple[str, ...],
+        python: tuple[int, int],
+        gitignore: bool,
+        made_by: str,
+        exclude: tuple[str, ...] = (),
+    ) -> None:
+        self.roots = roots
+        self.python = python
+        self.gitignore = gitignore
+        self.made_by = made_by
+        self.exclude = exclude
 
 
-class Stored(NamedTuple):
+class Stored:
     """An index as it lies in its file."""
 
-    native: _host.NameIndex
-    settings: Settings
+    def __init__(self, native: _host.NameIndex, settings: Settings) -> None:
+        self.native = native
+        self.settings = settings
 
 
 def find_index(start: str = ".") -> str:
@@ -95,57 +102,20 @@ def read_index(path: str) -> Stored:
         raise StaleIndex(f"{path}: the index is damaged; make it anew with: quillet index") from error
 
 
-def write_index(path: str, writer: _host.NameIndexWriter, settings: Settings) -> None:
-    """Puts a new index in the place of an old one. The caller holds the lock. Raises `IndexProblem`."""
-    data = writer.Finish(settings_text(settings))
-    unfinished = path + ".new"
-    with explained(path):
-        with suppress(FileNotFoundError):
-            os.unlink(unfinished)
-        # Made here and now, so that it is no link to somewhere else.
-        descriptor = os.open(unfinished, os.O_WRONLY | os.O_CREAT | os.O_EXCL | _NO_FOLLOW, 0o666)
-        try:
-            with open(descriptor, "wb") as file:
-                file.write(data)
-            os.replace(unfinished, path)
-        except BaseException:
-            os.unlink(unfinished)
-            raise
-
-
-def check_place(path: str) -> None:
-    """Raises `IndexProblem` where no index can be written at a path, or should not."""
-    folder = os.path.dirname(os.path.abspath(path))
-    if not os.path.isdir(folder):
-        raise IndexProblem(f"{path}: there is no folder {folder} to hold the index")
-    with explained(path):
-        try:
-            mode = os.lstat(path).st_mode
-        except FileNotFoundError:
-            return
-    if stat.S_ISDIR(mode):
-        raise IndexProblem(f"{path}: is a folder; name a file with -o")
-    if stat.S_ISLNK(mode):
-        raise IndexProblem(f"{path}: is a link, which is not followed; delete it, or name a file with -o")
-    if not stat.S_ISREG(mode):
-        raise IndexProblem(f"{path}: is no index of quillet; name another file with -o, or delete this one")
-
-
-def engine_mark() -> str:
-    """What tells one build of the engine from another, whose words of a file may be others."""
-    from quillet import tarvex
-
-    status = os.stat(tarvex.__file__ or sys.executable)
-    return f"{status.st_size}-{status.st_mtime_ns}"
-
-
-@contextmanager
-def explained(path: str) -> Iterator[None]:
+class explained:
     """Turns what the system says of a bad file into an `IndexProblem`."""
-    try:
-        yield
-    except OSError as error:
-        raise IndexProblem(f"{path}: {error.strerror or error}") from error
+
+    def __init__(self, path: str) -> None:
+        self._path = path
+
+    def __enter__(self) -> None:
+        pass
+
+    def __exit__(
+        self, kind: type[BaseException] | None, error: BaseException | None, traceback: TracebackType | None
+    ) -> None:
+        if isinstance(error, OSError):
+            raise IndexProblem(f"{self._path}: {error.strerror or error}") from error
 
 
 def settings_text(settings: Settings) -> bytes:
@@ -163,61 +133,3 @@ def _settings_of(text: bytes) -> Settings:
         raise ValueError("a version that there is not")
     patterns = tuple(exclude.split("\n")) if exclude else ()
     return Settings(tuple(roots), python, gitignore == "1", made_by, patterns)
-
-
-# ---- the lock ----
-
-_NO_FOLLOW = getattr(os, "O_NOFOLLOW", 0) | getattr(os, "O_BINARY", 0) | getattr(os, "O_CLOEXEC", 0)
-
-
-@contextmanager
-def write_lock(path: str, waiting: Callable[[], None]) -> Iterator[None]:
-    """Waits until no other run writes the index; `waiting` is called once where there is one.
-
-    The lock is on a file beside the index, which stays: to delete it would give two runs a lock each.
-    """
-    lock = path + ".lock"
-    with explained(lock):
-        if os.path.islink(lock):
-            raise IndexProblem(f"{lock}: is a link, which is not followed; delete it")
-        # A pipe must not be waited for.
-        flags = os.O_RDWR | os.O_CREAT | _NO_FOLLOW | getattr(os, "O_NONBLOCK", 0)
-        file = os.open(lock, flags, 0o666)
-    try:
-        if not stat.S_ISREG(os.fstat(file).st_mode):
-            raise IndexProblem(f"{lock}: is no file; delete it")
-        if not _try_lock(file):
-            waiting()
-            _wait_for_lock(file)
-        yield
-    finally:
-        os.close(file)
-
-
-if sys.platform == "win32":
-    import msvcrt
-    import time
-
-    def _try_lock(file: int) -> bool:
-        try:
-            msvcrt.locking(file, msvcrt.LK_NBLCK, 1)
-        except OSError:
-            return False
-        return True
-
-    def _wait_for_lock(file: int) -> None:
-        while not _try_lock(file):
-            time.sleep(0.05)
-
-else:
-    import fcntl
-
-    def _try_lock(file: int) -> bool:
-        try:
-            fcntl.flock(file, fcntl.LOCK_EX | fcntl.LOCK_NB)
-        except BlockingIOError:
-            return False
-        return True
-
-    def _wait_for_lock(file: int) -> None:
-        fcntl.flock(file, fcntl.LOCK_EX)

@@ -15,7 +15,8 @@ from typing import NamedTuple
 
 from quillet._batch import FileAnalysis, FileRecords, TextNumbers, analyze_files
 from quillet.index.source import content_hash
-from quillet.index.store import KINDS, IndexProblem, check_place, engine_mark, explained
+from quillet.index.store import KINDS, IndexProblem, explained
+from quillet.index.writing import check_place, engine_mark
 
 APPLICATION_ID = 0x51554C54  # "QULT"
 SCHEMA = 1

@@ -11,7 +11,8 @@ from __future__ import annotations
 import os
 from collections.abc import Iterator
 
-from quillet.index.questions import Hit, Index, definitions_in, imports_in
+from quillet.index.facts import Hit, definitions_in, imports_in
+from quillet.index.questions import Index
 from quillet.index.store import CLASS, FUNCTION
 
 _PSEUDO_TAGS = (

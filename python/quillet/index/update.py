@@ -17,20 +17,12 @@ from typing import NamedTuple
 
 from quillet._languages import available_cores, decode_source, native_language_of
 from quillet.cli.files import find_files, problem_of
+from quillet.index.facts import FileRow
 from quillet.index.git import keep_out_of_git
 from quillet.index.paths import StoredPaths, full_path, is_below, stored_path
-from quillet.index.questions import FileRow, is_as_known
-from quillet.index.store import (
-    IndexProblem,
-    StaleIndex,
-    Stored,
-    check_place,
-    engine_mark,
-    read_index,
-    write_index,
-    write_lock,
-)
+from quillet.index.store import IndexProblem, StaleIndex, Stored, read_index, settings_text
 from quillet.index.store import Settings as StoredSettings
+from quillet.index.writing import check_place, engine_mark, write_index, write_lock
 from quillet.tarvex import _host
 
 # A change within this time of the last one could leave size and time as they are.
@@ -189,7 +181,7 @@ class _Run:
                 kept.append((row, row.size, row.mtime_ns))
 
         records = sum(row.records for row, _, _ in kept)
-        is_same = self._stored is not None and self._stored.settings == self._settings
+        is_same = self._stored is not None and self._stored.native.settings == settings_text(self._settings)
         if changed or gone or not is_same or any(row[2:4] != (size, time) for row, size, time in kept):
             for row, size, mtime_ns in kept:
                 writer.Keep(self._stored.native, row.number, size, mtime_ns)  # type: ignore[union-attr]
@@ -230,8 +222,10 @@ class _Run:
             return True
         if row.problem is not None:
             return False
-        with suppress(OSError):
-            return is_as_known(candidate.path, os.stat(candidate.path), row._replace(mtime_ns=_UNTRUSTED))
+        if candidate.size != row.size:
+            return False
+        with suppress(OSError), open(candidate.path, "rb") as file:
+            return _host.HashOfSource(file.read()) == row.hash
         return False
 
     def _gone(self, unseen: dict[bytes, FileRow]) -> Iterator[bytes]:

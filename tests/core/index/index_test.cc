@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "foundations/errors.h"
+#include "index/answer_lines.h"
 #include "index/bytes.h"
 #include "index/counts.h"
 #include "index/name_index.h"
@@ -30,7 +31,7 @@ std::string Written(FileWriter& writer, Text source) {
   file.Analyze(source);
   scopes.Build(file);
   std::string out;
-  writer.Write(BatchInput{}, file, scopes, placed, out);
+  writer.Write(BatchInput{"t.py", {}, {}}, file, scopes, placed, out);
   return out;
 }
 
@@ -176,7 +177,7 @@ Question QuestionFor(Match match, Text name, Uses uses = kAllUses) {
 
 // The answers as "line:column name", in their order.
 std::vector<std::string> AnswersIn(Text source, const Question& question) {
-  const auto writer = MakeQuestionWriter(question, testing::kPy3);
+  const auto writer = MakeQuestionWriter(question, testing::kPy3, MakeAnswerBytes(false));
   std::vector<std::string> found;
   EXPECT_TRUE(ReadAnswers(Written(*writer, source), [&](const Answer& answer, Text) {
     found.push_back(std::to_string(answer.line) + ":" + std::to_string(answer.column) + " " + std::string(answer.name));
@@ -242,10 +243,9 @@ TEST(Questions, StayInAScope) {
 }
 
 TEST(Questions, HandOnTheSourceLineCutWhereItIsLong) {
-  Question question = QuestionFor(Match::kExact, "x");
-  question.with_lines = true;
+  const Question question = QuestionFor(Match::kExact, "x");
   const std::string source = "x = 1; x = 2\r\ny\nx = '" + std::string(9000, 'a') + "'";
-  const auto writer = MakeQuestionWriter(question, testing::kPy3);
+  const auto writer = MakeQuestionWriter(question, testing::kPy3, MakeAnswerBytes(true));
   std::vector<std::string> lines;
   const std::string written = Written(*writer, source);
   ASSERT_TRUE(ReadAnswers(written, [&](const Answer&, Text line) { lines.emplace_back(line); }));
@@ -255,6 +255,73 @@ TEST(Questions, HandOnTheSourceLineCutWhereItIsLong) {
   EXPECT_EQ(lines.back().size(), 4096u);
   EXPECT_FALSE(ReadAnswers("", [](const Answer&, Text) {}));
   EXPECT_FALSE(ReadAnswers(Text(written).substr(2), [](const Answer&, Text) {}));
+}
+
+// ---- lines ----
+
+using Form = AnswerLinesOptions::Form;
+
+AnswerLinesOptions LinesAs(Form form) { return {form, false, {}}; }
+
+// The lines of a question's answers, and the number of their places in front of them.
+std::string LinesIn(Text source, const Question& question, const AnswerLinesOptions& options) {
+  const auto writer = MakeQuestionWriter(question, testing::kPy3, MakeAnswerLines(options));
+  const std::string written = Written(*writer, source);
+  const std::optional<AnswerLines> lines = ReadAnswerLines(written);
+  return lines ? std::to_string(lines->place_count) + "\n" + std::string(lines->lines) : "none";
+}
+
+TEST(AnswersAsLines, ArePlacesWithTheirSource) {
+  const Question question = QuestionFor(Match::kExact, "a");
+  EXPECT_EQ(LinesIn("  a = a\t \n", question, {}), "2\nt.py:1:3: a = a\nt.py:1:7: a = a\n");
+  EXPECT_EQ(LinesIn("b\n", question, {}), "0\n");
+  EXPECT_EQ(LinesIn("a = a", question, LinesAs(Form::kNone)), "2\n");
+  EXPECT_EQ(LinesIn("a", question, {Form::kPlaces, false, "t."}), "1\npy:1:1: a\n");
+  EXPECT_EQ(LinesIn("a", question, {Form::kPlaces, true, {}}), "1\n\x1b[36mt.py:1:1:\x1b[0m a\n");
+}
+
+TEST(AnswersAsLines, AreSafeAndCutWhereTheyAreLong) {
+  const Question question = QuestionFor(Match::kExact, "a");
+  const std::string long_line = "a = '" + std::string(300, 'x') + "'";
+  EXPECT_EQ(LinesIn(long_line, question, {}), "1\nt.py:1:1: " + long_line.substr(0, 159) + "\xE2\x80\xA6\n");
+  const std::string wide = "a = '" + std::string(155, 'x') + "\xC3\xBC\xC3\xBC'";
+  EXPECT_EQ(LinesIn(wide, question, {}), "1\nt.py:1:1: " + wide.substr(0, 159) + "\xE2\x80\xA6\n");
+  EXPECT_EQ(LinesIn("a = '\x1b[0m'", question, {}), "1\nt.py:1:1: a = '\\x1b[0m'\n");
+  EXPECT_EQ(LinesIn("a = '\xC3\xBC'", question, {}), "1\nt.py:1:1: a = '\xC3\xBC'\n");
+}
+
+TEST(AnswersAsLines, SayWhatIsSaidOfTheName) {
+  const Text source = "def f(a: int):\n  del a\n  g(a=a.b(1))\n  import a.c\n";
+  EXPECT_EQ(LinesIn(source, QuestionFor(Match::kExact, "a"), LinesAs(Form::kLong)),
+            "5\n"
+            "t.py:1:7: def f(a: int):\n"
+            "    a  parameter  in f\n"
+            "    a  hint int  in f\n"
+            "t.py:2:7: del a\n"
+            "    a  read  in f\n"
+            "t.py:3:5: g(a=a.b(1))\n"
+            "    a  passed as a keyword  in f\n"
+            "t.py:3:7: g(a=a.b(1))\n"
+            "    a  read  in f\n"
+            "t.py:4:10: import a.c\n"
+            "    a  set  in f\n"
+            "    a  import a  in f\n");
+  EXPECT_EQ(LinesIn(source, QuestionFor(Match::kExact, "a", UseOfRole(NameRole::kDelete)), LinesAs(Form::kLong)),
+            "1\nt.py:2:7: del a\n    a  deleted  in f\n");
+}
+
+TEST(AnswersAsLines, AreObjectsForPrograms) {
+  const std::string line =
+      LinesIn("@o.a\nclass C: 'q\xC3\xBC'", QuestionFor(Match::kExact, "o.a", kDecoratorUse), LinesAs(Form::kJson));
+  EXPECT_EQ(line,
+            "1\n{\"type\":\"record\",\"path\":\"t.py\",\"line\":1,\"column\":2,\"scope\":\"\",\"name\":\"o.a\","
+            "\"kind\":\"get\",\"detail\":\"\",\"is_parameter\":false,\"source\":\"@o.a\",\"changed\":false,"
+            "\"role\":\"read\",\"flags\":[\"decorator\"],\"receiver\":\"o\"}\n");
+}
+
+TEST(AnswersAsLines, AreToldFromOtherBytes) {
+  EXPECT_FALSE(ReadAnswerLines("").has_value());
+  EXPECT_FALSE(ReadAnswerLines("1234567").has_value());
 }
 
 // ---- the index ----
