@@ -1,4 +1,4 @@
-"""What all tests of the package share: the scripts as modules, and the flag that rewrites golden files."""
+"""What all tests of the package share: scripts and benchmarks as modules, and the flag that rewrites golden files."""
 
 from __future__ import annotations
 
@@ -8,7 +8,9 @@ from pathlib import Path
 
 import pytest
 
-sys.path.insert(0, str(Path(__file__).resolve().parent.parent.parent / "scripts"))
+ROOT = Path(__file__).resolve().parent.parent.parent
+sys.path.insert(0, str(ROOT / "scripts"))
+sys.path.append(str(ROOT))
 
 # A run behind nohup or "&" may have been started with interrupts ignored, and so would be what the tests
 # start, some of which they interrupt.

@@ -1,0 +1,319 @@
+"""What answers cost in a real project: the workspace, and language servers beside it, in one table.
+
+Each is started afresh with nothing prepared, is held to one core (`--all-cores`: not), and is asked one question at a
+time. First answers are counted from the start of the process, for the workspace that of Python included. Warm ones are
+asked in files where other names have been asked before; of the workspace the time is that of the call, of a server
+until its answer has come. A keystroke puts a letter into a buffer of about 2,600 lines and asks for its problems and
+its outline; a server that does not let itself be asked for problems is asked for the outline alone, which is marked.
+"""
+
+from __future__ import annotations
+
+import argparse
+import json
+import os
+import random
+import re
+import shutil
+import statistics
+import subprocess
+import sys
+import tempfile
+import time
+from collections import Counter
+from collections.abc import Callable, Sequence
+from pathlib import Path
+from typing import NamedTuple, Protocol
+
+from bench.truth.engine import ByteColumn
+from bench.truth.lsp import LanguageServer, Refused, Usage
+from bench.truth.peers import AddPeers, Start
+from bench.truth.places import Cut, Place, ReadText
+from bench.truth.projects import HOW_TO_GET, OTHER, OWN, PLAIN, Name, Names, SourceFiles
+
+OWN_NAME = "quillet"
+
+
+class Subject(Protocol):
+    """What is measured. Each question gives the seconds that it took, and how many results it had."""
+
+    usage: Usage
+
+    def Open(self, path: str) -> None: ...
+
+    def Definitions(self, place: Place) -> tuple[float, int]: ...
+
+    def References(self, place: Place) -> tuple[float, int]: ...
+
+    def Complete(self, place: Place) -> tuple[float, int]: ...
+
+    def Keystroke(self, place: Place) -> tuple[float, int]:
+        """Puts a letter there, and asks for problems and outline. 1: both were given."""
+
+    def Stop(self) -> None: ...
+
+
+class OwnProcess:
+    """quillet.Workspace in a process of its own."""
+
+    def __init__(self, folder: Path, *, one_core: bool) -> None:
+        core = ["taskset", "-c", str(min(os.sched_getaffinity(0)))] if one_core else []
+        self._process = subprocess.Popen(
+            [*core, sys.executable, "-m", "bench.truth.own_process", str(folder)],
+            stdin=subprocess.PIPE,
+            stdout=subprocess.PIPE,
+            text=True,
+            start_new_session=True,
+        )
+        self.usage = Usage(self._process.pid)
+
+    def _Ask(self, *calls: Sequence[object]) -> tuple[float, int]:
+        assert self._process.stdin is not None
+        assert self._process.stdout is not None
+        self._process.stdin.write(json.dumps(calls) + "\n")
+        self._process.stdin.flush()
+        line = self._process.stdout.readline()
+        if not line:
+            raise SystemExit("the workspace's process has ended")
+        seconds, counts = json.loads(line)
+        return seconds, counts[-1]
+
+    @staticmethod
+    def _At(place: Place) -> tuple[str, int, int]:
+        line = Cut(ReadText(place.path))[place.line - 1]
+        return place.path, place.line, ByteColumn(line, place.column)
+
+    def Open(self, path: str) -> None:
+        self._Ask(("open", path, ReadText(path)))
+
+    def Definitions(self, place: Place) -> tuple[float, int]:
+        return self._Ask(("definitions", *self._At(place)))
+
+    def References(self, place: Place) -> tuple[float, int]:
+        return self._Ask(("references", *self._At(place)))
+
+    def Complete(self, place: Place) -> tuple[float, int]:
+        return self._Ask(("complete", *self._At(place)))
+
+    def Keystroke(self, place: Place) -> tuple[float, int]:
+        path, line, column = self._At(place)
+        edit = (path, line, column, column, "q")
+        seconds, _ = self._Ask(("change", path, [edit]), ("problems", path), ("outline", path))
+        return seconds, 1
+
+    def Stop(self) -> None:
+        assert self._process.stdin is not None
+        self.usage.Look()
+        self._process.stdin.close()
+        self._process.wait()
+
+
+class Server:
+    """A language server."""
+
+    def __init__(self, name: str, folder: Path, *, one_core: bool) -> None:
+        self._server: LanguageServer = Start(name, folder, one_core=one_core)
+        self.usage = self._server.usage
+        self._gives_problems = True
+
+    @staticmethod
+    def _Timed(question: Callable[[], Sequence[object]]) -> tuple[float, int]:
+        start = time.perf_counter()
+        count = len(question())
+        return time.perf_counter() - start, count
+
+    def Open(self, path: str) -> None:
+        self._server.Open(path)
+
+    def Definitions(self, place: Place) -> tuple[float, int]:
+        return self._Timed(lambda: self._server.Definitions(place))
+
+    def References(self, place: Place) -> tuple[float, int]:
+        return self._Timed(lambda: self._server.References(place))
+
+    def Complete(self, place: Place) -> tuple[float, int]:
+        return self._Timed(lambda: self._server.Complete(place))
+
+    def Keystroke(self, place: Place) -> tuple[float, int]:
+        start = time.perf_counter()
+        self._server.Type(place.path, place, "q")
+        if self._gives_problems:
+            try:
+                self._server.Problems(place.path)
+            except Refused:
+                self._gives_problems = False
+        self._server.Outline(place.path)
+        return time.perf_counter() - start, int(self._gives_problems)
+
+    def Stop(self) -> None:
+        self._server.Stop()
+
+
+class Questions(NamedTuple):
+    """What each subject is asked."""
+
+    symbol: Place
+    use: Place
+    before: list[Place]
+    definitions: list[Place]
+    completions: list[Place]
+    references: list[Place]
+    keystroke: Place
+
+
+def Choose(folder: Path, symbol: str | None, seed: int) -> Questions:
+    """The questions of a project. Without `symbol` (FILE:NAME), the function that most is asked of."""
+    pick = random.Random(seed)
+    files = SourceFiles(folder)
+    names = {path: list(Names(path)) for path in files}
+    defined: Counter[str] = Counter()
+    used: Counter[str] = Counter()
+    functions: dict[str, Name] = {}
+    for found in names.values():
+        for name in found:
+            if name.role in ("definition", "write") and name.scope_kind != "function":
+                defined[name.text] += 1
+                if name.kind == "function" and name.scope_kind == "module":
+                    functions[name.text] = name
+            elif name.role in ("read", "call") and name.group == PLAIN:
+                used[name.text] += 1
+    once = sorted((name for name in functions if defined[name] == 1), key=lambda name: -used[name])
+    if symbol is None:
+        definition = functions[once[0]]
+    else:
+        file, _, text = symbol.rpartition(":")
+        definition = next(each for each in names[folder / file] if each.text == text and each.role == "definition")
+    use = next(
+        each
+        for path in pick.sample(files, len(files))
+        if str(path) != definition.place.path
+        for each in names[path]
+        if each.text == definition.text and each.role == "call" and each.group == PLAIN
+    )
+    large = [path for path in files if sum(name.role in ("read", "call") for name in names[path]) > 60]
+    before, definitions, completions = [], [], []
+    for path in pick.sample(large, min(20, len(large))):
+        asked = pick.sample([name for name in names[path] if name.role in ("read", "call")], 20)
+        before += [name.place for name in asked[:10]]
+        definitions += [name.place for name in asked[10:]]
+        dotted = [name.place for name in names[path] if name.group in (OWN, OTHER)]
+        completions += pick.sample(dotted, min(10, len(dotted)))
+    others = [functions[name].place for name in once[:40] if functions[name].place != definition.place]
+    big = min(files, key=lambda path: abs(len(Cut(ReadText(path))) - 2600))
+    inside = [
+        name for name in names[big] if name.role == "read" and name.group == PLAIN and name.scope_kind == "function"
+    ]
+    return Questions(
+        definition.place,
+        use.place,
+        before,
+        definitions,
+        completions,
+        pick.sample(others, 10),
+        pick.choice(inside).place,
+    )
+
+
+def Measure(start: Callable[[], Subject], questions: Questions) -> dict[str, str]:
+    """A row of the table. A first answer gets a process of its own."""
+    row: dict[str, str] = {}
+    for what, place, opened in (
+        ("first definition", questions.use, questions.use.path),
+        ("first references", questions.symbol, questions.symbol.path),
+    ):
+        begin = time.perf_counter()
+        subject = start()
+        try:
+            subject.Open(opened)
+            ask = subject.Definitions if what == "first definition" else subject.References
+            _, count = ask(place)
+            wall = time.perf_counter() - begin
+            usage = subject.usage.Look()
+            row[what] = f"{wall:.2f} s ({count})"
+            row["its processor"] = f"{usage.seconds:.2f} s"
+            row["memory"] = f"{usage.peak_kib / 1024:.0f} MiB"
+            if what == "first definition":
+                row["the definition's processor"] = row.pop("its processor")
+                row["the definition's memory"] = row.pop("memory")
+            else:
+                row.update(_Warm(subject, questions))
+        finally:
+            subject.Stop()
+    return row
+
+
+def _Warm(subject: Subject, questions: Questions) -> dict[str, str]:
+    row = {}
+    for path in sorted({place.path for place in questions.before}):
+        subject.Open(path)
+    for place in questions.before:
+        subject.Definitions(place)
+    row["definitions"] = _Spread([subject.Definitions(place)[0] for place in questions.definitions])
+    for place in questions.completions[::10]:
+        subject.Complete(place)
+    row["completions"] = _Spread([subject.Complete(place)[0] for place in questions.completions])
+    row["references"] = _Spread([subject.References(place)[0] for place in questions.references])
+    if questions.keystroke.path not in {place.path for place in questions.before}:
+        subject.Open(questions.keystroke.path)
+    strokes = [subject.Keystroke(questions.keystroke) for _ in range(21)][1:]
+    both = all(given for _, given in strokes)
+    row["keystroke"] = _Spread([seconds for seconds, _ in strokes]) + ("" if both else " (outline only)")
+    return row
+
+
+def _Spread(seconds: list[float]) -> str:
+    """The median and the 99th percentile."""
+    ordered = sorted(seconds)
+    high = ordered[min(len(ordered) - 1, round(0.99 * len(ordered)))]
+    return f"{statistics.median(ordered) * 1000:.1f} / {high * 1000:.1f} ms"
+
+
+def Copies(project: Path, count: int, into: Path) -> None:
+    """Puts renamed copies of a project's package side by side: `sympy` becomes `sympy1`, `sympy2` and so on."""
+    package = max((path.parent for path in project.glob("*/__init__.py")), key=lambda path: len(SourceFiles(path)))
+    word = re.compile(rf"\b{re.escape(package.name)}\b")
+    for number in range(1, count + 1):
+        name = f"{package.name}{number}"
+        shutil.copytree(package, into / name)
+        for path in SourceFiles(into / name):
+            text = path.read_bytes().decode("utf-8", "surrogateescape")
+            path.write_bytes(word.sub(name, text).encode("utf-8", "surrogateescape"))
+
+
+def AddTo(commands: argparse._SubParsersAction[argparse.ArgumentParser]) -> None:
+    parser = commands.add_parser("speed", help="what answers cost", description=__doc__)
+    parser.add_argument("--project", type=Path, required=True, metavar="FOLDER", help=f"a project: {HOW_TO_GET}")
+    parser.add_argument("--symbol", metavar="FILE:NAME", help="whose references are asked; of copies the file in one")
+    parser.add_argument("--copies", type=int, default=0, help="ask in so many renamed copies of the project's package")
+    parser.add_argument("--all-cores", action="store_true")
+    parser.add_argument("--without", action="store_true", help="measure the servers alone")
+    parser.add_argument("--seed", type=int, default=1)
+    AddPeers(parser, "ty,basedpyright,pyrefly,zuban,jedi")
+    parser.set_defaults(run=Run)
+
+
+def Run(options: argparse.Namespace) -> int:
+    with tempfile.TemporaryDirectory() as name:
+        folder = options.project.resolve()
+        if options.copies:
+            Copies(folder, options.copies, Path(name))
+            folder = Path(name).resolve()
+        lines = sum(len(Cut(ReadText(path))) for path in SourceFiles(folder))
+        questions = Choose(folder, options.symbol, options.seed)
+        symbol = Path(questions.symbol.path).relative_to(folder)
+        print(f"{options.project.name}, {lines:,} lines; the symbol is at {symbol}:{questions.symbol.line}", flush=True)
+        one_core = not options.all_cores
+        subjects: dict[str, Callable[[], Subject]] = {}
+        if not options.without:
+            subjects[OWN_NAME] = lambda: OwnProcess(folder, one_core=one_core)
+        for peer in options.peers:
+            subjects[peer] = lambda peer=peer: Server(peer, folder, one_core=one_core)  # type: ignore[misc]
+        rows = {}
+        for subject, start in subjects.items():
+            rows[subject] = Measure(start, questions)
+            print(f"{subject}: {rows[subject]}", flush=True)
+    heads = list(next(iter(rows.values())))
+    print(f"\n| | {' | '.join(rows)} |\n| --- |{' ---: |' * len(rows)}")
+    for head in heads:
+        print(f"| {head} | {' | '.join(row.get(head, '') for row in rows.values())} |")
+    return 0
