@@ -131,7 +131,7 @@ class BatchAnalyzer::Worker {
     if (bytes.size() > SourceText::kMaxSize) return "the source is too large";
 
     reports_of_thread = {&file_, &result.reports};
-    file_.Analyze(bytes);
+    file_.Analyze(bytes, writer_ != nullptr ? writer_->row_filter() : nullptr);
     Describe(result);
     scopes_.Build(file_);
     if (writer_ != nullptr)

@@ -68,6 +68,8 @@ class FileWriter {
   virtual ~FileWriter() = default;
   virtual void Write(const BatchInput& input, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
                      std::string& out) = 0;
+  // Of the rows that it wants to see analysed; without one, all.
+  virtual RowFilter* row_filter() { return nullptr; }
 };
 
 // Binds the names of a file that was analysed; each thread has one.

@@ -67,7 +67,7 @@ CPGenAnalyzerImpl& FileAnalyzer::AnalyzerForSource() {
   return *print_function_analyzer_;
 }
 
-void FileAnalyzer::Analyze(Text bytes) {
+void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   Reset(bytes);
   Cut();
   CPGenAnalyzerImpl& analyzer = AnalyzerForSource();
@@ -77,10 +77,13 @@ void FileAnalyzer::Analyze(Text bytes) {
   const size_t nodes_before = pool.node_count();
   found_.results.reserve(found_.rows.size());
   CountMemory();
+  wanted_.assign(filter != nullptr ? found_.rows.size() : 0, false);
+  const bool is_filtered = filter != nullptr && filter->Choose(*found_.source, found_.rows, wanted_);
   LogicalLine line;
-  for (const LineRow& row : found_.rows) {
+  for (size_t i = 0; i < found_.rows.size(); ++i) {
+    const LineRow& row = found_.rows[i];
     CheckMemory(std::max(MostMemoryOf(row), sizeof(CNode) * (pool.node_count() - nodes_before)));
-    AnalyzeRow(analyzer, row, line);
+    AnalyzeRow(analyzer, row, !is_filtered || wanted_[i], line);
     CountMemory();
   }
   CheckMemory(0);
@@ -113,7 +116,7 @@ void FileAnalyzer::Cut() {
   }
 }
 
-void FileAnalyzer::AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, LogicalLine& line) {
+void FileAnalyzer::AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line) {
   LineResult result;
   const LinePlace place = scopes_.Next(row);
   result.in_async_def = place.in_async_def;
@@ -121,7 +124,7 @@ void FileAnalyzer::AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, L
   result.depth = place.depth;
   result.record_begin = static_cast<uint32_t>(found_.store.rows.size());
   result.arg_record_begin = static_cast<uint32_t>(found_.store.arg_rows.size());
-  if (row.token_count != 0) {
+  if (row.token_count != 0 && is_wanted) {
     SetFromRow(line, found_.source, row);
     line.parsed = false;
     line.WriteTo(&found_.store);

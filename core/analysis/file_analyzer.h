@@ -19,6 +19,15 @@
 
 namespace quillet {
 
+// Says which rows of a source are to be analysed, for who looks for something that few of them can hold. The others
+// have no records and no error. Each thread has one.
+class RowFilter {
+ public:
+  virtual ~RowFilter() = default;
+  // False where all of them are. `wanted` has a place a row, all false.
+  virtual bool Choose(const SourceText& source, std::span<const LineRow> rows, std::vector<bool>& wanted) = 0;
+};
+
 class FileAnalyzer {
  public:
   // What became of one logical line: its place, and its ranges of records. Parallel to rows().
@@ -68,7 +77,7 @@ class FileAnalyzer {
 
   // Results stand until the next call. The bytes are copied. OverflowError for a source that takes more
   // memory than it may.
-  void Analyze(Text bytes);
+  void Analyze(Text bytes, RowFilter* filter = nullptr);
   // The same for what is made of the results: OverflowError where `more` bytes are too many beside them.
   void CheckMemory(size_t more) const {
     if (held_ + more > memory_limit_) [[unlikely]]
@@ -93,7 +102,7 @@ class FileAnalyzer {
   CPGenAnalyzerImpl& AnalyzerForSource();
   void Reset(Text bytes);
   void Cut();
-  void AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, LogicalLine& line);
+  void AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line);
   void AddError(const SyntaxError& error);
   // What the analysis of a row may take beside its results, at most.
   size_t MostMemoryOf(const LineRow& row) const;
@@ -105,6 +114,7 @@ class FileAnalyzer {
   CPGenAnalyzerImpl analyzer_;
   std::unique_ptr<CPGenAnalyzerImpl> print_function_analyzer_;  // built at first need
   Found found_;
+  std::vector<bool> wanted_;  // of the rows, where there is a filter
   ScopeTracker scopes_;
   size_t memory_limit_ = kLeastMemoryLimit;
   size_t held_ = 0;

@@ -164,10 +164,55 @@ RecordKind KindOf(const Occurrence& occurrence) {
   return RecordKind::kOther;
 }
 
+// ---- which statements can hold an answer ----
+
+// Those that hold the last word of the name. So do those that bring others to it: a declaration moves records from
+// scope to scope, and a comment with types may be about names of the statement in front of it.
+class StatementsWithWord : public RowFilter {
+ public:
+  explicit StatementsWithWord(const Question& question) {
+    const Text name = question.name;
+    const Text last = name.substr(name.rfind('.') + 1);
+    const bool is_plain = !last.empty() && std::all_of(last.begin(), last.end(), IsWordByte);
+    const bool has_word = question.match == Question::Match::kExact || question.match == Question::Match::kSuffix;
+    if (is_plain && has_word && !question.returns) word_ = last;
+    is_name_alone_ = question.match == Question::Match::kExact && last.size() == name.size();
+  }
+
+  bool Choose(const SourceText& source, std::span<const LineRow> rows, std::vector<bool>& wanted) override {
+    constexpr Text kNonlocal = "nonlocal";
+    if (word_.empty() || rows.empty()) return false;
+    // Where such a name is bound may be told by any statement that holds it, which need not hold the last word.
+    if (!is_name_alone_ && source.text().find(kNonlocal) != Text::npos) return false;
+    for (const Text text : {Text(word_), Text("global"), kNonlocal, Text("type:")}) Mark(text, source, rows, wanted);
+    return true;
+  }
+
+ private:
+  static void Mark(Text wanted_text, const SourceText& source, std::span<const LineRow> rows,
+                   std::vector<bool>& wanted) {
+    const Text text = source.text();
+    const auto begin_of = [&](size_t row) { return source.tokens[rows[row].first_token].text; };
+    size_t row = 0;
+    for (size_t at = text.find(wanted_text); at != Text::npos;) {
+      // The last row that begins in front of it.
+      while (row + 1 < rows.size() && begin_of(row + 1) <= text.data() + at) ++row;
+      wanted[row] = true;
+      const size_t behind = row + 1 < rows.size() ? static_cast<size_t>(begin_of(row + 1) - text.data()) : text.size();
+      at = text.find(wanted_text, behind);
+    }
+  }
+
+  std::string word_;
+  bool is_name_alone_ = false;
+};
+
 class QuestionWriter : public FileWriter {
  public:
   QuestionWriter(const Question& question, Version version, std::unique_ptr<AnswerFormat> format)
-      : question_(question), matcher_(question_), binder_(version), format_(std::move(format)) {}
+      : question_(question), matcher_(question_), filter_(question_), binder_(version), format_(std::move(format)) {}
+
+  RowFilter* row_filter() override { return &filter_; }
 
   void Write(const BatchInput& input, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
              std::string& out) override {
@@ -300,6 +345,7 @@ class QuestionWriter : public FileWriter {
 
   const Question question_;
   const Matcher matcher_;
+  StatementsWithWord filter_;
   NameBinder binder_;
   const std::unique_ptr<AnswerFormat> format_;
   std::vector<Answer> answers_;

@@ -23,12 +23,12 @@ namespace {
 
 using Match = Question::Match;
 
-// What a writer writes of a source.
-std::string Written(FileWriter& writer, Text source) {
+// What a writer writes of a source, of which the statements that it wants are analysed, or all.
+std::string Written(FileWriter& writer, Text source, bool filters = true) {
   static FileAnalyzer file(FileAnalyzer::Options{testing::AnalyzerOptions(testing::kPy3), {}});
   ScopeNames scopes;
   PlacedRecords placed;
-  file.Analyze(source);
+  file.Analyze(source, filters ? writer.row_filter() : nullptr);
   scopes.Build(file);
   std::string out;
   writer.Write(BatchInput{"t.py", {}, {}}, file, scopes, placed, out);
@@ -240,6 +240,34 @@ TEST(Questions, StayInAScope) {
   EXPECT_EQ(AnswersIn(kShop, question).size(), 2u);
   question.scope = "";
   EXPECT_EQ(AnswersIn(kShop, question), Found{});
+}
+
+TEST(Questions, AreAnsweredAlikeOutOfTheStatementsThatHoldTheirWord) {
+  const Text sources[] = {
+      kShop,
+      "def f():\n  global x, y\n  x = 1; y.z = x\nx = 2\nclass A:\n  def x(self): return x\n",
+      "def f():\n  x = 1\n  def g():\n    nonlocal x\n    x.y = 2; x += 1\n  def h(x): x.y\n",
+      "def f(a, b):\n  # type: (int, A.b) -> C\n  a.b = b  # type: A\n  return a\n",
+      "from a.b import c as d, e\nimport a.b.c\nd.c(e, c=1)\n",
+      "x: 'A.B[C]' = f'{A.c!r:{C}}'\n\n\nif A: x; A\nelse: C.A\n  # A\n",
+      "a = (b +\n  c)\n\n@a\nclass c(b, metaclass=a): b = c\n",
+      "x = (A\ndef A(: pass\nA B\n",
+      "\n\nA",
+      "",
+  };
+  for (const Text source : sources) {
+    for (const Match match : {Match::kExact, Match::kSuffix, Match::kGlob}) {
+      for (const Text name :
+           {"x", "A", "b", "c", "f", "x.y", ".y", "A.x", "a.b", "f.x", "C", "a.b.c", "Shop.add", "*"}) {
+        for (const bool returns : {false, true}) {
+          Question question = QuestionFor(match, name);
+          question.returns = returns;
+          const auto writer = MakeQuestionWriter(question, testing::kPy3, MakeAnswerBytes(true));
+          EXPECT_EQ(Written(*writer, source, true), Written(*writer, source, false)) << source << name;
+        }
+      }
+    }
+  }
 }
 
 TEST(Questions, HandOnTheSourceLineCutWhereItIsLong) {
