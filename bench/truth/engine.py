@@ -1,4 +1,4 @@
-"""The engines that a truth set can be asked of: quillet's workspace, and jedi to see that a runner asks rightly.
+"""The engines that a truth set can be asked of: quillet's workspace, and others to see that a runner asks rightly.
 
 Only here do the runners meet an engine's own ways: where its lines and columns begin, what it raises, how it is told of
 buffers.
@@ -12,6 +12,7 @@ from collections.abc import Iterable, Sequence
 from pathlib import Path
 from typing import Any, Protocol
 
+from bench.truth.peers import COMMANDS, Start
 from bench.truth.places import Change, Found, Place, Texts
 
 _NAME_END = re.compile(r"\w+\Z")
@@ -192,7 +193,68 @@ class JediEngine:
         self._texts.Close(path)
 
 
-ENGINES: dict[str, type[QuilletEngine] | type[JediEngine]] = {"quillet": QuilletEngine, "jedi": JediEngine}
+class ServerEngine:
+    """A language server. What the protocol has no question for (types as text) it gives as nothing."""
+
+    name = ""
+
+    def __init__(
+        self, roots: Sequence[str | Path], environment: str | Path | None = None, _version: object = None
+    ) -> None:
+        libraries = [str(path) for path in Path(environment or "/nowhere").glob("lib/python*/site-packages")]
+        analysis = {"extraPaths": libraries, "diagnosticMode": "workspace"}
+        settings = {"basedpyright": {"analysis": analysis}}
+        self._server = Start(self.name, Path(roots[0]), settings=settings)
+        self._opened: set[str] = set()
+
+    def _Opened(self, place: Place) -> Place:
+        if place.path not in self._opened:
+            self._opened.add(place.path)
+            self._server.Open(place.path)
+        return place
+
+    def Definitions(self, place: Place) -> list[Found]:
+        return self._server.Definitions(self._Opened(place))
+
+    def References(self, place: Place) -> list[Found]:
+        return self._server.References(self._Opened(place))
+
+    def Types(self, _: Place) -> list[str]:
+        return []
+
+    TypesBefore = Types
+
+    def Complete(self, place: Place) -> list[str]:
+        return self._server.Complete(self._Opened(place))
+
+    def Rename(self, place: Place, new_name: str) -> list[Change] | None:
+        return self._server.Rename(self._Opened(place), new_name)
+
+    def Callers(self, place: Place) -> list[Found]:
+        return self._server.Callers(self._Opened(place))
+
+    def Callees(self, place: Place) -> list[Found]:
+        return self._server.Callees(self._Opened(place))
+
+    def Open(self, path: str, text: str) -> None:
+        self.Close(path)
+        self._opened.add(path)
+        self._server.Open(path, text)
+
+    def Close(self, path: str) -> None:
+        if path in self._opened:
+            self._opened.remove(path)
+            self._server.Close(path)
+
+    def __del__(self) -> None:
+        self._server.Stop()
+
+
+def _ServerEngines() -> dict[str, type[ServerEngine]]:
+    return {name: type(f"{name}Engine", (ServerEngine,), {"name": name}) for name in COMMANDS if name != "jedi"}
+
+
+ENGINES: dict[str, type[Engine]] = {"quillet": QuilletEngine, "jedi": JediEngine, **_ServerEngines()}
 
 
 def AddEngine(parser: argparse.ArgumentParser) -> None:

@@ -17,7 +17,7 @@ from pathlib import Path
 from typing import IO, Any
 from urllib.parse import unquote, urlsplit
 
-from bench.truth.places import Found, Place, Texts
+from bench.truth.places import Change, Found, Place, Texts
 
 
 class ServerError(Exception):
@@ -32,10 +32,18 @@ class LanguageServer:
     """A running server. Questions are in the runners' lines and columns; answers as well."""
 
     def __init__(
-        self, name: str, command: Sequence[str], folder: Path, *, timeout: float = 300, one_core: bool = False
+        self,
+        name: str,
+        command: Sequence[str],
+        folder: Path,
+        *,
+        timeout: float = 300,
+        one_core: bool = False,
+        settings: dict[str, Any] | None = None,
     ) -> None:
         self.name = name
         self._timeout = timeout
+        self._settings = settings or {}
         self._texts = Texts()
         self._next = 0
         self.refused = 0
@@ -79,6 +87,39 @@ class LanguageServer:
     def References(self, place: Place) -> list[Found]:
         asked = {**self._Position(place), "context": {"includeDeclaration": True}}
         return self._Locations("textDocument/references", asked)
+
+    def Rename(self, place: Place, new_name: str) -> list[Change] | None:
+        """None where it is refused."""
+        try:
+            answer = self.Ask("textDocument/rename", {**self._Position(place), "newName": new_name})
+        except Refused:
+            return None
+        files = dict((answer or {}).get("changes") or {})
+        for each in (answer or {}).get("documentChanges") or ():
+            if "edits" in each:
+                files.setdefault(each["textDocument"]["uri"], []).extend(each["edits"])
+        return [
+            Change(found.path, found.line, found.column, found.end, edit["newText"])
+            for uri, edits in files.items()
+            for edit in edits
+            for found in [self._Found(uri, edit["range"])]
+        ]
+
+    def Callers(self, place: Place) -> list[Found]:
+        return self._Calls("incomingCalls", "from", place)
+
+    def Callees(self, place: Place) -> list[Found]:
+        return self._Calls("outgoingCalls", "to", place)
+
+    def _Calls(self, question: str, end: str, place: Place) -> list[Found]:
+        found = []
+        try:
+            for item in self.Ask("textDocument/prepareCallHierarchy", self._Position(place)) or ():
+                for call in self.Ask(f"callHierarchy/{question}", {"item": item}) or ():
+                    found.append(self._Found(call[end]["uri"], call[end]["selectionRange"]))
+        except Refused:
+            self.refused += 1
+        return found
 
     def Complete(self, place: Place) -> list[str]:
         answer = self.Ask("textDocument/completion", self._Position(place)) or []
@@ -186,10 +227,10 @@ class LanguageServer:
             waiting.put({"ended": True})
 
     def _Reply(self, message: dict[str, Any]) -> None:
-        """Servers ask for settings and register what they watch; they get the defaults and a yes."""
+        """Servers ask for settings and register what they watch; they get those of a section, and a yes."""
         result: Any = None
         if message["method"] == "workspace/configuration":
-            result = [{} for _ in message["params"]["items"]]
+            result = [self._settings.get(item.get("section"), {}) for item in message["params"]["items"]]
         elif message["method"] == "workspace/workspaceFolders":
             result = [{"uri": self.folder.as_uri(), "name": self.folder.name}]
         with contextlib.suppress(ServerError):
@@ -209,13 +250,15 @@ class LanguageServer:
             return []
         found = []
         for each in answer if isinstance(answer, list) else [answer] if answer else []:
-            span = each.get("targetSelectionRange") or each["range"]
-            path = PathOf(each.get("targetUri") or each["uri"])
-            text = self._texts.Line(path, span["start"]["line"] + 1)
-            begin = FromUtf16(text, span["start"]["character"])
-            end = FromUtf16(text, span["end"]["character"])
-            found.append(Found(path, span["start"]["line"] + 1, begin, end))
+            uri = each.get("targetUri") or each["uri"]
+            found.append(self._Found(uri, each.get("targetSelectionRange") or each["range"]))
         return found
+
+    def _Found(self, uri: str, span: dict[str, Any]) -> Found:
+        path = PathOf(uri)
+        line = span["start"]["line"] + 1
+        text = self._texts.Line(path, line)
+        return Found(path, line, *(FromUtf16(text, span[end]["character"]) for end in ("start", "end")))
 
 
 class Usage:

@@ -6,6 +6,7 @@ import argparse
 import shutil
 import sys
 from pathlib import Path
+from typing import Any
 
 from bench.truth.lsp import LanguageServer
 
@@ -26,11 +27,11 @@ def Find(name: str) -> list[str] | None:
     return None if found is None else [found, *rest]
 
 
-def Start(name: str, folder: Path, *, one_core: bool = False) -> LanguageServer:
+def Start(name: str, folder: Path, *, one_core: bool = False, settings: dict[str, Any] | None = None) -> LanguageServer:
     command = Find(name)
     if command is None:
         raise SystemExit(f"{name} is not installed: {HOW_TO_GET}")
-    return LanguageServer(name, command, folder, one_core=one_core)
+    return LanguageServer(name, command, folder, one_core=one_core, settings=settings)
 
 
 def AddPeers(parser: argparse.ArgumentParser, default: str) -> None:
