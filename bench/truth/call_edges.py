@@ -45,6 +45,7 @@ class Program:
         self.functions: list[Function] = []
         self._bases: dict[str, list[str]] = {}
         self._imported: dict[Place, str] = {}
+        self._modules: dict[str, str] = {}
         for path in sorted(folder.rglob("*.py")):
             parts = path.relative_to(folder).with_suffix("").parts
             module = ".".join(parts[:-1] if parts[-1] == "__init__" and len(parts) > 1 else parts)
@@ -54,7 +55,9 @@ class Program:
 
     def _Read(self, path: str, module: str, text: str) -> None:
         lines = Cut(text)
-        self.functions.append(Function(module, Place(path, 1, 0), False, (1, 0), (len(lines) + 1, 0)))
+        # A module is asked about behind its last line, and named by its first place.
+        self.functions.append(Function(module, Place(path, len(lines) + 1, 0), False, (1, 0), (len(lines) + 1, 0)))
+        self._modules[path] = module
         self._Visit(ast.parse(text), path, module, lines, Counter())
 
     def _Visit(self, node: ast.AST, path: str, inside: str, lines: list[str], lambdas: Counter[str]) -> None:
@@ -107,6 +110,8 @@ class Program:
 
     def Caller(self, found: Found) -> str | None:
         """Who calls, by a place that was given: that of a function's name, or of the call itself."""
+        if found.kind == "module":
+            return self._modules.get(found.path)
         function = self._by_place.get(found.place)
         return function.name if function else self.Around(found.place)
 

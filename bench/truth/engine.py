@@ -81,11 +81,9 @@ class QuilletEngine:
         return [completion.name for completion in self.workspace.complete(*self._Asked(place))]
 
     def Rename(self, place: Place, new_name: str) -> list[Change] | None:
-        import quillet
-
         try:
             edits = self.workspace.rename(*self._Asked(place), new_name)
-        except (ValueError, getattr(quillet, "RenameError", ValueError)):
+        except ValueError:
             return None
         changes = []
         for edit in edits:

@@ -95,7 +95,7 @@ def Tag(text: str) -> str | None:
     """A type's text as the case writes it: `int()`, `int`, `None`; None where nothing is known."""
     if text in _UNKNOWN:
         return None
-    if text.startswith("def "):
+    if text.startswith(("def ", "async def ")):
         return "def"
     if inside := re.match(r"type\[(.*)\]\Z", text):
         return _Last(inside[1])

@@ -178,7 +178,7 @@ def Run(options: argparse.Namespace) -> int:
             if options.only and options.only not in what:
                 continue
             asker = Asker(tally, QuilletEngine([root]).workspace, what, options.most)
-            for path in sorted(root.glob("*.py"))[:3]:
+            for path in sorted(path for path in root.glob("*.py") if path.is_file())[:3]:
                 text = ReadText(path)
                 asker.AskFile(path, [*Places(text, pick, 5), *LastPlaces(text)], (*QUESTIONS, *WHOLE_PROJECT))
             asker.Ask("symbols", "x")

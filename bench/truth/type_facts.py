@@ -43,15 +43,20 @@ def Returned(types: list[str]) -> list[str]:
     """What the functions among some types return: the members of what stands behind the last arrow outside brackets."""
     found = []
     for text in types:
-        if text.startswith("def "):
+        if text.startswith(("def ", "async def ")):
             depth = 0
             for at, character in enumerate(text):
                 depth += (character in "([{") - (character in ")]}")
                 if depth == 0 and text.startswith("->", at):
                     rest = text[at + 2 :].strip()
-                    found += [rest] if rest.startswith("def ") else Parts(rest, "|")
+                    found += [rest] if rest.startswith("def ") else map(_Bare, Parts(rest, "|"))
                     break
     return found
+
+
+def _Bare(text: str) -> str:
+    """A type without the brackets that a function has in a union."""
+    return text[1:-1] if text.startswith("(") and text.endswith(")") else text
 
 
 def Same(expected: str, given: str) -> bool:

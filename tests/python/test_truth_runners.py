@@ -179,6 +179,9 @@ def test_a_place_is_in_the_function_whose_body_it_is_in(program):
 
 def test_what_is_called_has_the_sets_name(program, tmp_path):
     main = str(program.folder / "main.py")
+    assert program.Caller(Found(main, 1, 0, 0, role="module", kind="module")) == "main"
+    assert program.Caller(Found(main, 8, 4, 9)) == "main.outer"
+    assert program.Caller(Found(main, 13, 4, 7)) == "main"
     assert program.Name(Found(main, 8, 4, 9)) == "main.outer"
     assert program.Name(Found(main, 13, 8, 14)) == "main.<lambda1>"
     assert program.Name(Found(main, 2, 19, 23)) == "helper.Base"
@@ -409,6 +412,10 @@ def test_what_functions_return_stands_behind_their_last_arrow():
     assert type_facts.Returned(["def (f: def (x: int) -> str, g) -> builtins.int | None"]) == ["builtins.int", "None"]
     assert type_facts.Returned(["def () -> dict[str, int | None]"]) == ["dict[str, int | None]"]
     assert type_facts.Returned(["def () -> def () -> builtins.int"]) == ["def () -> builtins.int"]
+    assert type_facts.Returned(["async def () -> (def () -> builtins.int) | None"]) == [
+        "def () -> builtins.int",
+        "None",
+    ]
     assert type_facts.Returned(["builtins.int", "def (a)"]) == []
 
 
