@@ -188,6 +188,7 @@ struct FileSyntax {
   std::vector<Expr> exprs;
   std::vector<Stmt> stmts;
   std::vector<ExprId> lists;  // children of expressions and expressions of statements
+  std::vector<ExprId> named;  // the expressions with a name that is not empty, in order of their names
   const char* source = nullptr;
 
   const Expr& operator[](ExprId expr) const { return exprs[expr]; }
@@ -235,6 +236,15 @@ struct FileSyntax {
 
   size_t ByteSize() const;
   void Clear();
+
+ private:
+  // The last statement that begins at a place or in front of it, decorators included.
+  StmtId LastBegunAt(uint32_t offset) const;
+  ExprId InnermostAt(ExprId expr, uint32_t offset) const;
 };
+
+// The words of the kinds, without their "k".
+Text WordOf(ExprKind kind);
+Text WordOf(StmtKind kind);
 
 }  // namespace quillet

@@ -651,6 +651,8 @@ def CreateSyntaxError(
 class _host:  # a module at run time
     @staticmethod
     def CutSource(source: bytes, version_triple: _Version) -> list[tuple[CLogicalLine, int, int, int, bool, bool]]: ...
+    @staticmethod
+    def SyntaxLines(version: _Version, source: bytes) -> str: ...
 
     RECORD_KIND_WORDS: tuple[str, ...]
     @staticmethod
