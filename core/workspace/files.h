@@ -13,6 +13,11 @@
 
 namespace quillet {
 
+// Decodes a source that names an encoding of its own to UTF-8; false where it cannot. Called by any thread.
+using SourceDecoder = bool (*)(Text bytes, std::string& utf8);
+// For all workspaces; without one such sources are read as Latin-1. To be called before other threads read.
+void SetSourceDecoder(SourceDecoder decoder);
+
 class Files {
  public:
   // Sources above this many bytes are not read.
@@ -33,8 +38,11 @@ class Files {
   // something changed. Bytes are decoded by encoding lines as batches decode them; what cannot be decoded is
   // read as Latin-1.
   const SourceFile* Get(FileId file);
-  // The same without syntax: only the bytes, for a search by word. Empty where it cannot be read.
+  // The same without syntax: whether a word stands in it as a whole word. False where it cannot be read.
   bool Holds(FileId file, Text word);
+  // The source itself: a view of what is held of it, otherwise read into `memory`. Empty where it cannot be
+  // read. Any number of threads may ask while nothing else is called.
+  Text SourceOf(FileId file, std::string& memory) const;
 
   // Looks whether files that were read have changed since (or ceased, or begun to exist); true where any did.
   bool Refresh();
@@ -45,8 +53,11 @@ class Files {
   void Change(FileId file, uint32_t begin, uint32_t end, Text text);
   void Close(FileId file);
   bool IsOpen(FileId file) const;
+  // Those that a buffer holds, in no order.
+  const std::vector<FileId>& Buffers() const;
 
-  // Drops what was read of files that no buffer holds while more than `bytes` are held.
+  // Drops what was read of files that no buffer holds while more than `bytes` are held, and first what was asked for
+  // longest ago.
   void Trim(size_t bytes);
   size_t ByteSize() const;
 

@@ -35,7 +35,7 @@ class SourceFile {
   uint32_t OccurrenceBeginningAt(uint32_t offset) const;
   uint32_t OccurrenceAt(uint32_t offset) const;
 
-  // The innermost scope whose body an offset lies in.
+  // The innermost scope whose body an offset lies in; on a line of its own between statements its column decides.
   uint32_t ScopeAt(uint32_t offset) const;
   // The scope that a `def`, a `class`, a lambda or a comprehension opens; kNoIndex without one. A scope of type
   // parameters around it is its parent.
@@ -53,9 +53,13 @@ class SourceFile {
 
  private:
   void MapScopes() const;
+  uint32_t ScopeBeginningAt(uint32_t offset, NameScopeKind kind) const;
+  uint32_t FindScopeOfExpr(ExprId number) const;
+  uint32_t ExprScopeAt(uint32_t offset) const;
+  uint32_t ColumnOf(uint32_t offset) const;
 
   mutable std::unique_ptr<OccurrencesOfSymbols> occurrences_;
-  mutable std::vector<uint32_t> scopes_by_begin_;
+  mutable std::vector<uint32_t> scopes_by_begin_;  // of definitions, lambdas and comprehensions
   mutable std::vector<StmtId> stmt_of_scope_;
   mutable std::vector<ExprId> expr_of_scope_;
   mutable bool has_maps_ = false;
