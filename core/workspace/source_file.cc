@@ -140,7 +140,7 @@ uint32_t SourceFile::ExprScopeAt(uint32_t offset) const {
     bool is_inside = false;
     if (kind == ExprKind::kLambda) {
       is_inside = !children.empty() && offset >= syntax[children.back()].begin;
-    } else if (IsComprehension(kind)) {
+    } else if (IsComprehension(kind) && offset > syntax[expr].begin && offset < syntax[expr].end) {
       // The first iterable alone is read in the scope around.
       is_inside = true;
       for (const ExprId child : children) {
