@@ -224,10 +224,12 @@ TEST(Modules, LookBesideTheFileFirstInPython2) {
       {"project/pack/__init__.py", ""},
       {"project/pack/json.py", ""},
       {"project/pack/a.py", "import json\n"},
+      {"project/pack/b.py", "'words'\nfrom __future__ import division, absolute_import\nimport json\n"},
       {"project/json.py", ""},
   };
   World world(folder, Version::Of(2, 7));
   EXPECT_EQ(world.From("project/pack/a.py", 0, "json"), "project/pack/json.py");
+  EXPECT_EQ(world.From("project/pack/b.py", 0, "json"), "project/json.py");
   World newer(folder, Version::Of(3, 7));
   EXPECT_EQ(newer.From("project/pack/a.py", 0, "json"), "project/json.py");
 }
