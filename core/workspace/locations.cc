@@ -1,0 +1,286 @@
+// Definitions: where what a name stands for is bound.
+#include <algorithm>
+
+#include "workspace/workspace_impl.h"
+
+namespace quillet {
+
+uint32_t Workspace::Impl::OccurrenceAt(const SourceFile& file, uint32_t offset) {
+  if (const uint32_t at = file.OccurrenceBeginningAt(offset); at != kNoIndex) return at;
+  return file.OccurrenceAt(offset);
+}
+
+Location Workspace::Impl::AtOccurrence(const SourceFile& file, uint32_t index, Certainty certainty) {
+  const Occurrence& occurrence = file.bindings.occurrences[index];
+  Location location;
+  location.file = file.id;
+  location.begin = occurrence.begin;
+  location.end = file.bindings.EndOf(occurrence);
+  location.role = NameRoleWords()[static_cast<size_t>(occurrence.role)];
+  if (occurrence.kind != NameKind::kNone) location.kind = NameKindWords()[static_cast<size_t>(occurrence.kind) - 1];
+  location.certainty = certainty;
+  return location;
+}
+
+Location Workspace::Impl::At(const Binding& binding, Certainty certainty) {
+  Location location;
+  location.file = binding.file;
+  location.begin = location.end = binding.offset;
+  location.certainty = certainty;
+  const SourceFile* file = Get(binding.file);
+  if (file == nullptr) {
+    location.role = "module";
+    return location;
+  }
+  const uint32_t index = file->OccurrenceBeginningAt(binding.offset);
+  if (index != kNoIndex) {
+    Location found = AtOccurrence(*file, index, certainty);
+    // A write of an attribute is where it is defined.
+    if (found.kind.empty()) found.kind = "variable";
+    return found;
+  }
+  // A field in the string of a named tuple.
+  const Text text = file->text();
+  while (location.end < text.size() &&
+         (IsNone(text)
+              ? false
+              : (std::isalnum(static_cast<unsigned char>(text[location.end])) != 0 || text[location.end] == '_')))
+    ++location.end;
+  location.role = "definition";
+  location.kind = "variable";
+  return location;
+}
+
+Binding Workspace::Impl::SourceOf(Binding binding) {
+  const SourceFile* stub = Get(binding.file);
+  if (stub == nullptr || !stub->is_stub) return binding;
+  const ModuleId id = modules.OfFile(binding.file);
+  if (id == kNoModule || modules[id].file == kNoFile || modules[id].file == binding.file) return binding;
+  const SourceFile* source = Get(modules[id].file);
+  const uint32_t index = stub->OccurrenceBeginningAt(binding.offset);
+  if (source == nullptr || index == kNoIndex) return binding;
+  // The dotted way to the name, from the module in.
+  std::vector<Text> path{stub->bindings.TextOf(stub->bindings.occurrences[index])};
+  for (uint32_t scope = stub->bindings.ScopeOf(stub->bindings.occurrences[index]); scope != 0 && scope != kNoIndex;
+       scope = stub->bindings.scopes[scope].parent) {
+    if (stub->bindings.scopes[scope].kind == NameScopeKind::kClass)
+      path.push_back(stub->bindings.texts[stub->bindings.scopes[scope].name]);
+  }
+  uint32_t scope = 0;
+  for (size_t i = path.size(); i-- > 0;) {
+    uint32_t found = kNoIndex;
+    for (uint32_t symbol = source->bindings.scopes[scope].first_symbol; symbol != kNoIndex;
+         symbol = source->bindings.symbols[symbol].next) {
+      if (source->bindings.texts[source->bindings.symbols[symbol].name] != path[i]) continue;
+      for (const uint32_t at : source->occurrences().Of(symbol)) {
+        const NameKind kind = source->bindings.occurrences[at].kind;
+        if (kind != NameKind::kNone && kind != NameKind::kImport) {
+          found = at;
+          break;
+        }
+      }
+    }
+    if (found == kNoIndex) return binding;
+    const uint32_t offset = source->bindings.occurrences[found].begin;
+    if (i == 0) return {source->id, offset};
+    const StmtId stmt = source->syntax.StatementNamedAt(offset);
+    if (stmt == kModuleStmt) return binding;
+    scope = source->ScopeOfStmt(stmt);
+    if (scope == kNoIndex) return binding;
+  }
+  return binding;
+}
+
+void Workspace::Impl::Sort(std::vector<Location>& locations) const {
+  std::ranges::sort(locations, [&](const Location& a, const Location& b) {
+    if (a.file != b.file) return files.PathOf(a.file) < files.PathOf(b.file);
+    return std::pair(a.begin, a.certainty) < std::pair(b.begin, b.certainty);
+  });
+  const auto rest = std::ranges::unique(
+      locations, [](const Location& a, const Location& b) { return a.file == b.file && a.begin == b.begin; });
+  locations.erase(rest.begin(), rest.end());
+}
+
+std::vector<Location> Workspace::Impl::LocationsOf(const Entities& entities, bool follows_source) {
+  std::vector<Location> found;
+  const Certainty certainty = CertaintyOf(entities.doubt);
+  for (const Entity& entity : entities.found) {
+    std::vector<Binding> bindings = inference.BindingsOf(entity);
+    // What the version asked for never sees is no definition, unless nothing else is.
+    std::vector<Binding> seen;
+    for (const Binding& binding : bindings) {
+      const SourceFile* file = Get(binding.file);
+      if (file != nullptr && inference.IsReachable(*file, file->syntax.StatementAt(binding.offset)))
+        seen.push_back(binding);
+    }
+    if (!seen.empty()) bindings = std::move(seen);
+    for (const Binding& binding : bindings) {
+      if (entity.kind == Entity::kModule) {
+        Location location;
+        location.file = binding.file;
+        location.role = "module";
+        location.kind = "module";
+        location.certainty = certainty;
+        found.push_back(location);
+        continue;
+      }
+      found.push_back(At(follows_source ? SourceOf(binding) : binding, certainty));
+    }
+  }
+  return found;
+}
+
+std::vector<Location> Workspace::Impl::MembersNamed(Text name) {
+  static constexpr size_t kMaxFiles = 400;
+  std::vector<Location> found;
+  size_t count = 0;
+  for (const FileId id : project.WithWords({name})) {
+    if (++count > kMaxFiles) {
+      is_bounded = true;
+      break;
+    }
+    const SourceFile* file = Get(id);
+    if (file == nullptr) continue;
+    for (uint32_t i = 0; i < file->bindings.occurrences.size(); ++i) {
+      const Occurrence& occurrence = file->bindings.occurrences[i];
+      if (file->bindings.TextOf(occurrence) != name) continue;
+      const bool is_member = occurrence.kind != NameKind::kNone && occurrence.kind != NameKind::kImport &&
+                             file->bindings.scopes[file->bindings.ScopeOf(occurrence)].kind == NameScopeKind::kClass;
+      const uint32_t receiver = file->bindings.ReceiverOf(i);
+      const bool is_self = occurrence.is_attribute &&
+                           (occurrence.role == NameRole::kWrite || occurrence.role == NameRole::kDefinition) &&
+                           receiver != kNoIndex &&
+                           file->bindings.TextOf(file->bindings.occurrences[receiver]) == "self";
+      if (is_member || is_self) found.push_back(At({id, occurrence.begin}, Certainty::kByName));
+    }
+  }
+  return found;
+}
+
+std::vector<Location> Workspace::Definitions(FileId id, uint32_t offset) {
+  Impl& in = *impl_;
+  in.Begin();
+  const SourceFile* file = in.Get(id);
+  if (file == nullptr) return {};
+  const uint32_t index = in.OccurrenceAt(*file, offset);
+  if (index == kNoIndex) return {};
+  const Occurrence& occurrence = file->bindings.occurrences[index];
+  std::vector<Location> found;
+  if (occurrence.has_symbol && occurrence.kind != NameKind::kNone && occurrence.kind != NameKind::kImport &&
+      occurrence.role != NameRole::kRead) {
+    found.push_back(in.AtOccurrence(*file, index, Certainty::kCertain));
+    return found;
+  }
+  if (occurrence.has_symbol && occurrence.kind == NameKind::kNone) {
+    for (const Binding& binding : in.inference.BindingsReaching(*file, index)) {
+      const uint32_t at = file->OccurrenceBeginningAt(binding.offset);
+      if (at != kNoIndex && file->bindings.occurrences[at].kind == NameKind::kImport) {
+        const std::vector<Location> imported = in.LocationsOf(in.inference.EntitiesOfImport(*file, binding.offset));
+        if (imported.empty()) found.push_back(in.At(binding, Certainty::kCertain));
+        found.insert(found.end(), imported.begin(), imported.end());
+      } else {
+        found.push_back(in.At(binding, Certainty::kCertain));
+      }
+    }
+    if (!found.empty()) {
+      in.Sort(found);
+      return found;
+    }
+  }
+  const Entities entities = in.inference.EntitiesOf(*file, index);
+  found = in.LocationsOf(entities);
+  if (found.empty() && occurrence.is_attribute) {
+    const Text name = file->bindings.TextOf(occurrence);
+    const bool is_special = name.starts_with("__") && name.ends_with("__");
+    if (!is_special) found = in.MembersNamed(name);
+    // The only one there is, of a name that no type of the language has.
+    if (found.size() == 1 && !in.IsCommonAttribute(name)) found[0].certainty = Certainty::kLikely;
+  }
+  if (occurrence.is_attribute && found.empty() &&
+      (occurrence.role == NameRole::kWrite || occurrence.role == NameRole::kDefinition))
+    found.push_back(in.AtOccurrence(*file, index, Certainty::kLikely));
+  in.Sort(found);
+  std::ranges::stable_sort(found, {}, &Location::certainty);
+  return found;
+}
+
+std::vector<Location> Workspace::TypeDefinitions(FileId id, uint32_t offset) {
+  Impl& in = *impl_;
+  in.Begin();
+  const SourceFile* file = in.Get(id);
+  if (file == nullptr) return {};
+  const uint32_t index = in.OccurrenceAt(*file, offset);
+  if (index == kNoIndex) return {};
+  std::vector<Location> found;
+  const Value value = in.ValueAt(*file, index);
+  for (const TypeId type : in.inference.types().CopyOf(value.set)) {
+    const Type t = in.inference.types()[type];
+    const ClassId cls = t.kind == TypeKind::kClass ? t.a : in.inference.ClassOfType(type);
+    if (cls == kNoId) continue;
+    const ClassInfo& info = in.inference.InfoOf(cls);
+    const SourceFile* source = in.Get(info.file);
+    if (source == nullptr) continue;
+    const uint32_t begin =
+        info.stmt != kModuleStmt ? source->syntax.stmt(info.stmt).name_begin : source->syntax[info.call].begin;
+    found.push_back(in.At(in.SourceOf({info.file, begin}), CertaintyOf(value.doubt)));
+  }
+  in.Sort(found);
+  return found;
+}
+
+std::vector<Location> Workspace::Supertypes(FileId id, uint32_t offset) {
+  Impl& in = *impl_;
+  in.Begin();
+  const SourceFile* file = in.Get(id);
+  if (file == nullptr) return {};
+  const uint32_t index = in.OccurrenceAt(*file, offset);
+  if (index == kNoIndex) return {};
+  std::vector<Location> found;
+  for (const TypeId type : in.inference.types().CopyOf(in.ValueAt(*file, index).set)) {
+    const Type t = in.inference.types()[type];
+    if (t.kind != TypeKind::kClass && t.kind != TypeKind::kInstance) continue;
+    const std::vector<BaseClass> bases = in.inference.InfoOf(t.a).bases;
+    for (const BaseClass& base : bases) {
+      const ClassInfo& info = in.inference.InfoOf(base.cls);
+      const SourceFile* source = in.Get(info.file);
+      if (source != nullptr && info.stmt != kModuleStmt)
+        found.push_back(
+            in.At(in.SourceOf({info.file, source->syntax.stmt(info.stmt).name_begin}), Certainty::kCertain));
+    }
+  }
+  in.Sort(found);
+  return found;
+}
+
+std::vector<Location> Workspace::Subtypes(FileId id, uint32_t offset) {
+  Impl& in = *impl_;
+  in.Begin();
+  const SourceFile* file = in.Get(id);
+  if (file == nullptr) return {};
+  const uint32_t index = in.OccurrenceAt(*file, offset);
+  if (index == kNoIndex) return {};
+  std::vector<ClassId> wanted;
+  for (const TypeId type : in.inference.types().CopyOf(in.ValueAt(*file, index).set)) {
+    const Type t = in.inference.types()[type];
+    if (t.kind == TypeKind::kClass || t.kind == TypeKind::kInstance) wanted.push_back(t.a);
+  }
+  std::vector<Location> found;
+  for (const ClassId cls : wanted) {
+    const Text name = in.inference.InfoOf(cls).name;
+    for (const FileId candidate : in.project.WithWords({name})) {
+      const SourceFile* source = in.Get(candidate);
+      if (source == nullptr) continue;
+      for (StmtId stmt = 1; stmt < source->syntax.stmts.size(); ++stmt) {
+        if (source->syntax.stmt(stmt).kind != StmtKind::kClass) continue;
+        const ClassId sub = in.inference.ClassOfStmt(candidate, stmt);
+        const auto& bases = in.inference.InfoOf(sub).bases;
+        if (std::ranges::any_of(bases, [&](const BaseClass& base) { return base.cls == cls; }))
+          found.push_back(in.At({candidate, source->syntax.stmt(stmt).name_begin}, Certainty::kCertain));
+      }
+    }
+  }
+  in.Sort(found);
+  return found;
+}
+
+}  // namespace quillet

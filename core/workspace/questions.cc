@@ -1,0 +1,165 @@
+#include "workspace/questions.h"
+
+#include <algorithm>
+
+#include "workspace/workspace_impl.h"
+
+namespace quillet {
+
+namespace {
+
+Modules::Settings ModuleSettings(const Workspace::Settings& settings) {
+  Modules::Settings made;
+  for (const std::string& root : settings.roots)
+    for (std::string& folder : SourceRootsOf(root)) made.roots.push_back(std::move(folder));
+  made.libraries = settings.libraries;
+  made.typeshed = settings.typeshed;
+  return made;
+}
+
+}  // namespace
+
+Text WordOf(Certainty certainty) {
+  switch (certainty) {
+    case Certainty::kCertain:
+      return "certain";
+    case Certainty::kLikely:
+      return "likely";
+    case Certainty::kByName:
+      return "by name";
+  }
+  return {};
+}
+
+Workspace::Impl::Impl(Settings given)
+    : settings(std::move(given)),
+      files(settings.version),
+      modules(files, ModuleSettings(settings)),
+      project(files, settings.roots),
+      inference(files, modules) {
+  inference.set_callers(this);
+}
+
+void Workspace::Impl::Forget() {
+  modules.Forget();
+  project.Forget();
+  inference.Clear();
+  calls_by_name_.clear();
+  common_.clear();
+}
+
+void Workspace::Impl::Begin() {
+  // What is asked in one breath is asked of the same files.
+  static constexpr auto kBreath = std::chrono::milliseconds(30);
+  static constexpr size_t kMaxHeld = size_t{192} << 20;
+  const auto now = std::chrono::steady_clock::now();
+  if (now - last_refresh_ > kBreath) {
+    if (files.Refresh()) Forget();
+    if (files.ByteSize() > kMaxHeld) {
+      files.Trim(kMaxHeld / 2);
+      inference.Clear();
+      calls_by_name_.clear();
+    }
+  }
+  last_refresh_ = std::chrono::steady_clock::now();
+  inference.Begin();
+  is_bounded = false;
+}
+
+bool Workspace::Impl::IsProject(FileId file) {
+  const std::string& path = files.PathOf(file);
+  return std::ranges::any_of(settings.roots, [&](const std::string& root) {
+    return path.starts_with(root) && (path.size() == root.size() || root.ends_with('/') || path[root.size()] == '/');
+  });
+}
+
+// The calls of a function by its name, in the files that hold it: the first of them, so many.
+std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
+  static constexpr size_t kMaxFiles = 24;
+  static constexpr size_t kMaxCalls = 64;
+  const SourceFile* own = Get(function.file);
+  if (own == nullptr || function.lambda != kNoExpr || own->is_stub) return {};
+  Text name = own->syntax.NameOf(own->syntax.stmt(function.stmt));
+  if (name.starts_with("__") && name.ends_with("__")) {
+    if ((name != "__init__" && name != "__new__") || function.cls == kNoId) return {};
+    name = inference.MembersOf(function.cls).name;
+  }
+  const auto [at, is_new] = calls_by_name_.try_emplace(std::string(name));
+  if (!is_new) return at->second;
+  std::vector<ExprPlace> calls;
+  std::vector<FileId> candidates{function.file};
+  if (IsProject(function.file)) {
+    for (const FileId file : project.WithWords({name})) {
+      if (candidates.size() >= kMaxFiles) break;
+      if (file != function.file) candidates.push_back(file);
+    }
+  }
+  for (const FileId id : candidates) {
+    const SourceFile* file = Get(id);
+    if (file == nullptr) continue;
+    for (const Occurrence& occurrence : file->bindings.occurrences) {
+      if (calls.size() >= kMaxCalls) break;
+      if (occurrence.role != NameRole::kCall || file->bindings.TextOf(occurrence) != name) continue;
+      const ExprId named = file->syntax.NamedAt(occurrence.begin);
+      const ExprId call = named == kNoExpr ? kNoExpr : file->syntax[named].parent;
+      if (call != kNoExpr && file->syntax[call].kind == ExprKind::kCall && file->syntax.ChildOf(call, 0) == named)
+        calls.push_back({id, call});
+    }
+  }
+  calls_by_name_[std::string(name)] = calls;
+  return calls;
+}
+
+Workspace::Workspace(Settings settings) : impl_(std::make_unique<Impl>(std::move(settings))) {}
+Workspace::~Workspace() = default;
+
+FileId Workspace::FileOf(Text path) { return impl_->files.NumberOf(path); }
+const std::string& Workspace::PathOf(FileId file) const { return impl_->files.PathOf(file); }
+
+Position Workspace::PlaceOf(FileId file, uint32_t offset) {
+  const SourceFile* source = impl_->Get(file);
+  return source == nullptr ? Position{1, 1} : source->PlaceOf(offset);
+}
+
+uint32_t Workspace::OffsetOf(FileId file, int line, int column) {
+  const SourceFile* source = impl_->Get(file);
+  return source == nullptr ? 0 : source->OffsetOf(line, column);
+}
+
+std::string Workspace::LineOf(FileId file, uint32_t offset) {
+  const SourceFile* source = impl_->Get(file);
+  if (source == nullptr) return {};
+  const Text text = source->text();
+  offset = std::min<uint32_t>(offset, static_cast<uint32_t>(text.size()));
+  size_t begin = offset, end = offset;
+  while (begin > 0 && text[begin - 1] != '\n' && text[begin - 1] != '\r') --begin;
+  while (end < text.size() && text[end] != '\n' && text[end] != '\r') ++end;
+  return std::string(text.substr(begin, end - begin));
+}
+
+bool Workspace::CanRead(FileId file) { return impl_->Get(file) != nullptr; }
+
+void Workspace::Open(FileId file, std::string text) {
+  impl_->files.Open(file, std::move(text));
+  impl_->Forget();
+}
+
+void Workspace::Change(FileId file, uint32_t begin, uint32_t end, Text text) {
+  impl_->files.Change(file, begin, end, text);
+  impl_->inference.Clear();
+}
+
+void Workspace::Close(FileId file) {
+  impl_->files.Close(file);
+  impl_->Forget();
+}
+
+void Workspace::Refresh() {
+  impl_->files.Refresh();
+  impl_->Forget();
+}
+
+bool Workspace::was_bounded() const { return impl_->is_bounded || impl_->inference.IsExhausted(); }
+size_t Workspace::ByteSize() const { return impl_->files.ByteSize(); }
+
+}  // namespace quillet

@@ -1,0 +1,300 @@
+// Uses of a name, everywhere, and what renaming it changes.
+#include <algorithm>
+#include <array>
+#include <unordered_map>
+
+#include "workspace/workspace_impl.h"
+
+namespace quillet {
+
+// Whether a type that every program uses has an attribute of this name.
+bool Workspace::Impl::IsCommonAttribute(Text name) {
+  const auto [at, is_new] = common_.try_emplace(std::string(name), false);
+  if (!is_new) return at->second;
+  static constexpr std::array<Text, 9> kClasses{"str",   "list", "dict",  "set",      "tuple",
+                                                "bytes", "int",  "float", "frozenset"};
+  bool is_common = false;
+  for (const Text cls : kClasses) {
+    const ClassId id = inference.ClassNamed("builtins", cls);
+    is_common = is_common || (id != kNoId && inference.FindMember(id, name).has_value());
+  }
+  for (const Text cls : {Text("IO"), Text("Generator")}) {
+    const ClassId id = inference.ClassNamed("typing", cls);
+    is_common = is_common || (id != kNoId && inference.FindMember(id, name).has_value());
+  }
+  common_[std::string(name)] = is_common;
+  return is_common;
+}
+
+bool Workspace::Impl::Meets(const Entities& use, const std::vector<Entity>& targets, Certainty& certainty) {
+  bool has_met = false;
+  certainty = Certainty::kByName;
+  const auto meet = [&](Certainty found) {
+    has_met = true;
+    certainty = std::min(certainty, found);
+  };
+  for (const Entity& entity : use.found) {
+    for (const Entity& target : targets) {
+      if (entity == target) {
+        // One of several that it may be.
+        meet(use.doubt == 0 && use.found.size() == 1 ? Certainty::kCertain
+             : use.doubt == 0                        ? Certainty::kCertain
+                                                     : Certainty::kLikely);
+        continue;
+      }
+      if (entity.kind != Entity::kMember || target.kind != Entity::kMember || entity.b != target.b) continue;
+      const bool is_above = inference.IsSubclass(entity.a, target.a),
+                 is_below = inference.IsSubclass(target.a, entity.a);
+      if (!is_above && !is_below) continue;
+      // An attribute that a class above or below gives a value too is the same one; a method is another.
+      const Text name = inference.NameOfNumber(entity.b);
+      const auto is_method = [&](ClassId cls) {
+        const ClassInfo& info = inference.MembersOf(cls);
+        const SourceFile* file = Get(info.file);
+        const auto at = info.symbols.find(name);
+        if (at == info.symbols.end() || file == nullptr) return false;
+        return std::ranges::any_of(file->occurrences().Of(at->second), [&](uint32_t i) {
+          return file->bindings.occurrences[i].kind == NameKind::kFunction;
+        });
+      };
+      const bool overrides = is_method(entity.a) || is_method(target.a);
+      meet(overrides || use.doubt != 0 ? Certainty::kLikely : Certainty::kCertain);
+    }
+  }
+  return has_met;
+}
+
+std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, uint32_t index, bool everywhere) {
+  std::vector<Hit> hits;
+  const Occurrence occurrence = file.bindings.occurrences[index];
+  Entities wanted = inference.EntitiesOf(file, index);
+  const Text name = file.bindings.TextOf(occurrence);
+  // The name behind `as` is one of this file.
+  const uint32_t own_variable = file.bindings.VariableOf(occurrence);
+  if (own_variable != kNoIndex) {
+    for (const uint32_t i : file.occurrences().Of(own_variable)) {
+      const Occurrence& other = file.bindings.occurrences[i];
+      if (other.kind == NameKind::kImport && other.role == NameRole::kDefinition)
+        wanted.found.push_back({Entity::kVariable, file.id, own_variable});
+    }
+  }
+  if (wanted.found.empty()) {
+    // An attribute of what is not known: every one of its name.
+    if (!occurrence.is_attribute) return hits;
+  }
+  const bool is_by_name = wanted.found.empty();
+  bool is_local = !is_by_name;
+  bool has_member = is_by_name;
+  for (const Entity& entity : wanted.found) {
+    if (entity.kind == Entity::kMember) has_member = true;
+    if (entity.kind != Entity::kVariable) {
+      is_local = false;
+      continue;
+    }
+    const SourceFile* owner = Get(entity.a);
+    if (owner == nullptr) continue;
+    const NameScopeKind kind = owner->bindings.scopes[owner->bindings.symbols[entity.b].scope].kind;
+    const bool is_parameter = (owner->bindings.symbols[entity.b].uses & NameSymbol::kParameter) != 0;
+    if (entity.a != file.id ||
+        (kind != NameScopeKind::kFunction && kind != NameScopeKind::kLambda && kind != NameScopeKind::kComprehension) ||
+        is_parameter)
+      is_local = false;
+  }
+  std::vector<FileId> candidates;
+  if (is_local || !everywhere) {
+    candidates.push_back(file.id);
+  } else {
+    candidates = project.WithWords({name});
+    for (const Entity& entity : wanted.found) {
+      const FileId owner = entity.kind == Entity::kVariable ? entity.a
+                           : entity.kind == Entity::kMember ? inference.InfoOf(entity.a).file
+                                                            : kNoFile;
+      if (owner != kNoFile && std::ranges::find(candidates, owner) == candidates.end()) candidates.push_back(owner);
+    }
+    if (std::ranges::find(candidates, file.id) == candidates.end()) candidates.push_back(file.id);
+  }
+  // How many classes define an attribute of this name: what is used of an unknown receiver is likely the only one.
+  std::vector<Hit> unknown;
+  std::set<std::pair<FileId, uint32_t>> definers;
+  for (const FileId id : candidates) {
+    const SourceFile* source = Get(id);
+    if (source == nullptr) continue;
+    const Bindings& bindings = source->bindings;
+    uint32_t number = kNoIndex;
+    for (uint32_t i = 0; i < bindings.texts.size() && number == kNoIndex; ++i)
+      if (bindings.texts[i] == name) number = i;
+    if (number == kNoIndex) continue;
+    struct Known {
+      bool meets;
+      Certainty certainty;
+    };
+    std::unordered_map<uint32_t, Known> variables;
+    for (uint32_t i = 0; i < bindings.occurrences.size(); ++i) {
+      const Occurrence& other = bindings.occurrences[i];
+      if (other.text != number) continue;
+      inference.Begin();
+      const uint32_t variable = bindings.VariableOf(other);
+      Certainty certainty = Certainty::kCertain;
+      bool meets = false;
+      if (has_member && variable != kNoIndex && other.kind != NameKind::kNone) {
+        const uint32_t scope = bindings.ScopeOf(other);
+        if (bindings.scopes[scope].kind == NameScopeKind::kClass) definers.emplace(id, scope);
+      }
+      if (is_by_name) {
+        if (other.is_attribute ||
+            (variable != kNoIndex && bindings.scopes[bindings.symbols[variable].scope].kind == NameScopeKind::kClass))
+          hits.push_back({AtOccurrence(*source, i, Certainty::kByName), id, i});
+        continue;
+      }
+      if (variable != kNoIndex && other.role != NameRole::kImport) {
+        const auto known = variables.find(variable);
+        if (known != variables.end()) {
+          meets = known->second.meets;
+          certainty = known->second.certainty;
+        } else {
+          Entities use = inference.EntitiesOf(*source, i);
+          use.found.push_back({Entity::kVariable, id, variable});
+          meets = Meets(use, wanted.found, certainty);
+          variables.emplace(variable, Known{meets, certainty});
+        }
+      } else {
+        const Entities use = inference.EntitiesOf(*source, i);
+        meets = Meets(use, wanted.found, certainty);
+        if (!meets && use.found.empty() && has_member && (other.is_attribute || other.role == NameRole::kKeyword)) {
+          if (other.is_attribute) {
+            Location location = AtOccurrence(*source, i, Certainty::kByName);
+            unknown.push_back({location, id, i});
+          }
+          continue;
+        }
+      }
+      if (meets) hits.push_back({AtOccurrence(*source, i, certainty), id, i});
+    }
+    // Names in `__all__`.
+    for (const Entity& entity : wanted.found) {
+      if (entity.kind != Entity::kVariable && entity.kind != Entity::kModule) continue;
+      for (StmtId stmt = 1; stmt < source->syntax.stmts.size(); ++stmt) {
+        const Stmt& at = source->syntax.stmt(stmt);
+        const auto exprs = source->syntax.ExprsOf(at);
+        if ((at.kind != StmtKind::kAssign && at.kind != StmtKind::kAugmentedAssign) || exprs.size() != 2 ||
+            source->syntax.NameOf(exprs[0]).size() + source->syntax.TextOf(source->syntax[exprs[0]]).size() == 0 ||
+            source->syntax.TextOf(source->syntax[exprs[0]]) != "__all__")
+          continue;
+        for (const ExprId item : source->syntax.ChildrenOf(exprs[1])) {
+          const Text text = source->syntax.TextOf(source->syntax[item]);
+          if (source->syntax[item].kind != ExprKind::kString || text.size() != name.size() + 2 ||
+              text.substr(1, name.size()) != name)
+            continue;
+          const ModuleId module = modules.OfFile(id);
+          Certainty certainty = Certainty::kCertain;
+          if (module == kNoModule || !Meets(inference.EntitiesInModule(module, name), wanted.found, certainty))
+            continue;
+          Location location;
+          location.file = id;
+          location.begin = source->syntax[item].begin + 1;
+          location.end = location.begin + static_cast<uint32_t>(name.size());
+          location.role = "read";
+          location.certainty = certainty;
+          hits.push_back({location, id, kNoIndex});
+        }
+      }
+      break;
+    }
+  }
+  if (!unknown.empty()) {
+    const bool is_special = name.starts_with("__") && name.ends_with("__");
+    const bool is_unique = definers.size() <= 1 && !is_special && !IsCommonAttribute(name);
+    for (Hit& hit : unknown) {
+      if (is_unique) hit.location.certainty = Certainty::kLikely;
+      hits.push_back(hit);
+    }
+  }
+  return hits;
+}
+
+std::vector<Location> Workspace::References(FileId id, uint32_t offset, bool everywhere) {
+  Impl& in = *impl_;
+  in.Begin();
+  const SourceFile* file = in.Get(id);
+  if (file == nullptr) return {};
+  const uint32_t index = in.OccurrenceAt(*file, offset);
+  if (index == kNoIndex) return {};
+  std::vector<Location> found;
+  for (const Impl::Hit& hit : in.Uses(*file, index, everywhere)) found.push_back(hit.location);
+  in.Sort(found);
+  return found;
+}
+
+Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_certain) {
+  Impl& in = *impl_;
+  in.Begin();
+  Rename rename;
+  const SourceFile* file = in.Get(id);
+  const uint32_t index = file == nullptr ? kNoIndex : in.OccurrenceAt(*file, offset);
+  if (index == kNoIndex) {
+    rename.problem = "there is no name here";
+    return rename;
+  }
+  const bool is_identifier = !name.empty() && CodeOfText(name) == tok::NAME;
+  if (!is_identifier) {
+    rename.problem = "'" + std::string(name) + "' is no name that code can use";
+    return rename;
+  }
+  const Occurrence occurrence = file->bindings.occurrences[index];
+  const Text old_name = file->bindings.TextOf(occurrence);
+  const Entities wanted = in.inference.EntitiesOf(*file, index);
+  if (wanted.found.empty()) {
+    rename.problem = "nothing is known of what '" + std::string(old_name) + "' stands for here";
+    return rename;
+  }
+  for (const Entity& entity : wanted.found) {
+    if (entity.kind == Entity::kModule) {
+      rename.problem = "'" + std::string(old_name) + "' is a module: rename its file";
+      return rename;
+    }
+    for (const Binding& binding : in.inference.BindingsOf(entity)) {
+      if (!in.IsProject(binding.file)) {
+        rename.problem =
+            "'" + std::string(old_name) + "' is defined outside of the project, in " + in.files.PathOf(binding.file);
+        return rename;
+      }
+    }
+  }
+  std::vector<Impl::Hit> hits = in.Uses(*file, index, true);
+  for (const Impl::Hit& hit : hits) {
+    if (only_certain && hit.location.certainty != Certainty::kCertain) continue;
+    if (!in.IsProject(hit.file)) continue;
+    const SourceFile* source = in.Get(hit.file);
+    const Text there(source->text().data() + hit.location.begin, hit.location.end - hit.location.begin);
+    if (there != old_name) continue;
+    // A name that the scope has already would be taken for this one.
+    if (hit.occurrence != kNoIndex && source->bindings.occurrences[hit.occurrence].has_symbol) {
+      const uint32_t scope = source->bindings.ScopeOf(source->bindings.occurrences[hit.occurrence]);
+      const uint32_t variable = source->bindings.VariableOf(source->bindings.occurrences[hit.occurrence]);
+      const uint32_t owner = source->bindings.symbols[variable].scope;
+      for (const uint32_t at : {scope, owner}) {
+        for (uint32_t symbol = source->bindings.scopes[at].first_symbol; symbol != kNoIndex;
+             symbol = source->bindings.symbols[symbol].next) {
+          if (source->bindings.texts[source->bindings.symbols[symbol].name] != name) continue;
+          const Position place = source->PlaceOf(hit.location.begin);
+          rename.problem = "'" + std::string(name) + "' means something else already in " + source->path +
+                           ", at line " + std::to_string(place.line);
+          rename.edits.clear();
+          return rename;
+        }
+      }
+    }
+    rename.edits.push_back({hit.file, hit.location.begin, hit.location.end, std::string(name)});
+  }
+  std::ranges::sort(rename.edits, [&](const TextEdit& a, const TextEdit& b) {
+    if (a.file != b.file) return in.files.PathOf(a.file) < in.files.PathOf(b.file);
+    return a.begin < b.begin;
+  });
+  const auto rest = std::ranges::unique(
+      rename.edits, [](const TextEdit& a, const TextEdit& b) { return a.file == b.file && a.begin == b.begin; });
+  rename.edits.erase(rest.begin(), rest.end());
+  if (rename.edits.empty()) rename.problem = "nothing that is certain is to be renamed";
+  return rename;
+}
+
+}  // namespace quillet

@@ -1,0 +1,101 @@
+// The parts that questions share: the program, and how its answers are put together.
+#pragma once
+
+#include <chrono>
+#include <functional>
+#include <map>
+#include <set>
+#include <string>
+#include <unordered_set>
+#include <vector>
+
+#include "workspace/inference.h"
+#include "workspace/project_files.h"
+#include "workspace/questions.h"
+
+namespace quillet {
+
+class Workspace::Impl final : public CallerSource {
+ public:
+  explicit Impl(Settings settings);
+
+  std::vector<ExprPlace> CallsOf(const FunctionInfo& function) override;
+
+  // Begins a question: files that changed are read again.
+  void Begin();
+  void Forget();
+  const SourceFile* Get(FileId file) { return files.Get(file); }
+  // Whether a file lies below a root of the project.
+  bool IsProject(FileId file);
+
+  // ---- locations.cc ----
+  Location At(const Binding& binding, Certainty certainty);
+  Location AtOccurrence(const SourceFile& file, uint32_t index, Certainty certainty);
+  std::vector<Location> LocationsOf(const Entities& entities, bool follows_source = true);
+  // Where the source of a library's module says what its stub declares.
+  Binding SourceOf(Binding binding);
+  void Sort(std::vector<Location>& locations) const;
+  // Definitions of attributes of a name in the project, where nothing is known of the receiver.
+  std::vector<Location> MembersNamed(Text name);
+  uint32_t OccurrenceAt(const SourceFile& file, uint32_t offset);
+
+  // ---- references.cc ----
+  struct Hit {
+    Location location;
+    FileId file;
+    uint32_t occurrence;
+  };
+  std::vector<Hit> Uses(const SourceFile& file, uint32_t occurrence, bool everywhere);
+  // How a use's entities meet those asked for: nothing, or a certainty.
+  bool Meets(const Entities& use, const std::vector<Entity>& targets, Certainty& certainty);
+  bool IsCommonAttribute(Text name);
+
+  // ---- describe.cc ----
+  std::string TextOfType(TypeId type, bool is_short = false, int depth = 0);
+  std::string TextOfSet(TypeSetId set, bool is_short = false, int depth = 0);
+  std::vector<std::string> TextsOf(Value value, bool is_short = false);
+  std::string TextOfFunction(FunctionId function, bool is_bound, bool has_name, bool is_short, int depth = 0);
+  std::string TextOfParameter(const FunctionInfo& info, size_t index, bool is_short);
+  std::string DocumentationOf(FileId file, StmtId stmt);
+  std::string DocumentationOf(TypeId type);
+  std::string DocumentationOf(const Entity& entity);
+  std::string KindOf(TypeId type, bool is_member);
+  Value ValueAt(const SourceFile& file, uint32_t occurrence);
+
+  // ---- complete.cc ----
+  void AddMembers(Value receiver, Text prefix, std::vector<Completion>& found);
+  void AddNames(const SourceFile& file, uint32_t offset, Text prefix, std::vector<Completion>& found);
+  void AddModules(ModuleId package, Text prefix, std::vector<Completion>& found);
+  void AddModuleNames(ModuleId module, Text prefix, std::vector<Completion>& found, bool with_private);
+  void AddKeywords(const SourceFile& file, uint32_t offset, Text prefix, std::vector<Completion>& found);
+  std::string KindOfSymbol(const SourceFile& file, uint32_t symbol, bool in_class);
+
+  // ---- calls ----
+  struct Callee {
+    Binding binding;
+    std::string name;
+    Certainty certainty;
+  };
+  std::vector<Callee> CalleesOf(const SourceFile& file, ExprId call);
+  std::string QualifiedName(const Binding& binding);
+  std::string NameOfScope(const SourceFile& file, uint32_t scope);
+  // The function around a place, the module's body for kModuleStmt.
+  StmtId FunctionAround(const SourceFile& file, uint32_t offset);
+
+  Settings settings;
+  Files files;
+  Modules modules;
+  ProjectFiles project;
+  Inference inference;
+  bool is_bounded = false;
+  std::unique_ptr<FileAnalyzer> analyzer;  // made when it is first needed
+
+ private:
+  std::chrono::steady_clock::time_point last_refresh_{};
+  std::unordered_map<std::string, std::vector<ExprPlace>> calls_by_name_;
+  std::unordered_map<std::string, bool> common_;
+};
+
+inline Certainty CertaintyOf(uint8_t doubt) { return doubt == 0 ? Certainty::kCertain : Certainty::kLikely; }
+
+}  // namespace quillet
