@@ -102,11 +102,12 @@ class Matcher {
   }
 
   // Whether the name is that of a module and of what is imported from it, which the detail has with a blank
-  // between them.
+  // between them. Dots in front of a module say where it lies, and need not be asked for.
   bool IsImportedBy(Text detail) const {
     const size_t blank = detail.rfind(' ');
-    return has_member_ && blank != Text::npos && detail.substr(0, blank) == outer_ &&
-           detail.substr(blank + 1) == member_;
+    if (!has_member_ || blank == Text::npos || detail.substr(blank + 1) != member_) return false;
+    const Text module = detail.substr(0, blank);
+    return module == outer_ || module.substr(std::min(module.find_first_not_of('.'), module.size())) == outer_;
   }
 
   bool IsScopeOfName(Text scope) const {
@@ -232,7 +233,7 @@ class QuestionWriter : public FileWriter {
       SortAndUnite();
       AddOccurrences(file, scopes);
       std::erase_if(answers_, [](const Answer& answer) { return answer.line == 0; });
-      if (answers_.size() != record_count_) SortAndUnite();
+      if (answers_.size() != record_count_ || !moved_.empty()) SortAndUnite();
     }
     format_->Write(input, file.source(), answers_, out);
   }
@@ -259,10 +260,23 @@ class QuestionWriter : public FileWriter {
   void AddOccurrences(const FileAnalyzer& file, const ScopeNames& scopes) {
     // Where a record told of what, to the first of its answers; names are those of the question.
     told_.clear();
+    told_behind_.clear();
+    copies_.clear();
     texts_.Reset();
-    for (uint32_t i = 0; i < answers_.size(); ++i) told_.try_emplace(PlaceOf(answers_[i]), i);
-    record_count_ = answers_.size();
     const SourceText& source = file.source();
+    for (uint32_t i = 0; i < answers_.size(); ++i) {
+      told_.try_emplace(PlaceOf(answers_[i]), i);
+      const Text name = answers_[i].name;
+      if (name.find_first_of(kTrailers) == Text::npos) continue;
+      if (source.Holds(name.data())) {
+        const size_t last = name.rfind('.') + 1;
+        told_behind_.try_emplace(static_cast<uint32_t>(name.data() + last - source.begin()), i);
+      } else {
+        copies_.push_back(i);
+      }
+    }
+    record_count_ = answers_.size();
+    moved_.clear();
     const Bindings& bindings = binder_.Bind(source, file.rows());
     const std::span<const LineRow> rows = file.rows();
     size_t row = 0;
@@ -281,7 +295,7 @@ class QuestionWriter : public FileWriter {
       answer.flags = static_cast<uint8_t>(occurrence.flags);
       answer.name = name_;
       const bool is_wanted = (question_.uses & UsesOf(occurrence, bindings, source)) != 0;
-      if (TellRole(answer, is_wanted) || !is_wanted) continue;
+      if (TellRole(answer, is_wanted) || TellRoleBehind(occurrence.begin, rows[row], answer) || !is_wanted) continue;
       answer.is_parameter = occurrence.kind == NameKind::kParameter;
       answer.scope = scopes.names()[ScopeAt(bindings.occurrences[root], answer.is_parameter, bindings, scopes, row)];
       if (!matcher_.TakesScope(answer.scope)) continue;
@@ -289,6 +303,10 @@ class QuestionWriter : public FileWriter {
       answer.is_record = false;
       answer.name = texts_.Copy(name_);
       answers_.push_back(answer);
+    }
+    for (const Move& move : moved_) {
+      answers_[move.answer].line = move.line;
+      answers_[move.answer].column = move.column;
     }
   }
 
@@ -307,6 +325,38 @@ class QuestionWriter : public FileWriter {
       told = true;
     }
     return told;
+  }
+
+  // The same for records of what stands behind a call or a subscript, which have the text of that in their name: they
+  // are moved to where the names begin. A text that the statement spells another way (with blanks or in several
+  // lines) is known by its end and its statement.
+  bool TellRoleBehind(uint32_t begin, const LineRow& row, const Answer& occurrence) {
+    if (!occurrence.name.starts_with('.')) return false;
+    if (const auto found = told_behind_.find(begin); found != told_behind_.end()) {
+      MoveTo(occurrence, found->second);
+      return true;
+    }
+    const Text last = occurrence.name.substr(occurrence.name.rfind('.'));
+    auto copy = std::lower_bound(copies_.begin(), copies_.end(), row.first_line + 1,
+                                 [this](uint32_t i, uint32_t line) { return answers_[i].line < line; });
+    for (size_t tries = 0; tries < kMostCompared && copy != copies_.end(); ++tries, ++copy) {
+      if (answers_[*copy].line > row.last_line + 1) break;
+      if (answers_[*copy].role != 0 || !answers_[*copy].name.ends_with(last)) continue;
+      MoveTo(occurrence, *copy);
+      return true;
+    }
+    return false;
+  }
+
+  // With all records of its place and name.
+  void MoveTo(const Answer& occurrence, uint32_t first) {
+    const Answer& record = answers_[first];
+    for (uint32_t i = first; i < record_count_ && PlaceOf(answers_[i]) == PlaceOf(record); ++i) {
+      if (answers_[i].name != record.name) continue;
+      answers_[i].role = occurrence.role;
+      answers_[i].flags = occurrence.flags;
+      moved_.push_back({i, occurrence.line, occurrence.column});
+    }
   }
 
   static uint64_t PlaceOf(const Answer& answer) { return uint64_t{answer.line} << 32 | answer.column; }
@@ -342,6 +392,12 @@ class QuestionWriter : public FileWriter {
   }
 
   static constexpr size_t kMostCompared = 1000;
+  static constexpr Text kTrailers = "([{\"'";
+
+  struct Move {
+    uint32_t answer;
+    uint32_t line, column;
+  };
 
   const Question question_;
   const Matcher matcher_;
@@ -350,6 +406,9 @@ class QuestionWriter : public FileWriter {
   const std::unique_ptr<AnswerFormat> format_;
   std::vector<Answer> answers_;
   std::unordered_map<uint64_t, uint32_t> told_;
+  std::unordered_map<uint32_t, uint32_t> told_behind_;  // by the offset of the last name
+  std::vector<uint32_t> copies_;                        // answers whose name the source does not hold
+  std::vector<Move> moved_;
   size_t record_count_ = 0;
   std::string name_;
   TextArena texts_;

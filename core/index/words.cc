@@ -28,9 +28,17 @@ uint64_t Mixed(uint64_t hash, uint64_t value) {
   return hash ^ hash >> 32;
 }
 
+// Whether what stands behind a name leaves it the whole of what is raised, or of what is called for it.
+bool EndsRaised(Text behind) {
+  behind = behind.substr(std::min(behind.find_first_not_of(" \t\f\\"), behind.size()));
+  if (behind.empty() || Text("\r\n#();,").find(behind.front()) != Text::npos) return true;
+  return behind.starts_with("from") && (behind.size() == 4 || !IsWordByte(behind[4]));
+}
+
 // Whether `raise` stands in front of a name, or of what it is an attribute of.
 bool IsRaised(const Occurrence& occurrence, const Bindings& bindings, Text text) {
   constexpr Text kRaise = "raise";
+  if (!EndsRaised(text.substr(bindings.EndOf(occurrence)))) return false;
   const Occurrence* root = &occurrence;
   while (true) {
     const uint32_t receiver = bindings.ReceiverOf(static_cast<uint32_t>(root - bindings.occurrences.data()));

@@ -96,6 +96,21 @@ def test_another_version_of_python_is_analysed_again_and_kept(tmp_path: Path) ->
         assert index.python() == "2.7"
 
 
+def test_two_installations_of_one_build_share_an_index(tmp_path: Path, monkeypatch: pytest.MonkeyPatch) -> None:
+    from quillet import tarvex
+    from quillet.index.writing import engine_mark
+
+    mark = engine_mark()
+    assert tarvex.__file__
+    copy = tmp_path / "copy.so"
+    copy.write_bytes(Path(tarvex.__file__).read_bytes())
+    age(copy)
+    monkeypatch.setattr(tarvex, "__file__", str(copy))
+    assert engine_mark() == mark
+    copy.write_bytes(copy.read_bytes() + b"\0")
+    assert engine_mark() != mark
+
+
 def test_files_that_are_gone_leave_the_index(tmp_path: Path) -> None:
     (tmp_path / "sub").mkdir()
     for name in ("a.py", "sub/b.py", "sub/c.py"):

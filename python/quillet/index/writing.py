@@ -56,11 +56,14 @@ def check_place(path: str) -> None:
 
 
 def engine_mark() -> str:
-    """What tells one build of the engine from another, whose words of a file may be others."""
+    """What tells one build of the engine from another, whose words of a file may be others.
+
+    It is the same for two installations of one build, which would otherwise undo each other's work in turn.
+    """
     from quillet import tarvex
 
-    status = os.stat(tarvex.__file__ or sys.executable)
-    return f"{status.st_size}-{status.st_mtime_ns}"
+    with open(tarvex.__file__ or sys.executable, "rb") as file:
+        return f"{_host.HashOfSource(file.read()):016x}"
 
 
 # ---- the lock ----
