@@ -231,7 +231,9 @@ class Inference {
   FileId FileOfModule(ModuleId module) const;
   uint32_t NumberOfName(Text name);
   Text NameOfNumber(uint32_t number) const { return names_[number]; }
-  Text LiteralOf(const Type& type) const { return type.b != 0 ? Text(literals_[type.b - 1]) : kNoText; }
+  Text LiteralOf(const Type& type) const {
+    return type.kind == TypeKind::kInstance && type.b != 0 ? Text(literals_[type.b - 1]) : kNoText;
+  }
 
   TypeId InstanceOf(ClassId cls, std::span<const TypeSetId> args = {}) {
     return types_.Add(TypeKind::kInstance, cls, 0, args);

@@ -29,9 +29,9 @@ std::vector<Problem> Workspace::Problems(FileId id) {
       for (size_t row = 0; row < results.size(); ++row) {
         if (results[row].error < 0) continue;
         const FileAnalyzer::Failure& failure = in.analyzer->errors()[static_cast<size_t>(results[row].error)];
-        const int line = static_cast<int>(in.analyzer->rows()[row].first_line) + failure.place.line;
+        const Position place = in.analyzer->ErrorPosition(row);
         Problem problem;
-        problem.begin = file->OffsetOf(line, failure.place.col);
+        problem.begin = file->OffsetOf(place.line + 1, place.col + 1);
         const uint32_t token = in.OccurrenceAt(*file, problem.begin);
         problem.end = token != kNoIndex && file->bindings.occurrences[token].begin == problem.begin
                           ? file->bindings.EndOf(file->bindings.occurrences[token])
