@@ -1,6 +1,7 @@
-// What walks over files asks of the core: whether ignore rules exclude a path.
+// Workspaces, and what walks over files asks of the core: whether ignore rules exclude a path.
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
+#include "bindings/workspace_object.h"
 #include "workspace/ignore_rules.h"
 
 namespace quillet::host {
@@ -27,6 +28,8 @@ void BindWorkspace(nb::module_& tarvex) {
           },
           nb::arg("path"), nb::arg("is_folder"),
           "Whether the last rule that matches excludes a path, given from their folder; None where none matches.");
+  BindEnvironment(host);
+  BindQuestions(host);
 }
 
 }  // namespace quillet::host

@@ -1,8 +1,9 @@
 """Per-statement analysis of Python code: what each statement tells about names.
 
 `analyze` takes a whole source, `analyze_files` many files on all cores, and `bind` says which variable each
-name of a source is. `quillet.tarvex` is the engine below, which takes one logical line at a time;
-`quillet.logicalline`, `quillet.optpgen`, `quillet.symbolinfo` and `quillet.strutils` are what it works with.
+name of a source is; `Workspace` answers questions about whole programs. `quillet.tarvex` is the engine below,
+which takes one logical line at a time; `quillet.logicalline`, `quillet.optpgen`, `quillet.symbolinfo` and
+`quillet.strutils` are what it works with.
 """
 
 from __future__ import annotations
@@ -14,24 +15,50 @@ if TYPE_CHECKING:
     from quillet._names import FileBindings, FileOccurrences, Occurrence, Scope, Symbol, bind
     from quillet._records import Record, RecordKind
     from quillet._source import SourceEncodingError
+    from quillet._workspace import (
+        Call,
+        Completion,
+        Edit,
+        Hover,
+        Location,
+        OutlineItem,
+        Parameter,
+        Problem,
+        RenameError,
+        Signature,
+        Workspace,
+        WorkspaceSymbol,
+    )
     from quillet.host import Analysis, Line, analyze, analyzer_for, language_version
 
 __all__ = [
     "Analysis",
+    "Call",
+    "Completion",
     "Definition",
+    "Edit",
     "FileAnalyses",
     "FileAnalysis",
     "FileBindings",
     "FileOccurrences",
     "FileRecord",
     "FileRecords",
+    "Hover",
     "Line",
+    "Location",
     "Occurrence",
+    "OutlineItem",
+    "Parameter",
+    "Problem",
     "Record",
     "RecordKind",
+    "RenameError",
     "Scope",
+    "Signature",
     "SourceEncodingError",
     "Symbol",
+    "Workspace",
+    "WorkspaceSymbol",
     "analyze",
     "analyze_files",
     "analyzer_for",
@@ -40,19 +67,31 @@ __all__ = [
 ]
 
 _HOMES = {
+    "Call": "_workspace",
+    "Completion": "_workspace",
     "Definition": "_batch",
+    "Edit": "_workspace",
     "FileAnalyses": "_batch",
     "FileAnalysis": "_batch",
     "FileBindings": "_names",
     "FileOccurrences": "_names",
     "FileRecord": "_batch",
     "FileRecords": "_batch",
+    "Hover": "_workspace",
+    "Location": "_workspace",
     "Occurrence": "_names",
+    "OutlineItem": "_workspace",
+    "Parameter": "_workspace",
+    "Problem": "_workspace",
     "Record": "_records",
     "RecordKind": "_records",
+    "RenameError": "_workspace",
     "Scope": "_names",
+    "Signature": "_workspace",
     "SourceEncodingError": "_source",
     "Symbol": "_names",
+    "Workspace": "_workspace",
+    "WorkspaceSymbol": "_workspace",
     "analyze_files": "_batch",
     "bind": "_names",
 }
