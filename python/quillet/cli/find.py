@@ -45,6 +45,7 @@ def ask(
     index: str | None,
     roots: Sequence[str],
     exclude: Sequence[str],
+    resolve: bool,
     **roles: bool,
 ) -> int:
     """Runs the command with the parameters of `find_options` and returns its exit code."""
@@ -57,6 +58,14 @@ def ask(
         if any("\ud800" <= char <= "\udfff" for char in text):
             return fail(ValueError(f"{text}: is no UTF-8, which every name is"))
     wanted = tuple(role for role in ROLES if roles[f"role_{role}"])
+    if resolve:
+        others = {"return": returns, "scope": scope, "match": match, "any": any_receiver, "path": path, "long": long}
+        for option, given in {**others, "index": index, "exclude": exclude}.items():
+            if given:
+                return fail(ValueError(f"--{option} and --resolve do not go together"))
+        from quillet.cli.questions import resolve as run_resolved
+
+        return run_resolved(name, roles=wanted, roots=roots, as_json=as_json, count=count, files=files)
     if any_receiver and match is None:
         match = "suffix"
     query = Query(name, match or match_of(name), wanted, returns, scope, path)

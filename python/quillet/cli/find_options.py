@@ -89,6 +89,12 @@ OPTIONS = (
     Option(("--long",), "long", "Below each place what is said of the name there."),
     Option(("-c", "--count"), "count", "Only the number of places."),
     Option(("-l", "--files"), "files", "Only the names of the files."),
+    Option(
+        ("--resolve",),
+        "resolve",
+        "NAME is what the program defines by it, such as Shop.total: who means that very thing, without an index;"
+        " --root is a folder of the program.",
+    ),
     INDEX_OPTION,
     ROOT_OPTION,
 )

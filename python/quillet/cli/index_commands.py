@@ -110,6 +110,7 @@ def find(name: str, **parameters: Any) -> None:
         quillet find .total --set
         quillet find 'test_*' --set --scope TestShop
         quillet find Shop.price --return --long
+        quillet find Shop.total --resolve
     """
     from quillet.cli.find import ask
 

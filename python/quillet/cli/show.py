@@ -98,3 +98,12 @@ def statement_text(path: str, analysis: Analysis, line: Line, style: Style) -> s
         source = source[: _WINDOW - 1] + "…"
     more = " …" if line.last_line > line.first_line else ""
     return f"{style.place(f'{printable(path)}:{line.first_line}:')} {source}{more}\n"
+
+
+def place_text(path: str, line: int, column: int, source: bytes, style: Style) -> str:
+    """`path:line:column: source line`, as compilers write it."""
+    text = printable(source.decode("utf-8", "replace").strip())
+    if len(text) > _WINDOW:
+        text = text[: _WINDOW - 1] + "…"
+    place = style.place(f"{printable(path)}:{line}:{column}:")
+    return f"{place} {text}".rstrip()
