@@ -224,7 +224,9 @@ Value Inference::Substitute(Value value, const Solution& solution, bool drops_un
       bool has_other = false;
       for (size_t i = 0; i < t.args_count; ++i) {
         const TypeSetId arg = types_.ArgOf(id, i);
-        args.push_back(Substitute({arg, 0}, solution, drops_unsolved, depth + 1).set);
+        // The variables of a callable are those of its calls.
+        const bool drops = drops_unsolved && t.kind != TypeKind::kCallable;
+        args.push_back(Substitute({arg, 0}, solution, drops, depth + 1).set);
         has_other = has_other || args.back() != arg;
       }
       if (has_other) {
@@ -341,6 +343,7 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
   std::vector<Value> given(parameters.size());
   std::vector<bool> is_given(parameters.size(), false);
   int score = 2;
+  bool fits = true;
   const auto kind_of = [&](size_t i) { return static_cast<ParameterKind>(syntax[parameters[i]].op); };
   const auto give = [&](size_t i, Value value, bool is_many) {
     is_given[i] = true;
@@ -362,7 +365,7 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
         while (next < parameters.size() && kind_of(next) == ParameterKind::kSlash) ++next;
         if (next >= parameters.size() || kind_of(next) == ParameterKind::kBareStar ||
             kind_of(next) == ParameterKind::kDoubleStar) {
-          if (argument.kind == Argument::kPlain && !has_star) return -1;  // too many
+          if (argument.kind == Argument::kPlain && !has_star) fits = false;  // too many
           break;
         }
         const bool is_rest = kind_of(next) == ParameterKind::kStar;
@@ -382,14 +385,14 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
         give(i, ValueOfArgument(argument), true);
         is_found = true;
       }
-      if (!is_found) return -1;
+      if (!is_found) fits = false;
     } else {
       has_double_star = true;
     }
   }
   for (size_t i = 0; i < parameters.size(); ++i) {
     if (is_given[i] || kind_of(i) != ParameterKind::kPlain || syntax.ChildOf(parameters[i], 1) != kNoExpr) continue;
-    if (!has_star && !has_double_star) return -1;  // one is missing
+    if (!has_star && !has_double_star) fits = false;  // one is missing
     score = std::min(score, 1);
   }
   if (values != nullptr) {
@@ -414,7 +417,7 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
     }
     *values = std::move(given);
   }
-  return score;
+  return fits ? score : -1;
 }
 
 Value Inference::ResultOfFunctionCall(TypeId callee, std::vector<Argument>& arguments) {
@@ -457,11 +460,9 @@ Value Inference::ResultOfFunctionCall(TypeId callee, std::vector<Argument>& argu
   bool is_stated = false;
   const Value stated = StatedResult(id, kNoFrame, is_stated);
   if (is_stated && (stated.IsKnown() || (stated.doubt & Value::kOpen) == 0)) {
-    Value result = Substitute(stated, solution, false);
-    // What nothing says is nothing, except inside of the class or function whose variables they are.
-    return result;
+    return Substitute(stated, solution, true);
   }
-  const FrameId frame = score < 0 ? kNoFrame : FrameOf(id, t.b, values);
+  const FrameId frame = FrameOf(id, t.b, values);
   Value result = ResultIn(id, frame != kNoFrame ? frame : t.b);
   if (score < 0) result.doubt |= Value::kOpen;
   return Substitute(result, solution);
@@ -695,8 +696,15 @@ Value Inference::ResultOfType(TypeId callee, std::vector<Argument>& arguments, E
       const Value special = ResultOfSpecialCall(callee, arguments, place, is_special);
       return is_special ? special : ResultOfFunctionCall(callee, arguments);
     }
-    case TypeKind::kCallable:
-      return {types_.ArgOf(callee, 0), static_cast<uint8_t>(types_.ArgOf(callee, 0) == kNoTypes ? Value::kOpen : 0)};
+    case TypeKind::kCallable: {
+      Solution solution;
+      for (size_t i = 0; i + 1 < t.args_count && i < arguments.size(); ++i) {
+        if (arguments[i].kind != Argument::kPlain) break;
+        Solve(types_.ArgOf(callee, i + 1), ValueOfArgument(arguments[i]).set, solution);
+      }
+      const TypeSetId result = types_.ArgOf(callee, 0);
+      return Substitute({result, static_cast<uint8_t>(result == kNoTypes ? Value::kOpen : 0)}, solution, true);
+    }
     case TypeKind::kSpecial: {
       const auto form = static_cast<SpecialForm>(t.a);
       if (form == SpecialForm::kIdentity) return arguments.empty() ? kUnknown : ValueOfArgument(arguments[0]);

@@ -271,11 +271,22 @@ Value Workspace::Impl::ValueAt(const SourceFile& file, uint32_t index) {
   return value;
 }
 
+// At a closing bracket the expression that it ends.
+ExprId Workspace::Impl::ExpressionClosedAt(const SourceFile& file, uint32_t offset) {
+  const Text text = file.text();
+  if (offset >= text.size() || (text[offset] != ')' && text[offset] != ']' && text[offset] != '}')) return kNoExpr;
+  ExprId expr = file.syntax.ExpressionAt(offset + 1);
+  while (expr != kNoExpr && file.syntax[expr].end <= offset) expr = file.syntax[expr].parent;
+  return expr != kNoExpr && file.syntax[expr].end == offset + 1 ? expr : kNoExpr;
+}
+
 std::vector<std::string> Workspace::Types(FileId id, uint32_t offset) {
   Impl& in = *impl_;
   in.Begin();
   const SourceFile* file = in.Get(id);
   if (file == nullptr) return {};
+  if (const ExprId closed = in.ExpressionClosedAt(*file, offset); closed != kNoExpr)
+    return in.TextsOf(in.inference.ValueOf(id, closed));
   const uint32_t index = in.OccurrenceAt(*file, offset);
   if (index != kNoIndex) return in.TextsOf(in.ValueAt(*file, index));
   const ExprId expr = file->syntax.ExpressionAt(offset);

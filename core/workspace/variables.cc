@@ -86,6 +86,7 @@ std::vector<Binding> Inference::BindingsReaching(const SourceFile& file, uint32_
   if (scope.kind != NameScopeKind::kModule && scope.kind != NameScopeKind::kFunction &&
       scope.kind != NameScopeKind::kClass) {
     reached = own;
+    reached.insert(reached.end(), parameters.begin(), parameters.end());
     is_bound = true;
   } else if (!own.empty()) {
     const StmtId top = file.StmtOfScope(owner.scope);
