@@ -8,7 +8,7 @@ from __future__ import annotations
 
 import argparse
 import re
-from collections.abc import Iterable, Sequence
+from collections.abc import Callable, Iterable, Sequence
 from pathlib import Path
 from typing import Any, Protocol
 
@@ -252,7 +252,8 @@ def _ServerEngines() -> dict[str, type[ServerEngine]]:
     return {name: type(f"{name}Engine", (ServerEngine,), {"name": name}) for name in COMMANDS if name != "jedi"}
 
 
-ENGINES: dict[str, type[Engine]] = {"quillet": QuilletEngine, "jedi": JediEngine, **_ServerEngines()}
+# Each is made of the roots, an environment and a version.
+ENGINES: dict[str, Callable[..., Engine]] = {"quillet": QuilletEngine, "jedi": JediEngine, **_ServerEngines()}
 
 
 def AddEngine(parser: argparse.ArgumentParser) -> None:

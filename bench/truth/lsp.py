@@ -258,7 +258,8 @@ class LanguageServer:
         path = PathOf(uri)
         line = span["start"]["line"] + 1
         text = self._texts.Line(path, line)
-        return Found(path, line, *(FromUtf16(text, span[end]["character"]) for end in ("start", "end")))
+        begin, end = (FromUtf16(text, span[side]["character"]) for side in ("start", "end"))
+        return Found(path, line, begin, end)
 
 
 class Usage:

@@ -7,7 +7,6 @@ renames can also be done one after the other in a copy of the project, whose own
 from __future__ import annotations
 
 import argparse
-import ast
 import random
 import shlex
 import shutil
@@ -47,7 +46,7 @@ def Compiles(text: str) -> str | None:
     try:
         with warnings.catch_warnings():
             warnings.simplefilter("ignore")
-            ast.parse(text)
+            compile(text, "renamed", "exec", dont_inherit=True)
     except (SyntaxError, ValueError) as error:
         return str(error)
     return None

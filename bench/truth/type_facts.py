@@ -41,7 +41,7 @@ def Parts(text: str, separator: str) -> list[str]:
 
 def Returned(types: list[str]) -> list[str]:
     """What the functions among some types return: the members of what stands behind the last arrow outside brackets."""
-    found = []
+    found: list[str] = []
     for text in types:
         if text.startswith(("def ", "async def ")):
             depth = 0

@@ -547,6 +547,7 @@ def test_edits_of_a_line_do_not_move_each_other(tmp_path):
 def test_what_does_not_compile_is_said():
     assert renames.Compiles("x = 1\n") is None
     assert renames.Compiles("x = \n")
+    assert renames.Compiles("def f(a):\n    global a\n")  # which only a compiler sees
 
 
 # --- language servers
