@@ -18,7 +18,7 @@ from typing import NamedTuple
 
 from bench.truth.engine import ENGINES, AddEngine, Engine
 from bench.truth.halves import AddHalf, InHalf
-from bench.truth.places import Cut, Found, Place, ReadText
+from bench.truth.places import Call, Cut, Found, Place, ReadText
 from bench.truth.tally import AddFailures, Tally
 
 HOW_TO_GET = "git clone https://github.com/vitsalis/PyCG; the folder is PyCG/micro-benchmark/snippets"
@@ -108,8 +108,11 @@ class Program:
         path = Path(found.path)
         return None if path.is_relative_to(self.folder) else ForeignName(found)
 
-    def Caller(self, found: Found) -> str | None:
-        """Who calls, by a place that was given: that of a function's name, or of the call itself."""
+    def Callers(self, call: Call, function: Found) -> set[str | None]:
+        """Who calls: what is around each place where it does so, or else the function that was given for it."""
+        return {self.Around(site) for site in call.sites} or {self._Caller(function)}
+
+    def _Caller(self, found: Found) -> str | None:
         if found.kind == "module":
             return self._modules.get(found.path)
         function = self._by_place.get(found.place)
@@ -137,10 +140,11 @@ def ForeignName(found: Found) -> str:
     lines = Cut(ReadText(path))
     for number in range(found.line, 0, -1):
         line = lines[number - 1] if number <= len(lines) else ""
-        head = re.match(r"(\s*)(?:async\s+)?(?:def|class)\s+(\w+)", line)
-        if head and len(head[1]) < indent:
-            scopes.insert(0, head[2])
-            indent = len(head[1])
+        inside = len(line) - len(line.lstrip())
+        if line.strip() and inside < indent:
+            indent = inside
+            if head := re.match(r"\s*(?:async\s+)?(?:def|class)\s+(\w+)", line):
+                scopes.insert(0, head[1])
         if indent == 0:
             break
     name = lines[found.line - 1][found.column : found.end] if found.line <= len(lines) else ""
@@ -168,11 +172,13 @@ def Given(program: Program, engine: Engine) -> dict[Edge, str]:
 
     for function in program.functions:
         if not function.is_class:
-            for found in engine.Callees(function.place):
-                Add(function.name, program.Name(found), found.certainty)
+            for call in engine.Callees(function.place):
+                for caller in program.Callers(call, Found(*function.place, end=0)):
+                    Add(caller, program.Name(call.function), call.function.certainty)
         called = program.Name(Found(*function.place, end=function.place.column))
-        for found in engine.Callers(function.place):
-            Add(program.Caller(found), called, found.certainty)
+        for call in engine.Callers(function.place):
+            for caller in program.Callers(call, call.function):
+                Add(caller, called, call.function.certainty)
     return edges
 
 

@@ -7,15 +7,13 @@ buffers.
 from __future__ import annotations
 
 import argparse
-import re
 from collections.abc import Callable, Iterable, Sequence
 from pathlib import Path
 from typing import Any, Protocol
 
 from bench.truth.peers import COMMANDS, Start
-from bench.truth.places import Change, Found, Place, Texts
+from bench.truth.places import Call, Change, Found, Place, Texts
 
-_NAME_END = re.compile(r"\w+\Z")
 STRONG = ("certain", "likely")
 
 
@@ -38,9 +36,9 @@ class Engine(Protocol):
     def Rename(self, place: Place, new_name: str) -> list[Change] | None:
         """None where it is refused."""
 
-    def Callers(self, place: Place) -> list[Found]: ...
+    def Callers(self, place: Place) -> list[Call]: ...
 
-    def Callees(self, place: Place) -> list[Found]: ...
+    def Callees(self, place: Place) -> list[Call]: ...
 
     def Open(self, path: str, text: str) -> None: ...
 
@@ -70,12 +68,7 @@ class QuilletEngine:
     def Types(self, place: Place) -> list[str]:
         return list(self.workspace.types(*self._Asked(place)))
 
-    def TypesBefore(self, cursor: Place) -> list[str]:
-        line = self._texts.Line(cursor.path, cursor.line)
-        name = _NAME_END.search(line[: cursor.column])
-        if name or re.match(r"\w", line[cursor.column :]):
-            return self.Types(cursor._replace(column=name.start() if name else cursor.column))
-        return self.Types(cursor._replace(column=max(cursor.column - 1, 0)))
+    TypesBefore = Types  # a place is that of what it touches
 
     def Complete(self, place: Place) -> list[str]:
         return [completion.name for completion in self.workspace.complete(*self._Asked(place))]
@@ -92,11 +85,11 @@ class QuilletEngine:
             changes.append(Change(edit.path, edit.line, begin, end, edit.text))
         return changes
 
-    def Callers(self, place: Place) -> list[Found]:
-        return self._Found(self.workspace.callers(*self._Asked(place)))
+    def Callers(self, place: Place) -> list[Call]:
+        return self._Calls(self.workspace.callers(*self._Asked(place)))
 
-    def Callees(self, place: Place) -> list[Found]:
-        return self._Found(self.workspace.callees(*self._Asked(place)))
+    def Callees(self, place: Place) -> list[Call]:
+        return self._Calls(self.workspace.callees(*self._Asked(place)))
 
     def Open(self, path: str, text: str) -> None:
         self.workspace.open(path, text)
@@ -108,6 +101,9 @@ class QuilletEngine:
 
     def _Asked(self, place: Place) -> tuple[str, int, int]:
         return place.path, place.line, ByteColumn(self._texts.Line(place.path, place.line), place.column)
+
+    def _Calls(self, calls: Iterable[Any]) -> list[Call]:
+        return [Call(self._Found([each])[0], [site.place for site in self._Found(each.calls)]) for each in calls]
 
     def _Found(self, locations: Iterable[Any]) -> list[Found]:
         found = []
@@ -179,7 +175,7 @@ class JediEngine:
         found = self.References(place)
         return [Change(each.path, each.line, each.column, each.end, new_name) for each in found]
 
-    def Callers(self, _: Place) -> list[Found]:
+    def Callers(self, _: Place) -> list[Call]:
         return []
 
     Callees = Callers
@@ -228,10 +224,10 @@ class ServerEngine:
     def Rename(self, place: Place, new_name: str) -> list[Change] | None:
         return self._server.Rename(self._Opened(place), new_name)
 
-    def Callers(self, place: Place) -> list[Found]:
+    def Callers(self, place: Place) -> list[Call]:
         return self._server.Callers(self._Opened(place))
 
-    def Callees(self, place: Place) -> list[Found]:
+    def Callees(self, place: Place) -> list[Call]:
         return self._server.Callees(self._Opened(place))
 
     def Open(self, path: str, text: str) -> None:

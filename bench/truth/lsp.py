@@ -17,7 +17,7 @@ from pathlib import Path
 from typing import IO, Any
 from urllib.parse import unquote, urlsplit
 
-from bench.truth.places import Change, Found, Place, Texts
+from bench.truth.places import Call, Change, Found, Place, Texts
 
 
 class ServerError(Exception):
@@ -105,18 +105,21 @@ class LanguageServer:
             for found in [self._Found(uri, edit["range"])]
         ]
 
-    def Callers(self, place: Place) -> list[Found]:
+    def Callers(self, place: Place) -> list[Call]:
         return self._Calls("incomingCalls", "from", place)
 
-    def Callees(self, place: Place) -> list[Found]:
+    def Callees(self, place: Place) -> list[Call]:
         return self._Calls("outgoingCalls", "to", place)
 
-    def _Calls(self, question: str, end: str, place: Place) -> list[Found]:
+    def _Calls(self, question: str, end: str, place: Place) -> list[Call]:
         found = []
         try:
             for item in self.Ask("textDocument/prepareCallHierarchy", self._Position(place)) or ():
                 for call in self.Ask(f"callHierarchy/{question}", {"item": item}) or ():
-                    found.append(self._Found(call[end]["uri"], call[end]["selectionRange"]))
+                    function = self._Found(call[end]["uri"], call[end]["selectionRange"])
+                    path = PathOf(call["from"]["uri"]) if end == "from" else place.path
+                    sites = [self._Found(Path(path).as_uri(), span).place for span in call["fromRanges"]]
+                    found.append(Call(function, sites))
         except Refused:
             self.refused += 1
         return found

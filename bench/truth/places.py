@@ -42,6 +42,13 @@ class Found(NamedTuple):
         return f"{self.place} ({self.certainty})"
 
 
+class Call(NamedTuple):
+    """A function that calls, or is called, and where it does so; without `sites` it is not said where."""
+
+    function: Found
+    sites: list[Place]
+
+
 class Change(NamedTuple):
     """A piece of a line that a rename replaces."""
 

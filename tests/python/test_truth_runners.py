@@ -22,7 +22,7 @@ from bench.truth import (
     type_facts,
 )
 from bench.truth.engine import Answer, ByteColumn, Characters
-from bench.truth.places import Change, Found, Place, Texts
+from bench.truth.places import Call, Change, Found, Place, Texts
 
 ROOT = Path(__file__).parents[2]
 
@@ -179,9 +179,14 @@ def test_a_place_is_in_the_function_whose_body_it_is_in(program):
 
 def test_what_is_called_has_the_sets_name(program, tmp_path):
     main = str(program.folder / "main.py")
-    assert program.Caller(Found(main, 1, 0, 0, role="module", kind="module")) == "main"
-    assert program.Caller(Found(main, 8, 4, 9)) == "main.outer"
-    assert program.Caller(Found(main, 13, 4, 7)) == "main"
+    for found in (Found(main, 1, 0, 0, role="module", kind="module"), Found(main, 13, 4, 7)):
+        assert program.Callers(Call(found, []), found) == {"main"}
+    outer = Found(main, 8, 4, 9)
+    assert program.Callers(Call(outer, []), outer) == {"main.outer"}
+    assert program.Callers(Call(outer, [Place(main, 6, 15), Place(main, 10, 15)]), outer) == {
+        "main.A.run",
+        "main.outer.inner",
+    }
     assert program.Name(Found(main, 8, 4, 9)) == "main.outer"
     assert program.Name(Found(main, 13, 8, 14)) == "main.<lambda1>"
     assert program.Name(Found(main, 2, 19, 23)) == "helper.Base"
@@ -189,7 +194,8 @@ def test_what_is_called_has_the_sets_name(program, tmp_path):
     assert program.Name(Found(str(program.folder / "helper.py"), 1, 6, 10)) == "helper.Base.__init__"
     assert program.Name(Found(main, 4, 6, 7)) is None  # its __init__ is not followed through an import's other name
     stub = tmp_path.parent / "builtins.pyi"
-    stub.write_text("class str:\n    def upper(self): ...\ndef len(x): ...\n")
+    stub.write_text("class str:\n    def upper(self): ...\ndef len(x): ...\nif x:\n    def eval(x): ...\n")
+    assert program.Name(Found(str(stub), 5, 8, 12)) == "<builtin>.eval"
     assert program.Name(Found(str(stub), 2, 8, 13)) == "<builtin>.str.upper"
     assert program.Name(Found(str(stub), 3, 4, 7)) == "<builtin>.len"
 
@@ -199,12 +205,12 @@ def test_edges_come_from_callees_and_callers(program):
     one = Found(helper, 3, 4, 7, "likely")
 
     def Callees(place):
-        return [one] if place == Place(main, 9, 8) else []
+        return [Call(one, [])] if place == Place(main, 9, 8) else []
 
     def Callers(place):
         if place == one.place:
-            return [Found(main, 10, 22, 25, "certain")]
-        return [Found(main, 8, 4, 9, "by name")] if place == Place(main, 9, 8) else []
+            return [Call(Found(main, 9, 8, 13, "certain"), [Place(main, 10, 22)])]
+        return [Call(Found(main, 8, 4, 9, "by name"), [])] if place == Place(main, 9, 8) else []
 
     assert call_edges.Given(program, Fake(Callees=Callees, Callers=Callers)) == {
         ("main.outer.inner", "helper.one"): "certain",
