@@ -49,43 +49,43 @@ bool ReadDecoded(const std::string& path, const FileStamp& stamp, std::string& b
   return bytes.size() <= SourceText::kMaxSize;
 }
 
-// What reads sources of a version.
-class SourceReader {
- public:
-  explicit SourceReader(Version version) : version_(version), binder_(version), syntax_reader_(version) {}
-
-  void Read(Text text, SourceFile& file) {
-    file.source = SourceText::Copy(text);
-    file.source->tokens.swap(tokens_);
-    file.source->tokens.clear();
-    rows_.clear();
-    CutLines(*file.source, version_, rows_);
-    file.bindings = binder_.Bind(*file.source, rows_);
-    syntax_.Clear();
-    syntax_reader_.Read(*file.source, rows_, syntax_);
-    file.syntax = syntax_;
-    file.is_python2 = !version_.AtLeast(3, 0);
-    tokens_.swap(file.source->tokens);
-    file.source->tokens = {};
-    if (tokens_.capacity() > kMostTokensKept) tokens_ = {};
-  }
-
- private:
-  static constexpr size_t kMostTokensKept = 1 << 20;
-
-  Version version_;
-  NameBinder binder_;
-  SyntaxReader syntax_reader_;
-  std::vector<Token> tokens_;
-  std::vector<LineRow> rows_;
-  FileSyntax syntax_;
-};
-
 }  // namespace
 
 void SetSourceDecoder(SourceDecoder decoder) { decoder_of_all.store(decoder, std::memory_order_release); }
 
 class Files::Impl {
+  // What reads sources of a version.
+  class SourceReader {
+   public:
+    explicit SourceReader(Version version) : version_(version), binder_(version), syntax_reader_(version) {}
+
+    void Read(Text text, SourceFile& file) {
+      file.source = SourceText::Copy(text);
+      file.source->tokens.swap(tokens_);
+      file.source->tokens.clear();
+      rows_.clear();
+      CutLines(*file.source, version_, rows_);
+      file.bindings = binder_.Bind(*file.source, rows_);
+      syntax_.Clear();
+      syntax_reader_.Read(*file.source, rows_, syntax_);
+      file.syntax = syntax_;
+      file.is_python2 = !version_.AtLeast(3, 0);
+      tokens_.swap(file.source->tokens);
+      file.source->tokens = {};
+      if (tokens_.capacity() > kMostTokensKept) tokens_ = {};
+    }
+
+   private:
+    static constexpr size_t kMostTokensKept = 1 << 20;
+
+    Version version_;
+    NameBinder binder_;
+    SyntaxReader syntax_reader_;
+    std::vector<Token> tokens_;
+    std::vector<LineRow> rows_;
+    FileSyntax syntax_;
+  };
+
  public:
   explicit Impl(Version version) : version_(version) {}
 

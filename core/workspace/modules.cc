@@ -25,7 +25,7 @@ constexpr Text kStubFolders[] = {"typings", "stubs"};
 bool IsBuiltIn(Text name) { return name == "builtins" || name == "sys" || name == "_typeshed"; }
 
 bool IsModuleName(Text name) {
-  return !name.empty() && std::ranges::all_of(name, IsNameByte) && !(name[0] >= '0' && name[0] <= '9');
+  return !name.empty() && std::ranges::all_of(name, IsIdentifierByte) && !(name[0] >= '0' && name[0] <= '9');
 }
 
 }  // namespace

@@ -13,13 +13,14 @@
 namespace quillet {
 
 // A letter, a digit, an underscore, or a byte of a character beyond ASCII.
-inline bool IsNameByte(char byte) {
+inline bool IsIdentifierByte(char byte) {
   return (AsciiClassOf(byte) & (kAsciiAlpha | kAsciiDigit | kAsciiUnderscore)) != 0 ||
          static_cast<unsigned char>(byte) >= 0x80;
 }
 
 inline bool IsWholeWordAt(Text text, size_t at, size_t size) {
-  return (at == 0 || !IsNameByte(text[at - 1])) && (at + size == text.size() || !IsNameByte(text[at + size]));
+  return (at == 0 || !IsIdentifierByte(text[at - 1])) &&
+         (at + size == text.size() || !IsIdentifierByte(text[at + size]));
 }
 
 // Where it begins first at or behind `from`; Text::npos without one.
