@@ -328,6 +328,19 @@ void BindIndex(nb::module_& tarvex) {
           nb::arg("index"), nb::arg("number"), nb::arg("size"), nb::arg("time"), nb::keep_alive<1, 2>(),
           "Takes over a file of an index.")
       .def(
+          "KeepAll",
+          [](NameIndexWriter& self, const IndexObject& index, nb::handle files) {
+            for (nb::handle file : nb::borrow<nb::tuple>(TupleOf(files))) {
+              const nb::tuple row(nb::borrow<nb::tuple>(TupleOf(file)));
+              if (row.size() != 3) ThrowError(ErrorKind::kValueError, "a file is its number, size and time");
+              const auto number = nb::cast<size_t>(row[0]);
+              if (number >= index.index.size()) ThrowError(ErrorKind::kIndexError, "there is no such file");
+              self.Keep(index.index, number, nb::cast<uint64_t>(row[1]), nb::cast<int64_t>(row[2]));
+            }
+          },
+          nb::arg("index"), nb::arg("files"), nb::keep_alive<1, 2>(),
+          "Takes over files of an index: tuples of a number, a size and a time.")
+      .def(
           "Finish",
           [](NameIndexWriter& self, nb::handle settings) {
             return BytesOf(self.Finish(HostText::FromBytes(settings).text()));

@@ -1,13 +1,47 @@
-// Workspaces, and what walks over files asks of the core: whether ignore rules exclude a path.
+// Workspaces, and what walks over files asks of the core: which ones there are, and whether ignore rules exclude a
+// path.
+#include <string>
+#include <vector>
+
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
+#include "bindings/interpreter_lock.h"
+#include "bindings/signals.h"
 #include "bindings/workspace_object.h"
+#include "foundations/stop.h"
+#include "workspace/find_files.h"
 #include "workspace/ignore_rules.h"
 
 namespace quillet::host {
 
+namespace {
+
+nb::list FoundFiles(nb::handle arguments, bool gitignore, nb::handle exclude) {
+  std::vector<std::string> paths;
+  for (nb::handle path : nb::borrow<nb::tuple>(TupleOf(arguments)))
+    paths.emplace_back(HostText::FromBytes(path).text());
+  const std::string patterns(HostText::FromBytes(exclude).text());
+  std::vector<FoundFile> found;
+  {
+    const Unlocked unlocked;
+    const ThreadStopQuestion signals(HandlesSignals());
+    found = FindFiles(paths, gitignore, patterns);
+  }
+  nb::list files;
+  for (const FoundFile& file : found) {
+    files.append(nb::make_tuple(BytesOf(file.path), file.problem.empty() ? nb::object(nb::none()) : StrOf(file.problem),
+                                file.argument, file.below, file.size, file.time));
+  }
+  return files;
+}
+
+}  // namespace
+
 void BindWorkspace(nb::module_& tarvex) {
   nb::module_ host = SiblingModule(tarvex, "host");
+  host.def("FindFiles", &FoundFiles, nb::arg("arguments"), nb::arg("gitignore"), nb::arg("exclude"),
+           "The Python files of paths, as tuples (path, problem, argument, below, size, time): where the path goes on "
+           "below its argument, 0 for the argument itself.");
   nb::class_<IgnoreRules>(host, "IgnoreRules", "The rules of the content of a .gitignore file, read as git reads it.")
       .def(
           "__init__",

@@ -1,14 +1,18 @@
 // One call of the system a file where there is one.
 #include "foundations/file_status.h"
 
+#include <cerrno>
 #include <chrono>
+#include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <system_error>
 
 #ifndef _WIN32
+#include <dirent.h>
+#include <fcntl.h>
 #include <sys/stat.h>
-
-#include <cstdlib>
+#include <unistd.h>
 #endif
 
 namespace quillet {
@@ -66,6 +70,93 @@ std::optional<FileStatus> StatusOf(const std::string& path, bool follow_links) {
   status.is_folder = S_ISDIR(info.st_mode);
   status.is_link = S_ISLNK(info.st_mode);
   return status;
+}
+
+#endif
+
+#ifdef _WIN32
+
+std::optional<int> ListFolder(const std::string& path, std::vector<ListedEntry>& entries) {
+  using Kind = ListedEntry::Kind;
+  entries.clear();
+  std::error_code error;
+  for (std::filesystem::directory_iterator at(WideOf(path), error), end; !error && at != end; at.increment(error)) {
+    const std::u8string name = at->path().filename().u8string();
+    const std::filesystem::file_status kind = at->symlink_status(error);
+    entries.push_back({{name.begin(), name.end()},
+                       std::filesystem::is_symlink(kind)        ? Kind::kLink
+                       : std::filesystem::is_directory(kind)    ? Kind::kFolder
+                       : std::filesystem::is_regular_file(kind) ? Kind::kFile
+                                                                : Kind::kOther});
+  }
+  return error ? std::optional<int>(error.default_error_condition().value()) : std::nullopt;
+}
+
+std::optional<int> ReadBeginning(const std::string& path, bool follow_links, size_t most, std::string& bytes) {
+  const std::optional<FileStatus> status = StatusOf(path, follow_links);
+  if (!status) return ENOENT;
+  if (!status->is_file) return EINVAL;
+  std::ifstream file(WideOf(path), std::ios::binary);
+  if (!file) return EACCES;
+  bytes.resize(most);
+  file.read(bytes.data(), static_cast<std::streamsize>(most));
+  bytes.resize(static_cast<size_t>(file.gcount()));
+  return std::nullopt;
+}
+
+#else
+
+std::optional<int> ListFolder(const std::string& path, std::vector<ListedEntry>& entries) {
+  using Kind = ListedEntry::Kind;
+  entries.clear();
+  DIR* const folder = opendir(path.c_str());
+  if (folder == nullptr) return errno;
+  errno = 0;
+  while (const dirent* const entry = readdir(folder)) {
+    std::string name = entry->d_name;
+    if (name == "." || name == "..") continue;
+    Kind kind = entry->d_type == DT_REG ? Kind::kFile
+                : entry->d_type == DT_DIR ? Kind::kFolder
+                : entry->d_type == DT_LNK ? Kind::kLink
+                                          : Kind::kOther;
+    if (entry->d_type == DT_UNKNOWN) {
+      const std::optional<FileStatus> status = StatusOf(path + "/" + name, false);
+      if (status && status->is_file) kind = Kind::kFile;
+      if (status && status->is_folder) kind = Kind::kFolder;
+      if (status && status->is_link) kind = Kind::kLink;
+    }
+    entries.push_back({std::move(name), kind});
+    errno = 0;
+  }
+  const int error = errno;
+  closedir(folder);
+  return error != 0 ? std::optional<int>(error) : std::nullopt;
+}
+
+std::optional<int> ReadBeginning(const std::string& path, bool follow_links, size_t most, std::string& bytes) {
+  bytes.clear();
+  const int file = open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | (follow_links ? 0 : O_NOFOLLOW));
+  if (file < 0) return errno;
+  struct stat info;
+  std::optional<int> error;
+  if (fstat(file, &info) != 0) {
+    error = errno;
+  } else if (!S_ISREG(info.st_mode)) {
+    error = EINVAL;
+  } else {
+    bytes.resize(most);
+    size_t size = 0;
+    while (size < most) {
+      const ssize_t count = read(file, bytes.data() + size, most - size);
+      if (count < 0 && errno == EINTR) continue;
+      if (count < 0) error = errno;
+      if (count <= 0) break;
+      size += static_cast<size_t>(count);
+    }
+    bytes.resize(size);
+  }
+  close(file);
+  return error;
 }
 
 #endif

@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace quillet {
 
@@ -23,5 +24,17 @@ std::optional<FileStatus> StatusOf(const std::string& path, bool follow_links = 
 // Where a path leads when all links are followed, as far as it is there; the rest is kept as it is. Empty where
 // that cannot be told.
 std::string RealPathOf(const std::string& path);
+
+// What stands in a folder, in no order. Gives nothing, or the number of the error.
+struct ListedEntry {
+  enum class Kind : uint8_t { kFile, kFolder, kLink, kOther };
+  std::string name;
+  Kind kind;
+};
+std::optional<int> ListFolder(const std::string& path, std::vector<ListedEntry>& entries);
+
+// The first bytes of a regular file, all of them where it is no larger. Neither waits for a pipe nor, without
+// `follow_links`, reads what a link leads to. Gives nothing, or the number of the error; EINVAL for what is no file.
+std::optional<int> ReadBeginning(const std::string& path, bool follow_links, size_t most, std::string& bytes);
 
 }  // namespace quillet

@@ -16,25 +16,6 @@ def stored_path(path: str, base: str) -> bytes:
     return os.fsencode(path.replace(os.sep, "/"))
 
 
-class StoredPaths:
-    """`stored_path` for many files, of which those of a folder come together."""
-
-    def __init__(self, base: str) -> None:
-        self._base = base
-        self._folder: str | None = None
-        self._prefix = b""
-
-    def __call__(self, path: str) -> bytes:
-        folder, name = os.path.split(path)
-        if name in ("", ".", ".."):
-            return stored_path(path, self._base)
-        if folder != self._folder:
-            self._folder = folder
-            stored = stored_path(folder or ".", self._base)
-            self._prefix = b"" if stored == b"." else stored.rstrip(b"/") + b"/"
-        return self._prefix + os.fsencode(name)
-
-
 def full_path(stored: bytes, base: str) -> str:
     """The absolute path of a file that the index names."""
     return os.path.normpath(os.path.join(base, os.fsdecode(stored)))

@@ -296,18 +296,11 @@ class Folder(Sources):
         self._exclude = exclude
 
     def files(self) -> list[FileRow]:
-        from quillet.cli.files import find_files
+        from quillet.cli.files import walk
         from quillet.index.facts import row_of
-        from quillet.index.paths import StoredPaths
 
-        stored = StoredPaths(self.base)
-        sizes = {}
-        for item in find_files((self._path,), gitignore=True, exclude=self._exclude):
-            if item.problem is None:
-                try:
-                    sizes[stored(item.path)] = os.stat(item.path).st_size
-                except (OSError, ValueError):
-                    continue
+        walked = walk((self._path,), gitignore=True, exclude=self._exclude)
+        sizes = {path[below:]: size for path, problem, _, below, size, _ in walked if below and problem is None}
         return [row_of(path, sizes[path], number) for number, path in enumerate(sorted(sizes))]
 
     def candidates(self, _: _host.Question, /) -> Sequence[tuple[Any, ...]]:

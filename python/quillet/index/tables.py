@@ -71,7 +71,7 @@ CREATE VIEW facts AS
     JOIN details d ON d.id = r.detail;
 """
 # Made last, when all rows can be sorted at once.
-_INDICES = """
+INDICES = """
 CREATE UNIQUE INDEX names_by_name ON names (name);
 CREATE INDEX names_by_tail ON names (tail);
 CREATE UNIQUE INDEX details_by_detail ON details (detail);
@@ -126,6 +126,15 @@ def write_sqlite(source: Source, target: str) -> TablesOutcome:
             raise IndexProblem(f"{target}: {error}; check the space on the disk") from error
 
 
+def prepare(connection: sqlite3.Connection) -> None:
+    """Makes the tables in an empty database."""
+    # Nobody else sees the file, and one that is not finished is thrown away.
+    connection.execute("PRAGMA journal_mode=OFF")
+    connection.execute("PRAGMA synchronous=OFF")
+    connection.execute("PRAGMA cache_size=-65536")
+    connection.executescript(f"{_TABLES} PRAGMA application_id={APPLICATION_ID}; PRAGMA user_version={SCHEMA};")
+
+
 class _Tables:
     def __init__(self, connection: sqlite3.Connection, source: Source) -> None:
         self._connection = connection
@@ -136,11 +145,7 @@ class _Tables:
 
     def write(self) -> TablesOutcome:
         connection = self._connection
-        # Nobody else sees the file, and one that is not finished is thrown away.
-        connection.execute("PRAGMA journal_mode=OFF")
-        connection.execute("PRAGMA synchronous=OFF")
-        connection.execute("PRAGMA cache_size=-65536")
-        connection.executescript(f"{_TABLES} PRAGMA application_id={APPLICATION_ID}; PRAGMA user_version={SCHEMA};")
+        prepare(connection)
         connection.execute("BEGIN")
         connection.executemany("INSERT INTO kinds VALUES (?, ?)", enumerate(KINDS))
         connection.execute("INSERT INTO meta VALUES ('python', ?)", ("{}.{}".format(*self._source.version),))
@@ -151,7 +156,7 @@ class _Tables:
             for number, (stored, analysis) in enumerate(zip(source.stored, analyses, strict=True), 1):
                 self._write_file(number, stored, analysis)
         connection.execute("COMMIT")
-        connection.executescript(_INDICES)
+        connection.executescript(INDICES)
         return TablesOutcome(len(source.paths), self._records, self._problems)
 
     def _write_file(self, number: int, stored: bytes, analysis: FileAnalysis) -> None:
@@ -180,12 +185,12 @@ class _Tables:
             self._details.numbers_of(texts.details),
         )
         for tuples in records.numbered(first_id, numbers, _ROWS_AT_ONCE):
-            self._connection.executemany(_INSERT_RECORDS[len(tuples[0])], tuples)
+            self._connection.executemany(INSERT_RECORDS[len(tuples[0])], tuples)
 
 
 # The statements for many records and for one, by the number of their variables.
 _ROW = f"({', '.join('?' * _RECORD_COLUMNS)})"
-_INSERT_RECORDS = {
+INSERT_RECORDS = {
     rows * _RECORD_COLUMNS: f"INSERT INTO records VALUES {', '.join([_ROW] * rows)}" for rows in (1, _ROWS_AT_ONCE)
 }
 

@@ -11,15 +11,14 @@ from __future__ import annotations
 import os
 import sys
 import time
-from collections.abc import Callable, Iterator
+from collections.abc import Callable, Iterable, Iterator
 from contextlib import suppress
-from typing import NamedTuple
+from typing import Any, NamedTuple
 
 from quillet._languages import available_cores, decode_source, native_language_of
-from quillet.cli.files import find_files, problem_of
-from quillet.index.facts import FileRow
+from quillet.cli.files import problem_of, walk
 from quillet.index.git import keep_out_of_git
-from quillet.index.paths import StoredPaths, full_path, is_below, stored_path
+from quillet.index.paths import full_path, is_below, stored_path
 from quillet.index.store import IndexProblem, StaleIndex, Stored, read_index, settings_text
 from quillet.index.store import Settings as StoredSettings
 from quillet.index.writing import check_place, engine_mark, write_index, write_lock
@@ -74,11 +73,8 @@ class Reports(NamedTuple):
     advance: Callable[[], None]
 
 
-class _Candidate(NamedTuple):
-    path: str
-    stored: bytes
-    size: int
-    mtime_ns: int
+# A file that is there: path, path as stored, size and time. A plain tuple, since there may be many.
+_Candidate = tuple[bytes, bytes, int, int]
 
 
 def update(index: str, settings: Settings, reports: Reports) -> Outcome:
@@ -112,6 +108,12 @@ def _trusted_roots(stored: tuple[str, ...], base: str) -> tuple[tuple[str, ...],
     paths = [full_path(os.fsencode(root), base) for root in stored]
     inside = tuple(path for path in paths if is_below(os.path.realpath(path), os.path.realpath(base)))
     return inside, tuple(path for path in paths if path not in inside)
+
+
+def _prefix_of(folder: str, base: str) -> bytes:
+    """What stands in front of the paths below a folder, as the index keeps them."""
+    stored = stored_path(folder, base)
+    return b"" if stored == b"." else stored.rstrip(b"/") + b"/"
 
 
 class _Run:
@@ -157,34 +159,44 @@ class _Run:
             return None
 
     def run(self) -> Outcome:
-        rows = map(FileRow._make, self._stored.native.Files() if self._stored is not None else ())
-        known = {row.path: row for row in rows}
-        writer = _host.NameIndexWriter()
+        rows = self._stored.native.Files() if self._stored is not None else []
+        known = {row[1]: row for row in rows}
         changed: list[_Candidate] = []
-        kept: list[tuple[FileRow, int, int]] = []
+        kept: list[tuple[int, int, int]] = []  # number, size and time
+        is_same = self._stored is not None and self._stored.native.settings == settings_text(self._settings)
+        records = 0
         for candidate in self._candidates():
-            row = known.pop(candidate.stored, None)
-            if row is not None and not self._anew and self._is_as_known(candidate, row):
-                kept.append((row, candidate.size, candidate.mtime_ns))
-                if row.problem is not None:
-                    self._report(candidate.path, row.problem)
+            path, stored, size, mtime_ns = candidate
+            row = known.pop(stored, None)
+            if row is None or self._anew:
+                changed.append(candidate)
+                continue
+            if row[2] == size and row[3] == mtime_ns != _UNTRUSTED:
+                pass
+            elif self._has_its_content(path, size, row):
+                is_same = is_same and row[3] == mtime_ns
             else:
                 changed.append(candidate)
+                continue
+            kept.append((row[0], size, mtime_ns))
+            records += row[6]
+            if row[8] is not None:
+                self._report(os.fsdecode(path), row[8])
         gone = set(self._gone(known))
         for stored, row in known.items():
             if stored in gone:
                 continue
             # A file elsewhere stays as it is, unless nothing does.
             if self._anew:
-                changed.append(_Candidate(full_path(stored, self._base), stored, row.size, _UNTRUSTED))
+                changed.append((os.fsencode(full_path(stored, self._base)), stored, row[2], _UNTRUSTED))
             else:
-                kept.append((row, row.size, row.mtime_ns))
+                kept.append((row[0], row[2], row[3]))
+                records += row[6]
 
-        records = sum(row.records for row, _, _ in kept)
-        is_same = self._stored is not None and self._stored.native.settings == settings_text(self._settings)
-        if changed or gone or not is_same or any(row[2:4] != (size, time) for row, size, time in kept):
-            for row, size, mtime_ns in kept:
-                writer.Keep(self._stored.native, row.number, size, mtime_ns)  # type: ignore[union-attr]
+        if changed or gone or not is_same:
+            writer = _host.NameIndexWriter()
+            if self._stored is not None:
+                writer.KeepAll(self._stored.native, kept)
             records += self._analyse(changed, writer)
             keep_out_of_git(self._index)
             write_index(self._index, writer, self._settings)
@@ -196,39 +208,39 @@ class _Run:
 
     def _candidates(self) -> Iterator[_Candidate]:
         """The files that are there."""
-        stored_of = StoredPaths(self._base)
+        prefixes = [_prefix_of(path, self._base) for path in self._paths]
         seen: set[bytes] = set()
         now = time.time_ns()
-        for item in find_files(self._paths, gitignore=bool(self._gitignore), exclude=self._exclude):
-            if item.problem is not None:
-                self._report(item.path, item.problem)
+        walked = walk(self._paths, gitignore=bool(self._gitignore), exclude=self._exclude)
+        for path, problem, argument, below, size, mtime_ns in walked:
+            if problem is not None:
+                self._report(os.fsdecode(path), problem)
                 continue
-            try:
-                status = os.stat(item.path)
-            except OSError as error:
-                self._report(item.path, problem_of(error))
-                continue
-            except ValueError as error:  # a NUL in the name
-                self._report(item.path, str(error))
-                continue
-            stored = stored_of(item.path)
+            if below:
+                stored = prefixes[argument] + path[below:]
+            else:
+                name = os.fsdecode(path)
+                try:
+                    status = os.stat(name)
+                except (OSError, ValueError) as error:  # such as a NUL in the name
+                    self._report(name, problem_of(error))
+                    continue
+                size, mtime_ns = status.st_size, status.st_mtime_ns
+                stored = stored_path(name, self._base)
             if stored not in seen:
                 seen.add(stored)
-                trusted = now - status.st_mtime_ns > _GRAIN_NS
-                yield _Candidate(item.path, stored, status.st_size, status.st_mtime_ns if trusted else _UNTRUSTED)
+                trusted = now - mtime_ns > _GRAIN_NS
+                yield path, stored, size, mtime_ns if trusted else _UNTRUSTED
 
-    def _is_as_known(self, candidate: _Candidate, row: FileRow) -> bool:
-        if candidate.mtime_ns == row.mtime_ns != _UNTRUSTED and candidate.size == row.size:
-            return True
-        if row.problem is not None:
+    def _has_its_content(self, path: bytes, size: int, row: tuple[Any, ...]) -> bool:
+        """Whether a file is what a row of the index says, whatever its time."""
+        if row[8] is not None or size != row[2]:
             return False
-        if candidate.size != row.size:
-            return False
-        with suppress(OSError), open(candidate.path, "rb") as file:
-            return _host.HashOfSource(file.read()) == row.hash
+        with suppress(OSError), open(path, "rb") as file:
+            return bool(_host.HashOfSource(file.read()) == row[4])
         return False
 
-    def _gone(self, unseen: dict[bytes, FileRow]) -> Iterator[bytes]:
+    def _gone(self, unseen: Iterable[bytes]) -> Iterator[bytes]:
         """Of the files that were not seen, those below the folders of the run."""
         roots = [os.path.abspath(path) for path in self._paths]
         for stored in unseen:
@@ -239,20 +251,21 @@ class _Run:
     def _analyse(self, files: list[_Candidate], writer: _host.NameIndexWriter) -> int:
         """Adds files and returns the number of their records."""
         records = 0
-        inputs = [(os.fsencode(file.path), None, None) for file in files]
+        inputs = [(path, None, None) for path, _, _, _ in files]
         self._reports.begin(len(files))
         language = native_language_of(self._version)
         batch = _host.Batch(language, inputs, self._jobs, decode_source, _host.WordsFormat(), False)
         try:
             while (result := batch.Next()) is not None:
-                file = files[result.index]
+                path, stored, size, mtime_ns = files[result.index]
                 problem = result.problem
                 if problem is not None:
-                    self._report(file.path, problem)
+                    self._report(os.fsdecode(path), problem)
                 errors = len(result.errors) + len(result.reports)
                 # A file that could not be read, or is another one by now, is looked at again next time.
-                mtime_ns = file.mtime_ns if result.byte_count == file.size else _UNTRUSTED
-                records += writer.Add(file.stored, file.size, mtime_ns, result.line_count, errors, problem, result)
+                if result.byte_count != size:
+                    mtime_ns = _UNTRUSTED
+                records += writer.Add(stored, size, mtime_ns, result.line_count, errors, problem, result)
                 self._reports.advance()
         finally:
             batch.Cancel()
