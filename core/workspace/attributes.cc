@@ -5,17 +5,18 @@
 
 namespace quillet {
 
-std::optional<Member> Inference::FindMember(ClassId cls, Text name, bool skips_itself) {
+std::optional<Member> Inference::FindMember(ClassId cls, Text name, bool on_class) {
   if (cls == kNoId) return std::nullopt;
   InfoOf(cls);
   const size_t size = classes_[cls].order.size();
-  for (size_t i = skips_itself ? 1 : 0; i < size; ++i) {
+  for (size_t i = 0; i < size; ++i) {
     const ClassId owner = classes_[cls].order[i].cls;
     ClassInfo& info = MembersOf(owner);
     Member member;
     if (const auto at = info.symbols.find(name); at != info.symbols.end()) member.symbol = at->second;
-    if (const auto at = info.self_attributes.find(name); at != info.self_attributes.end())
-      member.self_attributes = &at->second;
+    const auto written = info.self_attributes.find(name);
+    if (written != info.self_attributes.end() && (!on_class || info.class_written.contains(name)))
+      member.self_attributes = &written->second;
     if (info.call != kNoExpr) {
       for (const MadeField& field : info.fields)
         if (field.name == name) member.field = &field;
@@ -42,7 +43,7 @@ std::vector<Member> Inference::MembersOf(Value receiver, Text name, uint8_t& dou
     const Type t = types_[id];
     switch (t.kind) {
       case TypeKind::kClass:
-        if (!add(FindMember(t.a, name))) add(FindMember(ClassOfType(id), name));
+        if (!add(FindMember(t.a, name, true))) add(FindMember(ClassOfType(id), name));
         break;
       case TypeKind::kSuper: {
         // Behind the class, in the order of the receiver's own.
@@ -307,7 +308,7 @@ Value Inference::AttributeOfType(TypeId id, Text name) {
     return cls == kNoId ? kUnknown : Just(types_.Add(TypeKind::kClass, cls));
   }
   if (on_class) {
-    if (const auto member = FindMember(t.a, name)) {
+    if (const auto member = FindMember(t.a, name, true)) {
       const Value value = ValueOfMember(*member, name, id, true);
       if (value.IsKnown() || member->owner != ClassNamed("builtins", "object")) return value;
     }

@@ -264,7 +264,9 @@ void Inference::FindMembers(ClassId cls) {
       const Occurrence& attribute = bindings.occurrences[next];
       if (!attribute.is_attribute || bindings.ReceiverOf(next) != i) continue;
       if (attribute.role != NameRole::kWrite && attribute.role != NameRole::kDefinition) continue;
-      info.self_attributes[bindings.TextOf(attribute)].push_back(attribute.begin);
+      const Text name = bindings.TextOf(attribute);
+      info.self_attributes[name].push_back(attribute.begin);
+      if ((functions_[function].flags & (kIsClassMethod | kIsStatic)) != 0) info.class_written.insert(name);
     }
   }
   if (info.is_dataclass || info.is_named_tuple || info.is_typed_dict) {

@@ -459,7 +459,9 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
       }
     }
     if (t.kind == TypeKind::kNone) continue;
-    value = types_.Union(value, CallMethod(Just(id), "__getitem__", {key}));
+    Value item = CallMethod(Just(id), "__getitem__", {key});
+    if (types_.SizeOf(item.set) > 1) item.doubt |= Value::kGuessed;  // one of several
+    value = types_.Union(value, item);
   }
   if (!value.IsKnown()) value.doubt |= Value::kOpen;
   return value;

@@ -77,7 +77,7 @@ Value Inference::ValueOfParameter(FunctionId id, size_t index, FrameId frame) {
 
 // What the calls of a function in the project give a parameter.
 Value Inference::GuessedParameter(FunctionId id, size_t index) {
-  static constexpr int kMaxGuesses = 2;  // a guess may need others
+  static constexpr int kMaxGuesses = 3;  // a guess may need others
   const uint64_t key = uint64_t{id} << 16 | index;
   if (const auto known = guesses_.find(key); known != guesses_.end()) return known->second;
   if (callers_ == nullptr || guess_depth_ >= kMaxGuesses) return kUnknown;
@@ -89,9 +89,13 @@ Value Inference::GuessedParameter(FunctionId id, size_t index) {
   for (const ExprPlace& call : calls) {
     const SourceFile* file = FileOf(call.file);
     if (file == nullptr) continue;
-    const auto children = file->syntax.ChildrenOf(call.expr);
-    if (children.empty()) continue;
-    const Value callee = ValueOf(call.file, children[0]);
+    const FileSyntax& syntax = file->syntax;
+    const StmtId stmt = syntax.StatementOf(call.expr);
+    const auto decorators = syntax.DecoratorsOf(syntax.stmt(stmt));
+    const bool decorates = std::ranges::find(decorators, call.expr) != decorators.end();
+    const auto children = syntax.ChildrenOf(call.expr);
+    if (!decorates && children.empty()) continue;
+    const Value callee = ValueOf(call.file, decorates ? call.expr : children[0]);
     for (const TypeId type : types_.CopyOf(callee.set)) {
       const Type t = types_[type];
       bool is_bound = t.args_count > 0;
@@ -101,7 +105,14 @@ Value Inference::GuessedParameter(FunctionId id, size_t index) {
       } else if (t.kind != TypeKind::kFunction || t.a != id) {
         continue;
       }
-      std::vector<Argument> arguments = ArgumentsOf(*file, children.subspan(1), kNoFrame);
+      std::vector<Argument> arguments;
+      if (decorates) {
+        arguments.emplace_back();
+        arguments[0].value = DecoratedBelow(*file, stmt, call.expr);
+        arguments[0].is_evaluated = true;
+      } else {
+        arguments = ArgumentsOf(*file, children.subspan(1), kNoFrame);
+      }
       Solution solution;
       std::vector<Value> given;
       if (MatchArguments(id, is_bound, arguments, solution, &given) < 0) continue;

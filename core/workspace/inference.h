@@ -19,6 +19,7 @@
 #include <span>
 #include <string>
 #include <unordered_map>
+#include <unordered_set>
 #include <vector>
 
 #include "foundations/text.h"
@@ -82,6 +83,7 @@ struct ClassInfo {
   std::vector<MadeField> fields;
   std::unordered_map<Text, uint32_t> symbols;                       // of its scope
   std::unordered_map<Text, std::vector<uint32_t>> self_attributes;  // where methods write `self.x`: offsets
+  std::unordered_set<Text> class_written;                           // of those the ones that class methods write
 };
 
 enum FunctionFlag : uint8_t {
@@ -181,6 +183,8 @@ class Inference {
   // What a name is given where it is bound.
   Value ValueOfBinding(Binding binding, FrameId frame = kNoFrame);
   Value ValueOfEntity(const Entity& entity);
+  // What the decorators from a definition up to one of them, which is left out, make of it.
+  Value DecoratedBelow(const SourceFile& file, StmtId stmt, ExprId decorator);
   // What an annotation says that a value of it is.
   Value ValueOfHint(FileId file, ExprId hint, FrameId frame = kNoFrame);
   Value AttributeOf(Value receiver, Text name);
@@ -196,9 +200,12 @@ class Inference {
   std::vector<Binding> BindingsOf(const Entity& entity);
   // The bindings that reach a name; empty for attributes.
   std::vector<Binding> BindingsReaching(const SourceFile& file, uint32_t occurrence, bool* may_be_unbound = nullptr);
+  // The bindings of a variable that its scope is left with.
+  std::vector<Binding> BindingsAtEnd(const SourceFile& file, uint32_t symbol);
   // The members that an attribute of this name may be, one for each type of the receiver that has it.
   std::vector<Member> MembersOf(Value receiver, Text name, uint8_t& doubt);
-  std::optional<Member> FindMember(ClassId cls, Text name, bool skips_itself = false);
+  // On a class only what classes have: no attribute that methods give their instances.
+  std::optional<Member> FindMember(ClassId cls, Text name, bool on_class = false);
   Entity EntityOfMember(const Member& member, Text name);
   Entity EntityOfVariable(const SourceFile& file, uint32_t symbol);
   // The variable of a name in a module, its star imports included.
@@ -311,7 +318,7 @@ class Inference {
   Value Entered(Value manager, bool is_async);
   Value Caught(Value type);
   Value BuiltinNamed(Text name);
-  Value Decorated(const SourceFile& file, StmtId stmt, Value value, FrameId frame);
+  Value Decorated(const SourceFile& file, StmtId stmt, Value value, FrameId frame, ExprId until = kNoExpr);
   const ModuleNames& NamesOfModule(const SourceFile& file);
   FrameId FrameFor(const SourceFile& file, uint32_t scope, FrameId frame);
   Value ItemsPutInto(const SourceFile& file, ExprId target);

@@ -52,11 +52,18 @@ Location Workspace::Impl::At(const Binding& binding, Certainty certainty) {
 }
 
 Binding Workspace::Impl::SourceOf(Binding binding) {
+  const SourceFile* file = Get(binding.file);
+  return file != nullptr && file->is_stub ? OtherSideOf(binding) : binding;
+}
+
+// Of what a stub declares where its source defines it, and the other way around; itself where there is no other.
+Binding Workspace::Impl::OtherSideOf(Binding binding) {
   const SourceFile* stub = Get(binding.file);
-  if (stub == nullptr || !stub->is_stub) return binding;
+  if (stub == nullptr) return binding;
   const ModuleId id = modules.OfFile(binding.file);
-  if (id == kNoModule || modules[id].file == kNoFile || modules[id].file == binding.file) return binding;
-  const SourceFile* source = Get(modules[id].file);
+  const FileId other = id == kNoModule ? kNoFile : stub->is_stub ? modules[id].file : modules[id].stub;
+  if (other == kNoFile || other == binding.file) return binding;
+  const SourceFile* source = Get(other);
   const uint32_t index = stub->OccurrenceBeginningAt(binding.offset);
   if (source == nullptr || index == kNoIndex) return binding;
   // The dotted way to the name, from the module in.
@@ -106,6 +113,16 @@ std::vector<Location> Workspace::Impl::LocationsOf(const Entities& entities, boo
   const Certainty certainty = CertaintyOf(entities.doubt);
   for (const Entity& entity : entities.found) {
     std::vector<Binding> bindings = inference.BindingsOf(entity);
+    // Of what a module assigns again and again, what it is left with.
+    const SourceFile* owner = entity.kind == Entity::kVariable ? Get(entity.a) : nullptr;
+    if (owner != nullptr && owner->bindings.symbols[entity.b].scope == 0) {
+      bindings = inference.BindingsAtEnd(*owner, entity.b);
+      const bool has_several = bindings.size() > 1;
+      std::erase_if(bindings, [&](const Binding& binding) {
+        const uint32_t at = owner->OccurrenceBeginningAt(binding.offset);
+        return has_several && at != kNoIndex && owner->bindings.occurrences[at].kind == NameKind::kImport;
+      });
+    }
     // What the version asked for never sees is no definition, unless nothing else is.
     std::vector<Binding> seen;
     for (const Binding& binding : bindings) {
@@ -189,6 +206,10 @@ std::vector<Location> Workspace::Definitions(FileId id, uint32_t offset) {
   }
   const Entities entities = in.inference.EntitiesOf(*file, index);
   found = in.LocationsOf(entities);
+  if (found.empty() && occurrence.is_attribute) {
+    const ExprId named = file->syntax.NamedAt(occurrence.begin);
+    if (named != kNoExpr) found = in.MembersBelow(*file, named);
+  }
   if (found.empty() && occurrence.is_attribute) {
     const Text name = file->bindings.TextOf(occurrence);
     const bool is_special = name.starts_with("__") && name.ends_with("__");

@@ -29,21 +29,39 @@ std::string Workspace::Impl::QualifiedName(const Binding& binding) {
   return name + "." + std::string(file->bindings.TextOf(file->bindings.occurrences[index]));
 }
 
-StmtId Workspace::Impl::FunctionAround(const SourceFile& file, uint32_t offset) {
-  const uint32_t index = OccurrenceAt(file, offset);
-  if (index != kNoIndex) {
-    const StmtId named = file.syntax.StatementNamedAt(file.bindings.occurrences[index].begin);
-    if (named != kModuleStmt && file.syntax.stmt(named).kind == StmtKind::kDef) return named;
+// Decorators and defaults are run by what is around the definition, the body of a lambda by the lambda.
+Workspace::Impl::Body Workspace::Impl::BodyAround(const SourceFile& file, uint32_t offset) {
+  const FileSyntax& syntax = file.syntax;
+  Body body;
+  for (ExprId expr = syntax.ExpressionAt(offset); expr != kNoExpr; expr = syntax[expr].parent) {
+    if (syntax[expr].kind != ExprKind::kLambda || syntax.ChildrenOf(expr).empty()) continue;
+    if (offset < syntax[syntax.ChildrenOf(expr).back()].begin) continue;
+    body.lambda = expr;
+    return body;
   }
-  StmtId stmt = file.syntax.StatementAt(offset);
-  while (stmt != kModuleStmt && file.syntax.stmt(stmt).kind != StmtKind::kDef) stmt = file.syntax.stmt(stmt).parent;
-  return stmt;
+  StmtId stmt = syntax.StatementAt(offset);
+  if (stmt != kModuleStmt && syntax.stmt(stmt).kind == StmtKind::kDef && offset < syntax.stmt(stmt).end)
+    stmt = syntax.stmt(stmt).parent;
+  while (stmt != kModuleStmt && syntax.stmt(stmt).kind != StmtKind::kDef) stmt = syntax.stmt(stmt).parent;
+  body.def = stmt;
+  return body;
 }
 
-std::vector<Workspace::Impl::Callee> Workspace::Impl::CalleesOf(const SourceFile& file, ExprId call) {
+// What a place names: the definition or lambda that begins there, otherwise the body that it lies in.
+Workspace::Impl::Body Workspace::Impl::BodyAt(const SourceFile& file, uint32_t offset) {
+  const FileSyntax& syntax = file.syntax;
+  const uint32_t index = OccurrenceAt(file, offset);
+  if (index != kNoIndex) {
+    const StmtId named = syntax.StatementNamedAt(file.bindings.occurrences[index].begin);
+    if (named != kModuleStmt && syntax.stmt(named).kind == StmtKind::kDef) return {named, kNoExpr};
+  }
+  for (ExprId expr = syntax.ExpressionAt(offset); expr != kNoExpr; expr = syntax[expr].parent)
+    if (syntax[expr].kind == ExprKind::kLambda && syntax[expr].begin == offset) return {kModuleStmt, expr};
+  return BodyAround(file, offset);
+}
+
+std::vector<Workspace::Impl::Callee> Workspace::Impl::CalleesOf(Value callee) {
   std::vector<Callee> found;
-  const ExprId function = file.syntax.ChildOf(call, 0);
-  const Value callee = inference.ValueOf(file.id, function);
   const Certainty certainty = CertaintyOf(callee.doubt);
   const auto add = [&](FileId id, uint32_t offset) {
     const Binding binding = SourceOf({id, offset});
@@ -92,22 +110,64 @@ std::vector<Workspace::Impl::Callee> Workspace::Impl::CalleesOf(const SourceFile
         if (inference.types()[inner].kind == TypeKind::kFunction) add_function(inference.types()[inner].a);
     }
   }
+  return found;
+}
+
+std::vector<Workspace::Impl::Callee> Workspace::Impl::CalleesOf(const SourceFile& file, ExprId call) {
+  const ExprId function = file.syntax.ChildOf(call, 0);
+  std::vector<Callee> found = CalleesOf(inference.ValueOf(file.id, function));
   if (!found.empty()) return found;
-  const uint32_t at =
-      file.syntax[function].kind == ExprKind::kAttribute || file.syntax[function].kind == ExprKind::kName
-          ? file.OccurrenceBeginningAt(file.syntax[function].kind == ExprKind::kName ? file.syntax[function].begin
-                                                                                     : file.syntax[function].name_begin)
-          : kNoIndex;
+  const ExprKind kind = file.syntax[function].kind;
+  if (kind != ExprKind::kAttribute && kind != ExprKind::kName) return found;
+  const uint32_t at = file.OccurrenceBeginningAt(kind == ExprKind::kName ? file.syntax[function].begin
+                                                                         : file.syntax[function].name_begin);
   if (at == kNoIndex) return found;
+  for (const Location& location : MembersBelow(file, function)) {
+    const Binding binding{location.file, location.begin};
+    found.push_back({binding, QualifiedName(binding), Certainty::kLikely});
+  }
+  if (!found.empty()) return found;
   const Entities entities = inference.EntitiesOf(file, at);
   for (const Entity& entity : entities.found) {
     if (entity.kind == Entity::kModule) continue;
     for (const Binding& binding : inference.BindingsOf(entity)) {
       const SourceFile* source = Get(binding.file);
-      const StmtId stmt = source == nullptr ? kModuleStmt : source->syntax.StatementNamedAt(binding.offset);
-      if (stmt != kModuleStmt) add(binding.file, binding.offset);
+      if (source == nullptr || source->syntax.StatementNamedAt(binding.offset) == kModuleStmt) continue;
+      const Binding there = SourceOf(binding);
+      found.push_back({there, QualifiedName(there), CertaintyOf(entities.doubt)});
     }
   }
+  return found;
+}
+
+// An attribute that a class does not have of itself: where its subclasses in the project define it.
+std::vector<Location> Workspace::Impl::MembersBelow(const SourceFile& file, ExprId attribute) {
+  std::vector<Location> found;
+  const FileSyntax& syntax = file.syntax;
+  if (syntax[attribute].kind != ExprKind::kAttribute) return found;
+  const Text name = syntax.NameOf(attribute);
+  const Value receiver = inference.ValueOf(file.id, syntax.ChildOf(attribute, 0));
+  for (const TypeId type : inference.types().CopyOf(receiver.set)) {
+    const Type t = inference.types()[type];
+    if ((t.kind != TypeKind::kInstance && t.kind != TypeKind::kClass) || inference.FindMember(t.a, name)) continue;
+    if (!IsProject(inference.InfoOf(t.a).file)) continue;
+    static constexpr size_t kMaxFiles = 200;
+    size_t count = 0;
+    for (const FileId id : project.WithWords({name, inference.InfoOf(t.a).name})) {
+      const SourceFile* source = ++count > kMaxFiles ? nullptr : Get(id);
+      if (source == nullptr) continue;
+      for (StmtId stmt = 1; stmt < source->syntax.stmts.size(); ++stmt) {
+        if (source->syntax.stmt(stmt).kind != StmtKind::kClass) continue;
+        const ClassId cls = inference.ClassOfStmt(id, stmt);
+        if (cls == t.a || !inference.IsSubclass(cls, t.a)) continue;
+        const auto member = inference.FindMember(cls, name);
+        if (!member || member->owner != cls) continue;
+        for (const Binding& binding : inference.BindingsOf(inference.EntityOfMember(*member, name)))
+          found.push_back(At(binding, Certainty::kLikely));
+      }
+    }
+  }
+  Sort(found);
   return found;
 }
 
@@ -118,40 +178,95 @@ std::vector<Call> Workspace::Callees(FileId id, uint32_t offset) {
   const SourceFile* file = in.Get(id);
   if (file == nullptr) return found;
   const FileSyntax& syntax = file->syntax;
-  const StmtId function = in.FunctionAround(*file, offset);
-  const uint32_t begin = function == kModuleStmt ? 0 : syntax.stmt(function).end;
-  const uint32_t end =
-      function == kModuleStmt ? static_cast<uint32_t>(file->text().size()) : syntax.stmt(function).block_end;
-  for (ExprId expr = 1; expr < syntax.exprs.size(); ++expr) {
-    if (syntax[expr].kind != ExprKind::kCall || syntax[expr].begin < begin || syntax[expr].begin >= end) continue;
-    StmtId around = syntax.StatementOf(expr);
-    // Decorators and defaults are run by what is around the definition.
-    if (around != kModuleStmt && syntax.stmt(around).kind == StmtKind::kDef &&
-        syntax[expr].begin < syntax.stmt(around).end)
-      around = syntax.stmt(around).parent;
-    while (around != kModuleStmt && syntax.stmt(around).kind != StmtKind::kDef) around = syntax.stmt(around).parent;
-    if (around != function) continue;
-    in.inference.Begin();
-    const ExprId called = syntax.ChildOf(expr, 0);
+  const Impl::Body body = in.BodyAt(*file, offset);
+  uint32_t begin = 0, end = static_cast<uint32_t>(file->text().size());
+  if (body.lambda != kNoExpr) {
+    begin = syntax[body.lambda].begin;
+    end = syntax[body.lambda].end;
+  } else if (body.def != kModuleStmt) {
+    begin = syntax.stmt(body.def).end;
+    end = syntax.stmt(body.def).block_end;
+  }
+  const auto is_here = [&](uint32_t at) { return at >= begin && at < end && in.BodyAround(*file, at) == body; };
+  const auto add = [&](ExprId at, const std::vector<Impl::Callee>& callees, bool only_project = false) {
     Location call;
     call.file = id;
-    call.begin = syntax[called].kind == ExprKind::kAttribute ? syntax[called].name_begin : syntax[called].begin;
-    call.end = syntax[called].end;
+    call.begin = syntax[at].kind == ExprKind::kAttribute ? syntax[at].name_begin : syntax[at].begin;
+    call.end = syntax[at].end;
     call.role = "call";
-    for (const Impl::Callee& callee : in.CalleesOf(*file, expr)) {
+    for (const Impl::Callee& callee : callees) {
+      if (only_project && !in.IsProject(callee.binding.file)) continue;
       call.certainty = callee.certainty;
-      auto at = std::ranges::find_if(found, [&](const Call& other) {
+      auto known = std::ranges::find_if(found, [&](const Call& other) {
         return other.function.file == callee.binding.file && other.function.begin == callee.binding.offset;
       });
-      if (at == found.end()) {
+      if (known == found.end()) {
         Call made;
         made.function = in.At(callee.binding, callee.certainty);
         made.name = callee.name;
         found.push_back(std::move(made));
-        at = found.end() - 1;
+        known = found.end() - 1;
       }
-      at->function.certainty = std::min(at->function.certainty, callee.certainty);
-      at->calls.push_back(call);
+      known->function.certainty = std::min(known->function.certainty, callee.certainty);
+      known->calls.push_back(call);
+    }
+  };
+  const auto method_of = [&](Value receiver, Text name) {
+    return in.CalleesOf(in.inference.AttributeOf(receiver, name));
+  };
+  const auto iterate = [&](ExprId iterable, bool is_async) {
+    const Value value = in.inference.ValueOf(id, iterable);
+    const Value method = in.inference.AttributeOf(value, is_async ? "__aiter__" : "__iter__");
+    add(iterable, in.CalleesOf(method), true);
+    std::vector<Argument> none;
+    add(iterable, method_of(in.inference.ResultOf(method, none), is_async ? "__anext__" : "__next__"), true);
+  };
+  const auto only = [&](Value value, TypeKind kind) {
+    std::vector<TypeId> kept;
+    for (const TypeId type : in.inference.types().CopyOf(value.set))
+      if (in.inference.types()[type].kind == kind) kept.push_back(type);
+    return Value{in.inference.types().SetOf(kept), value.doubt};
+  };
+  for (ExprId expr = 1; expr < syntax.exprs.size(); ++expr) {
+    const Expr& e = syntax[expr];
+    if (e.begin >= end || e.end <= begin) continue;
+    if (e.kind == ExprKind::kCall) {
+      const ExprId called = syntax.ChildOf(expr, 0);
+      if (!is_here(syntax[called].kind == ExprKind::kAttribute ? syntax[called].name_begin : syntax[called].begin))
+        continue;
+      in.inference.Begin();
+      const std::vector<Impl::Callee> callees = in.CalleesOf(*file, expr);
+      add(called, callees);
+      // What the library is given to call, it likely calls.
+      const auto is_project = [&](const Impl::Callee& callee) { return in.IsProject(callee.binding.file); };
+      if (callees.empty() || std::ranges::any_of(callees, is_project)) continue;
+      for (const ExprId argument : syntax.ChildrenOf(expr).subspan(1)) {
+        const ExprId given = syntax[argument].kind == ExprKind::kKeyword ? syntax.ChildOf(argument, 0) : argument;
+        if (given == kNoExpr) continue;
+        Value value = only(in.inference.ValueOf(id, given), TypeKind::kFunction);
+        value.doubt |= Value::kGuessed;
+        add(given, in.CalleesOf(value), true);
+      }
+    } else if (e.kind == ExprKind::kComprehensionFor && e.children_count > 1 && is_here(e.begin)) {
+      iterate(syntax.ChildOf(expr, 1), (e.flags & kAsyncClause) != 0);
+    } else if (e.kind == ExprKind::kWithItem && is_here(e.begin)) {
+      const ExprId manager = syntax.ChildOf(expr, 0);
+      const Value value = in.inference.ValueOf(id, manager);
+      const bool is_async = (syntax.stmt(syntax.StatementOf(expr)).flags & kAsyncStmt) != 0;
+      add(manager, method_of(value, is_async ? "__aenter__" : "__enter__"), true);
+      add(manager, method_of(value, is_async ? "__aexit__" : "__exit__"), true);
+    }
+  }
+  for (StmtId stmt = 1; stmt < syntax.stmts.size(); ++stmt) {
+    const Stmt& at = syntax.stmt(stmt);
+    const auto exprs = syntax.ExprsOf(at);
+    if (at.kind == StmtKind::kFor && exprs.size() > 1 && is_here(at.begin)) {
+      iterate(exprs[1], (at.flags & kAsyncStmt) != 0);
+    } else if (at.kind == StmtKind::kRaise && !exprs.empty() && is_here(at.begin)) {
+      add(exprs[0], in.CalleesOf(only(in.inference.ValueOf(id, exprs[0]), TypeKind::kClass)), true);
+    } else if (at.decorator_count > 0) {
+      for (const ExprId decorator : syntax.DecoratorsOf(at))
+        if (is_here(syntax[decorator].begin)) add(decorator, in.CalleesOf(in.inference.ValueOf(id, decorator)), true);
     }
   }
   return found;
@@ -165,11 +280,17 @@ std::vector<Call> Workspace::Callers(FileId id, uint32_t offset) {
   const uint32_t index = file == nullptr ? kNoIndex : in.OccurrenceAt(*file, offset);
   if (index == kNoIndex) return found;
   for (const Impl::Hit& hit : in.Uses(*file, index, true)) {
-    if (hit.location.role != "call") continue;
     const SourceFile* source = in.Get(hit.file);
-    StmtId around = source->syntax.StatementAt(hit.location.begin);
-    while (around != kModuleStmt && source->syntax.stmt(around).kind != StmtKind::kDef)
-      around = source->syntax.stmt(around).parent;
+    const bool decorates = hit.occurrence != kNoIndex && hit.location.role == "read" &&
+                           (source->bindings.occurrences[hit.occurrence].flags & kNameDecorator) != 0;
+    if (hit.location.role != "call" && !decorates) continue;
+    const Impl::Body body = in.BodyAround(*source, hit.location.begin);
+    StmtId around = body.def;
+    if (body.lambda != kNoExpr) {  // the definition that the lambda stands in
+      around = source->syntax.StatementAt(hit.location.begin);
+      while (around != kModuleStmt && source->syntax.stmt(around).kind != StmtKind::kDef)
+        around = source->syntax.stmt(around).parent;
+    }
     const Binding binding{hit.file, around == kModuleStmt ? 0 : source->syntax.stmt(around).name_begin};
     auto at = std::ranges::find_if(found, [&](const Call& other) {
       return other.function.file == hit.file && other.function.begin == binding.offset;

@@ -99,8 +99,13 @@ std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
     if (file == nullptr) continue;
     for (const Occurrence& occurrence : file->bindings.occurrences) {
       if (calls.size() >= kMaxCalls) break;
-      if (occurrence.role != NameRole::kCall || file->bindings.TextOf(occurrence) != name) continue;
+      const bool decorates = (occurrence.flags & kNameDecorator) != 0 && occurrence.role == NameRole::kRead;
+      if ((occurrence.role != NameRole::kCall && !decorates) || file->bindings.TextOf(occurrence) != name) continue;
       const ExprId named = file->syntax.NamedAt(occurrence.begin);
+      if (decorates) {
+        if (named != kNoExpr) calls.push_back({id, named});
+        continue;
+      }
       const ExprId call = named == kNoExpr ? kNoExpr : file->syntax[named].parent;
       if (call != kNoExpr && file->syntax[call].kind == ExprKind::kCall && file->syntax.ChildOf(call, 0) == named)
         calls.push_back({id, call});

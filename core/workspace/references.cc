@@ -36,32 +36,39 @@ bool Workspace::Impl::Meets(const Entities& use, const std::vector<Entity>& targ
   for (const Entity& entity : use.found) {
     for (const Entity& target : targets) {
       if (entity == target) {
-        // One of several that it may be.
-        meet(use.doubt == 0 && use.found.size() == 1 ? Certainty::kCertain
-             : use.doubt == 0                        ? Certainty::kCertain
-                                                     : Certainty::kLikely);
+        meet(CertaintyOf(use.doubt));
         continue;
       }
       if (entity.kind != Entity::kMember || target.kind != Entity::kMember || entity.b != target.b) continue;
-      const bool is_above = inference.IsSubclass(entity.a, target.a),
-                 is_below = inference.IsSubclass(target.a, entity.a);
-      if (!is_above && !is_below) continue;
-      // An attribute that a class above or below gives a value too is the same one; a method is another.
+      if (!inference.IsSubclass(entity.a, target.a) && !inference.IsSubclass(target.a, entity.a)) continue;
+      // What methods of both classes give their instances is one attribute; what a class defines anew is another.
       const Text name = inference.NameOfNumber(entity.b);
-      const auto is_method = [&](ClassId cls) {
+      const auto is_written = [&](ClassId cls) {
         const ClassInfo& info = inference.MembersOf(cls);
-        const SourceFile* file = Get(info.file);
-        const auto at = info.symbols.find(name);
-        if (at == info.symbols.end() || file == nullptr) return false;
-        return std::ranges::any_of(file->occurrences().Of(at->second), [&](uint32_t i) {
-          return file->bindings.occurrences[i].kind == NameKind::kFunction;
-        });
+        return !info.symbols.contains(name) && info.self_attributes.contains(name);
       };
-      const bool overrides = is_method(entity.a) || is_method(target.a);
-      meet(overrides || use.doubt != 0 ? Certainty::kLikely : Certainty::kCertain);
+      if (is_written(entity.a) && is_written(target.a)) meet(CertaintyOf(use.doubt));
     }
   }
   return has_met;
+}
+
+// What a stub declares and what its source defines are one.
+void Workspace::Impl::AddOtherSides(Entities& entities) {
+  const size_t count = entities.found.size();
+  for (size_t i = 0; i < count; ++i) {
+    const Entity entity = entities.found[i];
+    if (entity.kind == Entity::kModule) continue;
+    const std::vector<Binding> bindings = inference.BindingsOf(entity);
+    if (bindings.empty()) continue;
+    const Binding other = OtherSideOf(bindings.front());
+    const SourceFile* file = Get(other.file);
+    if (other == bindings.front() || file == nullptr) continue;
+    const uint32_t at = file->OccurrenceBeginningAt(other.offset);
+    if (at == kNoIndex) continue;
+    const uint32_t variable = file->bindings.VariableOf(file->bindings.occurrences[at]);
+    if (variable != kNoIndex) entities.found.push_back(inference.EntityOfVariable(*file, variable));
+  }
 }
 
 std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, uint32_t index, bool everywhere) {
@@ -83,6 +90,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
     if (!occurrence.is_attribute) return hits;
   }
   const bool is_by_name = wanted.found.empty();
+  AddOtherSides(wanted);
   bool is_local = !is_by_name;
   bool has_member = is_by_name;
   for (const Entity& entity : wanted.found) {
@@ -112,6 +120,13 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
       if (owner != kNoFile && std::ranges::find(candidates, owner) == candidates.end()) candidates.push_back(owner);
     }
     if (std::ranges::find(candidates, file.id) == candidates.end()) candidates.push_back(file.id);
+  }
+  for (const Entity& entity : wanted.found) {
+    if (entity.kind != Entity::kModule) continue;
+    Location location;
+    location.file = modules[entity.a].file != kNoFile ? modules[entity.a].file : modules[entity.a].stub;
+    location.role = location.kind = "module";
+    if (location.file != kNoFile) hits.push_back({location, location.file, kNoIndex});
   }
   // How many classes define an attribute of this name: what is used of an unknown receiver is likely the only one.
   std::vector<Hit> unknown;
@@ -263,7 +278,7 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
   std::vector<Impl::Hit> hits = in.Uses(*file, index, true);
   for (const Impl::Hit& hit : hits) {
     if (only_certain && hit.location.certainty != Certainty::kCertain) continue;
-    if (!in.IsProject(hit.file)) continue;
+    if (!in.IsProject(hit.file) || hit.location.role == "module") continue;
     const SourceFile* source = in.Get(hit.file);
     const Text there(source->text().data() + hit.location.begin, hit.location.end - hit.location.begin);
     if (there != old_name) continue;

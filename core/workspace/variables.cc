@@ -372,22 +372,14 @@ Value Inference::ValueOfBindings(std::span<const Binding> bindings, FrameId fram
   return value;
 }
 
-Value Inference::ValueOfVariable(const SourceFile& file, uint32_t symbol, FrameId frame) {
-  const auto indices = file.occurrences().Of(symbol);
-  std::vector<uint32_t> own, elsewhere;
+std::vector<Binding> Inference::BindingsAtEnd(const SourceFile& file, uint32_t symbol) {
+  std::vector<uint32_t> own, elsewhere, reached;
   const NameSymbol& owner = file.bindings.symbols[symbol];
-  Value declared;
-  for (const uint32_t i : indices) {
+  for (const uint32_t i : file.occurrences().Of(symbol)) {
     const Occurrence& occurrence = file.bindings.occurrences[i];
-    if (!Binds(occurrence)) continue;
-    const StmtId stmt = file.syntax.StatementAt(occurrence.begin);
-    if (!IsReachable(file, stmt)) continue;
+    if (!Binds(occurrence) || !IsReachable(file, file.syntax.StatementAt(occurrence.begin))) continue;
     (file.bindings.ScopeOf(occurrence) == owner.scope ? own : elsewhere).push_back(occurrence.begin);
-    if (occurrence.kind == NameKind::kVariable && file.syntax.stmt(stmt).kind == StmtKind::kAnnotated)
-      declared = types_.Union(declared, ValueOfBinding({file.id, occurrence.begin}, frame));
   }
-  if (declared.IsKnown()) return declared;
-  std::vector<uint32_t> reached;
   const NameScopeKind kind = file.bindings.scopes[owner.scope].kind;
   if (kind == NameScopeKind::kModule || kind == NameScopeKind::kClass || kind == NameScopeKind::kFunction) {
     const std::function<int(ExprId)> truth = [&](ExprId condition) { return StaticTruth(file, condition); };
@@ -395,9 +387,21 @@ Value Inference::ValueOfVariable(const SourceFile& file, uint32_t symbol, FrameI
   }
   if (reached.empty()) reached = own;
   reached.insert(reached.end(), elsewhere.begin(), elsewhere.end());
-  Value value;
-  for (const uint32_t offset : reached) value = types_.Union(value, ValueOfBinding({file.id, offset}, frame));
-  return value;
+  std::vector<Binding> found;
+  for (const uint32_t offset : reached) found.push_back({file.id, offset});
+  return found;
+}
+
+Value Inference::ValueOfVariable(const SourceFile& file, uint32_t symbol, FrameId frame) {
+  Value declared;
+  for (const uint32_t i : file.occurrences().Of(symbol)) {
+    const Occurrence& occurrence = file.bindings.occurrences[i];
+    if (occurrence.kind != NameKind::kVariable) continue;
+    const StmtId stmt = file.syntax.StatementAt(occurrence.begin);
+    if (file.syntax.stmt(stmt).kind == StmtKind::kAnnotated && IsReachable(file, stmt))
+      declared = types_.Union(declared, ValueOfBinding({file.id, occurrence.begin}, frame));
+  }
+  return declared.IsKnown() ? declared : ValueOfBindings(BindingsAtEnd(file, symbol), frame);
 }
 
 Value Inference::ValueOfEntity(const Entity& entity) {
@@ -499,12 +503,20 @@ Value Inference::FindValueOfBinding(const SourceFile& file, uint32_t offset, Fra
   }
 }
 
+Value Inference::DecoratedBelow(const SourceFile& file, StmtId stmt, ExprId decorator) {
+  if (file.syntax.stmt(stmt).kind == StmtKind::kClass)
+    return Just(types_.Add(TypeKind::kClass, ClassOfStmt(file.id, stmt)));
+  const FunctionId function = FunctionOfStmt(file.id, stmt);
+  return Decorated(file, stmt, Just(types_.Add(TypeKind::kFunction, function)), kNoFrame, decorator);
+}
+
 // Decorators from the inside out. One that says nothing leaves what it decorates, as a guess.
-Value Inference::Decorated(const SourceFile& file, StmtId stmt, Value value, FrameId frame) {
+Value Inference::Decorated(const SourceFile& file, StmtId stmt, Value value, FrameId frame, ExprId until) {
   const FileSyntax& syntax = file.syntax;
   const auto decorators = syntax.DecoratorsOf(syntax.stmt(stmt));
   for (size_t i = decorators.size(); i-- > 0;) {
     const ExprId decorator = decorators[i];
+    if (decorator == until) break;
     const Text name = syntax.NameOf(decorator);
     if (name == "staticmethod" || name == "classmethod" || name == "overload" || name == "abstractmethod" ||
         name == "override" || name == "final" || name == "type_check_only" || name == "deprecated")
@@ -654,8 +666,7 @@ Value Inference::ValueOfTarget(const SourceFile& file, ExprId target, FrameId fr
         const Value items = ItemsPutInto(file, target);
         if (items.IsKnown()) return items;
       }
-      const Value given = root == target || !is_container(value) ? ValueOf(file.id, value, frame) : kUnknown;
-      return Unpack(file, target, root, given, {file.id, value}, frame);
+      return Unpack(file, target, root, ValueOf(file.id, value, frame), {file.id, value}, frame);
     }
     case StmtKind::kAnnotated: {
       const Text hinted = syntax.NameOf(stmt.hint);

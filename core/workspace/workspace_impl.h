@@ -34,6 +34,7 @@ class Workspace::Impl final : public CallerSource {
   std::vector<Location> LocationsOf(const Entities& entities, bool follows_source = true);
   // Where the source of a library's module says what its stub declares.
   Binding SourceOf(Binding binding);
+  Binding OtherSideOf(Binding binding);
   void Sort(std::vector<Location>& locations) const;
   // Definitions of attributes of a name in the project, where nothing is known of the receiver.
   std::vector<Location> MembersNamed(Text name);
@@ -49,6 +50,7 @@ class Workspace::Impl final : public CallerSource {
   // How a use's entities meet those asked for: nothing, or a certainty.
   bool Meets(const Entities& use, const std::vector<Entity>& targets, Certainty& certainty);
   bool IsCommonAttribute(Text name);
+  void AddOtherSides(Entities& entities);
 
   // ---- describe.cc ----
   std::string TextOfType(TypeId type, bool is_short = false, int depth = 0);
@@ -77,11 +79,19 @@ class Workspace::Impl final : public CallerSource {
     std::string name;
     Certainty certainty;
   };
+  std::vector<Callee> CalleesOf(Value callee);
   std::vector<Callee> CalleesOf(const SourceFile& file, ExprId call);
+  std::vector<Location> MembersBelow(const SourceFile& file, ExprId attribute);
   std::string QualifiedName(const Binding& binding);
   std::string NameOfScope(const SourceFile& file, uint32_t scope);
-  // The function around a place, the module's body for kModuleStmt.
-  StmtId FunctionAround(const SourceFile& file, uint32_t offset);
+  // Code that runs at one time: of a function, of a lambda, or of the module, where both are none.
+  struct Body {
+    StmtId def = kModuleStmt;
+    ExprId lambda = kNoExpr;
+    friend bool operator==(const Body&, const Body&) = default;
+  };
+  Body BodyAround(const SourceFile& file, uint32_t offset);
+  Body BodyAt(const SourceFile& file, uint32_t offset);
 
   Settings settings;
   Files files;
