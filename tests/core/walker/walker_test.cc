@@ -193,6 +193,15 @@ TEST(Frame, AHostsOverridesGetTheSameRecords) {
   }
 }
 
+TEST(Frame, AHostsOverridesGetWhatOthersAppend) {
+  const ParsedLine line("x");
+  Hooks hooks;
+  line.line().hooks = &hooks;
+  line.line().AppendTypeEquiv("x", ":g:");
+  line.line().AppendArgTypeEquiv("y", ":s:");
+  EXPECT_EQ(hooks.records, (Records{"x :g:", "arg: y :s:"}));
+}
+
 TEST(Frame, OtherFailuresPassThroughAndLeaveTheWalkerIdle) {
   CNodeWalker walker(kPy3);
   const ParsedLine line("x = y");
@@ -873,6 +882,14 @@ TEST(Patterns, DefineWhatTheyCapture) {
       {"case [_, a]: pass", {"a :s:"}},
       {"case a.b.C(d): pass", {"d :s:", "a :g:", "b :g:", "C :g:"}},
   });
+}
+
+TEST(Patterns, AreWalkedAsAnyNodeWhereAHostHandsThemOver) {
+  const ParsedLine line("case a.b | 'c': pass");
+  CPatternNode* const pattern = line.Find<CPatternNode>();
+  ASSERT_EQ(pattern->kind, NodeKind::kCPatternNode);
+  CNodeWalker(kPy3).Walk(pattern, &line.line());
+  EXPECT_EQ(RecordStrings(line.line()), (Records{"a :g:", "b :g:"}));
 }
 
 TEST(Patterns, ALoneNameOrValueAtTheTopRecordsNothing) { Check({{"case x: pass", {}}, {"case a.b: pass", {}}}); }
