@@ -113,6 +113,11 @@ TEST(Places, ANameWithBlanksBetweenItsPartsStandsWhereTheStatementSpellsIt) {
   EXPECT_EQ(RecordsOf("x(x, 'a'  .join)\n", "'a'.join"), (Strings{"1:6 |'a'.join get"}));
   // Spelled with brackets that the name lacks: where its first part is, which no dot is in front of.
   EXPECT_EQ(RecordsOf("q.x + x[(1)] .y\n", "x[1].y"), (Strings{"1:7 |x[1].y get"}));
+  std::string row;
+  for (int i = 0; i < 249; ++i) row += "a,";
+  // The last token that is looked at, and the one behind it.
+  EXPECT_EQ(RecordsOf("(" + row + "x .y)\n", "x.y"), (Strings{"1:500 |x.y get"}));
+  EXPECT_EQ(RecordsOf("-(" + row + "x .y)\n", "x.y"), (Strings{"1:1 |x.y get"}));
   const std::string arguments(300, 'a');
   EXPECT_EQ(RecordsOf("x[0]; x + x[" + arguments + "] .y\n", "x[" + arguments + "].y"),
             (Strings{"1:11 |x[" + arguments + "].y get"}));

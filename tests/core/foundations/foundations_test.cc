@@ -292,6 +292,12 @@ TEST(Errors, ReprReadsAsTheHostWritesIt) {
   EXPECT_EQ(repr(1), "Exception()");
 }
 
+TEST(Errors, AreReportedOnALineWhereNoHostTakesThem) {
+  ::testing::internal::CaptureStderr();
+  TheConsole().report_exception(std::make_exception_ptr(Error(ErrorKind::kValueError, "odd")), false);
+  EXPECT_EQ(::testing::internal::GetCapturedStderr(), "ValueError('odd')\n");
+}
+
 TEST(Errors, ReprOfTextChoosesQuotesAndEscapesAsTheHostDoes) {
   EXPECT_EQ(ReprOfText(""), "''");
   EXPECT_EQ(ReprOfText("it's"), "\"it's\"");

@@ -85,6 +85,15 @@ TEST(FutureImports, OnlyThoseOfTheFutureSwitchThePrintFunctionOn) {
   EXPECT_FALSE(imports(""));
 }
 
+TEST(Positions, OfPartsEndWithTheWhole) {
+  const std::vector<Position> stored = {{1, 2}, {3, 4}, {5, 6}};
+  const PositionView positions(stored);
+  EXPECT_EQ(positions.Slice(1, 9).size(), 2u);
+  EXPECT_EQ(positions.Slice(1, 9)[0].line, 3);
+  EXPECT_EQ(positions.Slice(7, 9).size(), 0u);
+  EXPECT_EQ(positions.Slice(2, 1).size(), 0u);
+}
+
 // ---- lines ----
 
 TEST(Lines, ABodyOnTheLineOfItsHeadIsWhatItWouldBeAlone) {
