@@ -18,7 +18,8 @@ void BindSite(nb::module_& tarvex) {
   nb::class_<SiteObject>(host, "SiteIndex", "What the pages of a site know of each other.")
       .def(
           "__init__",
-          [](SiteObject* self, std::vector<std::string> files, std::vector<std::string> builtin_attributes) {
+          [](SiteObject* self, const std::vector<std::string>& files,
+             const std::vector<std::string>& builtin_attributes) {
             new (self) SiteObject{std::make_shared<SiteIndex>(files, builtin_attributes)};
           },
           nb::arg("files"), nb::arg("builtin_attributes"),

@@ -204,7 +204,7 @@ class Engine {
                                                           : "bad input";
     ParseError error(message, type, token.view(), Context::Index(context));
     error.needed = needed;
-    throw error;
+    throw ParseError(error);
   }
 
   void DropNodes() {
