@@ -574,6 +574,7 @@ struct Costs {
   double seconds[kPhases][2];
   double bytes[2];   // of the texts
   double memory[2];  // by which the process grew for one
+  bool refused;      // the larger one: it takes more memory than a source may
 };
 
 FileAnalyzer::Options OptionsFor(bool py3) {
@@ -655,7 +656,7 @@ void RenderAll(Text text) {
 }
 
 Costs MeasureHere(const Shape& shape, size_t size) {
-  Costs costs;
+  Costs costs{};
   Tools& tools = TheTools();
   for (int step = 0; step < 2; ++step) {
     const std::string text = Make(shape, step == 0 ? size : 4 * size);
@@ -688,7 +689,13 @@ struct Job {
 
 void* RunJob(void* argument) {
   const Job& job = *static_cast<Job*>(argument);
-  const Costs costs = MeasureHere(*job.shape, job.size);
+  Costs costs{};
+  try {
+    costs = MeasureHere(*job.shape, job.size);
+  } catch (const Error& error) {
+    if (error.kind() != ErrorKind::kOverflowError) throw;
+    costs.refused = true;
+  }
   if (write(job.pipe, &costs, sizeof costs) != sizeof costs) std::perror("write");
   return nullptr;
 }
@@ -756,7 +763,7 @@ bool Try(const Shape& shape, const Limits& limits, bool show_all) {
   Costs costs{};
   for (int attempt = 0; attempt < 3; ++attempt) {
     wrong = Measure(shape, limits.size, limits.stack, costs);
-    if (!wrong.empty()) break;
+    if (!wrong.empty() || costs.refused) break;
     wrong = Judge(costs, limits);
     if (wrong.empty()) break;
   }
@@ -764,8 +771,8 @@ bool Try(const Shape& shape, const Limits& limits, bool show_all) {
     std::printf("%-44s", shape.name.c_str());
     for (int phase = 0; phase < kPhases; ++phase)
       std::printf(" %6.0f", costs.bytes[1] > 0 ? costs.seconds[phase][1] / costs.bytes[1] * 1e9 : 0.0);
-    std::printf(" %6.0f %s%s\n", costs.bytes[1] > 0 ? costs.memory[1] / costs.bytes[1] : 0.0,
-                wrong.empty() ? "" : "  <--", wrong.c_str());
+    std::printf(" %6.0f %s%s%s\n", costs.bytes[1] > 0 ? costs.memory[1] / costs.bytes[1] : 0.0,
+                costs.refused ? "  refused: too large" : "", wrong.empty() ? "" : "  <--", wrong.c_str());
     std::fflush(stdout);
   }
   return wrong.empty();
