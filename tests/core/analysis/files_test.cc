@@ -223,11 +223,17 @@ TEST(Memory, WhatIsMadeOfTheResultsCounts) {
 
 // ---- the stack ----
 
+#ifdef __SANITIZE_THREAD__
+constexpr size_t kSmallStack = size_t{4} << 20;  // frames are several times as large
+#else
+constexpr size_t kSmallStack = size_t{512} << 10;
+#endif
+
 // Runs a function on a stack of half a mebibyte, as threads have it on some systems.
 void OnSmallStack(std::function<void()> function) {
   pthread_attr_t attributes;
   pthread_attr_init(&attributes);
-  pthread_attr_setstacksize(&attributes, size_t{512} << 10);
+  pthread_attr_setstacksize(&attributes, kSmallStack);
   pthread_t thread;
   const auto run = [](void* argument) -> void* {
     (*static_cast<std::function<void()>*>(argument))();
