@@ -131,9 +131,9 @@ nb::list CutSource(Any source, Any version_triple) {
 
 void BindLanguage(nb::module_& host) {
   nb::class_<Language>(host, "Language", "What an analyzer is built from. Grammar files are absolute paths.")
-      .def(nb::init<nb::handle, std::string, std::string, std::vector<std::string>, bool, std::string>(),
+      .def(nb::init<nb::handle, std::string, std::string, std::vector<std::string>, bool, std::string, bool>(),
            nb::arg("version_triple"), nb::arg("grammar_file"), nb::arg("hint_grammar_file"), nb::arg("keyword_seq"),
-           nb::arg("py3_grammar"), nb::arg("print_function_grammar_file"));
+           nb::arg("py3_grammar"), nb::arg("print_function_grammar_file"), nb::arg("exact"));
 }
 
 }  // namespace

@@ -16,13 +16,14 @@ namespace quillet::host {
 class Language {
  public:
   Language(nb::handle version_triple, std::string grammar_file, std::string hint_grammar_file,
-           std::vector<std::string> keywords, bool py3_grammar, std::string print_function_grammar_file) {
+           std::vector<std::string> keywords, bool py3_grammar, std::string print_function_grammar_file, bool exact) {
     options_.version = VersionOf(version_triple);
     options_.grammar_file = std::move(grammar_file);
     options_.hint_grammar_file = std::move(hint_grammar_file);
     options_.hint_keywords = keywords;
     options_.keywords = std::move(keywords);
     options_.py3_grammar = py3_grammar;
+    options_.reads_completely = !exact;
     options_.print_function_grammar_file = std::move(print_function_grammar_file);
   }
 

@@ -12,7 +12,8 @@ An example is a comment that names a view, a block of source and a block of outp
     ```
 
 The views: `records` (each record raw and decoded), `tree` (the parse tree), `analyze` (what the command
-line prints; the comment may name a file for it), `find` (what it answers of the name in the comment), `names` (each
+line prints; the comment may name a file for it), `exact` and `exact_records` (`analyze` and `records` of an exact
+reading), `find` (what it answers of the name in the comment), `names` (each
 occurrence: place, text, role, kind or flags, and its variable's scope), `scopes` (each scope with its symbols).
 The version is 3.12 where none is given.
 
@@ -51,10 +52,10 @@ def documents() -> list[Path]:
     return [ROOT / "README.md", *sorted((ROOT / "docs").glob("*.md"))]
 
 
-def records_view(source: str, version: tuple[int, int], _: str) -> str:
+def records_view(source: str, version: tuple[int, int], _: str, *, exact: bool = False) -> str:
     """One record a line: name, raw info, kind and detail. Parameters are marked."""
     rows: list[tuple[str, str, Record]] = []
-    for line in analyze(source, version=version).lines:
+    for line in analyze(source, version=version, exact=exact).lines:
         logical = line.logical
         raw = [*(logical.fTypeEquivs or ()), *(logical.fArgTypeEquivs or ())]
         rows += [(name.decode(), info.decode(), record) for (name, info), record in zip(raw, line.records, strict=True)]
@@ -66,17 +67,28 @@ def records_view(source: str, version: tuple[int, int], _: str) -> str:
     return "".join(out)
 
 
+def exact_records_view(source: str, version: tuple[int, int], _: str) -> str:
+    """The records of an exact reading."""
+    return records_view(source, version, "", exact=True)
+
+
 def tree_view(source: str, version: tuple[int, int], _: str) -> str:
     """The trees of all statements."""
     analysis = analyze(source, version=version)
     return "".join(tree_text(line, analysis.analyzer) for line in analysis.lines)
 
 
-def analyze_view(source: str, version: tuple[int, int], file: str) -> str:
+def analyze_view(source: str, version: tuple[int, int], file: str, *, exact: bool = False) -> str:
     """What `quillet analyze` prints."""
     inputs = [(file.encode(), source.encode(), None)]
     form = output_format("text", errors_only=False, style=Style(on=False))
-    return "".join(bytes(result).decode() for result in write_files(inputs, version=version, jobs=1, form=form))
+    results = write_files(inputs, version=version, jobs=1, form=form, exact=exact)
+    return "".join(bytes(result).decode() for result in results)
+
+
+def exact_view(source: str, version: tuple[int, int], file: str) -> str:
+    """What `quillet analyze --exact` prints."""
+    return analyze_view(source, version, file, exact=True)
 
 
 @contextmanager
@@ -150,6 +162,8 @@ VIEWS = {
     "records": records_view,
     "tree": tree_view,
     "analyze": analyze_view,
+    "exact": exact_view,
+    "exact_records": exact_records_view,
     "find": find_view,
     "names": names_view,
     "scopes": scopes_view,

@@ -172,7 +172,7 @@ def survey(library: Library, each_nth: int = 1) -> Findings:
         for path in library.files(each_nth):
             findings.files += 1
             try:
-                analysis = analyze(path.read_bytes(), version=library.version)
+                analysis = analyze(path.read_bytes(), version=library.version, exact=True)
             except SourceEncodingError:
                 findings.unreadable.append(path)
                 continue

@@ -6,13 +6,16 @@
 // with the line's tokens and reported. The tree goes back on every way out.
 #include "analysis/analyzer.h"
 
+#include <algorithm>
 #include <exception>
 #include <utility>
 
+#include "analysis/closer_look.h"
 #include "analysis/error_words.h"
 #include "foundations/console.h"
 #include "foundations/stop.h"
 #include "lines/syntax_error.h"
+#include "parser/complete_parser.h"
 
 namespace quillet {
 
@@ -83,7 +86,20 @@ CPGenAnalyzerImpl::CPGenAnalyzerImpl(const Options& options)
       type_hint_walker_(
           std::make_unique<CTypeHintWalker>(std::make_unique<CPGenParserImpl>(ParserOptions(
                                                 options, options.hint_grammar_file, options.hint_keywords, true)),
-                                            options.version, node_walker_.get())) {}
+                                            options.version, node_walker_.get())),
+      version_(options.version) {
+  if (!options.reads_completely) return;
+  CPGenParserImpl& hint_parser = type_hint_walker_->hint_parser();
+  const bool print_statement =
+      !options.version.AtLeast(3, 0) && std::ranges::find(options.keywords, "print") != options.keywords.end();
+  complete_parser_ =
+      std::make_unique<CompleteParser>(hint_parser.factory(), hint_parser.grammar(), options.version, print_statement);
+  closer_look_ = std::make_unique<CloserLook>(options.version);
+  node_walker_->ReadCompletely();
+  type_hint_walker_->ReadCompletely(complete_parser_.get());
+}
+
+CPGenAnalyzerImpl::~CPGenAnalyzerImpl() = default;
 
 std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeSingleLogical(LogicalLine& logical, bool in_async_def,
                                                                    bool first_in_def) {

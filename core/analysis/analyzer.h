@@ -14,10 +14,15 @@
 #include "foundations/errors.h"
 #include "hints/hint_walker.h"
 #include "lines/logical_line.h"
+#include "lines/scopes.h"
+#include "lines/typing_names.h"
 #include "parser/parser.h"
 #include "walker/walker.h"
 
 namespace quillet {
+
+class CloserLook;
+class CompleteParser;
 
 class CPGenAnalyzerImpl {
  public:
@@ -30,14 +35,23 @@ class CPGenAnalyzerImpl {
     bool py3_grammar = true;
     TokenNames token_names = TokenNames::Default();
     KindsByName kinds_by_state = KindsByStateName();
+    // For AnalyzeCompletely.
+    bool reads_completely = false;
   };
 
   explicit CPGenAnalyzerImpl(const Options& options);
+  ~CPGenAnalyzerImpl();
 
   // Analyses a line once. The error that describes a failure, or nothing: success, a line that was
   // analysed before, or a failure that is no syntax error, which is reported to the console. Only
   // what a hook or the report raises leaves as an exception.
   std::optional<SyntaxError> AnalyzeSingleLogical(LogicalLine& logical, bool in_async_def, bool first_in_def = false);
+
+  // The same for a host that wants what the version of Python has, no more and no less: a statement that the
+  // tables do not take, or may take in error, is read by the parser that knows every rule, and its error is in
+  // the language's own words. A hint that cannot be read is an error that leaves the statement its records.
+  // Of an analyzer that was made for it.
+  std::optional<SyntaxError> AnalyzeCompletely(LogicalLine& logical, const LinePlace& place, const TypingNames& typing);
 
   // True; throws ParseError, SyntaxError, or ValueError for anything else that went wrong.
   bool InspectSingleLogical(LogicalLine& logical, bool in_async_def, bool in_embedded_expression = false,
@@ -58,9 +72,29 @@ class CPGenAnalyzerImpl {
   CTypeHintWalker& type_hint_walker() const { return *type_hint_walker_; }
 
  private:
+  // Throws what the statement is rejected with.
+  void InspectCompletely(LogicalLine& logical, const LinePlace& place);
+  // The walks of a tree, which is given back; null for a line of comments.
+  void WalkCompletely(CNode* tree, LogicalLine& logical, const LinePlace& place);
+  void InspectEmbeddedCompletely(LogicalLine& logical, const LinePlace& place);
+  void InspectField(LogicalLine& logical, LogicalLine& exp, const LinePlace& place);
+  void InspectStringHint(LogicalLine& exp);
+  // A failure in an embedded expression, as one of the line that holds it.
+  SyntaxError ErrorInEmbedded(const std::string& message, const LogicalLine& logical, const LogicalLine& exp,
+                              Context context) const;
+  SyntaxError ErrorAt(const std::string& message, const LogicalLine& logical, Context context) const;
+
   std::unique_ptr<CPGenParserImpl> logical_parser_;
   std::unique_ptr<CNodeWalker> node_walker_;
   std::unique_ptr<CTypeHintWalker> type_hint_walker_;
+  // Of an analyzer that reads completely.
+  std::unique_ptr<CompleteParser> complete_parser_;
+  std::unique_ptr<CloserLook> closer_look_;
+  const TypingNames* typing_ = nullptr;  // of the statement under way
+  // Errors that leave it its records: of a hint, the first one, and of what the compiler does not take.
+  std::optional<SyntaxError> hint_error_;
+  std::optional<SyntaxError> compile_error_;
+  const Version version_;
   bool spells_error_texts_ = true;
   bool explains_errors_ = false;
 };

@@ -70,11 +70,14 @@ CPGenAnalyzerImpl& FileAnalyzer::AnalyzerForSource() {
 void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   Reset(bytes);
   Cut();
+  if (options_.reads_completely) typing_.Read(*found_.source, found_.rows);
   CPGenAnalyzerImpl& analyzer = AnalyzerForSource();
   analyzer.set_spells_error_texts(options_.keeps_whole_errors);
   analyzer.set_explains_errors(true);
   const NodePool& pool = analyzer.logical_parser().factory().pool();
-  const size_t nodes_before = pool.node_count();
+  const NodePool& other_pool = analyzer.type_hint_walker().hint_parser().factory().pool();
+  const auto node_count = [&] { return pool.node_count() + other_pool.node_count(); };
+  const size_t nodes_before = node_count();
   found_.results.reserve(found_.rows.size());
   CountMemory();
   wanted_.assign(filter != nullptr ? found_.rows.size() : 0, false);
@@ -82,7 +85,7 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   LogicalLine line;
   for (size_t i = 0; i < found_.rows.size(); ++i) {
     const LineRow& row = found_.rows[i];
-    CheckMemory(std::max(MostMemoryOf(row), sizeof(CNode) * (pool.node_count() - nodes_before)));
+    CheckMemory(std::max(MostMemoryOf(row), sizeof(CNode) * (node_count() - nodes_before)));
     AnalyzeRow(analyzer, row, !is_filtered || wanted_[i], line);
     CountMemory();
   }
@@ -128,7 +131,9 @@ void FileAnalyzer::AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, b
     SetFromRow(line, found_.source, row);
     line.parsed = false;
     line.WriteTo(&found_.store);
-    if (const auto error = analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def)) {
+    if (const auto error = options_.reads_completely
+                               ? analyzer.AnalyzeCompletely(line, place, typing_)
+                               : analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def)) {
       result.error = static_cast<int32_t>(found_.errors.size());
       AddError(*error);
     }

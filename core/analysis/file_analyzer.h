@@ -53,6 +53,7 @@ class FileAnalyzer {
   static constexpr size_t kMemoryPerSourceByte = 10;
   static constexpr size_t kLeastMemoryLimit = size_t{1} << 30;
 
+  // Where Options::reads_completely is set, lines are read by AnalyzeCompletely.
   struct Options : CPGenAnalyzerImpl::Options {
     // The grammar for sources of 2.7 that switch the print function on; empty where the version has
     // no such switch.
@@ -116,6 +117,7 @@ class FileAnalyzer {
   Found found_;
   std::vector<bool> wanted_;  // of the rows, where there is a filter
   ScopeTracker scopes_;
+  TypingNames typing_;
   size_t memory_limit_ = kLeastMemoryLimit;
   size_t held_ = 0;
 };

@@ -133,12 +133,14 @@ void CTypeHintWalker::WalkTree(CNode* node, LogicalLine* logical, bool first_in_
     int32_t& count;
     ~Reset() { count = 0; }
   } reset{fCommentHintCount};
+  hint_error_.reset();
   CountCommentHints(*logical);
 
   if (node != nullptr) {
-    const bool is_small = is_of_line &&
-                          logical->toks.size() + kInventedTokens <= static_cast<size_t>(fMaxRecurseCount) &&
-                          fMaxVisits >= 4 * fMaxRecurseCount;
+    const bool is_small =
+        complete_parser_ != nullptr ||
+        (is_of_line && logical->toks.size() + kInventedTokens <= static_cast<size_t>(fMaxRecurseCount) &&
+         fMaxVisits >= 4 * fMaxRecurseCount);
     if (!is_small) return CDispatchWalker::Walk(node, logical, first_in_def);
     return RunWalk(logical, [&] { VisitStatements(node, 1); });
   }
@@ -327,6 +329,7 @@ bool CTypeHintWalker::GetHintFromComment(Text comment, std::string& hint) {
 }
 
 CNode* CTypeHintWalker::ParseHint(Text hint, int32_t tok_i, bool call_general_node_walker) {
+  if (complete_parser_ != nullptr) return ParseHintCompletely(hint, tok_i, call_general_node_walker);
   if (!hint_source_)
     hint_source_ = SourceText::Copy(hint);
   else

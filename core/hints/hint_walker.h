@@ -12,6 +12,7 @@
 #pragma once
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
@@ -24,6 +25,8 @@
 
 namespace quillet {
 
+class CompleteParser;
+
 class CTypeHintWalker : public CDispatchWalker {
  public:
   // `general_node_walker` may be null; it is not owned.
@@ -33,6 +36,16 @@ class CTypeHintWalker : public CDispatchWalker {
   void Walk(CNode* node, LogicalLine* logical, bool first_in_def) override;
   // For a tree of a host's, which the line says nothing of: always visits every node.
   void WalkAnyTree(CNode* node, LogicalLine* logical, bool first_in_def);
+
+  // ---- complete readings (complete_hints.cc) ----
+  // For hosts that want every hint: any comment that tells a type checker to look away holds none, signatures
+  // have all their forms, and a hint that cannot be read is kept as an error and takes nothing else with it.
+  // `parser` makes nodes of this walker's factory and is not owned.
+  void ReadCompletely(CompleteParser* parser);
+  // What the first hint of the last walk that could not be read was rejected with.
+  const std::optional<SyntaxError>& hint_error() const { return hint_error_; }
+  // Whether the function that is walked is a method, whose signature may leave its object out.
+  bool in_class = false;
 
   // ---- comments (hint_walker.cc) ----
   struct Comment {
@@ -97,6 +110,14 @@ class CTypeHintWalker : public CDispatchWalker {
   // The comments that may hold a hint, into fCommentHintCount.
   void CountCommentHints(LogicalLine& logical);
   void WalkTree(CNode* node, LogicalLine* logical, bool first_in_def, bool is_of_line);
+  // ---- complete readings ----
+  CNode* ParseHintCompletely(Text hint, int32_t tok_i, bool call_general_node_walker);
+  CNode* ParseTokensCompletely(TokenSpan toks, int32_t tok_i, bool is_signature);
+  void ProcessSignatureCompletely(Text hint, int32_t tok_i, LogicalLine* funcdef_logical, bool is_arg);
+  void KeepHintError(int32_t tok_i, int64_t utf8_offset_in_hint, const std::string& message);
+  static bool SaysIgnore(Text hint);
+  std::vector<Token> TokensOfHint(Text hint);
+
   // Walks a tree that cannot reach a limit: statements alone, none of their expressions.
   void VisitStatements(CNode* node, int32_t depth);
 
@@ -118,6 +139,9 @@ class CTypeHintWalker : public CDispatchWalker {
   Ref<SourceText> hint_source_;  // reused for the text of every hint
   std::vector<LineRow> hint_rows_;
   std::string info_buffer_;
+  CompleteParser* complete_parser_ = nullptr;
+  std::optional<SyntaxError> hint_error_;
+  int64_t hint_column_ = 0;  // of the first token of the hint under way
 };
 
 template <class Use>

@@ -145,6 +145,7 @@ CNode* CTypeHintWalker::ParseFuncdefCommentHint(Text hint, int32_t tok_i) {
 }
 
 void CTypeHintWalker::ProcessFuncdefComment(Text hint, int32_t tok_i, LogicalLine* funcdef_logical, bool is_arg) {
+  if (complete_parser_ != nullptr) return ProcessSignatureCompletely(hint, tok_i, funcdef_logical, is_arg);
   CNode* node = ParseFuncdefCommentHint(hint, tok_i);
   if (node == nullptr) return;
   if (!isa<CFuncdefStmt>(node)) return hint_parser_->DiscardNode(node);

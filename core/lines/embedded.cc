@@ -13,6 +13,7 @@
 #include "lines/logical_line.h"
 #include "lines/string_hints.h"
 #include "lines/type_comment.h"
+#include "lines/typing_names.h"
 
 namespace quillet {
 
@@ -22,8 +23,8 @@ using Found = EmbeddedExpressions::Found;
 
 class EmbeddedSearch {
  public:
-  EmbeddedSearch(TokenSpan toks, std::vector<Token>& tokens, std::vector<Found>& found)
-      : toks_(toks), tokens_(tokens), found_(found) {}
+  EmbeddedSearch(TokenSpan toks, const TypingNames* typing, std::vector<Token>& tokens, std::vector<Found>& found)
+      : toks_(toks), typing_(typing), tokens_(tokens), found_(found) {}
 
   void Run() {
     bool may_hold_hints = false;
@@ -32,12 +33,17 @@ class EmbeddedSearch {
       may_hold_hints |= token.code == tok::COLON || token.code == tok::RARROW || token.code == word::kCast;
       has_plain_string |= token.code == tok::STRING && !IsFormattedString(token);
     }
-    if (may_hold_hints && has_plain_string) FindStringHints(toks_, hints_);
+    if (typing_ != nullptr && typing_->has_renamed_cast()) may_hold_hints = true;
+    if (may_hold_hints && has_plain_string && typing_ != nullptr)
+      FindStringHints(toks_, *typing_, hints_, may_be_text_);
+    else if (may_hold_hints && has_plain_string)
+      FindStringHints(toks_, hints_);
 
     size_t next_hint = 0;
     for (size_t i = 0; i < toks_.size(); ++i) {
       if (next_hint < hints_.size() && hints_[next_hint] == i) {
-        AddHint(LineKind::kStringifiedTypeHint, ContentsOfStringHint(toks_[i]), i);
+        AddHint(LineKind::kStringifiedTypeHint, ContentsOfStringHint(toks_[i]), i,
+                next_hint < may_be_text_.size() && may_be_text_[next_hint]);
         while (next_hint < hints_.size() && hints_[next_hint] == i) ++next_hint;
       }
       if (toks_[i].code == tok::STRING && IsFormattedString(toks_[i])) AddFields(i);
@@ -58,22 +64,24 @@ class EmbeddedSearch {
     if (hint.found) AddHint(LineKind::kCommentedTypeHint, comment.substr(hint.begin, hint.end - hint.begin), i);
   }
 
-  void AddHint(LineKind kind, Text hint, size_t i) {
+  void AddHint(LineKind kind, Text hint, size_t i, bool may_be_text = false) {
     if (IsNone(hint)) return;
     const size_t begin = tokens_.size();
     AppendExpressionTokens(hint.data(), hint.data() + hint.size(), tokens_);
-    if (tokens_.size() > begin) AddFound(kind, {begin, tokens_.size()}, i);
+    if (tokens_.size() > begin) AddFound(kind, {begin, tokens_.size()}, i, may_be_text);
   }
 
-  void AddFound(LineKind kind, TokenRange range, size_t outer) {
-    found_.push_back(
-        {kind, static_cast<uint32_t>(range.begin), static_cast<uint32_t>(range.end), static_cast<uint32_t>(outer)});
+  void AddFound(LineKind kind, TokenRange range, size_t outer, bool may_be_text = false) {
+    found_.push_back({kind, static_cast<uint32_t>(range.begin), static_cast<uint32_t>(range.end),
+                      static_cast<uint32_t>(outer), may_be_text});
   }
 
   TokenSpan toks_;
+  const TypingNames* typing_;
   std::vector<Token>& tokens_;
   std::vector<Found>& found_;
   std::vector<size_t> hints_;
+  std::vector<bool> may_be_text_;
   std::vector<TokenRange> fields_;
 };
 
@@ -100,14 +108,14 @@ class EmbeddedExpressions::PlacesInToken {
   std::vector<const char*> line_starts_;
 };
 
-EmbeddedExpressions::EmbeddedExpressions(const LogicalLine& line)
+EmbeddedExpressions::EmbeddedExpressions(const LogicalLine& line, const TypingNames* typing)
     : outer_toks_(line.toks), first_line_(line.first_line), has_stored_positions_(line.has_stored_positions()) {
   // Only bytes of the source are followed by what a scan may load.
   if (!line.source) return;
   for (const Token& token : line.toks)
     if (!token.removed() && !line.source->Holds(token.text)) return;
   std::vector<Token> tokens;
-  EmbeddedSearch(line.toks, tokens, found_).Run();
+  EmbeddedSearch(line.toks, typing, tokens, found_).Run();
   if (found_.empty()) return;
   inner_ = SourceText::Within(line.source);
   inner_->tokens = std::move(tokens);

@@ -28,6 +28,7 @@ Text TextOfLineKind(LineKind kind);
 LineKind LineKindOfText(Text text);
 
 class LogicalLine;
+class TypingNames;
 
 // Positions by token index. Either stored one by one (a host gave them) or worked out from where
 // the tokens stand in their source, relative to a first line.
@@ -218,14 +219,17 @@ class EmbeddedExpressions {
     uint32_t begin;
     uint32_t end;
     uint32_t outer;
+    bool may_be_text;  // see FindStringHints
   };
 
   // Of a line with positions of the host's own it holds views, so that no code of the host's may run while
   // it lives.
-  explicit EmbeddedExpressions(const LogicalLine& line);
+  // `typing`, where it is known: what the file calls the names of types.
+  explicit EmbeddedExpressions(const LogicalLine& line, const TypingNames* typing = nullptr);
   ~EmbeddedExpressions();
 
   size_t size() const { return found_.size(); }
+  bool MayBeText(size_t index) const { return found_[index].may_be_text; }
   // Makes `line`, a fresh one or one that an expression was shown in, the expression of this index.
   void Show(size_t index, LogicalLine& line);
 

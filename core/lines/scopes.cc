@@ -17,6 +17,8 @@ LinePlace ScopeTracker::Next(const LineRow& row) {
   if (!scopes_.empty()) {
     Scope& scope = scopes_.back();
     place.in_async_def = scope.is_async;
+    place.in_def = scope.is_def;
+    place.in_class = !scope.is_def;
     place.first_in_def = scope.is_def && scope.awaits_first;
     if (!is_comment) scope.awaits_first = false;
   }

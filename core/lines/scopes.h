@@ -19,7 +19,9 @@ namespace quillet {
 struct LinePlace {
   bool in_async_def = false;
   bool first_in_def = false;
-  uint32_t depth = 0;  // of the open definitions around the line; 0 for a blank line
+  bool in_class = false;  // directly
+  bool in_def = false;    // directly, of either kind
+  uint32_t depth = 0;     // of the open definitions around the line; 0 for a blank line
 };
 
 class ScopeTracker {

@@ -8,6 +8,7 @@
 
 #include "lines/logical_line.h"
 #include "lines/token_search.h"
+#include "lines/typing_names.h"
 #include "tokens/operators.h"
 #include "tokens/token_ends.h"
 
@@ -17,16 +18,24 @@ namespace {
 
 class HintSearch {
  public:
-  HintSearch(TokenSpan toks, std::vector<size_t>& hints) : toks_(toks), count_(toks.size()), hints_(hints) {}
+  explicit HintSearch(TokenSpan toks, const TypingNames* typing = nullptr)
+      : toks_(toks), count_(toks.size()), typing_(typing) {}
+
+  struct Hint {
+    size_t token;
+    bool may_be_text;
+
+    friend bool operator<(const Hint& a, const Hint& b) { return a.token < b.token; }
+  };
 
   void Run() {
-    const size_t first = hints_.size();
     for (size_t i = NextSignificant(toks_, 0, count_); i < count_; i = NextSignificant(toks_, i, count_))
       i = Statement(i);
     Casts();
-    std::sort(hints_.begin() + static_cast<ptrdiff_t>(first), hints_.end());
+    std::sort(hints_.begin(), hints_.end());
   }
   void RunOnType() { Region(0, count_); }
+  const std::vector<Hint>& hints() const { return hints_; }
 
  private:
   TokenCode CodeAt(size_t i) const { return i < count_ ? toks_[i].code : tok::ENDMARKER; }
@@ -126,7 +135,7 @@ class HintSearch {
     for (size_t i = NextSignificant(toks_, 0, count_); i < count_; i = Next(i)) {
       const TokenCode code = toks_[i].code;
       if (code == tok::LPAR && IsCast(previous, before_previous))
-        brackets_.push_back({Meaning::kFirstOnly, true});
+        brackets_.push_back({Meaning::kFirstOnly, true, false});
       else if (IsOpeningBracket(code))
         OpenBracket(code, previous, false);
       else if (IsClosingBracket(code) && !brackets_.empty())
@@ -134,7 +143,7 @@ class HintSearch {
       else if (code == tok::COMMA)
         AddComma();
       else if (code == tok::STRING && !brackets_.empty() && brackets_.back().holds_types && IsWholeType(i, previous))
-        hints_.push_back(i);
+        AddHint(i);
       before_previous = previous;
       previous = i;
     }
@@ -143,6 +152,7 @@ class HintSearch {
   // `cast` as a call of its own or of `typing`; not as the name of what is defined, nor as another
   // object's method.
   bool IsCast(size_t name, size_t before_name) const {
+    if (typing_ != nullptr) return name < count_ && IsImportedCast(name, before_name);
     if (CodeAt(name) != word::kCast) return false;
     const TokenCode front = CodeAt(before_name);
     if (front == word::kDef || front == word::kClass) return false;
@@ -153,21 +163,55 @@ class HintSearch {
     return toks_[owner].view() == "typing";
   }
 
+  bool IsImportedCast(size_t name, size_t before_name) const {
+    if (!IsNameCode(toks_[name].code)) return false;
+    const TokenCode front = CodeAt(before_name);
+    if (front == word::kDef || front == word::kClass) return false;
+    return MemberAt(name, front == tok::DOT) == "cast";
+  }
+
+  // What the module of types calls the name at `i`; empty for any other name.
+  Text MemberAt(size_t i, bool is_attribute) const {
+    const Text name = toks_[i].view();
+    if (!is_attribute) return typing_->MemberOf(name);
+    const size_t dot = Before(i);
+    const size_t owner = dot < count_ ? Before(dot) : count_;
+    return owner < count_ && typing_->IsModule(toks_[owner].view()) ? name : Text("");
+  }
+  size_t Before(size_t i) const {
+    while (i > 0) {
+      --i;
+      if (!toks_[i].removed() && !IsSkipCode(toks_[i].code)) return i;
+    }
+    return count_;
+  }
+
   // What the text in a bracket is: types, types up to the first comma, or values.
   enum class Meaning : uint8_t { kTypes, kFirstOnly, kValues };
   struct Bracket {
     Meaning meaning;
     bool holds_types;  // it and all around it, from here on
+    bool may_be_text;  // it or one around it is a subscript of what nobody knows
   };
+
+  void AddHint(size_t i) { hints_.push_back({i, !brackets_.empty() && brackets_.back().may_be_text}); }
 
   void OpenBracket(TokenCode code, size_t previous, bool outermost_holds_types) {
     const Meaning meaning = MeaningOf(code, previous);
     const bool around = brackets_.empty() ? outermost_holds_types : brackets_.back().holds_types;
-    brackets_.push_back({meaning, around && meaning != Meaning::kValues});
+    const bool may_be_text = (!brackets_.empty() && brackets_.back().may_be_text) || IsUnknownSubscript(code, previous);
+    brackets_.push_back({meaning, around && meaning != Meaning::kValues, may_be_text});
   }
 
   void AddComma() {
     if (!brackets_.empty() && brackets_.back().meaning == Meaning::kFirstOnly) brackets_.back().holds_types = false;
+  }
+
+  bool IsUnknownSubscript(TokenCode code, size_t previous) const {
+    if (typing_ == nullptr || code != tok::LSQB || previous >= count_ || !IsNameCode(toks_[previous].code))
+      return false;
+    const size_t front = Before(previous);
+    return MemberAt(previous, front < count_ && toks_[front].code == tok::DOT).empty();
   }
 
   Meaning MeaningOf(TokenCode code, size_t previous) const {
@@ -175,7 +219,12 @@ class HintSearch {
     const bool follows_value = IsNameCode(front) || front == tok::RPAR || front == tok::RSQB;
     if (code == tok::LPAR) return follows_value ? Meaning::kValues : Meaning::kTypes;
     if (code == tok::LBRACE) return Meaning::kValues;
-    const Text name = follows_value ? toks_[previous].view() : Text();
+    Text name = follows_value ? toks_[previous].view() : Text();
+    if (typing_ != nullptr && !name.empty()) {
+      const size_t before = Before(previous);
+      const Text member = MemberAt(previous, before < count_ && toks_[before].code == tok::DOT);
+      if (!member.empty()) name = member;
+    }
     if (name == "Literal") return Meaning::kValues;
     return name == "Annotated" ? Meaning::kFirstOnly : Meaning::kTypes;
   }
@@ -198,7 +247,7 @@ class HintSearch {
         AddComma();
       }
       const bool holds_types = brackets_.empty() || brackets_.back().holds_types;
-      if (code == tok::STRING && holds_types && IsWholeType(i, previous)) hints_.push_back(i);
+      if (code == tok::STRING && holds_types && IsWholeType(i, previous)) AddHint(i);
       previous = i;
     }
     return end;
@@ -232,15 +281,34 @@ class HintSearch {
 
   TokenSpan toks_;
   size_t count_;
-  std::vector<size_t>& hints_;
+  const TypingNames* typing_;  // null: names are taken at their word
+  std::vector<Hint> hints_;
   std::vector<Bracket> brackets_;
 };
 
 }  // namespace
 
-void FindStringHints(TokenSpan toks, std::vector<size_t>& hints) { HintSearch(toks, hints).Run(); }
+void FindStringHints(TokenSpan toks, std::vector<size_t>& hints) {
+  HintSearch search(toks);
+  search.Run();
+  for (const HintSearch::Hint& hint : search.hints()) hints.push_back(hint.token);
+}
 
-void FindStringHintsOfType(TokenSpan toks, std::vector<size_t>& hints) { HintSearch(toks, hints).RunOnType(); }
+void FindStringHints(TokenSpan toks, const TypingNames& typing, std::vector<size_t>& hints,
+                     std::vector<bool>& may_be_text) {
+  HintSearch search(toks, &typing);
+  search.Run();
+  for (const HintSearch::Hint& hint : search.hints()) {
+    hints.push_back(hint.token);
+    may_be_text.push_back(hint.may_be_text);
+  }
+}
+
+void FindStringHintsOfType(TokenSpan toks, std::vector<size_t>& hints) {
+  HintSearch search(toks);
+  search.RunOnType();
+  for (const HintSearch::Hint& hint : search.hints()) hints.push_back(hint.token);
+}
 
 Text ContentsOfStringHint(const Token& string) {
   const Text text = string.view();

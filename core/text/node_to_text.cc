@@ -150,8 +150,12 @@ bool CNodeToTextConverter::AppendInterior(Run& run, CNode* node, TextOptions opt
   if (auto* atom_expr = dyn_cast<CAtomExpr>(node)) {
     return AppendChain(run, atom_expr->GetAtom(), atom_expr->TrailerSpan(), options);
   }
-  // The exponent of a power plays no part.
-  if (auto* power = dyn_cast<CPower>(node)) return AppendChain(run, power->GetAtom(), power->TrailerSpan(), options);
+  if (auto* power = dyn_cast<CPower>(node)) {
+    // Without it, the exponent of a power plays no part.
+    CNode* const exponent = shows_exponents_ ? power->GetExponentNode() : nullptr;
+    if (exponent != nullptr) return AppendPower(run, power, exponent, options);
+    return AppendChain(run, power->GetAtom(), power->TrailerSpan(), options);
+  }
   if (options.dotted_name_only) return false;
 
   if (auto* atom = dyn_cast<CAtom>(node)) {
@@ -231,6 +235,17 @@ bool CNodeToTextConverter::AppendChain(Run& run, CNode* atom, std::span<CNode* c
   for (CNode* trailer : trailers) {
     if (!AppendTrailer(run, trailer, options.dotted_name_only, options.literal_only)) return false;
   }
+  return true;
+}
+
+bool CNodeToTextConverter::AppendPower(Run& run, CPower* power, CNode* exponent, TextOptions options) {
+  if (options.dotted_name_only || !include_bracket_text_) return false;
+  const TextOptions part_options{.discard_simple_parens = false, .literal_only = options.literal_only};
+  if (options.add_parens_if_operator) Append(run, "(");
+  if (!AppendChain(run, power->GetAtom(), power->TrailerSpan(), part_options)) return false;
+  Append(run, " ** ");
+  if (!AppendNode(run, exponent, part_options)) return false;
+  if (options.add_parens_if_operator) Append(run, ")");
   return true;
 }
 

@@ -47,6 +47,10 @@ class CNodeToTextConverter {
   // Never none.
   Text TextForStringLiteral(const CStringLiteral* node) const;
 
+  // Whether a power is shown with its exponent, as a reader of all of a source wants it; hosts of the walkers
+  // know it without.
+  void set_shows_exponents(bool shows) { shows_exponents_ = shows; }
+
   bool include_bracket_text() const { return include_bracket_text_; }
   bool include_string_contents() const { return include_string_contents_; }
   bool include_arg_text() const { return include_arg_text_; }
@@ -89,12 +93,14 @@ class CNodeToTextConverter {
   bool AppendInterior(Run& run, CNode* node, TextOptions options);
   bool AppendCompound(Run& run, CNode* node, TextOptions options);
   bool AppendChain(Run& run, CNode* atom, std::span<CNode* const> trailers, TextOptions options);
+  bool AppendPower(Run& run, CPower* power, CNode* exponent, TextOptions options);
   bool AppendTrailer(Run& run, CNode* trailer, bool dotted_name_only, bool literal_only);
   void AppendTrailerContents(Run& run, CNode* nested, bool literal_only);
 
   bool include_bracket_text_;
   bool include_string_contents_;
   bool include_arg_text_;
+  bool shows_exponents_ = false;
   int depth_ = 0;
   // Kept from call to call for their memory.
   std::string buffer_;

@@ -42,6 +42,7 @@ void CNodeWalker::VisitAssignment(CExprStmt* node) {
   CNode* const value = node->GetPostEqualsTestExpr(equal_count - 1);
   for (int64_t i = -1; i < equal_count - 1; ++i) {
     CNode* const target = i < 0 ? node->GetInitialTestExpr() : node->GetPostEqualsTestExpr(i);
+    if (is_complete_) DoubtTarget(target);
     ProcessTargets(target, value);
     // Reads the names inside the target that it does not bind.
     VisitStoreContextNode(target);
@@ -51,11 +52,17 @@ void CNodeWalker::VisitAssignment(CExprStmt* node) {
 
 void CNodeWalker::VisitAugAssign(CExprStmt* node) {
   // It changes a binding and makes none: x += 1 only reads x. That is meant.
+  if (is_complete_) DoubtTarget(node->GetInitialTestExpr());
   VisitChildren(node);
 }
 
 void CNodeWalker::VisitAnnotatedAssign(CExprStmt* node) {
   CNode* const target = node->GetInitialTestExpr();
+  if (is_complete_) {
+    DoubtTarget(target);
+    // A list of targets takes no annotation, which a single one does in any brackets.
+    met_doubtful_ |= isa<CTestListStarExpr>(target) || isa<CAtom>(target);
+  }
   VisitStoreContextNode(target);
   CAnnotatedAssignNode* const annotation = node->GetAnnotatedAssignNode();
   if (annotation == nullptr) return;
@@ -68,6 +75,7 @@ void CNodeWalker::VisitAnnotatedAssign(CExprStmt* node) {
 // ---- targets ----
 
 void CNodeWalker::ProcessTargets(CNode* lhs, CNode* rhs, Text extra_trailer) {
+  lhs = TargetIn(lhs);
   if (!IsSequence(lhs)) return AppendEquivNode(lhs, rhs, extra_trailer);
   std::string trailer(extra_trailer);
   ProcessTargetsAtDepth(lhs, rhs, !IsNone(extra_trailer), trailer, 0);
@@ -75,6 +83,7 @@ void CNodeWalker::ProcessTargets(CNode* lhs, CNode* rhs, Text extra_trailer) {
 
 // `trailer` grows and shrinks with the nesting of the targets.
 void CNodeWalker::ProcessTargetsAtDepth(CNode* lhs, CNode* rhs, bool has_trailer, std::string& trailer, int depth) {
+  lhs = TargetIn(lhs);
   if (!IsSequence(lhs)) return AppendEquivNode(lhs, rhs, has_trailer ? Text(trailer) : kNoText);
   if (depth >= kMaxTargetDepth) {
     ThrowError(ErrorKind::kRecursionError, "maximum recursion depth exceeded while unpacking a target");
@@ -86,7 +95,7 @@ void CNodeWalker::ProcessTargetsAtDepth(CNode* lhs, CNode* rhs, bool has_trailer
     CNode* const value = i < values.count ? values.At(i) : nullptr;
     CNode* const target = targets.At(i);
     if (auto* starred = dyn_cast<CStarExpression>(target)) {
-      ProcessStarredTarget(starred);
+      ProcessStarredTarget(starred, depth);
     } else if (value != nullptr) {
       ProcessTargetsAtDepth(target, value, /*has_trailer=*/false, trailer, depth + 1);
     } else {
@@ -98,7 +107,12 @@ void CNodeWalker::ProcessTargetsAtDepth(CNode* lhs, CNode* rhs, bool has_trailer
   }
 }
 
-void CNodeWalker::ProcessStarredTarget(CStarExpression* target) {
+void CNodeWalker::ProcessStarredTarget(CStarExpression* target, int depth) {
+  if (CNode* starred = TargetIn(target->GetStarredExpression()); is_complete_ && IsSequence(starred)) {
+    // Its names are bound to elements of a list that is not known.
+    std::string trailer;
+    return ProcessTargetsAtDepth(starred, nullptr, /*has_trailer=*/false, trailer, depth + 1);
+  }
   // A list, whatever the value is.
   const Text text = fToText.TextForNode(target->GetStarredExpression());
   if (IsNone(text)) return;
@@ -112,6 +126,7 @@ void CNodeWalker::ProcessStarredTarget(CStarExpression* target) {
 void CNodeWalker::VisitForStmt(CForStmt* node) {
   CNode* const target = node->GetTarget();
   CNode* const iterable = node->GetInExpression();
+  if (is_complete_) DoubtTarget(target);
   VisitStoreContextNode(target, /*within_sub_expr=*/false);
   VisitNode(iterable);
   ProcessTargets(target, iterable, kIterationSubscript);
@@ -124,6 +139,10 @@ void CNodeWalker::VisitWithItem(CWithItem* node) {
   // it worked out what entering the context gives.
   CNode* const expression = node->GetExpression();
   ProcessTargets(node->GetTarget(), expression);
+  if (is_complete_) {
+    DoubtTarget(node->GetTarget());
+    VisitStoreContextNode(node->GetTarget());
+  }
   VisitNode(expression);
 }
 
@@ -133,6 +152,11 @@ void CNodeWalker::VisitExceptClause(CExceptClause* node) {
   if (type_expr == nullptr) return;
   VisitNode(type_expr);
   if (target == nullptr) return;
+  if (is_complete_ && !isa<CNameLiteral>(target)) {
+    DoubtTarget(target);
+    ProcessTargets(target, nullptr);
+    return VisitStoreContextNode(target);
+  }
   if (!isa<CNameLiteral>(target)) {
     // except E, (a, b): of the older language.
     throw CreateSyntaxError("Name in except clause must be a simple name", RequireLogical(), target->fContext);
@@ -142,6 +166,7 @@ void CNodeWalker::VisitExceptClause(CExceptClause* node) {
 }
 
 void CNodeWalker::VisitNamedExpr(CNode* node) {
+  met_doubtful_ = true;
   CNode* name_node = nullptr;
   CNode* value = nullptr;
   if (auto* named = dyn_cast<CNamedExpr>(node)) {

@@ -24,6 +24,7 @@ void CNodeWalker::ProcessCallOf(Text func_name, CNode* arglist) {
 }
 
 void CNodeWalker::ProcessFunctionCall(Text func_name, const UsedArgList& arg_list) {
+  if (is_complete_) DoubtArguments(arg_list);
   for (const CArgInfo& arg : arg_list) {
     if (arg_list.size() > 1) {
       if (auto* argument = dyn_cast<CSingleUsedArgumentNode>(arg.value)) {

@@ -54,6 +54,7 @@ void CNodeWalker::VisitParameters(CNode* node) {
 }
 
 void CNodeWalker::ProcessDefiningArgList(const ArgList& arg_list) {
+  if (is_complete_) DoubtParameters(arg_list);
   ForEachArg(arg_list, [this](const CArgInfo& arg) { ProcessDefiningArg(arg); });
 }
 
@@ -88,6 +89,7 @@ void CNodeWalker::VisitLambdaExpr(CLambdaExpr* node) {
 }
 
 void CNodeWalker::ProcessLambdaDefiningArgList(const ArgList& arg_list) {
+  if (is_complete_) DoubtParameters(arg_list);
   ForEachArg(arg_list, [this](const CArgInfo& arg) { ProcessLambdaDefiningArg(arg); });
 }
 
@@ -101,6 +103,7 @@ void CNodeWalker::VisitClassdef(CClassdefStmt* node) {
   if (CNode* bases = node->GetBaseClassesNode()) {
     const ListStack<UsedArgList>::Lease list(used_lists_);
     GetUsedArgInfoList(bases, *list);
+    if (is_complete_) DoubtArguments(*list);
     for (const CArgInfo& arg : *list) VisitNode(arg.value);
   }
 }

@@ -52,6 +52,12 @@ void CNodeWalker::VisitNode(CNode* node) {
   switch (node->kind) {
     case NodeKind::kCWithItem:
       return VisitWithItem(cast<CWithItem>(node));
+    case NodeKind::kCStarExpression:
+      met_doubtful_ = true;
+      return VisitChildren(node);
+    case NodeKind::kCDelStmt:
+      if (is_complete_) DoubtTarget(node->GetChild(1));
+      return VisitChildren(node);
     case NodeKind::kCImportNamesStmt:
       return VisitImportNames(cast<CImportNamesStmt>(node));
     case NodeKind::kCFromImportStmt:
@@ -104,7 +110,6 @@ void CNodeWalker::VisitNode(CNode* node) {
     case NodeKind::kCNode:
     case NodeKind::kCStmt:
     case NodeKind::kCIfStmt:
-    case NodeKind::kCDelStmt:
     case NodeKind::kCWithStmt:
     case NodeKind::kCPassStmt:
     case NodeKind::kCWithTypeParameters:
@@ -112,7 +117,6 @@ void CNodeWalker::VisitNode(CNode* node) {
     case NodeKind::kCAtom:
     case NodeKind::kCOperatorExpression:
     case NodeKind::kCIfElseExpression:
-    case NodeKind::kCStarExpression:
     case NodeKind::kCTestExpr:
     case NodeKind::kCTestListStarExpr:
     case NodeKind::kCKeywordLiteral:

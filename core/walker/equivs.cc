@@ -100,7 +100,7 @@ Text CNodeWalker::TypeEquivForNode(CNode* node, Text extra_trailer) {
     return equiv_buffer_;
   }
   if (auto* power = dyn_cast<CPower>(node)) {
-    if (power->GetExponentNode() != nullptr) return kNoText;
+    if (power->GetExponentNode() != nullptr) return is_complete_ ? EquivForPower(power, extra_trailer) : kNoText;
     return WithTrailer(fToText.TextForAtomPlusTrailers(power->GetAtom(), power->TrailerSpan()), extra_trailer);
   }
   if (auto* atom_expr = dyn_cast<CAtomExpr>(node)) {
@@ -111,6 +111,13 @@ Text CNodeWalker::TypeEquivForNode(CNode* node, Text extra_trailer) {
     return WithTrailer(fToText.TextForNode(node, {.dotted_name_only = true}), extra_trailer);
   }
   const Text text = fToText.TextForNode(node, {.add_parens_if_operator = has_trailer});
+  if (IsNone(text) || text.size() > kMaxOperatorText) return kNoText;
+  return equiv_buffer_.assign(kExpressionEquivPrefix).append(text).append(extra_trailer);
+}
+
+// A power, as any other operator expression.
+Text CNodeWalker::EquivForPower(CPower* power, Text extra_trailer) {
+  const Text text = fToText.TextForNode(power, {.add_parens_if_operator = !IsNone(extra_trailer)});
   if (IsNone(text) || text.size() > kMaxOperatorText) return kNoText;
   return equiv_buffer_.assign(kExpressionEquivPrefix).append(text).append(extra_trailer);
 }

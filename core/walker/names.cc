@@ -231,6 +231,7 @@ void CNodeWalker::VisitTrailers(CNode* atom_node, std::span<CNode* const> all_tr
       }
     } else if (trailer->ChildIs(0, tok::LPAR) && trailer->child_count == 3) {
       // Empty parentheses are no call here: they tell nothing about the callee.
+      const Restored load(fLoadNameContext, fLoadNameContext || is_complete_);
       ProcessCallOf(dotted ? chain.DottedName(i) : kNoText, child);
     } else if (trailer->ChildIs(0, tok::LSQB) || trailer->ChildIs(0, tok::LBRACE)) {
       VisitLoadContextNode(child);
@@ -248,6 +249,7 @@ void CNodeWalker::VisitTrailers(CNode* atom_node, std::span<CNode* const> all_tr
 void CNodeWalker::VisitCompForNode(CCompForNode* node) {
   // Targets live in the scope of the comprehension. The element in front of the clause was walked
   // before it, so the names bound here also count as read.
+  if (is_complete_) DoubtTarget(node->GetTargetNode());
   VisitStoreContextNode(node->GetTargetNode(), /*within_sub_expr=*/true);
   VisitNode(node->GetInNode());
   if (CNode* iter = node->GetCompIterNode()) VisitNode(iter);

@@ -48,6 +48,7 @@ void CNodeWalker::VisitPatternAtDepth(CNode* node, int depth) {
 }
 
 void CNodeWalker::VisitTypeParameter(CTypeParameter* node) {
+  if (is_complete_) return VisitWholeTypeParameter(node);
   const CNode* const name = node->GetName();
   if (name == nullptr) return;
   const Text prefix = node->GetPrefix();
@@ -65,6 +66,28 @@ void CNodeWalker::VisitTypeParameter(CTypeParameter* node) {
     if (!IsNone(prefix)) scratch_.append(" ");
     scratch_.append(spec_text);
   }
+  AddArgInfoBytes(name->fText(), scratch_);
+}
+
+// With its default, and also where it is that of a type alias.
+void CNodeWalker::VisitWholeTypeParameter(CTypeParameter* node) {
+  const Text prefix = node->GetPrefix();
+  const uint32_t name_place = IsNone(prefix) ? 0 : 1;
+  const CNode* const name = node->Child(name_place);
+  if (name == nullptr || !name->IsLeaf()) return;
+  std::string detail;
+  for (uint32_t i = name_place + 2; i < node->child_count; i += 2) {
+    VisitNode(node->children[i]);
+    const Text text = fToText.TextForNode(node->children[i]);
+    if (IsNone(text)) continue;
+    if (!detail.empty()) detail.append(" ");
+    if (node->ChildIs(i - 1, tok::EQUAL)) detail.append("= ");
+    detail.append(text);
+  }
+  scratch_.assign(kTypeParameterPrefix);
+  if (!IsNone(prefix)) scratch_.append(prefix);
+  if (!IsNone(prefix) && !detail.empty()) scratch_.append(" ");
+  scratch_.append(detail);
   AddArgInfoBytes(name->fText(), scratch_);
 }
 

@@ -31,6 +31,7 @@ void CNodeWalker::Walk(CNode* node, LogicalLine* logical) {
     ThrowError(ErrorKind::kValueError, "Only one logical may be walked at a time");
   if (node == nullptr) return;
   operations_ = 1;
+  met_doubtful_ = false;
   fLogical = logical;
   // Names left over from operations by name are the walker's own.
   direct_ = own_texts_used_ ? nullptr : logical;

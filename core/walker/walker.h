@@ -49,6 +49,16 @@ class CNodeWalker {
   // a walk is running.
   void Walk(CNode* node, LogicalLine* logical);
 
+  // ---- complete readings ----
+  // For hosts that want all that a statement says, where the walk is otherwise bound to what its first hosts
+  // know: powers keep their exponents, a target in brackets is bound, what a target reads is read, and no
+  // limit that a source meets ends the walk.
+  void ReadCompletely();
+  // Whether the last walk met what the tables take and the language may not: a target that is none, an
+  // argument out of order, a star, an assignment in an expression.
+  bool met_doubtful() const { return met_doubtful_; }
+  void set_met_doubtful(bool met) { met_doubtful_ = met; }
+
   // ---- the line, as a host hands it in ----
   // For operations by name between walks, or to send what follows in a walk to another line. Nobody
   // knows how long such a line lives, nor what it does with its records meanwhile, so from here to the
@@ -245,7 +255,7 @@ class CNodeWalker {
 
   // ---- assignments ----
   void ProcessTargetsAtDepth(CNode* lhs, CNode* rhs, bool has_trailer, std::string& trailer, int depth);
-  void ProcessStarredTarget(CStarExpression* target);
+  void ProcessStarredTarget(CStarExpression* target, int depth);
 
   // ---- calls ----
   void ProcessCallOf(Text func_name, CNode* arglist);
@@ -258,12 +268,23 @@ class CNodeWalker {
 
   // ---- equivalents ----
   Text EquivForAtom(CAtom* atom, Text extra_trailer);
+  Text EquivForPower(CPower* power, Text extra_trailer);
   Text LiteralInfo(Text cls_name, Text literal);
   Text StringInstanceName(const CStringLiteral* node) const;
   Text WithTrailer(Text text, Text extra_trailer);
 
   void VisitPatternAtDepth(CNode* node, int depth);
+  void VisitWholeTypeParameter(CTypeParameter* node);
 
+  // ---- complete readings (complete.cc) ----
+  void DoubtTarget(const CNode* target);
+  void DoubtArguments(const UsedArgList& arg_list);
+  void DoubtParameters(const ArgList& arg_list);
+  // What stands in brackets that only group it.
+  CNode* TargetIn(CNode* node) const { return is_complete_ ? DropSimpleParens(node) : node; }
+
+  bool is_complete_ = false;
+  bool met_doubtful_ = false;
   LogicalLine* direct_ = nullptr;  // fLogical during a walk, unless the host set that: takes texts uncopied
   int32_t operations_ = 0;         // walks and operations by name that are under way
   uintptr_t source_begin_ = 0;     // address of the line's source, during a walk

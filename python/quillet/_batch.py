@@ -276,12 +276,13 @@ def analyze_files(
     version: tuple[int, ...] | None = None,
     jobs: int | None = None,
     bindings: bool = False,
+    exact: bool = False,
 ) -> FileAnalyses:
     """Analyses files, on `jobs` threads (one a core without it), and yields a result a file in order.
 
     A path may be given with its source, as a tuple (path, bytes): then nothing is read. `version` is the
     Python that the files are written for, as for `analyze`. With `bindings`, each result has the names of its
-    file as well, as `bind` gives them.
+    file as well, as `bind` gives them. `exact` is that of `analyze`.
 
     No file ends the run: one that cannot be read, or whose encoding is unknown, is a result with a
     `problem`. Raises `TypeError` and `ValueError` for wrong arguments.
@@ -293,7 +294,7 @@ def analyze_files(
     (2, 9, 'Shop', 'total', 'set')
     (2, 15, 'Shop.total', 'self', 'set')
     """
-    language = native_language_of(version)
+    language = native_language_of(version, exact=exact)
     count = jobs_of(jobs)
     names: list[str] = []
     inputs: list[BatchInput] = []
@@ -307,14 +308,19 @@ def analyze_files(
 
 
 def write_files(
-    inputs: Iterable[BatchInput], *, version: tuple[int, ...] | None, jobs: int | None, form: tuple[object, ...]
+    inputs: Iterable[BatchInput],
+    *,
+    version: tuple[int, ...] | None,
+    jobs: int | None,
+    form: tuple[object, ...],
+    exact: bool = False,
 ) -> Generator[_host.FileResult, None, None]:
     """Analyses files and writes what was found: the buffer of each result is the text of a format.
 
     The formats are ("jsonl", errors_only) and ("text", errors_only, colours, width_of), where `width_of`
     gives the cells that a code point takes on a terminal.
     """
-    batch = _host.Batch(native_language_of(version), inputs, jobs_of(jobs), decode_source, form, False)
+    batch = _host.Batch(native_language_of(version, exact=exact), inputs, jobs_of(jobs), decode_source, form, False)
     try:
         while (result := batch.Next()) is not None:
             yield result
@@ -333,6 +339,6 @@ def jobs_of(jobs: int | None) -> int:
     return jobs
 
 
-def native_batch(version: tuple[int, ...] | None = None) -> _host.NativeBatch:
+def native_batch(version: tuple[int, ...] | None = None, *, exact: bool = False) -> _host.NativeBatch:
     """Sources in memory through the native path, for measuring: counts and no objects."""
-    return _host.NativeBatch(native_language_of(version))
+    return _host.NativeBatch(native_language_of(version, exact=exact))

@@ -32,18 +32,21 @@ def language_version(version: tuple[int, ...] | None = None) -> tuple[int, int]:
     return major, minor
 
 
-def native_language_of(version: tuple[int, ...] | None = None) -> _host.Language:
-    """What native analyzers of a version are built from; None is the running interpreter's."""
-    language = language_version(version)
-    if language not in _languages:
-        _languages[language] = _make_language(language)
-    return _languages[language]
+def native_language_of(version: tuple[int, ...] | None = None, *, exact: bool = False) -> _host.Language:
+    """What native analyzers of a version are built from; None is the running interpreter's.
+
+    Those of an `exact` one read as `quillet.tarvex` does; the others read what the version has, completely.
+    """
+    key = (language_version(version), bool(exact))
+    if key not in _languages:
+        _languages[key] = _make_language(*key)
+    return _languages[key]
 
 
-_languages: dict[tuple[int, int], _host.Language] = {}
+_languages: dict[tuple[tuple[int, int], bool], _host.Language] = {}
 
 
-def _make_language(language: tuple[int, int]) -> _host.Language:
+def _make_language(language: tuple[int, int], exact: bool) -> _host.Language:
     python_3 = language >= (3, 0)
     grammar = kPy3DefaultGrammar if python_3 else kPy2DefaultGrammar
     return _host.Language(
@@ -53,6 +56,7 @@ def _make_language(language: tuple[int, int]) -> _host.Language:
         keyword_seq=list(keywords_of(language)),
         py3_grammar=python_3,
         print_function_grammar_file="" if python_3 else _grammar_path(PY2_PRINT_FUNCTION_GRAMMAR),
+        exact=exact,
     )
 
 

@@ -56,7 +56,9 @@ def analyzer_for(version: tuple[int, ...] | None = None, *, print_function: bool
     return analyzer
 
 
-def analyze(source: bytes | bytearray | memoryview | str, *, version: tuple[int, ...] | None = None) -> Analysis:
+def analyze(
+    source: bytes | bytearray | memoryview | str, *, version: tuple[int, ...] | None = None, exact: bool = False
+) -> Analysis:
     """Analyses a source, statement by statement.
 
     `source` is the content of a file: bytes, read as their byte order mark or their PEP 263 line says and
@@ -64,8 +66,12 @@ def analyze(source: bytes | bytearray | memoryview | str, *, version: tuple[int,
     (3, 12); None is the running interpreter's. Both grammars are served by any interpreter.
 
     Any content is analysed to its end: a bad statement has an `error` and no records, and the others are
-    served. Raises `SourceEncodingError` where the source names an encoding that cannot be used,
-    `TypeError` and `ValueError` for wrong arguments.
+    served. An error in a hint, or in what only Python's compiler rejects (a `return` outside of a function),
+    leaves the statement its records. With `exact`, statements are read as `quillet.tarvex` reads them: by the
+    grammars of 2.7 and 3.8 and what it adds to these, whatever the version has.
+
+    Raises `SourceEncodingError` where the source names an encoding that cannot be used, `TypeError` and
+    `ValueError` for wrong arguments.
 
     >>> for record in analyze("import os.path as p").lines[0].records:
     ...     print((record.name, record.kind.value, record.detail))
@@ -74,7 +80,7 @@ def analyze(source: bytes | bytearray | memoryview | str, *, version: tuple[int,
     ('p', 'import_as', 'p')
     """
     language = language_version(version)
-    return Analysis(to_utf8(source), language)
+    return Analysis(to_utf8(source), language, exact=exact)
 
 
 class Line:
@@ -167,10 +173,10 @@ class _Lines(Sequence[Line]):
 class Analysis:
     """What `analyze` found in one source. `version` is the (major, minor) that it was read as."""
 
-    def __init__(self, source: bytes, version: tuple[int, int]) -> None:
+    def __init__(self, source: bytes, version: tuple[int, int], *, exact: bool = False) -> None:
         self.version = version
         self._source = source
-        self._native = _host.AnalyzedSource(native_language_of(version), source)
+        self._native = _host.AnalyzedSource(native_language_of(version, exact=exact), source)
 
     @property
     def analyzer(self) -> CPGenAnalyzerImpl:

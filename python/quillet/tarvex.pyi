@@ -713,6 +713,7 @@ class _host:  # a module at run time
             keyword_seq: list[str],
             py3_grammar: bool,
             print_function_grammar_file: str,
+            exact: bool,
         ) -> None: ...
 
     class AnalyzedSource:

@@ -181,7 +181,7 @@ class Report:
             self.not_python += 1
             return
         with watched() as events:
-            analysis = analyze(source)
+            analysis = analyze(source, exact=True)
         self.files += 1
         self.lines += len(analysis.lines)
         self.events.internal_errors += events.internal_errors

@@ -46,7 +46,7 @@ class Case:
 
     def actual(self) -> str:
         """What the code makes of the source, in the form of `expected`."""
-        analysis = analyze(self.source, version=self.version)
+        analysis = analyze(self.source, version=self.version, exact=True)
         out = []
         if analysis.errors:
             out.append("--- error\n")
@@ -57,7 +57,7 @@ class Case:
         else:
             out.append("--- tree\n")
             out += [tree_text(line, analysis.analyzer) for line in analysis.lines]
-        records = records_view(self.source, self.version, "")
+        records = records_view(self.source, self.version, "", exact=True)
         if records or not analysis.errors:
             out.append("--- records\n" + records)
         return "".join(out)

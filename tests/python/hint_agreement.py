@@ -391,7 +391,7 @@ class HintReport:
             self.not_python += 1
             return
         with watched() as events:
-            analysis = analyze(text, version=version)
+            analysis = analyze(text, version=version, exact=True)
         self.files += 1
         self.misplaced += misplaced
         self.internal_errors += events.internal_errors

@@ -307,6 +307,7 @@ def open(a, *b,
 def long(%s): pass
 """
     (tmp_path / "a.py").write_text("\ufeff" + source % ", ".join(f"a{i}=0" for i in range(100)), encoding="utf-8")
+    run("index", ".", "--python", "3.12", cwd=tmp_path)
     lines = run("outline", "a.py", cwd=tmp_path).stdout.splitlines()
     assert lines[:3] == [
         " 1 async def f(a, *args, b=1, **kw)",

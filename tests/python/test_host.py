@@ -153,7 +153,7 @@ def test_none_is_the_running_interpreter() -> None:
         ("x = `y`", (2, 7), (3, 8)),
         ("raise E, 'text'", (2, 7), (3, 8)),
         ("def f(a, (b, c)): pass", (2, 7), (3, 8)),
-        ("nonlocal x", (3, 8), (2, 7)),
+        ("def f():\n  def g(): nonlocal x", (3, 8), (2, 7)),
         ("x: int = 1", (3, 8), (2, 7)),
         ("def f(*, a): pass", (3, 8), (2, 7)),
         ("async = 1", (3, 6), (3, 7)),
@@ -318,9 +318,11 @@ def test_an_error_has_its_place_in_the_source() -> None:
     analysis = analyze("x = 1\nif (a\n    b):\n    pass\n")
     (line,) = analysis.errors
     assert isinstance(line.error, SyntaxError)
-    assert line.error.msg == "invalid syntax"
-    assert line.error_position == (3, 5)
+    assert line.error.msg == "invalid syntax. Perhaps you forgot a comma?"
+    assert line.error_position == (2, 5)
     assert line.records == ()
+    (line,) = analyze("x = 1\nif (a\n    b):\n    pass\n", exact=True).errors
+    assert line.error_position == (3, 5)
 
 
 @pytest.mark.parametrize(
@@ -333,13 +335,13 @@ def test_an_error_has_its_place_in_the_source() -> None:
     ],
 )
 def test_an_error_says_what_is_missing(source: str, missing: str, tmp_path: Path) -> None:
-    analysis = analyze(source)
+    analysis = analyze(source, exact=True)
     (line,) = analysis.errors
     assert line.error is not None
     assert line.error.msg == f"invalid syntax: {missing}"
     path = tmp_path / "a.py"
     path.write_text(source)
-    (result,) = quillet.analyze_files([path])
+    (result,) = quillet.analyze_files([path], exact=True)
     assert result.errors == [(*(line.error_position or ()), line.error.msg)]
 
     # An analyzer of quillet.tarvex has the same error without those words.

@@ -79,7 +79,7 @@ def heads_of(patterns: list[tuple[int, int]], lines: list[tuple[int, int]]) -> s
 def test_lines_of_the_library_are_what_the_host_takes_them_for(capsys: pytest.CaptureFixture[str]) -> None:
     counts = dict.fromkeys((kMatch, kCase, kUnknown), 0)
     for path, source in files_with_the_words():
-        analysis: Analysis = analyze(source)
+        analysis: Analysis = analyze(source, exact=True)
         host = HostStatements()
         try:
             with warnings.catch_warnings():

@@ -267,7 +267,9 @@ def test_comments_that_the_host_refuses(source: str, found: list[tuple[str, str]
 def test_what_is_said_of_another_source_is_a_difference(
     monkeypatch: pytest.MonkeyPatch, source: str, other: str
 ) -> None:
-    monkeypatch.setattr(hint_agreement, "analyze", lambda text, version: analyze(other, version=version))
+    monkeypatch.setattr(
+        hint_agreement, "analyze", lambda text, version, exact: analyze(other, version=version, exact=exact)
+    )
     report = HintReport()
     report.compare("example", source.encode())
     assert report.unexplained != []

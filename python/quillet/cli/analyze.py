@@ -31,6 +31,7 @@ def run(
     exclude: tuple[str, ...],
     stdin_filename: str,
     jobs: int | None,
+    exact: bool = False,
 ) -> int:
     """Runs the command and returns its exit code."""
     unread = 0
@@ -40,7 +41,7 @@ def run(
         write(memoryview(output_header(form, version)))
         found = list(find_files(paths, gitignore=gitignore, exclude=exclude))
         inputs = [_input_of(item, stdin_filename) for item in found]
-        results = write_files(inputs, version=version, jobs=jobs, form=output_format(form, errors_only))
+        results = write_files(inputs, version=version, jobs=jobs, form=output_format(form, errors_only), exact=exact)
         # The line is for a person who waits: where the data itself runs over the terminal, there is none.
         with closing(results), Progress("analysing", len(found), wanted=not is_terminal(out)) as progress:
             for result in results:

@@ -47,6 +47,7 @@ def group() -> None:
     metavar="N",
     help="How many files to analyse at once; one a core without it.",
 )
+@click.option("--exact", is_flag=True, help="Read statements as quillet.tarvex does, whatever the version has.")
 @_stdin_filename
 def analyze(
     paths: tuple[str, ...],
@@ -57,6 +58,7 @@ def analyze(
     no_gitignore: bool,
     exclude: tuple[str, ...],
     jobs: int | None,
+    exact: bool,
     stdin_filename: str,
 ) -> None:
     """Analyses files and folders, and standard input for "-".
@@ -77,6 +79,7 @@ def analyze(
             exclude=exclude,
             stdin_filename=stdin_filename,
             jobs=jobs,
+            exact=exact,
         )
     )
 

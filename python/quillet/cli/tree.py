@@ -19,7 +19,7 @@ def run(target: str, *, version: tuple[int, int] | None, stdin_filename: str) ->
     path, number = split_target(target)
     shown = stdin_filename if path == "-" else path
     try:
-        analysis = analyze(read_file(path), version=version)
+        analysis = analyze(read_file(path), version=version, exact=True)
     except OSError as error:
         return _fail(path, problem_of(error))
     except SourceEncodingError as error:

@@ -1,0 +1,75 @@
+// How deep a complete reading may descend: brackets as the language counts them, all else by kMaxDepth.
+#pragma once
+
+#include "parser/complete_parser.h"
+
+namespace quillet {
+
+// One more level of rules for as long as it lives.
+class CompleteParser::Deeper {
+ public:
+  explicit Deeper(CompleteParser& parser) : parser_(parser) {
+    if (parser.depth_ >= kMaxDepth) parser.Fail("too many nested expressions");
+    ++parser.depth_;
+  }
+  ~Deeper() { --parser_.depth_; }
+  Deeper(const Deeper&) = delete;
+  Deeper& operator=(const Deeper&) = delete;
+
+ private:
+  CompleteParser& parser_;
+};
+
+// Inside of a bracket for as long as it lives.
+class CompleteParser::InBracket {
+ public:
+  explicit InBracket(CompleteParser& parser) : parser_(parser) { ++parser.brackets_; }
+  ~InBracket() { --parser_.brackets_; }
+  InBracket(const InBracket&) = delete;
+  InBracket& operator=(const InBracket&) = delete;
+
+ private:
+  CompleteParser& parser_;
+};
+
+// Puts a value back when it goes.
+template <class T>
+class RestoredValue {
+ public:
+  RestoredValue(T& value, T inside) : value_(value), before_(value) { value = inside; }
+  ~RestoredValue() { value_ = before_; }
+  RestoredValue(const RestoredValue&) = delete;
+  RestoredValue& operator=(const RestoredValue&) = delete;
+
+ private:
+  T& value_;
+  T before_;
+};
+
+template <class Rule>
+bool CompleteParser::Try(Rule&& rule) {
+  const size_t mark = nodes_.size();
+  const size_t start = at_;
+  const RestoredValue<bool> trying(is_trying_, true);
+  bool is_read = true;
+  try {
+    rule();
+  } catch (const ParseError&) {
+    is_read = false;
+  }
+  for (size_t i = mark; i < nodes_.size(); ++i) factory_.pool().Reclaim(nodes_[i]);
+  nodes_.resize(mark);
+  furthest_ = std::max(furthest_, at_);
+  at_ = start;
+  return is_read;
+}
+
+template <class T>
+void CompleteParser::FinishBare(size_t mark) {
+  T* node = factory_.NewBare<T>();
+  factory_.SetChildren(node, std::span<CNode* const>(nodes_).subspan(mark));
+  nodes_.resize(mark);
+  nodes_.push_back(node);
+}
+
+}  // namespace quillet

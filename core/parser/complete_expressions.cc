@@ -1,0 +1,788 @@
+// Expressions of every version, by precedence climbing: a run of operators of one level is one flat node, as
+// the tables make it.
+//
+// Where an expression ends and another begins inside of brackets, what is missing is a comma, and the
+// failure stands at the first of the two. What only the compiler behind the language's parser rejects is
+// postponed: an error of the grammar further on comes first.
+#include <algorithm>
+
+#include "foundations/errors.h"
+#include "parser/complete_depth.h"
+#include "parser/complete_parser.h"
+
+namespace quillet {
+
+namespace {
+
+enum Level : int {
+  kOrLevel,
+  kAndLevel,
+  kNotLevel,
+  kCompareLevel,
+  kBitOrLevel,
+  kXorLevel,
+  kBitAndLevel,
+  kShiftLevel,
+  kArithLevel,
+  kTermLevel,
+  kNoLevel
+};
+
+bool IsBytesLiteral(Text text) {
+  for (const char c : text) {
+    if (c == '"' || c == '\'') return false;
+    if ((c | 0x20) == 'b') return true;
+  }
+  return false;
+}
+
+}  // namespace
+
+// ---- lists ----
+
+void CompleteParser::TestOrStar() {
+  if (Code() != tok::STAR) return Test();
+  if (!Since(0)) FailHere();
+  const size_t mark = Mark();
+  PushLeaf();
+  Binary(kBitOrLevel);
+  Finish(symbols_.star_expr, mark);
+}
+
+void CompleteParser::NamedOrStar() {
+  if (Code() != tok::STAR) return NamedTest();
+  if (!Since(5)) FailHere();
+  TestOrStar();
+}
+
+void CompleteParser::StarExpressions(int symbol) {
+  const size_t mark = Mark();
+  TestOrStar();
+  while (Code() == tok::COMMA) {
+    PushLeaf();
+    if (!BeginsExpression(Code()) && Code() != tok::STAR) break;
+    TestOrStar();
+  }
+  Finish(symbol, mark);
+}
+
+void CompleteParser::TargetList(TargetUse use) {
+  const size_t mark = Mark();
+  const size_t start = at_;
+  const auto one = [this] {
+    if (Code() == tok::STAR) return TestOrStar();
+    Binary(kBitOrLevel);
+  };
+  one();
+  while (Code() == tok::COMMA) {
+    PushLeaf();
+    if (!BeginsExpression(Code()) && Code() != tok::STAR) break;
+    one();
+  }
+  Finish(symbols_.exprlist, mark);
+  if (use != TargetUse::kFor || Code() == word::kIn) return CheckTarget(Top(), use, false);
+  // What a target may not be, such as a comparison, explains more than the missing word does.
+  const size_t stopped = at_;
+  at_ = start;
+  {
+    const RestoredValue<bool> trying(is_trying_, true);
+    StarExpressions(symbols_.exprlist);
+  }
+  CheckTarget(Top(), use, false);
+  FailGeneric(stopped);
+}
+
+void CompleteParser::NamedTest() {
+  const size_t mark = Mark();
+  const size_t start = at_;
+  Test();
+  if (Code() == tok::COLONEQUAL) {
+    if (!Since(8)) RequireAt(at_, 8, "Assignment expressions are");
+    if (at_ != start + 1 || !IsName(code_[start])) {
+      FailAtNode(Top(), std::string("cannot use assignment expressions with ") + NameOfExpression(Top()));
+    }
+    CheckWalrus(start);
+    PushLeaf();
+    Test();
+    Finish(symbols_.namedexpr_test, mark);
+  } else if (Code() == tok::EQUAL) {
+    FailAtEqual(start, mark);
+  }
+}
+
+// `if x = 1:` and `(f() = 1)`.
+void CompleteParser::FailAtEqual(size_t start, size_t mark) {
+  const CNode* left = nodes_[mark];
+  const size_t equal = at_;
+  const bool is_name = equal == start + 1 && IsName(code_[start]);
+  const TokenCode first = code_[start];
+  const bool is_excluded =
+      first == word::kTrue || first == word::kFalse || first == word::kNone || IsBracketed(left) || !IsBitwiseOr(left);
+  if (!is_name && is_excluded) FailGeneric(equal);
+  const bool is_comparison = Try([&] {
+    ++at_;
+    Binary(kBitOrLevel);
+    if (Code() == tok::EQUAL || Code() == tok::COLONEQUAL) FailHere();
+  });
+  if (!is_comparison) FailGeneric(equal);
+  if (is_name) FailAt(start, "invalid syntax. Maybe you meant '==' or ':=' instead of '='?");
+  FailAtNode(left,
+             std::string("cannot assign to ") + NameOfExpression(left) + " here. Maybe you meant '==' instead of '='?");
+}
+
+// ---- tests and operators ----
+
+void CompleteParser::Test() {
+  const Deeper deeper(*this);
+  if (Code() == word::kLambda) return Lambda();
+  const size_t mark = Mark();
+  const size_t start = at_;
+  Binary(kOrLevel);
+  if (Code() != word::kIf) {
+    if (BeginsExpression(Code())) [[unlikely]]
+      CheckBetween(start, mark);
+    return;
+  }
+  PushLeaf();
+  Binary(kOrLevel);
+  if (Code() != word::kElse) {
+    if (Code() == tok::COLON) FailHere();
+    FailAtNode(nodes_[mark], "expected 'else' after 'if' expression");
+  }
+  PushLeaf();
+  Test();
+  Finish(symbols_.test, mark);
+}
+
+void CompleteParser::CheckBetween(size_t start, size_t mark) {
+  if (is_trying_) return;
+  const size_t second = at_;
+  const TokenCode first = code_[start];
+  const bool is_legacy = python3_ && second == start + 1 && (first == word::kPrint || first == word::kExec);
+  const bool is_soft =
+      first == word::kMatch || first == word::kCase || first == word::kUnderscore || first == word::kType;
+  const bool is_prefix = IsNameCode(first) && code_[start + 1] == tok::STRING;
+  if (!is_legacy && (is_soft || is_prefix)) return;
+  const bool is_read = Try([&] {
+    if (is_legacy)
+      StarExpressions(symbols_.testlist_star_expr);
+    else
+      Test();
+  });
+  if (!is_read) return;
+  if (is_legacy) {
+    const std::string name(TokenAt(start).view());
+    FailAt(start, "Missing parentheses in call to '" + name + "'. Did you mean " + name + "(...)?");
+  }
+  if (brackets_ > 0) FailAtNode(nodes_[mark], "invalid syntax. Perhaps you forgot a comma?");
+}
+
+// The condition of a comprehension in front of 3.9.
+void CompleteParser::OldTest() {
+  if (Code() == word::kLambda && !Since(9)) {
+    const Deeper deeper(*this);
+    return Lambda();
+  }
+  Binary(kOrLevel);
+}
+
+void CompleteParser::Lambda() {
+  const size_t mark = Mark();
+  PushLeaf();
+  const RestoredValue<StatementPlace> place(place_, {StatementPlace::Scope::kFunction});
+  const RestoredValue<const char*> comprehension(comprehension_, nullptr);
+  if (Code() != tok::COLON) Parameters(/*is_lambda=*/true, tok::COLON);
+  Expect(tok::COLON, nullptr);
+  Test();
+  yield_at_ = kNowhere;
+  Finish(symbols_.lambdef, mark);
+}
+
+int CompleteParser::LevelOf(TokenCode code) const {
+  switch (code) {
+    case word::kOr:
+      return kOrLevel;
+    case word::kAnd:
+      return kAndLevel;
+    case word::kNot:
+      return CodeAt(1) == word::kIn ? kCompareLevel : kNoLevel;
+    case word::kIn:
+    case word::kIs:
+    case tok::LESS:
+    case tok::GREATER:
+    case tok::EQEQUAL:
+    case tok::NOTEQUAL:
+    case tok::LESSEQUAL:
+    case tok::GREATEREQUAL:
+      return kCompareLevel;
+    case tok::VBAR:
+      return kBitOrLevel;
+    case tok::CIRCUMFLEX:
+      return kXorLevel;
+    case tok::AMPER:
+      return kBitAndLevel;
+    case tok::LEFTSHIFT:
+    case tok::RIGHTSHIFT:
+      return kShiftLevel;
+    case tok::PLUS:
+    case tok::MINUS:
+      return kArithLevel;
+    case tok::STAR:
+    case tok::SLASH:
+    case tok::PERCENT:
+    case tok::DOUBLESLASH:
+    case tok::AT:
+      return kTermLevel;
+    default:
+      return kNoLevel;
+  }
+}
+
+// The operator at the front, which is of the level.
+void CompleteParser::Operator(int level) {
+  if (level != kCompareLevel) {
+    if (Code() == tok::AT && !Since(5)) RequireAt(at_, 5, "The '@' operator is");
+    return PushLeaf();
+  }
+  const size_t mark = Mark();
+  if (Code() == tok::NOTEQUAL && python3_ && TokenAt(at_).view() == "<>") FailHere();
+  const TokenCode code = Code();
+  PushLeaf();
+  if (code == word::kNot || (code == word::kIs && Code() == word::kNot)) {
+    PushLeaf();
+    Finish(symbols_.comp_op, mark);
+  }
+}
+
+void CompleteParser::Binary(int level) {
+  const Deeper deeper(*this);
+  const int symbols[] = {symbols_.or_test,  symbols_.and_test, symbols_.not_test,   symbols_.comparison, symbols_.expr,
+                         symbols_.xor_expr, symbols_.and_expr, symbols_.shift_expr, symbols_.arith_expr, symbols_.term};
+  const size_t mark = Mark();
+  if (Code() == word::kNot && level <= kNotLevel) {
+    PushLeaf();
+    Binary(kNotLevel);
+    Finish(symbols_.not_test, mark);
+  } else {
+    Factor();
+  }
+  for (int next; (next = LevelOf(Code())) >= level && next != kNoLevel;) {
+    do {
+      Operator(next);
+      Binary(next + 1);
+    } while (LevelOf(Code()) == next);
+    Finish(symbols[next], mark);
+  }
+}
+
+void CompleteParser::Factor() {
+  if (Code() != tok::PLUS && Code() != tok::MINUS && Code() != tok::TILDE) return Power();
+  const Deeper deeper(*this);
+  const size_t mark = Mark();
+  PushLeaf();
+  Factor();
+  Finish(symbols_.factor, mark);
+}
+
+void CompleteParser::Power() {
+  const size_t mark = Mark();
+  AtomExpression();
+  if (Code() != tok::DOUBLESTAR) return;
+  PushLeaf();
+  Factor();
+  Finish(symbols_.power, mark);
+}
+
+void CompleteParser::AtomExpression() {
+  const size_t mark = Mark();
+  if (Code() == word::kAwait && IsKeyword(word::kAwait)) {
+    if (place_.scope == StatementPlace::Scope::kFunction)
+      Postpone(at_, "'await' outside async function");
+    else if (!place_.is_in_async())
+      Postpone(at_, "'await' outside function");
+    PushLeafOf(tok::AWAIT, TokenAt(at_), index_[at_]);
+    ++at_;
+  }
+  Atom();
+  while (Code() == tok::DOT || Code() == tok::LPAR || Code() == tok::LSQB) Trailer();
+  Finish(symbols_.atom_expr, mark);
+}
+
+void CompleteParser::Trailer() {
+  const size_t mark = Mark();
+  if (Code() == tok::DOT) {
+    PushLeaf();
+    PushName();
+  } else if (Code() == tok::LPAR) {
+    PushLeaf();
+    const InBracket in_bracket(*this);
+    if (Code() != tok::RPAR) Arguments();
+    Expect(tok::RPAR, nullptr);
+  } else {
+    PushLeaf();
+    const InBracket in_bracket(*this);
+    Subscripts();
+    Expect(tok::RSQB, nullptr);
+  }
+  Finish(symbols_.trailer, mark);
+}
+
+// ---- atoms ----
+
+void CompleteParser::Atom() {
+  switch (Code()) {
+    case tok::NUMBER:
+      return PushLeaf();
+    case tok::STRING:
+      return Strings();
+    case tok::LPAR:
+      return Group();
+    case tok::LSQB:
+      return ListDisplay();
+    case tok::LBRACE:
+      return DictOrSet();
+    case tok::BACKQUOTE:
+      if (python3_) FailHere();
+      return Backquotes();
+    case tok::ELLIPSIS:
+      if (!python3_) FailHere();
+      return PushLeaf();
+    case word::kNone:
+    case word::kTrue:
+    case word::kFalse:
+      return PushLeaf();
+    default:
+      if (!IsName(Code())) FailHere();
+      return PushLeaf();
+  }
+}
+
+void CompleteParser::Strings() {
+  const size_t mark = Mark();
+  const bool is_bytes = IsBytesLiteral(TokenAt(at_).view());
+  bool is_mixed = false;
+  while (Code() == tok::STRING) {
+    is_mixed |= IsBytesLiteral(TokenAt(at_).view()) != is_bytes;
+    PushLeaf();
+  }
+  if (is_mixed && python3_) Fail("cannot mix bytes and nonbytes literals");
+  Finish(symbols_.atom, mark);
+}
+
+void CompleteParser::Group() {
+  const Deeper deeper(*this);
+  const InBracket in_bracket(*this);
+  const size_t mark = Mark();
+  PushLeaf();
+  if (Code() == word::kYield) {
+    Yield();
+  } else if (Code() != tok::RPAR) {
+    const size_t inner = Mark();
+    const size_t start = at_;
+    if (Code() == tok::DOUBLESTAR && python3_) {
+      ++at_;
+      Binary(kBitOrLevel);
+      if (Code() == tok::RPAR) FailAt(start, "cannot use double starred expression here");
+      FailGeneric(start);
+    }
+    NamedOrStar();
+    if (IsComprehension()) {
+      if (code_[start] == tok::STAR) FailAt(start, "iterable unpacking cannot be used in comprehension");
+      Comprehension("generator expression", start);
+    } else {
+      if (code_[start] == tok::STAR && Code() == tok::RPAR) FailAt(start, "cannot use starred expression here");
+      Elements(tok::RPAR);
+    }
+    Finish(symbols_.testlist_comp, inner);
+  }
+  Expect(tok::RPAR, nullptr);
+  Finish(symbols_.atom, mark);
+}
+
+// The elements behind the first one.
+void CompleteParser::Elements(TokenCode close) {
+  while (Code() == tok::COMMA) {
+    PushLeaf();
+    if (Code() == close) return;
+    NamedOrStar();
+  }
+}
+
+bool CompleteParser::IsComprehension() const {
+  return Code() == word::kFor || (Code() == word::kAsync && CodeAt(1) == word::kFor);
+}
+
+void CompleteParser::ListDisplay() {
+  const Deeper deeper(*this);
+  const InBracket in_bracket(*this);
+  const size_t mark = Mark();
+  PushLeaf();
+  if (Code() != tok::RSQB) {
+    const size_t inner = Mark();
+    const size_t start = at_;
+    NamedOrStar();
+    if (IsComprehension()) {
+      if (code_[start] == tok::STAR) FailAt(start, "iterable unpacking cannot be used in comprehension");
+      Comprehension("list comprehension", start);
+    } else {
+      Elements(tok::RSQB);
+      if (IsComprehension()) FailAtTarget(start);
+    }
+    Finish(symbols_.testlist_comp, inner);
+  }
+  Expect(tok::RSQB, nullptr);
+  Finish(symbols_.atom, mark);
+}
+
+// `[a, b for a, b in c]`
+void CompleteParser::FailAtTarget(size_t start) {
+  if (!python3_ || !Try([&] { Comprehension("comprehension", start); })) FailHere();
+  FailAt(start, "did you forget parentheses around the comprehension target?");
+}
+
+void CompleteParser::DictOrSet() {
+  const Deeper deeper(*this);
+  const InBracket in_bracket(*this);
+  const size_t mark = Mark();
+  PushLeaf();
+  if (Code() != tok::RBRACE) {
+    const size_t inner = Mark();
+    const size_t start = at_;
+    const bool is_unpacked = Code() == tok::DOUBLESTAR;
+    bool is_dict = is_unpacked;
+    if (is_unpacked) {
+      if (!Since(5)) FailHere();
+      PushLeaf();
+      Binary(kBitOrLevel);
+    } else if (Code() == tok::STAR) {
+      NamedOrStar();
+    } else {
+      NamedTest();
+      is_dict = Code() == tok::COLON;
+      if (is_dict) DictValue();
+    }
+    if (IsComprehension()) {
+      if (is_unpacked) FailAt(start, "dict unpacking cannot be used in dict comprehension");
+      if (code_[start] == tok::STAR) FailAt(start, "iterable unpacking cannot be used in comprehension");
+      Comprehension(is_dict ? "dict comprehension" : "set comprehension", start);
+    } else if (is_dict) {
+      while (Code() == tok::COMMA) {
+        PushLeaf();
+        if (Code() == tok::RBRACE) break;
+        if (Code() == tok::DOUBLESTAR) {
+          if (!Since(5)) FailHere();
+          PushLeaf();
+          Binary(kBitOrLevel);
+        } else {
+          Test();
+          if (Code() != tok::COLON) {
+            if (Code() == tok::COMMA || Code() == tok::RBRACE) FailAt(at_ - 1, "':' expected after dictionary key");
+            FailHere();
+          }
+          DictValue();
+        }
+      }
+    } else {
+      Elements(tok::RBRACE);
+      if (IsComprehension()) FailAtTarget(start);
+    }
+    Finish(symbols_.dictorsetmaker, inner);
+  }
+  Expect(tok::RBRACE, nullptr);
+  Finish(symbols_.atom, mark);
+}
+
+// The colon of a pair and the value behind it.
+void CompleteParser::DictValue() {
+  const size_t colon = at_;
+  PushLeaf();
+  if (Code() == tok::RBRACE || Code() == tok::COMMA) {
+    if (python3_) FailAt(colon, "expression expected after dictionary key and ':'");
+    FailHere();
+  }
+  if (Code() == tok::STAR) FailAt(at_, "cannot use a starred expression in a dictionary value");
+  Test();
+}
+
+void CompleteParser::Backquotes() {
+  const Deeper deeper(*this);
+  const size_t mark = Mark();
+  PushLeaf();
+  const size_t inner = Mark();
+  Test();
+  while (Code() == tok::COMMA) {
+    PushLeaf();
+    Test();
+  }
+  Finish(symbols_.testlist_star_expr, inner);
+  Expect(tok::BACKQUOTE, nullptr);
+  Finish(symbols_.atom, mark);
+}
+
+// ---- arguments and subscripts ----
+
+void CompleteParser::Arguments() {
+  const size_t mark = Mark();
+  const size_t first_name = names_.size();
+  bool has_keyword = false;
+  bool has_unpacked_keywords = false;
+  bool has_star = false;
+  size_t count = 0;
+  size_t generator = kNowhere;
+  while (Code() != tok::RPAR) {
+    const size_t start = at_;
+    const size_t argument = Mark();
+    ++count;
+    if (Code() == tok::STAR || Code() == tok::DOUBLESTAR) {
+      const bool is_star = Code() == tok::STAR;
+      if (is_star && has_unpacked_keywords)
+        FailAt(start, "iterable argument unpacking follows keyword argument unpacking");
+      (is_star ? has_star : has_unpacked_keywords) = true;
+      PushLeaf();
+      Test();
+      if (Code() == tok::EQUAL) {
+        FailAt(start, is_star ? "cannot assign to iterable argument unpacking"
+                              : "cannot assign to keyword argument unpacking");
+      }
+      Finish(symbols_.argument, argument);
+    } else if (CodeAt(1) == tok::EQUAL && IsNameCode(Code())) {
+      if (python3_ && (Code() == word::kTrue || Code() == word::kFalse || Code() == word::kNone))
+        Fail("cannot assign to " + std::string(TokenAt(at_).view()));
+      if (!python3_ && Code() == word::kNone) Fail("cannot assign to None");
+      if (!IsName(Code())) FailHere();
+      const Text name = TokenAt(at_).view();
+      for (size_t i = first_name; i < names_.size(); ++i)
+        if (names_[i] == name) Postpone(at_, "keyword argument repeated: " + std::string(name), kCompiler);
+      if (name == "__debug__" && python3_) Postpone(at_, "cannot assign to __debug__", kCompiler);
+      names_.push_back(name);
+      has_keyword = true;
+      PushLeaf();
+      PushLeaf();
+      if (Code() == tok::COMMA || Code() == tok::RPAR) {
+        if (python3_) FailAt(start, "expected argument value expression");
+        FailHere();
+      }
+      Test();
+      if (IsComprehension() && python3_) FailAt(start, "invalid syntax. Maybe you meant '==' or ':=' instead of '='?");
+      Finish(symbols_.argument, argument);
+    } else {
+      Test();
+      if (Code() == tok::COLONEQUAL) {
+        if (!Since(8)) RequireAt(at_, 8, "Assignment expressions are");
+        if (at_ != start + 1 || !IsName(code_[start]))
+          FailAtNode(Top(), std::string("cannot use assignment expressions with ") + NameOfExpression(Top()));
+        CheckWalrus(start);
+        PushLeaf();
+        Test();
+        Finish(symbols_.argument, argument);
+      } else if (IsComprehension()) {
+        Comprehension("generator expression", start);
+        Finish(symbols_.argument, argument);
+        if (generator == kNowhere) generator = start;
+      } else if (Code() == tok::EQUAL) {
+        const bool was_taken = !Since(8) && isa<CAtom>(Top()) && IsNameInBrackets(Top());
+        if (!was_taken) FailAt(start, "expression cannot contain assignment, perhaps you meant \"==\"?");
+        has_keyword = true;
+        PushLeaf();
+        Test();
+        Finish(symbols_.argument, argument);
+      } else if (has_unpacked_keywords || has_keyword) {
+        if (Code() != tok::COMMA && Code() != tok::RPAR) FailHere();
+        FailPositional(has_unpacked_keywords);
+      } else if (has_star && !Since(5)) {
+        FailAt(start, "only named arguments may follow *expression");
+      }
+    }
+    if (Code() != tok::COMMA) break;
+    PushLeaf();
+    if (generator != kNowhere && (Code() != tok::RPAR || Since(7)))
+      FailAt(generator, "Generator expression must be parenthesized");
+  }
+  if (generator != kNowhere && count > 1) FailAt(generator, "Generator expression must be parenthesized");
+  names_.resize(first_name);
+  Finish(symbols_.arglist, mark);
+}
+
+// A positional argument behind a keyword: the language's parser says so where the arguments end.
+void CompleteParser::FailPositional(bool behind_unpacked) {
+  size_t place = at_;
+  int depth = 0;
+  for (; place + 1 < code_.size(); ++place) {
+    const TokenCode code = code_[place];
+    if (code == tok::LPAR || code == tok::LSQB || code == tok::LBRACE) ++depth;
+    if (code == tok::RPAR || code == tok::RSQB || code == tok::RBRACE) {
+      if (depth == 0) break;
+      --depth;
+    }
+  }
+  FailAt(place, behind_unpacked ? "positional argument follows keyword argument unpacking"
+                                : "positional argument follows keyword argument");
+}
+
+void CompleteParser::Subscripts() {
+  const size_t mark = Mark();
+  Subscript();
+  while (Code() == tok::COMMA) {
+    PushLeaf();
+    if (Code() == tok::RSQB) break;
+    Subscript();
+  }
+  Finish(symbols_.subscriptlist, mark);
+}
+
+void CompleteParser::Subscript() {
+  const size_t mark = Mark();
+  if (Code() == tok::STAR) {
+    if (!Since(11)) FailHere();
+    return TestOrStar();
+  }
+  if (!python3_ && Code() == tok::ELLIPSIS) return PushLeaf();
+  if (Code() != tok::COLON) {
+    const size_t start = at_;
+    Test();
+    if (Code() == tok::COLONEQUAL) {
+      RequireAt(at_, 10, "Assignment expressions in subscripts are");
+      if (at_ != start + 1 || !IsName(code_[start]))
+        FailAtNode(Top(), std::string("cannot use assignment expressions with ") + NameOfExpression(Top()));
+      CheckWalrus(start);
+      PushLeaf();
+      Test();
+      return Finish(symbols_.namedexpr_test, mark);
+    }
+    if (Code() == tok::EQUAL) FailAtEqual(start, mark);
+    if (Code() != tok::COLON) return;
+  }
+  PushLeaf();
+  if (Code() != tok::COLON && Code() != tok::COMMA && Code() != tok::RSQB) Test();
+  if (Code() == tok::COLON) {
+    const size_t step = Mark();
+    PushLeaf();
+    if (Code() != tok::COMMA && Code() != tok::RSQB) Test();
+    Finish(symbols_.sliceop, step);
+  }
+  Finish(symbols_.subscript, mark);
+}
+
+// ---- comprehensions ----
+
+void CompleteParser::Comprehension(const char* what, size_t start) {
+  if (yield_at_ != kNowhere && yield_at_ >= start && Since(8))
+    Postpone(yield_at_, std::string("'yield' inside ") + what);
+  const RestoredValue<const char*> comprehension(comprehension_, what);
+  const size_t outer_names = iterated_.size();
+  ComprehensionTail(/*is_first=*/true);
+  const auto is_within = [start](size_t at) { return at >= start; };
+  CheckAssignedWithin(
+      static_cast<size_t>(std::find_if(assigned_.begin(), assigned_.end(), is_within) - assigned_.begin()));
+  iterated_.resize(outer_names);
+}
+
+// The names assigned to from the `first` on stand in the comprehension that was read.
+void CompleteParser::CheckAssignedWithin(size_t first) {
+  for (size_t i = first; i < assigned_.size(); ++i) {
+    const Text name = TokenAt(assigned_[i]).view();
+    if (place_.scope == StatementPlace::Scope::kClass)
+      Postpone(assigned_[i], "assignment expression within a comprehension cannot be used in a class body");
+    if (std::find(iterated_.begin(), iterated_.end(), name) != iterated_.end()) {
+      Postpone(assigned_[i],
+               "assignment expression cannot rebind comprehension iteration variable '" + std::string(name) + "'");
+    }
+  }
+}
+
+void CompleteParser::AddIterated(const CNode* target) {
+  if (isa<CNameLiteral>(target)) iterated_.push_back(target->fText());
+  if (!isa<CTestListStarExpr>(target) && !isa<CAtom>(target) && !isa<CStarExpression>(target)) return;
+  for (const CNode* child : target->fChildren()) AddIterated(child);
+}
+
+void CompleteParser::ComprehensionTail(bool is_first) {
+  const Deeper deeper(*this);
+  const size_t mark = Mark();
+  if (Code() == word::kAsync) {
+    if (!Since(6)) FailHere();
+    if (!IsKeyword(word::kAsync)) FailHere();
+    const bool is_generator = comprehension_[0] == 'g';
+    if (!place_.is_in_async() && !(is_generator && Since(8)))
+      Postpone(at_, "asynchronous comprehension outside of an asynchronous function", kCompiler);
+    PushLeafOf(tok::ASYNC, TokenAt(at_), index_[at_]);
+    ++at_;
+  }
+  const size_t clause = Mark();
+  PushLeaf();
+  TargetList(TargetUse::kFor);
+  AddIterated(Top());
+  PushLeaf();
+  const bool is_list = !python3_ && comprehension_[0] == 'l';
+  {
+    const RestoredValue<bool> in_iterable(in_iterable_, true);
+    // The first iterable is none of the comprehension's own.
+    const RestoredValue<const char*> comprehension(comprehension_, is_first ? nullptr : comprehension_);
+    if (is_list) {
+      const size_t iterable = Mark();
+      OldTest();
+      while (Code() == tok::COMMA) {
+        PushLeaf();
+        if (!BeginsExpression(Code())) break;
+        OldTest();
+      }
+      Finish(symbols_.testlist_star_expr, iterable);
+    } else {
+      Binary(kOrLevel);
+    }
+  }
+  ComprehensionRest();
+  Finish(symbols_.sync_comp_for, clause);
+  Finish(symbols_.comp_for, mark);
+}
+
+void CompleteParser::ComprehensionRest() {
+  if (IsComprehension()) return ComprehensionTail(/*is_first=*/false);
+  if (Code() != word::kIf) {
+    if (BeginsExpression(Code()) && brackets_ > 0) FailHere();
+    return;
+  }
+  const Deeper deeper(*this);
+  const size_t mark = Mark();
+  PushLeaf();
+  OldTest();
+  ComprehensionRest();
+  Finish(symbols_.comp_if, mark);
+}
+
+// ---- yield, assignment expressions ----
+
+void CompleteParser::Yield() {
+  const size_t mark = Mark();
+  const size_t start = at_;
+  using Scope = StatementPlace::Scope;
+  yield_at_ = start;
+  if (comprehension_ != nullptr && Since(8))
+    Postpone(start, std::string("'yield' inside ") + comprehension_);
+  else if (place_.scope == Scope::kModule || place_.scope == Scope::kClass)
+    Postpone(start, "'yield' outside function", kCompiler);
+  else if (place_.is_in_async() && !Since(6))
+    Postpone(start, "'yield' inside async function", kCompiler);
+  PushLeaf();
+  if (Code() == word::kFrom) {
+    if (!Since(3)) FailHere();
+    if (place_.is_in_async()) Postpone(start, "'yield from' inside async function", kCompiler);
+    const size_t argument = Mark();
+    PushLeaf();
+    Test();
+    Finish(symbols_.yield_arg, argument);
+  } else if (BeginsExpression(Code()) || Code() == tok::STAR) {
+    StarExpressions(symbols_.testlist_star_expr);
+    if (!Since(8)) CheckNoStars(Top());
+    CheckNoLoneStar(Top());
+  }
+  Finish(symbols_.yield_expr, mark);
+}
+
+void CompleteParser::CheckWalrus(size_t name) {
+  assigned_.push_back(name);
+  if (in_iterable_) Postpone(name, "assignment expression cannot be used in a comprehension iterable expression");
+  if (TokenAt(name).view() == "__debug__") Postpone(name, "cannot assign to __debug__", kCompiler);
+}
+
+}  // namespace quillet

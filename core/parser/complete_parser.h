@@ -1,0 +1,288 @@
+// CompleteParser reads one statement of one version of Python, whole and to the letter.
+//
+// The tables (parser.h) know two grammars and take what they can; this parser knows every form of every
+// version, and is asked about the statements that the tables reject or that are outside of what they can
+// judge. It is a recursive descent over the same tokens, makes the same nodes of the same factory in the
+// layouts of the newer grammar, and gives a tree that the walkers read like any other. What the version
+// does not take is a ParseError whose message is in the words of the language's own newest parser and
+// whose context is the index of the token at fault.
+//
+// Each rule leaves one node on a stack of nodes, so that whatever a failure interrupts is given back in
+// one place. A rule that matched one child makes no node of its own, as in the tables. Recursion is
+// bounded: by nesting of brackets as the language bounds it, by kMaxDepth for all else.
+#pragma once
+
+#include <algorithm>
+#include <array>
+#include <optional>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "foundations/errors.h"
+#include "grammar/grammar.h"
+#include "lines/logical_line.h"
+#include "tree/factory.h"
+#include "tree/nodes.h"
+
+namespace quillet {
+
+// What a statement stands in, as far as that decides what it may say.
+struct StatementPlace {
+  enum class Scope : uint8_t { kModule, kClass, kFunction, kAsyncFunction };
+
+  Scope scope = Scope::kModule;
+
+  bool is_in_async() const { return scope == Scope::kAsyncFunction; }
+};
+
+class CompleteParser {
+ public:
+  static constexpr int kMaxBrackets = 200;
+  static constexpr int kMaxDepth = 1200;
+
+  // `grammar` is that of Python 3, whose states the factory's nodes have.
+  CompleteParser(CNodeFactory& factory, const Grammar& grammar, Version version, bool print_statement);
+  CompleteParser(const CompleteParser&) = delete;
+  CompleteParser& operator=(const CompleteParser&) = delete;
+
+  // The tree of a statement or of a statement's head, which is the caller's; null where there is nothing but
+  // comments. ParseError for what the version's grammar rejects.
+  CNode* ParseStatement(const LogicalLine& line, StatementPlace place);
+  // The same for the expression in a field of a formatted string.
+  CNode* ParseField(const LogicalLine& line, StatementPlace place);
+  // For a hint: one expression, or several with commas between them.
+  CNode* ParseHint(TokenSpan toks);
+  // For a signature in a comment, `(int, *str) -> bool`: a node whose last child is the type returned and whose
+  // others are those of the parameters, none for `(...)`.
+  CNode* ParseSignature(TokenSpan toks);
+
+  // What the grammar took in the last statement or field and the compiler behind it does not take, such as a
+  // `return` outside of a function: an error of a statement that is understood all the same.
+  const std::optional<ParseError>& postponed() const { return postponed_; }
+
+  CNodeFactory& factory() const { return factory_; }
+
+ private:
+  // The rules of the grammar that make nodes.
+  struct Symbols {
+    int and_expr, and_test, annassign, argument, arglist, arith_expr, assert_stmt, async_stmt, atom, atom_expr,
+        classdef, comp_for, comp_if, comp_op, comparison, decorator, del_stmt, dictorsetmaker, dotted_as_name,
+        dotted_as_names, dotted_name, except_clause, expr, expr_stmt, exprlist, factor, for_stmt, funcdef, global_stmt,
+        if_stmt, import_as_name, import_as_names, import_from, import_name, lambdef, namedexpr_test, nonlocal_stmt,
+        not_test, or_test, parameters, power, raise_stmt, return_stmt, shift_expr, sliceop, star_expr, subscript,
+        subscriptlist, sync_comp_for, term, test, testlist_comp, testlist_star_expr, tfpdef, trailer, try_stmt,
+        typedargslist, varargslist, while_stmt, with_item, with_stmt, xor_expr, yield_arg, yield_expr;
+  };
+  enum class TargetUse : uint8_t { kAssign, kAnnotate, kAugment, kFor, kWith, kDelete };
+  // Who rejects what the grammar takes, in the order in which they are asked.
+  enum Judge : uint8_t { kSymbolTable, kCompiler, kNobody };
+  class Deeper;
+  class InBracket;
+  static constexpr size_t kNowhere = SIZE_MAX;
+  // Of the operators, that of "|": what binds as tight may be a target.
+  static constexpr int kTargetLevel = 4;
+
+  // ---- the frame (complete_parser.cc) ----
+  template <class Rule>
+  CNode* Run(TokenSpan toks, StatementPlace place, Rule&& rule);
+  void SetTokens(TokenSpan toks);
+  // What the language's tokeniser rejects, in front of all else.
+  void CheckTokens();
+  void CheckNumber(const Token& token, int32_t index) const;
+  void CheckString(const Token& token, int32_t index) const;
+  // The innermost bracket that stands open at the end, or -1.
+  int32_t OpenBracket() const;
+  [[noreturn]] void FailAtToken(int32_t token, std::string message) const;
+  [[noreturn]] void FailAt(size_t at, std::string message) const { FailAtToken(index_[at], std::move(message)); }
+  [[noreturn]] void Fail(std::string message) const { FailAt(at_, std::move(message)); }
+  [[noreturn]] void FailHere() const { FailGeneric(at_); }
+  // "invalid syntax", or what the brackets say to that.
+  [[noreturn]] void FailGeneric(size_t at) const;
+  [[noreturn]] void FailAtNode(const CNode* node, std::string message) const;
+  // A failure that waits for the end of the statement; the first one of the earliest judge stays.
+  void Postpone(size_t at, std::string message, Judge judge = kSymbolTable);
+  void PostponeAtNode(const CNode* node, std::string message, Judge judge);
+  int32_t FirstTokenOf(const CNode* node) const;
+  // A form that came with a later version: the statement is understood all the same.
+  void RequireAt(size_t at, int minor, const char* what);
+  // Reads by a rule and gives it up again; whether it could be read.
+  template <class Rule>
+  bool Try(Rule&& rule);
+  // " on line 3" for a token that stands on another line than the one at `at`.
+  std::string OnLineOf(int32_t token, size_t at) const;
+  std::string DetectedAt(size_t at, bool is_triple) const;
+
+  bool Since(int minor) const { return python3_ && minor_ >= minor; }
+  TokenCode Code() const { return code_[at_]; }
+  TokenCode CodeAt(size_t ahead) const { return code_[std::min(at_ + ahead, code_.size() - 1)]; }
+  bool AtEnd() const { return Code() == tok::ENDMARKER; }
+  const Token& TokenAt(size_t at) const { return toks_[static_cast<size_t>(index_[at])]; }
+  bool IsKeyword(TokenCode code) const;
+  bool IsName(TokenCode code) const { return IsNameCode(code) && !IsKeyword(code); }
+  bool BeginsExpression(TokenCode code) const;
+  size_t Mark() const { return nodes_.size(); }
+  CNode* Top() const { return nodes_.back(); }
+  void PushLeaf();
+  void PushLeafOf(int type, const Token& token, int32_t index);
+  void PushInvented(const Token& token);
+  void PushName();
+  bool Accept(TokenCode code);
+  // `message` null: the generic one.
+  void Expect(TokenCode code, const char* message);
+  void ExpectEnd();
+  // One node of those since the mark, for a rule with several.
+  void Finish(int symbol, size_t mark);
+  // The same for a class without a state.
+  template <class T>
+  void FinishBare(size_t mark);
+
+  // ---- statements (complete_statements.cc) ----
+  void Statement(LineKind kind);
+  void SimpleStatement();
+  void Suite();
+  void Colon();
+  void ForcedColon();
+  void IfOrWhile(int symbol);
+  void Else();
+  void TryClause();
+  void Finally();
+  void Except();
+  void ExceptTypes();
+  void For();
+  void With();
+  bool WithItemsInBrackets();
+  void WithItem();
+  bool IsAsyncStatement() const;
+  void Async();
+  void Definition();
+  void Class();
+  // How many there are; they are left on the stack.
+  size_t TypeParameters();
+  void TypeParameter(bool& has_default);
+  void FinishWithTypeParameters(int symbol, size_t mark, size_t parameters, size_t count);
+  void TypeStatement();
+  void Decorator();
+  bool IsDottedDecorator() const;
+  void ExpressionStatement();
+  void Annotation(size_t mark, size_t start);
+  void Delete();
+  void AssertStatement();
+  void Declaration(int symbol);
+  void Return();
+  void RaiseStatement();
+  void Import();
+  void ImportTarget();
+  void FromImport();
+  void DottedName();
+  void PrintStatement();
+  void ExecStatement();
+
+  // ---- parameters (complete_parameters.cc) ----
+  void Parameters(bool is_lambda, TokenCode end);
+  void Parameter(bool is_lambda, bool is_starred);
+  void TupleParameter();
+  void AddParameterName(size_t at);
+  bool IsParameterStart() const;
+  bool IsNamesInBrackets() const;
+
+  // ---- expressions (complete_expressions.cc) ----
+  void StarExpressions(int symbol);
+  void TestOrStar();
+  void NamedOrStar();
+  void NamedTest();
+  [[noreturn]] void FailAtEqual(size_t start, size_t mark);
+  void Test();
+  // Where two expressions stand side by side, the first of which is the node at `mark`: says so where that
+  // explains something.
+  void CheckBetween(size_t start, size_t mark);
+  void OldTest();
+  void Lambda();
+  void Binary(int level);
+  int LevelOf(TokenCode code) const;
+  void Operator(int level);
+  void Factor();
+  void Power();
+  void AtomExpression();
+  void Trailer();
+  void Atom();
+  void Strings();
+  void Group();
+  void Elements(TokenCode close);
+  void ListDisplay();
+  void DictOrSet();
+  void DictValue();
+  [[noreturn]] void FailAtTarget(size_t start);
+  void Backquotes();
+  void Arguments();
+  [[noreturn]] void FailAtTargetOf(size_t mark);
+  [[noreturn]] void FailPositional(bool behind_unpacked);
+  void Subscripts();
+  void Subscript();
+  bool IsComprehension() const;
+  // What stands in front of the first "for" was read from `start` on.
+  void Comprehension(const char* what, size_t start);
+  void ComprehensionTail(bool is_first);
+  void ComprehensionRest();
+  void Yield();
+  void TargetList(TargetUse use);
+  void CheckWalrus(size_t name);
+  void CheckAssignedWithin(size_t first);
+  void AddIterated(const CNode* target);
+
+  // ---- targets (complete_targets.cc) ----
+  void CheckTarget(const CNode* node, TargetUse use, bool may_mean_equal);
+  void CheckTargetNames(const CNode* node);
+  const CNode* InvalidTarget(const CNode* node, TargetUse use) const;
+  const char* NameOfExpression(const CNode* node) const;
+  bool IsBracketed(const CNode* node) const;
+  bool IsNameInBrackets(const CNode* node) const;
+  bool IsBitwiseOr(const CNode* node) const;
+  void CheckNoLoneStar(const CNode* node);
+  void CheckNoStars(const CNode* node) const;
+
+  // ---- patterns (complete_patterns.cc) ----
+  void Match();
+  void Case();
+  void Patterns();
+  void MaybeStarPattern();
+  void AsPattern();
+  void OrPattern();
+  void ClosedPattern();
+  void NumberPattern();
+  void ClassArguments();
+  void SequencePattern(TokenCode close);
+  void MappingPattern();
+  void CheckCapture(size_t at);
+
+  CNodeFactory& factory_;
+  Symbols symbols_;
+  const bool python3_;
+  const int minor_;
+  const bool print_statement_;
+  std::array<bool, 256> keyword_{};
+
+  TokenSpan toks_;
+  std::vector<int32_t> index_;   // of the significant tokens, and the token count at the end
+  std::vector<TokenCode> code_;  // of the same; ENDMARKER at the end
+  std::vector<CNode*> nodes_;
+  std::vector<Text> names_;  // of the parameters, or what a pattern captures
+  size_t at_ = 0;
+  StatementPlace place_;
+  int depth_ = 0;
+  int brackets_ = 0;
+  const LogicalLine* line_ = nullptr;  // where it is known
+  size_t furthest_ = 0;                // the last token that was looked at in a reading that was given up
+  bool is_trying_ = false;             // a reading that may be given up, which explains nothing
+  bool in_field_ = false;
+  bool in_annotation_ = false;
+  bool in_iterable_ = false;             // of a comprehension
+  const char* comprehension_ = nullptr;  // what the one around is called
+  std::vector<size_t> assigned_;         // where names are assigned to within expressions
+  std::vector<Text> iterated_;           // the names that the comprehensions around bind
+  size_t yield_at_ = kNowhere;           // the last yield that was read
+  std::optional<ParseError> postponed_;
+  Judge judge_ = kNobody;
+};
+
+}  // namespace quillet

@@ -1,0 +1,275 @@
+// Heads of match and case statements: subject, patterns, guard.
+//
+// Captures are leaves, and every group is a node of a pattern, so that a walk tells what is bound by the
+// class alone; a dotted value is a chain as in any expression, which reads its links.
+#include <algorithm>
+
+#include "parser/complete_depth.h"
+#include "parser/complete_parser.h"
+
+namespace quillet {
+
+void CompleteParser::Match() {
+  const size_t mark = Mark();
+  RequireAt(at_, 10, "Pattern matching is");
+  PushLeaf();
+  const size_t subject = Mark();
+  // A lone star needs its comma.
+  NamedOrStar();
+  while (Code() == tok::COMMA) {
+    PushLeaf();
+    if (!BeginsExpression(Code()) && Code() != tok::STAR) break;
+    NamedOrStar();
+  }
+  Finish(symbols_.testlist_comp, subject);
+  if (isa<CStarExpression>(Top())) FailHere();
+  if (AtEnd()) Fail("expected ':'");
+  Expect(tok::COLON, nullptr);
+  FinishBare<CMatchStmt>(mark);
+}
+
+void CompleteParser::Case() {
+  const size_t mark = Mark();
+  RequireAt(at_, 10, "Pattern matching is");
+  PushLeaf();
+  Patterns();
+  if (Code() == word::kIf) {
+    const size_t guard = Mark();
+    PushLeaf();
+    NamedTest();
+    FinishBare<CNode>(guard);
+  }
+  if (AtEnd()) Fail("expected ':'");
+  Expect(tok::COLON, nullptr);
+  if (!AtEnd()) SimpleStatement();
+  names_.clear();
+  FinishBare<CCaseStmt>(mark);
+}
+
+// What stands behind "case": one pattern, or a sequence without brackets.
+void CompleteParser::Patterns() {
+  const size_t mark = Mark();
+  const bool is_star = Code() == tok::STAR;
+  MaybeStarPattern();
+  if (Code() != tok::COMMA) {
+    if (is_star) FailHere();
+    // A node of its own, also around a lone capture: the walk of a pattern looks at what is in it.
+    if (!isa<CPatternNode>(Top())) FinishBare<CPatternNode>(mark);
+    return;
+  }
+  while (Code() == tok::COMMA) {
+    PushLeaf();
+    if (Code() == tok::COLON || Code() == word::kIf) break;
+    MaybeStarPattern();
+  }
+  FinishBare<CSequencePatternNode>(mark);
+}
+
+void CompleteParser::MaybeStarPattern() {
+  if (Code() != tok::STAR) return AsPattern();
+  const size_t mark = Mark();
+  PushLeaf();
+  if (!IsName(Code())) FailHere();
+  CheckCapture(at_);
+  PushLeaf();
+  FinishBare<CPatternNode>(mark);
+}
+
+void CompleteParser::AsPattern() {
+  const Deeper deeper(*this);
+  const size_t mark = Mark();
+  OrPattern();
+  if (Code() != word::kAs) return;
+  PushLeaf();
+  const size_t name = at_;
+  if (Code() == word::kUnderscore && CodeAt(1) != tok::DOT && CodeAt(1) != tok::LPAR)
+    Fail("cannot use '_' as a target");
+  if (!IsName(Code()) || CodeAt(1) == tok::DOT || CodeAt(1) == tok::LPAR || CodeAt(1) == tok::LSQB) {
+    if (!Try([&] { Test(); })) FailGeneric(name);
+    Test();
+    FailAt(name, std::string("cannot use ") + NameOfExpression(Top()) + " as pattern target");
+  }
+  CheckCapture(name);
+  PushLeaf();
+  FinishBare<CPatternNode>(mark);
+}
+
+void CompleteParser::OrPattern() {
+  const size_t mark = Mark();
+  const size_t first_name = names_.size();
+  size_t alternatives = 1;
+  size_t names_of_first = 0;
+  const size_t start = at_;
+  ClosedPattern();
+  while (Code() == tok::VBAR) {
+    if (alternatives == 1) names_of_first = names_.size() - first_name;
+    const std::vector<Text> before(names_.begin() + static_cast<ptrdiff_t>(first_name), names_.end());
+    names_.resize(first_name);
+    PushLeaf();
+    ClosedPattern();
+    ++alternatives;
+    std::vector<Text> now(names_.begin() + static_cast<ptrdiff_t>(first_name), names_.end());
+    const auto holds = [](const std::vector<Text>& in, Text name) {
+      return std::find(in.begin(), in.end(), name) != in.end();
+    };
+    bool same = now.size() == before.size();
+    for (const Text name : now) same = same && holds(before, name);
+    if (!same) Postpone(start, "alternative patterns bind different names", kCompiler);
+  }
+  (void)names_of_first;
+  if (alternatives > 1) FinishBare<CPatternNode>(mark);
+}
+
+void CompleteParser::CheckCapture(size_t at) {
+  const Text name = TokenAt(at).view();
+  if (name == "_") return;
+  for (const Text earlier : names_) {
+    if (earlier == name) Postpone(at, "multiple assignments to name '" + std::string(name) + "' in pattern", kCompiler);
+  }
+  names_.push_back(name);
+}
+
+void CompleteParser::ClosedPattern() {
+  const Deeper deeper(*this);
+  const size_t mark = Mark();
+  switch (Code()) {
+    case tok::NUMBER:
+    case tok::MINUS:
+      return NumberPattern();
+    case tok::STRING:
+      for (size_t at = at_; code_[at] == tok::STRING; ++at)
+        if (TokenAt(at).view().find_first_of("fFtT") < TokenAt(at).view().find_first_of("\"'"))
+          FailAt(at_, "patterns may only match literals and attribute lookups");
+      return Strings();
+    case word::kNone:
+    case word::kTrue:
+    case word::kFalse:
+      return PushLeaf();
+    case tok::LSQB:
+      return SequencePattern(tok::RSQB);
+    case tok::LPAR:
+      return SequencePattern(tok::RPAR);
+    case tok::LBRACE:
+      return MappingPattern();
+    default:
+      break;
+  }
+  if (!IsName(Code())) FailHere();
+  if (CodeAt(1) != tok::DOT && CodeAt(1) != tok::LPAR) {
+    CheckCapture(at_);
+    return PushLeaf();
+  }
+  // A dotted value, or a class.
+  PushLeaf();
+  while (Code() == tok::DOT) {
+    const size_t trailer = Mark();
+    PushLeaf();
+    PushName();
+    Finish(symbols_.trailer, trailer);
+  }
+  Finish(symbols_.atom_expr, mark);
+  if (Code() != tok::LPAR) return;
+  PushLeaf();
+  ClassArguments();
+  FinishBare<CClassPatternNode>(mark);
+}
+
+void CompleteParser::NumberPattern() {
+  const size_t mark = Mark();
+  if (Code() == tok::MINUS) PushLeaf();
+  if (Code() != tok::NUMBER) FailHere();
+  const auto is_imaginary = [this] { return (TokenAt(at_).view().back() | 0x20) == 'j'; };
+  const bool first_is_imaginary = is_imaginary();
+  const size_t first = at_;
+  PushLeaf();
+  if (Code() == tok::PLUS || Code() == tok::MINUS) {
+    PushLeaf();
+    if (Code() != tok::NUMBER) FailHere();
+    if (first_is_imaginary) FailAt(first, "real number required in complex literal");
+    if (!is_imaginary()) Fail("imaginary number required in complex literal");
+    PushLeaf();
+  }
+  if (Mark() - mark > 1) FinishBare<CPatternNode>(mark);
+}
+
+// Behind the "(" up to and with the ")".
+void CompleteParser::ClassArguments() {
+  const InBracket in_bracket(*this);
+  std::vector<Text> keywords;
+  size_t last_positional = 0;
+  bool is_misplaced = false;
+  while (Code() != tok::RPAR) {
+    if (IsName(Code()) && CodeAt(1) == tok::EQUAL) {
+      const size_t mark = Mark();
+      const Text name = TokenAt(at_).view();
+      if (std::find(keywords.begin(), keywords.end(), name) != keywords.end())
+        Postpone(at_, "attribute name repeated in class pattern: " + std::string(name), kCompiler);
+      keywords.push_back(name);
+      PushLeaf();
+      PushLeaf();
+      AsPattern();
+      FinishBare<CClassArgumentPatternNode>(mark);
+    } else {
+      last_positional = at_;
+      AsPattern();
+      is_misplaced |= !keywords.empty();
+    }
+    if (Code() != tok::COMMA) break;
+    PushLeaf();
+  }
+  if (Code() == tok::RPAR && is_misplaced) FailAt(last_positional, "positional patterns follow keyword patterns");
+  Expect(tok::RPAR, nullptr);
+}
+
+// In brackets of either kind; round ones around one pattern alone only group it.
+void CompleteParser::SequencePattern(TokenCode close) {
+  const InBracket in_bracket(*this);
+  const size_t mark = Mark();
+  PushLeaf();
+  bool has_comma = false;
+  bool has_star = false;
+  int stars = 0;
+  const size_t start = at_;
+  while (Code() != close) {
+    has_star = Code() == tok::STAR;
+    if (has_star && ++stars == 2) Postpone(start - 1, "multiple starred expressions in sequence pattern", kCompiler);
+    MaybeStarPattern();
+    if (Code() != tok::COMMA) break;
+    has_comma = true;
+    PushLeaf();
+  }
+  if (close == tok::RPAR && has_star && !has_comma) FailHere();
+  Expect(close, nullptr);
+  FinishBare<CSequencePatternNode>(mark);
+}
+
+void CompleteParser::MappingPattern() {
+  const InBracket in_bracket(*this);
+  const size_t mark = Mark();
+  PushLeaf();
+  while (Code() != tok::RBRACE) {
+    if (Code() == tok::DOUBLESTAR) {
+      PushLeaf();
+      if (!IsName(Code())) FailHere();
+      if (Code() == word::kUnderscore) FailHere();
+      CheckCapture(at_);
+      PushLeaf();
+      if (Code() == tok::COMMA) PushLeaf();
+      if (Code() != tok::RBRACE) FailHere();
+      break;
+    }
+    // A key is a literal or a dotted value.
+    if (IsName(Code()) && CodeAt(1) != tok::DOT) FailHere();
+    if (Code() == tok::LPAR || Code() == tok::LSQB || Code() == tok::LBRACE) FailHere();
+    ClosedPattern();
+    if (isa<CClassPatternNode>(Top())) FailHere();
+    Expect(tok::COLON, nullptr);
+    AsPattern();
+    if (Code() != tok::COMMA) break;
+    PushLeaf();
+  }
+  Expect(tok::RBRACE, nullptr);
+  FinishBare<CSequencePatternNode>(mark);
+}
+
+}  // namespace quillet

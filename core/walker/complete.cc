@@ -1,0 +1,108 @@
+// What a complete reading asks of a walk: no limits that a source meets, and an eye for what the tables
+// take and the language may not.
+//
+// Nothing is judged here. A doubt costs a second parse by the parser that knows every rule, so it is raised
+// where the common shapes of a target, of arguments and of parameters end.
+#include "walker/walker.h"
+
+namespace quillet {
+namespace {
+
+// Deeper trees come of brackets that the language itself does not take.
+constexpr int32_t kMaxCompleteDepth = 1000;
+
+bool IsConstant(TokenCode code) { return code == word::kNone || code == word::kTrue || code == word::kFalse; }
+
+bool IsDebugName(Text name) { return name.size() == 9 && name == "__debug__"; }
+
+bool IsPlainTarget(const CNode* node) {
+  if (isa<CNameLiteral>(node)) return node->code != word::kNone && !IsDebugName(node->fText());
+  const auto* chain = dyn_cast<CAtomExpr>(node);
+  if (chain == nullptr || chain->GetPrefix() != nullptr) return false;
+  const CNode* trailer = chain->LastChild();
+  return isa<CTrailer>(trailer) && trailer->child_count > 0 && trailer->children[0]->code != tok::LPAR;
+}
+
+bool IsPlainPower(const CNode* node) {
+  const auto* power = dyn_cast<CPower>(node);
+  if (power == nullptr || power->HasChildWithCode(tok::DOUBLESTAR)) return false;
+  const CNode* trailer = power->LastChild();
+  return isa<CTrailer>(trailer) && trailer->child_count > 0 && trailer->children[0]->code != tok::LPAR;
+}
+
+}  // namespace
+
+void CNodeWalker::ReadCompletely() {
+  is_complete_ = true;
+  fMaxVisits = INT32_MAX;
+  fMaxRecurseCount = kMaxCompleteDepth;
+  fToText.set_shows_exponents(true);
+}
+
+void CNodeWalker::DoubtTarget(const CNode* target) {
+  if (target == nullptr || IsPlainTarget(target) || IsPlainPower(target)) return;
+  if (const auto* list = dyn_cast<CTestListStarExpr>(target); list != nullptr && list->IsTuple()) {
+    for (const CNode* element : list->fChildren())
+      if (element->code != tok::COMMA && !IsPlainTarget(element) && !IsPlainPower(element)) met_doubtful_ = true;
+    return;
+  }
+  met_doubtful_ = true;
+}
+
+void CNodeWalker::DoubtArguments(const UsedArgList& arg_list) {
+  bool has_keyword = false;
+  bool has_star = false;
+  for (size_t i = 0; i < arg_list.size(); ++i) {
+    const CArgInfo& arg = arg_list[i];
+    if (arg.name == nullptr && IsNone(arg.prefix)) {
+      // In front of Python 3 a star comes last.
+      met_doubtful_ |= has_keyword || (has_star && !fPy3);
+      if (isa<CSingleUsedArgumentNode>(arg.value) && arg_list.size() == 1)
+        met_doubtful_ |= arg.value->ChildIs(1, tok::COLONEQUAL);
+      continue;
+    }
+    if (arg.prefix == "*" && has_keyword) met_doubtful_ = true;
+    has_star |= arg.prefix == "*";
+    has_keyword |= arg.name != nullptr || arg.prefix == "**";
+    if (arg.name == nullptr) continue;
+    if (!isa<CNameLiteral>(arg.name) || IsConstant(arg.name->code)) {
+      met_doubtful_ = true;
+      continue;
+    }
+    const Text name = arg.name->fText();
+    for (size_t j = 0; j < i; ++j)
+      if (arg_list[j].name != nullptr && arg_list[j].name->fText() == name) met_doubtful_ = true;
+    // A source with hundreds of arguments is asked once and not squared.
+    if (i > 64) {
+      met_doubtful_ = true;
+      return;
+    }
+  }
+}
+
+void CNodeWalker::DoubtParameters(const ArgList& arg_list) {
+  bool has_default = false;
+  bool behind_star = false;
+  for (size_t i = 0; i < arg_list.size(); ++i) {
+    const ArgEntry& entry = arg_list[i];
+    if (entry.is_list || i > 64) {
+      met_doubtful_ = true;
+      return;
+    }
+    const CArgInfo& arg = entry.arg;
+    if (!IsNone(arg.prefix)) behind_star = true;
+    if (arg.value != nullptr)
+      has_default = true;
+    else if (has_default && !behind_star)
+      met_doubtful_ = true;
+    if (arg.value != nullptr && !IsNone(arg.prefix)) met_doubtful_ = true;
+    if (arg.name == nullptr) continue;
+    const Text name = arg.name->fText();
+    if (IsConstant(arg.name->code) || IsDebugName(name)) met_doubtful_ = true;
+    for (size_t j = 0; j < i; ++j)
+      if (!arg_list[j].is_list && arg_list[j].arg.name != nullptr && arg_list[j].arg.name->fText() == name)
+        met_doubtful_ = true;
+  }
+}
+
+}  // namespace quillet

@@ -1,0 +1,227 @@
+"""The complete reading: what `quillet.analyze` reads beyond, and otherwise than, an exact one.
+
+Statements that the tables reject have their records, comments that are no types are no errors, what concerns a
+hint stays with the hint, and what a version does not take is rejected in Python's own words.
+"""
+
+from __future__ import annotations
+
+import pytest
+
+from quillet import analyze, analyze_files
+
+NEWEST = (3, 14)
+
+
+def read(source: str, version: tuple[int, int] = NEWEST, *, exact: bool = False) -> list[str]:
+    """The records of all lines, each as a line of text, and errors as place and message."""
+    found = []
+    for line in analyze(source, version=version, exact=exact).lines:
+        if line.error is not None:
+            row, column = line.error_position or (0, 0)
+            found.append(f"{row}:{column} {line.error.msg}")
+        for record in line.records:
+            mark = "parameter " if record.is_parameter else ""
+            found.append(f"{record.name} {mark}{record.kind.value} {record.detail}".rstrip())
+    return found
+
+
+# ---- statements that the tables reject ----
+
+FORMS = [
+    ("case a, *rest:", ["a set", "rest set"]),
+    ("case (1 as z):", ["z set"]),
+    ("case (a.b | c.d):", None),
+    ("case ():", []),
+    ('case "GET" "/":', []),
+    ("case (Point(x=y) | [_, y]) as whole if y:", ["y set", "y set", "whole set", "Point get", "y get"]),
+    ("case {-1: x, 'k': a.b, **rest}:", ["x set", "rest set", "a get", "a.b get"]),
+    ("case x:", ["x set"]),
+    ("case a.b:", ["a get", "a.b get"]),
+    ("case _:", []),
+    ("match ...:", []),
+    ("match *a, b:", ["a get", "b get"]),
+    ("@buttons[0].clicked", ["buttons get", "buttons[0].clicked get"]),
+    ("@f(x)(y)", ["f called (x)", "f get", "x get", "y get"]),
+    ("@a or b", ["a get", "b get"]),
+    ("with (found := find(key)):", ["found set", "found equal find(key)", "find called (key)", "find get", "key get"]),
+    ("with (a / b).c:", None),
+    ("with (open(a) as f, g,): pass", None),
+    ("def f(*args: *Ts): pass", None),
+    ("class C[T: int = str, *Ts = *tuple[int]]: pass", None),
+    ("type X[T] = list[T]", ["X set", "X equal list[T]", "list get", "T get", "T parameter type_parameter"]),
+    ("except A, B:", ["A get", "B get"]),
+    ("except* (A, B) as e:", None),
+    ("x = {a := 1, b}", None),
+    ("x[a := 1]", None),
+    ("x: ...", ["x hint ..."]),
+    ("def f() -> ...: pass", ["f set", "return parameter hint ..."]),
+    ("(x) = 1", ["x set", "x literal int: 1"]),
+    ("[(x), y] = z", ["x set", "x equal z[0]", "y set", "y equal z[1]", "z get"]),
+    ("a, *[b, c] = d", ["a set", "a equal d[0]", "b set", "c set", "d get"]),
+    ("x = micros // 10 ** 6", ["x set", "x expression micros // 10 ** 6", "micros get"]),
+    ("x = a ** b", ["x set", "x expression a ** b", "a get", "b get"]),
+    ("d.setdefault(K, {})[k] = v", None),
+    ("with f() as x.y: pass", ["x.y set", "x.y equal f()", "x get", "f get"]),
+    ("x = " + "f(" * 60 + "a" + ")" * 60, None),
+]
+
+
+@pytest.mark.parametrize(("source", "expected"), FORMS, ids=[form[0][:50] for form in FORMS])
+def test_every_form_of_the_newest_version_is_read(source: str, expected: list[str] | None) -> None:
+    found = read(source)
+    assert [text for text in found if text[0].isdigit()] == []
+    if expected is None:
+        assert any(text.endswith(" get") or " get" in text for text in found)
+    else:
+        assert found == expected
+
+
+def test_what_a_target_reads_is_read() -> None:
+    assert "K get" in read("d.setdefault(K, {})[k] = v")
+    assert "K get" not in read("d.setdefault(K, {})[k] = v", exact=True)
+
+
+def test_2_binds_all_names_of_an_except() -> None:
+    assert read("except E, (a, b):", (2, 7)) == ["a set", "b set", "E get"]
+    assert read("print >>f, x,", (2, 7)) == ["f get", "x get"]
+
+
+# ---- comments and hints ----
+
+HINTS = [
+    ("x = 1  # type: ignore[misc]", ["x set", "x literal int: 1"]),
+    ("x = 1  # type: ignore # why", ["x set", "x literal int: 1"]),
+    ("def f(a):  # type: ignore[override]", ["f set", "a parameter set"]),
+    ("x = 1  # type: any text", ["1:20 invalid syntax in commented type hint", "x set", "x literal int: 1"]),
+    ("def f(a):  # type: int", ["1:20 invalid syntax in signature comment", "f set", "a parameter set"]),
+    (
+        "def f(*a, **k):  # type: (*str, **int) -> (None)",
+        [
+            "f set",
+            "str get",
+            "int get",
+            "a parameter set",
+            "a parameter literal tuple",
+            "k parameter set",
+            "k parameter literal dict",
+            "a parameter hint str",
+            "k parameter hint int",
+            "return parameter hint None",
+        ],
+    ),
+    (
+        "class C:\n    def f(self, a):  # type: (int) -> str\n        pass",
+        [
+            "C set",
+            "f set",
+            "int get",
+            "str get",
+            "self parameter set",
+            "a parameter set",
+            "a parameter hint int",
+            "return parameter hint str",
+        ],
+    ),
+    (
+        "def f(a: 'any text', b: 'B'): pass",
+        [
+            "1:15 invalid syntax in stringified type hint",
+            "f set",
+            "B get",
+            "a parameter set",
+            "b parameter set",
+            "a parameter hint any text",
+            "b parameter hint B",
+        ],
+    ),
+    ("x: L['|'] = 1", ["x set", "x literal int: 1", "L get", "x hint L['']"]),
+]
+
+
+@pytest.mark.parametrize(("source", "expected"), HINTS, ids=[hint[0][:40] for hint in HINTS])
+def test_a_hint_costs_nothing_but_itself(source: str, expected: list[str]) -> None:
+    found = read(source)
+    assert sorted(found) == sorted(expected)
+
+
+@pytest.mark.parametrize(
+    ("imports", "call", "is_hint"),
+    [
+        ("from typing import cast", "cast('A', x)", True),
+        ("from typing import cast as c", "c('A', x)", True),
+        ("import typing", "typing.cast('A', x)", True),
+        ("import typing as t", "t.cast('A', x)", True),
+        ("from typing_extensions import *", "cast('A', x)", True),
+        ("", "cast('A', x)", False),
+        ("from sqlalchemy import cast", "cast('A', x)", False),
+        ("import typing", "other.cast('A', x)", False),
+    ],
+)
+def test_cast_is_what_the_imports_say(imports: str, call: str, is_hint: bool) -> None:
+    assert ("A get" in read(f"{imports}\n{call}\n")) == is_hint
+
+
+def test_literal_is_what_the_imports_say() -> None:
+    assert "A get" not in read("from typing import Literal as L\ndef f(a: L['A']): pass\n")
+    assert "A get" in read("from typing import List as L\ndef f(a: L['A']): pass\n")
+
+
+# ---- errors ----
+
+ERRORS = [
+    ((3, 7), "if (n := 1): pass", "1:7 Assignment expressions are only supported in Python 3.8 and greater"),
+    ((3, 7), "def f(a, /): pass", "1:10 Positional-only parameters are only supported in Python 3.8 and greater"),
+    ((3, 9), "match x:", "1:1 Pattern matching is only supported in Python 3.10 and greater"),
+    ((3, 11), "def f[T](): pass", "1:6 Type parameter lists are only supported in Python 3.12 and greater"),
+    ((3, 11), "type X = int", "1:1 Type statement is only supported in Python 3.12 and greater"),
+    ((3, 13), "f() = 1", "1:1 cannot assign to function call here. Maybe you meant '==' instead of '='?"),
+    ((3, 13), "x, None = 1, 2", "1:4 cannot assign to None"),
+    ((3, 13), "a, *b, *c = d", "1:1 multiple starred expressions in assignment"),
+    ((3, 13), "del f()", "1:5 cannot delete function call"),
+    ((3, 13), "f() += 1", "1:1 'function call' is an illegal expression for augmented assignment"),
+    ((3, 13), "f(a=1, a=2)", "1:8 keyword argument repeated: a"),
+    ((3, 13), "def f(a=1, b): pass", "1:12 parameter without a default follows parameter with a default"),
+    ((3, 13), "def f(*): pass", "1:7 named arguments must follow bare *"),
+    ((3, 13), "return 1", "1:1 'return' outside function"),
+    ((3, 13), "x = yield", "1:5 'yield' outside function"),
+    ((3, 13), "def f(): await x", "1:10 'await' outside async function"),
+    ((3, 13), "nonlocal x", "1:1 nonlocal declaration not allowed at module level"),
+    ((3, 13), "f(a b)", "1:3 invalid syntax. Perhaps you forgot a comma?"),
+    ((3, 13), "x = (1, 2", "1:5 '(' was never closed"),
+    ((3, 13), "x = (1]", "1:7 closing parenthesis ']' does not match opening parenthesis '('"),
+    ((3, 13), "x = 1 if 2", "1:5 expected 'else' after 'if' expression"),
+    ((3, 13), "print 'x'", "1:1 Missing parentheses in call to 'print'. Did you mean print(...)?"),
+    ((3, 13), "except A, B:", "1:8 multiple exception types must be parenthesized"),
+    ((3, 13), "x = 0777", None),
+    ((3, 13), "x <> y", "1:3 invalid syntax"),
+    ((2, 7), "f() = 1", "1:1 cannot assign to function call here. Maybe you meant '==' instead of '='?"),
+    ((2, 7), "x: int = 1", "1:2 invalid syntax"),
+]
+
+
+@pytest.mark.parametrize(("version", "source", "expected"), ERRORS, ids=[error[1] for error in ERRORS])
+def test_what_the_version_rejects_is_rejected(version: tuple[int, int], source: str, expected: str | None) -> None:
+    [error] = [text for text in read(source, version) if text[0].isdigit()]
+    if expected is not None:
+        assert error == expected
+
+
+@pytest.mark.parametrize("source", [error[1] for error in ERRORS if error[0] == (3, 13) and error[1] != "except A, B:"])
+def test_the_running_interpreter_rejects_it_as_well(source: str) -> None:
+    with pytest.raises(SyntaxError):
+        compile(source + "\n", "s", "exec")
+
+
+def test_what_only_the_compiler_rejects_keeps_its_records() -> None:
+    assert read("return a.b") == ["1:1 'return' outside function", "return equal a.b", "a get", "a.b get"]
+    assert read("f() = a") == ["1:1 cannot assign to function call here. Maybe you meant '==' instead of '='?"]
+
+
+def test_an_exact_reading_is_that_of_the_tables() -> None:
+    for source in ("return a", "f() = 1", "def f(a=1, b): pass", "x = 1  # type: ignore[misc]"):
+        assert analyze(source, exact=True).errors == []
+    [result] = analyze_files([("a.py", b"case a, b:\n")], version=(3, 13), exact=True)
+    assert result.errors == [(1, 7, "invalid syntax")]
+    [result] = analyze_files([("a.py", b"case a, b:\n")], version=(3, 13))
+    assert result.errors == []
