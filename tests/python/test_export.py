@@ -247,6 +247,29 @@ def test_parquet_names_what_it_cannot_read_or_write(shop: Path) -> None:
     assert result.stderr == f"quillet: missing/out.parquet: there is no folder {shop / 'missing'} to hold it\n"
 
 
+def test_the_documented_questions_have_answers_in_duckdb(shop: Path, monkeypatch: pytest.MonkeyPatch) -> None:
+    duckdb = pytest.importorskip("duckdb")
+    pytest.importorskip("pyarrow")
+    (shop / "other.py").write_text(
+        "from decimal import Decimal\ndef f(a, b: Decimal, *c): return Decimal(a) + Decimal(b)\n"
+    )
+    assert run("index", ".", "-q", cwd=shop).returncode == 0
+    assert run("export", "parquet", cwd=shop).returncode == 0
+    monkeypatch.chdir(shop)
+    text = (Path(__file__).parents[2] / "docs" / "index.md").read_text(encoding="utf-8")
+    questions = dict(re.findall(r"<!-- duckdb: (.*?) -->\n```sql\n(.*?)```", text, re.DOTALL))
+    answers = {title: duckdb.sql(question).fetchall() for title, question in questions.items()}
+    assert list(answers) == [
+        "what is called most",
+        "which modules names are taken from, and by how many files",
+        "parameters that have no type hint",
+    ]
+    called, modules, unhinted = answers.values()
+    assert ("Decimal", 2) in called
+    assert ("decimal", 2) in modules
+    assert [row for row in unhinted if row[0] == "other.py"] == [("other.py", 2, "f", "a"), ("other.py", 2, "f", "c")]
+
+
 def test_tables_can_be_asked_by_sql(shop: Path) -> None:
     records = json.loads(run("stats", "--json", cwd=shop).stdout)["records"]
     assert run("export", "sqlite", cwd=shop).returncode == 0

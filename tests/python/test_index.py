@@ -484,6 +484,43 @@ def test_a_full_disk_leaves_the_old_index(tmp_path: Path) -> None:
     assert not (tmp_path / ".quillet-index.new").exists()
 
 
+def in_a_namespace(script: str, folder: Path) -> subprocess.CompletedProcess[str]:
+    """Runs a script of the shell where it may mount file systems; skips where nobody may."""
+    unshare = shutil.which("unshare")
+    if (
+        unshare is None
+        or subprocess.run([unshare, "-rm", "mount", "-t", "tmpfs", "none", folder], check=False).returncode
+    ):
+        pytest.skip("no file system can be mounted here")
+    command = [unshare, "-rm", "sh", "-ec", script, *COMMAND]
+    return subprocess.run(command, cwd=folder, env=ENVIRONMENT, capture_output=True, text=True, check=False)
+
+
+def test_a_file_system_that_fills_up_leaves_the_old_index(tmp_path: Path) -> None:
+    script = """
+        mkdir disk; mount -t tmpfs -o size=64k none disk; cd disk
+        echo 'x = 1' > a.py; "$0" "$@" index . -q; cp .quillet-index ../before
+        i=0; while [ $i -lt 12000 ]; do echo "name_$i = $i"; i=$((i + 1)); done > ../many.py
+        "$0" "$@" index . ../many.py -q && exit 9
+        cmp .quillet-index ../before; "$0" "$@" find x; ls -A"""
+    result = in_a_namespace(script, tmp_path)
+    assert result.returncode == 0, result.stderr
+    assert only_line(result.stderr).endswith("No space left on device")
+    assert result.stdout.splitlines() == ["a.py:1:1: x = 1", ".quillet-index", ".quillet-index.lock", "a.py"]
+
+
+def test_an_index_on_a_file_system_that_one_may_not_write_can_be_asked(tmp_path: Path) -> None:
+    script = """
+        mkdir disk; mount -t tmpfs none disk; cd disk
+        echo 'x = 1' > a.py; "$0" "$@" index . -q; echo 'x = 2; x' > a.py; cd ..; mount -o remount,ro disk; cd disk
+        "$0" "$@" find x; "$0" "$@" stats > /dev/null; "$0" "$@" index && exit 9
+        "$0" "$@" find x -c"""
+    result = in_a_namespace(script, tmp_path)
+    assert result.returncode == 0, result.stderr
+    assert result.stdout == "a.py:1:1: x = 2; x\na.py:1:8: x = 2; x\n2\n"
+    assert only_line(result.stderr).endswith("Read-only file system")
+
+
 # ---- what somebody else made ----
 
 
