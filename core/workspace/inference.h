@@ -210,6 +210,8 @@ class Inference {
   Entity EntityOfVariable(const SourceFile& file, uint32_t symbol);
   // The variable of a name in a module, its star imports included.
   Entities EntitiesInModule(ModuleId module, Text name, int depth = 0);
+  // The same for one of the files that say what a module holds.
+  Entities EntitiesInFile(ModuleId module, FileId file, Text name, int depth = 0);
   // Whether the language has a name of its own.
   bool IsBuiltin(Text name);
   // What an import binds, followed to where it is defined.

@@ -70,30 +70,48 @@ Binding Workspace::Impl::OtherSideOf(Binding binding) {
   std::vector<Text> path{stub->bindings.TextOf(stub->bindings.occurrences[index])};
   for (uint32_t scope = stub->bindings.ScopeOf(stub->bindings.occurrences[index]); scope != 0 && scope != kNoIndex;
        scope = stub->bindings.scopes[scope].parent) {
-    if (stub->bindings.scopes[scope].kind == NameScopeKind::kClass)
-      path.push_back(stub->bindings.texts[stub->bindings.scopes[scope].name]);
+    const NameScope& around = stub->bindings.scopes[scope];
+    if (around.kind == NameScopeKind::kClass) path.push_back(stub->bindings.texts[around.name]);
   }
-  uint32_t scope = 0;
-  for (size_t i = path.size(); i-- > 0;) {
-    uint32_t found = kNoIndex;
-    for (uint32_t symbol = source->bindings.scopes[scope].first_symbol; symbol != kNoIndex;
-         symbol = source->bindings.symbols[symbol].next) {
-      if (source->bindings.texts[source->bindings.symbols[symbol].name] != path[i]) continue;
-      for (const uint32_t at : source->occurrences().Of(symbol)) {
-        const NameKind kind = source->bindings.occurrences[at].kind;
-        if (kind != NameKind::kNone && kind != NameKind::kImport) {
-          found = at;
-          break;
+  Entities at = inference.EntitiesInFile(id, other, path.back());
+  for (size_t i = path.size() - 1; i-- > 0;) {
+    // Of a class that is there under another name as well: `C = other.C`.
+    Value value;
+    for (const Entity& entity : at.found) value = inference.types().Union(value, inference.ValueOfEntity(entity));
+    at = {};
+    for (const TypeId type : inference.types().CopyOf(value.set)) {
+      const Type t = inference.types()[type];
+      if (t.kind != TypeKind::kClass) continue;
+      if (const auto member = inference.FindMember(t.a, path[i]))
+        at.found.push_back(inference.EntityOfMember(*member, path[i]));
+    }
+  }
+  for (const Entity& entity : at.found) {
+    if (entity.kind == Entity::kModule) continue;
+    const std::vector<Binding> bindings = inference.BindingsOf(entity);
+    if (bindings.empty() || bindings.front().file == binding.file) continue;
+    // A name that stands for a class or function leads to it.
+    const SourceFile* there = Get(bindings.front().file);
+    const uint32_t occurrence = there == nullptr ? kNoIndex : there->OccurrenceBeginningAt(bindings.front().offset);
+    const NameKind kind = stub->bindings.occurrences[index].kind;
+    if (occurrence != kNoIndex && there->bindings.occurrences[occurrence].kind == NameKind::kVariable &&
+        (kind == NameKind::kClass || kind == NameKind::kFunction)) {
+      const Value value = inference.ValueOfEntity(entity);
+      for (const TypeId type : inference.types().CopyOf(value.set)) {
+        const Type t = inference.types()[type];
+        FileId file = kNoFile;
+        StmtId stmt = kModuleStmt;
+        if (t.kind == TypeKind::kClass) {
+          file = inference.InfoOf(t.a).file;
+          stmt = inference.InfoOf(t.a).stmt;
+        } else if (t.kind == TypeKind::kFunction) {
+          file = inference.function(t.a).file;
+          stmt = inference.function(t.a).stmt;
         }
+        if (stmt != kModuleStmt && Get(file) != nullptr) return {file, Get(file)->syntax.stmt(stmt).name_begin};
       }
     }
-    if (found == kNoIndex) return binding;
-    const uint32_t offset = source->bindings.occurrences[found].begin;
-    if (i == 0) return {source->id, offset};
-    const StmtId stmt = source->syntax.StatementNamedAt(offset);
-    if (stmt == kModuleStmt) return binding;
-    scope = source->ScopeOfStmt(stmt);
-    if (scope == kNoIndex) return binding;
+    return bindings.front();
   }
   return binding;
 }
@@ -141,7 +159,10 @@ std::vector<Location> Workspace::Impl::LocationsOf(const Entities& entities, boo
         found.push_back(location);
         continue;
       }
-      found.push_back(At(follows_source ? SourceOf(binding) : binding, certainty));
+      const Binding source = follows_source ? SourceOf(binding) : binding;
+      found.push_back(At(source, certainty));
+      // A stub that somebody wrote for this project is worth seeing as well.
+      if (!(source == binding) && IsProject(binding.file)) found.push_back(At(binding, certainty));
     }
   }
   return found;

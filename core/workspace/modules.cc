@@ -189,8 +189,13 @@ class Modules::Impl {
         std::string package = Join(folder, name);
         const bool has_source = folders_.HasFile(package, kPackageFile);
         const bool has_stub = folders_.HasFile(package, kPackageStub);
-        if (has_source || has_stub) {
-          if (has_source) found.file = Join(package, kPackageFile);
+        if (has_stub && !has_source && found.file.empty()) {  // its source may lie in a folder behind
+          AddStubFolder(std::move(package), found);
+          if (found.in.empty()) found.in = folder;
+          continue;
+        }
+        if (has_source) {
+          found.file = Join(package, kPackageFile);
           if (has_stub && found.stub.empty()) found.stub = Join(package, kPackageStub);
           found.is_package = true;
           found.in = folder;
@@ -202,15 +207,20 @@ class Modules::Impl {
       }
       const bool has_source = folders_.HasFile(folder, source_name);
       const bool has_stub = folders_.HasFile(folder, stub_name);
-      if (has_source || has_stub || folders_.HasCompiled(folder, name)) {
+      if (has_stub && !has_source) {
+        if (found.stub.empty()) found.stub = Join(folder, stub_name);
+        if (found.in.empty()) found.in = folder;
+        continue;
+      }
+      if (has_source || folders_.HasCompiled(folder, name)) {
         if (has_source) found.file = Join(folder, source_name);
         if (has_stub && found.stub.empty()) found.stub = Join(folder, stub_name);
-        found.is_compiled = !has_source && !has_stub;
+        found.is_compiled = !has_source && found.stub.empty();
         found.in = folder;
         return;
       }
     }
-    if (portions.empty()) return;
+    if (portions.empty() || !found.stub.empty()) return;
     found.is_package = true;
     found.sources = std::move(portions);
   }

@@ -183,7 +183,10 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
           continue;
         }
       }
-      if (meets) hits.push_back({AtOccurrence(*source, i, certainty), id, i});
+      const bool is_foreign = id != file.id && !IsProject(id);
+      if (meets &&
+          (!is_foreign || other.kind != NameKind::kNone || (other.is_attribute && other.role == NameRole::kWrite)))
+        hits.push_back({AtOccurrence(*source, i, certainty), id, i});
     }
     // Names in `__all__`.
     for (const Entity& entity : wanted.found) {

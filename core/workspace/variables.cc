@@ -163,10 +163,13 @@ const Inference::ModuleNames& Inference::NamesOfModule(const SourceFile& file) {
 }
 
 Entities Inference::EntitiesInModule(ModuleId module, Text name, int depth) {
+  return EntitiesInFile(module, FileOfModule(module), name, depth);
+}
+
+Entities Inference::EntitiesInFile(ModuleId module, FileId file_id, Text name, int depth) {
   Entities found;
   static constexpr int kMaxImports = 24;
   if (depth > kMaxImports) return found;
-  const FileId file_id = FileOfModule(module);
   const SourceFile* file = file_id == kNoFile ? nullptr : FileOf(file_id);
   if (file != nullptr) {
     const ModuleNames& names = NamesOfModule(*file);
