@@ -19,6 +19,21 @@ bool Fits(Text name, Text prefix) {
   });
 }
 
+bool EndsWithWord(Text text, Text word) {
+  while (!text.empty() && (text.back() == ' ' || text.back() == '\t')) text.remove_suffix(1);
+  return text.ends_with(word) && text.size() > word.size() && !IsNameByte(text[text.size() - word.size() - 1]);
+}
+
+// The word `import` in the head of a `from`, as a word of its own behind the module.
+size_t FindImport(Text head) {
+  for (size_t at = head.find("import"); at != Text::npos; at = head.find("import", at + 1)) {
+    const bool begins = at > 0 && (head[at - 1] == ' ' || head[at - 1] == '\t' || head[at - 1] == '.');
+    const bool ends = at + 6 >= head.size() || !IsNameByte(head[at + 6]);
+    if (begins && ends && (at + 6 == head.size() || head[at + 6] != '.')) return at;
+  }
+  return Text::npos;
+}
+
 constexpr std::array kKeywords{"False", "None",     "True",  "and",    "as",   "assert", "async",  "await",    "break",
                                "class", "continue", "def",   "del",    "elif", "else",   "except", "finally",  "for",
                                "from",  "global",   "if",    "import", "in",   "is",     "lambda", "nonlocal", "not",
@@ -79,9 +94,10 @@ void Workspace::Impl::AddMembers(Value receiver, Text prefix, std::vector<Comple
       for (const auto& [name, symbol] : info.symbols) symbols.emplace_back(symbol, name);
       std::ranges::sort(symbols);
       for (const auto& [symbol, name] : symbols) add(name, KindOfSymbol(*file, symbol, true), info.name);
-      if (!on_class || true) {
+      {
         std::vector<std::pair<uint32_t, Text>> written;
-        for (const auto& [name, offsets] : info.self_attributes) written.emplace_back(offsets.front(), name);
+        for (const auto& [name, offsets] : info.self_attributes)
+          if (!on_class || info.class_written.contains(name)) written.emplace_back(offsets.front(), name);
         std::ranges::sort(written);
         for (const auto& [offset, name] : written) add(name, "attribute", info.name);
       }
@@ -148,7 +164,7 @@ void Workspace::Impl::AddModuleNames(ModuleId module, Text prefix, std::vector<C
         if (occurrence.kind != NameKind::kImport) is_re_export = true;
       }
       if (!binds || (is_import && !is_re_export) || (at != module && name.starts_with('_'))) continue;
-      if (!with_private && name.starts_with('_') && prefix.empty()) continue;
+      if (!with_private && name.starts_with('_') && (prefix.empty() || prefix == "_")) continue;
       seen.insert(std::string(name));
       found.push_back(
           {std::string(name), KindOfSymbol(*file, symbol, false), modules[at].name, {}, Certainty::kCertain});
@@ -167,9 +183,31 @@ void Workspace::Impl::AddModuleNames(ModuleId module, Text prefix, std::vector<C
       if (other != kNoModule) pending.push_back(other);
     }
   }
+  const Module& own = modules[module];
+  if (own.stub != kNoFile && own.file != kNoFile && IsProject(own.file))
+    AddNamesOfFile(own.file, own.name, prefix, found, seen);
+  if (with_private) {
+    for (const Text name : {Text("__doc__"), Text("__file__"), Text("__name__"), Text("__package__")})
+      if (Fits(name, prefix) && seen.insert(std::string(name)).second)
+        found.push_back({std::string(name), "variable", own.name, {}, Certainty::kCertain});
+  }
   for (std::string& name : modules.ChildNames(module))
     if (Fits(name, prefix) && seen.insert(name).second)
       found.push_back({std::move(name), "module", {}, {}, Certainty::kCertain});
+}
+
+void Workspace::Impl::AddNamesOfFile(FileId id, Text module, Text prefix, std::vector<Completion>& found,
+                                     std::unordered_set<std::string>& seen) {
+  const SourceFile* file = Get(id);
+  if (file == nullptr) return;
+  const Bindings& bindings = file->bindings;
+  for (uint32_t symbol = bindings.scopes[0].first_symbol; symbol != kNoIndex; symbol = bindings.symbols[symbol].next) {
+    const Text name = bindings.texts[bindings.symbols[symbol].name];
+    if (!Fits(name, prefix) || !Bindings::IsBound(bindings.symbols[symbol])) continue;
+    if (seen.insert(std::string(name)).second)
+      found.push_back(
+          {std::string(name), KindOfSymbol(*file, symbol, false), std::string(module), {}, Certainty::kCertain});
+  }
 }
 
 void Workspace::Impl::AddModules(ModuleId package, Text prefix, std::vector<Completion>& found) {
@@ -198,8 +236,7 @@ void Workspace::Impl::AddNames(const SourceFile& file, uint32_t offset, Text pre
       found.push_back({std::string(name), KindOfSymbol(file, symbol, false), {}, {}, Certainty::kCertain});
     }
   }
-  for (const StmtId stmt : {kModuleStmt}) {
-    (void)stmt;
+  {
     for (StmtId id = 1; id < file.syntax.stmts.size(); ++id) {
       const auto exprs = file.syntax.ExprsOf(file.syntax.stmt(id));
       if (file.syntax.stmt(id).kind != StmtKind::kFromImport || exprs.size() < 2 ||
@@ -214,29 +251,75 @@ void Workspace::Impl::AddNames(const SourceFile& file, uint32_t offset, Text pre
       if (other != kNoModule) AddModuleNames(other, prefix, found, false);
     }
   }
+  for (const Text name : {Text("__doc__"), Text("__file__"), Text("__name__"), Text("__package__")})
+    if (prefix.starts_with("__") && Fits(name, prefix) && seen.insert(std::string(name)).second)
+      found.push_back({std::string(name), "variable", {}, {}, Certainty::kCertain});
   const ModuleId builtins = modules.Find("builtins");
-  if (builtins != kNoModule) AddModuleNames(builtins, prefix, found, !prefix.empty());
+  if (builtins != kNoModule) AddModuleNames(builtins, prefix, found, false);
+}
+
+// Whether a name that is being typed is one that the place itself gives.
+Workspace::Impl::NewName Workspace::Impl::NewNameAt(const SourceFile& file, uint32_t begin) {
+  const FileSyntax& syntax = file.syntax;
+  Text head = file.text().substr(0, begin);
+  head = head.substr(head.find_last_of("\n\r") + 1);
+  if (EndsWithWord(" " + std::string(head), "def")) {
+    return file.bindings.scopes[file.ScopeAt(begin)].kind == NameScopeKind::kClass ? NewName::kMethod : NewName::kOther;
+  }
+  if (EndsWithWord(" " + std::string(head), "class") || EndsWithWord(" " + std::string(head), "as"))
+    return NewName::kOther;
+  const ExprId named = syntax.NamedAt(begin);
+  if (named != kNoExpr && syntax[named].kind == ExprKind::kParameter) return NewName::kOther;
+  return NewName::kNone;
+}
+
+bool Workspace::Impl::IsInBrackets(const SourceFile& file, uint32_t offset) {
+  int depth = 0;
+  const Text text = file.text();
+  const StmtId stmt = file.syntax.StatementAt(offset > 0 ? offset - 1 : 0);
+  for (uint32_t at = file.syntax.stmt(stmt).begin; at < offset && at < text.size(); ++at) {
+    if (text[at] == '(' || text[at] == '[' || text[at] == '{') ++depth;
+    if (text[at] == ')' || text[at] == ']' || text[at] == '}') --depth;
+  }
+  return stmt != kModuleStmt && depth > 0;
 }
 
 void Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text prefix,
                                   std::vector<Completion>& found) {
-  // The parameters of the call in whose brackets the place lies.
+  // The parameters of the call in whose brackets the place lies, without those that are given.
   const FileSyntax& syntax = file.syntax;
+  const auto begin = offset - static_cast<uint32_t>(prefix.size());
   ExprId expr = syntax.ExpressionAt(offset);
-  ExprId inner = kNoExpr;
-  while (expr != kNoExpr && syntax[expr].kind != ExprKind::kCall) {
-    inner = expr;
+  while (expr != kNoExpr && (syntax[expr].kind != ExprKind::kCall || begin <= syntax[syntax.ChildOf(expr, 0)].end))
     expr = syntax[expr].parent;
+  if (expr == kNoExpr) return;
+  size_t positions = 0;
+  std::unordered_set<Text> given;
+  for (const ExprId argument : syntax.ChildrenOf(expr).subspan(1)) {
+    const Expr& at = syntax[argument];
+    if (at.begin <= begin && begin <= at.end) {
+      // In the value of a keyword, or inside of an expression, none can begin.
+      if (at.begin != begin) return;
+      continue;
+    }
+    if (at.kind == ExprKind::kKeyword) {
+      given.insert(syntax.NameOf(argument));
+    } else if (at.kind != ExprKind::kMissing && at.end < begin) {
+      ++positions;
+    }
   }
-  if (expr == kNoExpr || inner == syntax.ChildOf(expr, 0) || offset <= syntax[syntax.ChildOf(expr, 0)].end) return;
-  if (inner != kNoExpr && syntax[inner].kind != ExprKind::kName && syntax[inner].kind != ExprKind::kMissing) return;
   const auto add = [&](FunctionId function, bool is_bound) {
     const FunctionInfo info = inference.function(function);
     const SourceFile* source = Get(info.file);
     const auto parameters = inference.ParametersOf(info);
+    bool is_keyword_only = false;
+    size_t position = 0;
     for (size_t i = is_bound ? 1 : 0; i < parameters.size(); ++i) {
-      if (source->syntax[parameters[i]].op != static_cast<uint8_t>(ParameterKind::kPlain)) continue;
+      const auto kind = static_cast<ParameterKind>(source->syntax[parameters[i]].op);
+      if (kind == ParameterKind::kStar || kind == ParameterKind::kBareStar) is_keyword_only = true;
+      if (kind != ParameterKind::kPlain) continue;
       const Text name = source->syntax.NameOf(parameters[i]);
+      if ((!is_keyword_only && position++ < positions) || given.contains(name)) continue;
       if (!name.empty() && Fits(name, prefix))
         found.push_back(
             {std::string(name) + "=", "parameter", TextOfParameter(info, i, true), {}, Certainty::kCertain});
@@ -291,7 +374,8 @@ std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
       text.substr(at.begin, begin - at.begin).find_first_of("\n;") == Text::npos) {
     const auto exprs = syntax.ExprsOf(at);
     const Text head = text.substr(at.begin, begin - at.begin);
-    const size_t behind_import = at.kind == StmtKind::kFromImport ? head.find(" import") : Text::npos;
+    const size_t behind_import = at.kind == StmtKind::kFromImport ? FindImport(head) : Text::npos;
+    if (EndsWithWord(head, "as")) return found;  // a name of one's own
     if (at.kind == StmtKind::kFromImport && behind_import != Text::npos) {
       const ExprId path = exprs.empty() ? kNoExpr : exprs[0];
       if (path == kNoExpr) return found;
@@ -351,10 +435,36 @@ std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
         offset > syntax[expr].begin && (syntax[expr].op & (kStringFormatted | kStringTemplate)) == 0 &&
         offset < syntax[expr].end)
       return found;
+    switch (in.NewNameAt(*file, begin)) {
+      case Impl::NewName::kMethod: {  // one that a base has
+        const ClassId cls = in.inference.ClassOfScope(*file, file->ScopeAt(begin));
+        if (cls == kNoId) return found;
+        std::vector<Completion> members;
+        const std::vector<BaseClass> bases = in.inference.InfoOf(cls).bases;
+        for (const BaseClass& base : bases)
+          in.AddMembers(in.inference.Just(in.inference.InstanceOf(base.cls)), prefix, members);
+        for (Completion& member : members)
+          if (member.kind == "method" || member.kind == "property") found.push_back(std::move(member));
+        return found;
+      }
+      case Impl::NewName::kOther:
+        return found;
+      case Impl::NewName::kNone:
+        break;
+    }
+    if (const ExprId value = syntax.ExpressionAt(before); prefix.empty() && before < offset && value != kNoExpr &&
+                                                          syntax[value].kind == ExprKind::kNumber &&
+                                                          syntax[value].end == before) {
+      for (const Text keyword : {Text("and"), Text("if"), Text("in"), Text("is"), Text("not"), Text("or")})
+        found.push_back({std::string(keyword), "keyword", {}, {}, Certainty::kCertain});
+      return found;
+    }
+    const bool is_inside = in.IsInBrackets(*file, begin);
     in.AddKeywords(*file, offset, prefix, found);
     in.AddNames(*file, offset, prefix, found);
     for (const Text keyword : kKeywords)
-      if (Fits(keyword, prefix)) found.push_back({std::string(keyword), "keyword", {}, {}, Certainty::kCertain});
+      if (Fits(keyword, prefix) && !(is_inside && OnlyBeginsStatement(CodeOfText(keyword))))
+        found.push_back({std::string(keyword), "keyword", {}, {}, Certainty::kCertain});
   }
   // What begins exactly so first; private names last; otherwise in the order in which they were found, the nearest
   // first.

@@ -163,7 +163,15 @@ const Inference::ModuleNames& Inference::NamesOfModule(const SourceFile& file) {
 }
 
 Entities Inference::EntitiesInModule(ModuleId module, Text name, int depth) {
-  return EntitiesInFile(module, FileOfModule(module), name, depth);
+  Entities found = EntitiesInFile(module, FileOfModule(module), name, depth);
+  if (!found.found.empty()) return found;
+  // What a stub leaves out its source may have.
+  const Module& own = modules_[module];
+  if (own.stub != kNoFile && own.file != kNoFile) found = EntitiesInFile(module, own.file, name, depth);
+  if (!found.found.empty()) return found;
+  const ModuleId child = modules_.Child(module, name);
+  if (child != kNoModule) found.found.push_back({Entity::kModule, child, 0});
+  return found;
 }
 
 Entities Inference::EntitiesInFile(ModuleId module, FileId file_id, Text name, int depth) {
@@ -214,10 +222,7 @@ Entities Inference::EntitiesInFile(ModuleId module, FileId file_id, Text name, i
       Entities starred = EntitiesInModule(source, name, depth + 1);
       if (!starred.found.empty()) found.found = std::move(starred.found);
     }
-    if (!found.found.empty()) return found;
   }
-  const ModuleId child = modules_.Child(module, name);
-  if (child != kNoModule) found.found.push_back({Entity::kModule, child, 0});
   return found;
 }
 

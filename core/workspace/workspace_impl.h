@@ -71,6 +71,11 @@ class Workspace::Impl final : public CallerSource {
   void AddModules(ModuleId package, Text prefix, std::vector<Completion>& found);
   void AddModuleNames(ModuleId module, Text prefix, std::vector<Completion>& found, bool with_private);
   void AddKeywords(const SourceFile& file, uint32_t offset, Text prefix, std::vector<Completion>& found);
+  void AddNamesOfFile(FileId file, Text module, Text prefix, std::vector<Completion>& found,
+                      std::unordered_set<std::string>& seen);
+  enum class NewName : uint8_t { kNone, kMethod, kOther };
+  NewName NewNameAt(const SourceFile& file, uint32_t begin);
+  bool IsInBrackets(const SourceFile& file, uint32_t offset);
   std::string KindOfSymbol(const SourceFile& file, uint32_t symbol, bool in_class);
 
   // ---- calls ----
