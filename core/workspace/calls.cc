@@ -37,10 +37,24 @@ std::vector<Argument> Inference::ArgumentsOf(const SourceFile& file, std::span<c
         argument.is_evaluated = true;
         break;
       }
-      case ExprKind::kDoubleStarred:
+      case ExprKind::kDoubleStarred: {
         argument.kind = Argument::kDoubleStar;
         argument.place.expr = file.syntax.ChildOf(expr, 0);
+        const Value items = ValueOf(file.id, argument.place.expr, frame);
+        const std::vector<std::pair<Text, Value>> entries = types_.SizeOf(items.set) == 1
+                                                                ? EntriesOf(types_.TypesOf(items.set)[0])
+                                                                : std::vector<std::pair<Text, Value>>();
+        for (const auto& [name, value] : entries) {
+          Argument item;
+          item.kind = Argument::kKeyword;
+          item.name = name;
+          item.value = value;
+          item.is_evaluated = true;
+          arguments.push_back(std::move(item));
+        }
+        if (!entries.empty()) continue;
         break;
+      }
       default:
         break;
     }
@@ -410,7 +424,23 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
         given[i] = is_exact ? Just(types_.Add(TypeKind::kTuple, 0, 0, items))
                             : InstanceNamed("builtins", "tuple", {given[i].set});
       } else if (kind_of(i) == ParameterKind::kDoubleStar && is_given[i]) {
-        given[i] = InstanceNamed("builtins", "dict", {InstanceNamed("builtins", "str").set, given[i].set});
+        // What each keyword was given is remembered by its name.
+        std::string entries = "#";
+        for (Argument& argument : arguments) {
+          if (argument.kind != Argument::kKeyword) continue;
+          const bool is_own = std::ranges::any_of(parameters, [&](ExprId parameter) {
+            return syntax[parameter].op == static_cast<uint8_t>(ParameterKind::kPlain) &&
+                   syntax.NameOf(parameter) == argument.name;
+          });
+          if (is_own) continue;
+          entries += argument.name;
+          entries += ':';
+          entries += std::to_string(ValueOfArgument(argument).set);
+          entries += ';';
+        }
+        const ClassId dict = ClassNamed("builtins", "dict");
+        const TypeSetId args[] = {InstanceNamed("builtins", "str").set, given[i].set};
+        given[i] = Just(types_.Add(TypeKind::kInstance, dict, LiteralNumber(entries), args));
       } else if (!is_given[i] && kind_of(i) == ParameterKind::kPlain && syntax.ChildOf(parameters[i], 1) != kNoExpr) {
         given[i] = ValueOf(info.file, syntax.ChildOf(parameters[i], 1));
       }

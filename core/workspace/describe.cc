@@ -277,7 +277,14 @@ ExprId Workspace::Impl::ExpressionClosedAt(const SourceFile& file, uint32_t offs
   if (offset >= text.size() || (text[offset] != ')' && text[offset] != ']' && text[offset] != '}')) return kNoExpr;
   ExprId expr = file.syntax.ExpressionAt(offset + 1);
   while (expr != kNoExpr && file.syntax[expr].end <= offset) expr = file.syntax[expr].parent;
-  return expr != kNoExpr && file.syntax[expr].end == offset + 1 ? expr : kNoExpr;
+  if (expr != kNoExpr && file.syntax[expr].end == offset + 1) return expr;
+  // Round brackets are no part of what they hold.
+  uint32_t at = offset;
+  while (at > 0 && (text[at] == ')' || text[at] == ' ')) --at;
+  expr = file.syntax.ExpressionAt(at + 1);
+  while (expr != kNoExpr && file.syntax[expr].end == at + 1 && (file.syntax[expr].flags & kParenthesized) == 0)
+    expr = file.syntax[expr].parent;
+  return expr != kNoExpr && file.syntax[expr].end == at + 1 ? expr : kNoExpr;
 }
 
 std::vector<std::string> Workspace::Types(FileId id, uint32_t offset) {

@@ -445,6 +445,15 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
           }
         }
       }
+      if (literal.starts_with('#') && !IsNone(literal_key)) {
+        Value entry;
+        for (const auto& [name, given] : EntriesOf(id))
+          if (name == unquoted(literal_key)) entry = given;
+        if (entry.IsKnown()) {
+          value = types_.Union(value, entry);
+          continue;
+        }
+      }
       ClassInfo& info = InfoOf(t.a);
       if (info.is_typed_dict && !IsNone(literal_key)) {
         const Value field = AttributeOfType(id, Text(*owned_names_[NumberOfName(unquoted(literal_key))]));
@@ -465,6 +474,39 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
   }
   if (!value.IsKnown()) value.doubt |= Value::kOpen;
   return value;
+}
+
+std::vector<std::pair<Text, Value>> Inference::EntriesOf(TypeId dict) {
+  std::vector<std::pair<Text, Value>> entries;
+  const Text literal = LiteralOf(types_[dict]);
+  const auto to_number = [](Text text) {
+    uint32_t number = 0;
+    for (const char c : text) number = number * 10 + static_cast<uint32_t>(c - '0');
+    return number;
+  };
+  if (literal.starts_with('#')) {
+    for (size_t begin = 1; begin < literal.size();) {
+      const size_t colon = literal.find(':', begin), end = literal.find(';', begin);
+      entries.emplace_back(literal.substr(begin, colon - begin),
+                           Value{to_number(literal.substr(colon + 1, end - colon - 1)), 0});
+      begin = end + 1;
+    }
+  } else if (literal.starts_with('@')) {
+    const size_t first = literal.find(':'), second = literal.find(':', first + 1);
+    const FileId file = to_number(literal.substr(1, first - 1));
+    const ExprId display = to_number(literal.substr(first + 1, second - first - 1));
+    const FrameId frame = to_number(literal.substr(second + 1));
+    const SourceFile* source = FileOf(file);
+    if (source == nullptr || source->syntax[display].kind != ExprKind::kDict) return entries;
+    const auto children = source->syntax.ChildrenOf(display);
+    for (size_t i = 0; i + 1 < children.size(); i += 2) {
+      if (source->syntax[children[i]].kind != ExprKind::kString) continue;
+      Text key = source->syntax.TextOf(source->syntax[children[i]]);
+      while (!key.empty() && key.front() != '\'' && key.front() != '"') key.remove_prefix(1);
+      if (key.size() > 2) entries.emplace_back(key.substr(1, key.size() - 2), ValueOf(file, children[i + 1], frame));
+    }
+  }
+  return entries;
 }
 
 Value Inference::EvaluateSubscript(const SourceFile& file, ExprId expr, FrameId frame) {
@@ -615,7 +657,8 @@ Value Inference::WithoutFalse(Value value, bool keeps_false) {
     bool is_surely_true = t.kind == TypeKind::kModule || t.kind == TypeKind::kClass || t.kind == TypeKind::kFunction;
     bool is_surely_false = t.kind == TypeKind::kNone;
     const Text literal = LiteralOf(t);
-    if (t.kind == TypeKind::kInstance && !literal.empty() && !literal.starts_with('@') && !classes_[t.a].is_enum) {
+    if (t.kind == TypeKind::kInstance && !literal.empty() && !literal.starts_with('@') && !literal.starts_with('#') &&
+        !classes_[t.a].is_enum) {
       const bool is_false = literal == "False" || literal == "0" || literal == "''" || literal == "\"\"";
       (is_false ? is_surely_false : is_surely_true) = true;
     }

@@ -1,6 +1,7 @@
 // Parameters and results of functions.
 #include <algorithm>
 
+#include "workspace/flow.h"
 #include "workspace/inference.h"
 #include "workspace/remembered.h"
 
@@ -145,6 +146,48 @@ Value Inference::StatedResult(FunctionId id, FrameId frame, bool& is_stated) {
   return value;
 }
 
+// Whether a statement runs in every call of its function in a frame: 1, in none: 0; otherwise -1.
+int Inference::IsReached(const SourceFile& file, StmtId stmt, StmtId function, FrameId frame) {
+  const FileSyntax& syntax = file.syntax;
+  bool is_sure = true;
+  const auto truth_of = [&](StmtId clause) {
+    const auto exprs = syntax.ExprsOf(syntax.stmt(clause));
+    return exprs.empty() ? -1 : TruthIn(file, exprs[0], frame);
+  };
+  for (; stmt != function && stmt != kModuleStmt; stmt = syntax.stmt(stmt).parent) {
+    switch (syntax.stmt(stmt).kind) {
+      case StmtKind::kIf:
+      case StmtKind::kElif:
+      case StmtKind::kElse: {
+        if (syntax.stmt(stmt).kind != StmtKind::kElse) {
+          const int truth = truth_of(stmt);
+          if (truth == 0) return 0;
+          is_sure = is_sure && truth == 1;
+        }
+        for (StmtId at = stmt; ContinuesChain(syntax.stmt(at).kind);) {
+          at = syntax.stmt(at).previous;
+          const StmtKind kind = syntax.stmt(at).kind;
+          if (at == kModuleStmt) break;
+          if (kind != StmtKind::kIf && kind != StmtKind::kElif) {
+            is_sure = false;  // the `else` of a loop or of a `try`
+            break;
+          }
+          const int truth = truth_of(at);
+          if (truth == 1) return 0;
+          is_sure = is_sure && truth == 0;
+        }
+        break;
+      }
+      case StmtKind::kReturn:
+      case StmtKind::kWith:
+        break;
+      default:
+        is_sure = false;
+    }
+  }
+  return is_sure ? 1 : -1;
+}
+
 Value Inference::ReturnedIn(FunctionId id, FrameId frame) {
   const FunctionInfo info = functions_[id];
   const SourceFile* file = FileOf(info.file);
@@ -158,7 +201,9 @@ Value Inference::ReturnedIn(FunctionId id, FrameId frame) {
   Value value;
   bool has_return = false, raises_only = false;
   StmtId skipped_to = kModuleStmt;
-  for (StmtId stmt = info.stmt + 1; stmt < syntax.stmts.size() && syntax.stmt(stmt).begin < own.block_end; ++stmt) {
+  bool is_over = false;
+  for (StmtId stmt = info.stmt + 1; stmt < syntax.stmts.size() && syntax.stmt(stmt).begin < own.block_end && !is_over;
+       ++stmt) {
     const Stmt& at = syntax.stmt(stmt);
     if (skipped_to != kModuleStmt && at.begin < syntax.stmt(skipped_to).block_end) continue;
     if (at.kind == StmtKind::kDef || at.kind == StmtKind::kClass) {
@@ -170,6 +215,9 @@ Value Inference::ReturnedIn(FunctionId id, FrameId frame) {
       raises_only = !exprs.empty() && syntax.TextOf(syntax[exprs[0]]).starts_with("NotImplemented");
     }
     if (at.kind != StmtKind::kReturn || !IsReachable(*file, stmt)) continue;
+    const int reached = IsReached(*file, stmt, info.stmt, frame);
+    if (reached == 0) continue;
+    is_over = reached == 1;  // nothing behind it runs
     const auto exprs = syntax.ExprsOf(at);
     has_return = true;
     value = types_.Union(value, exprs.empty() ? NoneValue() : ValueOf(info.file, exprs[0], frame));

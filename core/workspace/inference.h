@@ -306,6 +306,8 @@ class Inference {
   Value WithoutLiterals(Value value);
   Value CallMethod(Value receiver, Text name, std::initializer_list<Value> arguments, bool* has_method = nullptr);
   uint32_t LiteralNumber(Text text);
+  // What a display that a value came from, or the keywords of a call, have for each key: name, value.
+  std::vector<std::pair<Text, Value>> EntriesOf(TypeId dict);
   Value LiteralValue(Text cls, Text text);
 
   // ---- variables.cc ----
@@ -330,6 +332,8 @@ class Inference {
   Value Narrowed(const SourceFile& file, ExprId expr, Value value, FrameId frame);
   // -1 where it is not known before the program runs.
   int StaticTruth(const SourceFile& file, ExprId condition);
+  // The same by what parameters are in a frame.
+  int TruthIn(const SourceFile& file, ExprId condition, FrameId frame);
 
   // ---- classes.cc ----
   void FindBases(ClassId cls);
@@ -360,6 +364,7 @@ class Inference {
   Value ResultIn(FunctionId function, FrameId frame);
   Value StatedResult(FunctionId function, FrameId frame, bool& is_stated);
   Value ReturnedIn(FunctionId function, FrameId frame);
+  int IsReached(const SourceFile& file, StmtId stmt, StmtId function, FrameId frame);
   Value YieldedIn(FunctionId function, FrameId frame);
   Value GuessedParameter(FunctionId function, size_t index);
   Value SelfOf(const FunctionInfo& info);

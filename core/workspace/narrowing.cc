@@ -297,6 +297,68 @@ Value Inference::Narrowed(const SourceFile& file, ExprId expr, Value value, Fram
   return value;
 }
 
+int Inference::TruthIn(const SourceFile& file, ExprId condition, FrameId frame) {
+  const int always = StaticTruth(file, condition);
+  if (always >= 0 || frame == kNoFrame || condition == kNoExpr) return always;
+  const FileSyntax& syntax = file.syntax;
+  const Expr& e = syntax[condition];
+  switch (e.kind) {
+    case ExprKind::kUnary: {
+      const int inner = e.op == word::kNot ? TruthIn(file, syntax.ChildOf(condition, 0), frame) : -1;
+      return inner < 0 ? -1 : 1 - inner;
+    }
+    case ExprKind::kBoolean: {
+      const int left = TruthIn(file, syntax.ChildOf(condition, 0), frame);
+      const int right = TruthIn(file, syntax.ChildOf(condition, 1), frame);
+      if (e.op == word::kAnd) return left == 0 || right == 0 ? 0 : left == 1 && right == 1 ? 1 : -1;
+      return left == 1 || right == 1 ? 1 : left == 0 && right == 0 ? 0 : -1;
+    }
+    case ExprKind::kCompare: {
+      if (e.children_count != 2) return -1;
+      const auto op = static_cast<CompareOperator>(e.op);
+      const ExprId right = syntax.ChildOf(condition, 1);
+      const bool is_none =
+          syntax[right].kind == ExprKind::kConstant && syntax[right].op == static_cast<uint8_t>(ConstantValue::kNone);
+      if (!is_none || (op != CompareOperator::kIs && op != CompareOperator::kIsNot)) return -1;
+      const Value value = ValueOf(file.id, syntax.ChildOf(condition, 0), frame);
+      if (!value.IsKnown() || value.doubt != 0) return -1;
+      size_t nones = 0;
+      for (const TypeId id : types_.CopyOf(value.set)) nones += types_[id].kind == TypeKind::kNone;
+      if (nones != 0 && nones != types_.SizeOf(value.set)) return -1;
+      return (nones != 0) == (op == CompareOperator::kIs) ? 1 : 0;
+    }
+    case ExprKind::kCall: {
+      const auto children = syntax.ChildrenOf(condition);
+      if (children.size() != 3 || syntax.TextOf(syntax[children[0]]) != "isinstance") return -1;
+      const Value value = ValueOf(file.id, children[1], frame);
+      if (!value.IsKnown() || value.doubt != 0) return -1;
+      std::vector<ClassId> wanted;
+      const Value classes = ValueOf(file.id, children[2], frame);
+      for (const TypeId id : types_.CopyOf(classes.set)) {
+        if (types_[id].kind == TypeKind::kClass) {
+          wanted.push_back(types_[id].a);
+        } else if (types_[id].kind == TypeKind::kTuple) {
+          for (size_t i = 0; i < types_[id].args_count; ++i)
+            for (const TypeId item : types_.CopyOf(types_.ArgOf(id, i)))
+              if (types_[item].kind == TypeKind::kClass) wanted.push_back(types_[item].a);
+        } else {
+          return -1;
+        }
+      }
+      if (wanted.empty() || classes.doubt != 0) return -1;
+      size_t are = 0;
+      for (const TypeId id : types_.CopyOf(value.set)) {
+        const ClassId own = ClassOfType(id);
+        if (own == kNoId || InfoOf(own).is_open) return -1;
+        are += std::ranges::any_of(wanted, [&](ClassId cls) { return IsSubclass(own, cls); });
+      }
+      return are == types_.SizeOf(value.set) ? 1 : are == 0 ? 0 : -1;
+    }
+    default:
+      return -1;
+  }
+}
+
 int Inference::StaticTruth(const SourceFile& file, ExprId condition) {
   const FileSyntax& syntax = file.syntax;
   if (condition == kNoExpr) return -1;
@@ -307,7 +369,7 @@ int Inference::StaticTruth(const SourceFile& file, ExprId condition) {
     case ExprKind::kConstant:
       return e.op == static_cast<uint8_t>(ConstantValue::kTrue) ? 1 : 0;
     case ExprKind::kNumber:
-      return text == "0" ? 0 : text == "1" ? 1 : -1;
+      return text.find_first_not_of("0.") == Text::npos ? 0 : 1;
     case ExprKind::kName:
     case ExprKind::kAttribute:
       if (text == "TYPE_CHECKING" || text == "typing.TYPE_CHECKING" || text == "t.TYPE_CHECKING") return 1;

@@ -78,8 +78,18 @@ std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
   static constexpr size_t kMaxFiles = 24;
   static constexpr size_t kMaxCalls = 64;
   const SourceFile* own = Get(function.file);
-  if (own == nullptr || function.lambda != kNoExpr || own->is_stub) return {};
-  Text name = own->syntax.NameOf(own->syntax.stmt(function.stmt));
+  if (own == nullptr || own->is_stub) return {};
+  Text name;
+  if (function.lambda != kNoExpr) {  // by the name that it is given
+    const Stmt& stmt = own->syntax.stmt(own->syntax.StatementOf(function.lambda));
+    const auto exprs = own->syntax.ExprsOf(stmt);
+    if (stmt.kind != StmtKind::kAssign || exprs.size() != 2 || exprs[1] != function.lambda) return {};
+    name = own->syntax[exprs[0]].kind == ExprKind::kName ? own->syntax.TextOf(own->syntax[exprs[0]])
+                                                         : own->syntax.NameOf(exprs[0]);
+  } else {
+    name = own->syntax.NameOf(own->syntax.stmt(function.stmt));
+  }
+  if (name.empty()) return {};
   if (name.starts_with("__") && name.ends_with("__")) {
     if ((name != "__init__" && name != "__new__") || function.cls == kNoId) return {};
     name = inference.MembersOf(function.cls).name;

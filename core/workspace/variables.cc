@@ -586,12 +586,28 @@ Value Inference::Unpack(const SourceFile& file, ExprId target, ExprId root, Valu
     for (size_t i = 0; i < targets.size(); ++i)
       if (syntax[targets[i]].kind == ExprKind::kStarred) star = i;
     // A display of as many items gives each target its own.
-    if (source.expr != kNoExpr && star == SIZE_MAX &&
+    if (source.expr != kNoExpr &&
         (syntax[source.expr].kind == ExprKind::kTuple || syntax[source.expr].kind == ExprKind::kList)) {
       const auto items = syntax.ChildrenOf(source.expr);
       const bool has_star =
           std::ranges::any_of(items, [&](ExprId item) { return syntax[item].kind == ExprKind::kStarred; });
-      if (items.size() == targets.size() && !has_star) {
+      if (star != SIZE_MAX && !has_star && items.size() + 1 >= targets.size() &&
+          syntax[source.expr].kind == ExprKind::kList) {
+        const size_t behind = targets.size() - star - 1;
+        if (index != star) {
+          source.expr = items[index < star ? index : items.size() + index - targets.size()];
+          value = ValueOf(file.id, source.expr, frame);
+        } else {
+          Value rest;
+          for (size_t i = star; i + behind < items.size(); ++i)
+            rest = types_.Union(rest, ValueOf(file.id, items[i], frame));
+          value = InstanceNamed("builtins", "list", {WithoutLiterals(rest).set});
+          source.expr = kNoExpr;
+        }
+        container = child;
+        continue;
+      }
+      if (items.size() == targets.size() && !has_star && star == SIZE_MAX) {
         source.expr = items[index];
         value = ValueOf(file.id, source.expr, frame);
         container = child;
