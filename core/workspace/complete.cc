@@ -284,7 +284,7 @@ bool Workspace::Impl::IsInBrackets(const SourceFile& file, uint32_t offset) {
   return stmt != kModuleStmt && depth > 0;
 }
 
-void Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text prefix,
+bool Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text prefix,
                                   std::vector<Completion>& found) {
   // The parameters of the call in whose brackets the place lies, without those that are given.
   const FileSyntax& syntax = file.syntax;
@@ -292,38 +292,49 @@ void Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text 
   ExprId expr = syntax.ExpressionAt(offset);
   while (expr != kNoExpr && (syntax[expr].kind != ExprKind::kCall || begin <= syntax[syntax.ChildOf(expr, 0)].end))
     expr = syntax[expr].parent;
-  if (expr == kNoExpr) return;
+  if (expr == kNoExpr) return false;
   size_t positions = 0;
+  bool has_star = false;
   std::unordered_set<Text> given;
   for (const ExprId argument : syntax.ChildrenOf(expr).subspan(1)) {
     const Expr& at = syntax[argument];
     if (at.begin <= begin && begin <= at.end) {
       // In the value of a keyword, or inside of an expression, none can begin.
-      if (at.begin != begin) return;
+      if (at.begin != begin) return false;
       continue;
     }
-    if (at.kind == ExprKind::kKeyword) {
+    if (at.kind == ExprKind::kKeyword && at.end < begin) {
       given.insert(syntax.NameOf(argument));
     } else if (at.kind != ExprKind::kMissing && at.end < begin) {
       ++positions;
+      has_star = has_star || at.kind == ExprKind::kStarred;
     }
   }
+  bool is_full = true, is_any = false;
   const auto add = [&](FunctionId function, bool is_bound) {
     const FunctionInfo info = inference.function(function);
     const SourceFile* source = Get(info.file);
     const auto parameters = inference.ParametersOf(info);
     bool is_keyword_only = false;
-    size_t position = 0;
+    size_t position = 0, first_keyword = 0;
+    for (size_t i = 0; i < parameters.size(); ++i)
+      if (source->syntax[parameters[i]].op == static_cast<uint8_t>(ParameterKind::kSlash)) first_keyword = i;
+    bool takes_more = has_star;
     for (size_t i = is_bound ? 1 : 0; i < parameters.size(); ++i) {
       const auto kind = static_cast<ParameterKind>(source->syntax[parameters[i]].op);
       if (kind == ParameterKind::kStar || kind == ParameterKind::kBareStar) is_keyword_only = true;
+      if (kind == ParameterKind::kStar) takes_more = true;
       if (kind != ParameterKind::kPlain) continue;
       const Text name = source->syntax.NameOf(parameters[i]);
-      if ((!is_keyword_only && position++ < positions) || given.contains(name)) continue;
+      if (!is_keyword_only && position++ < positions) continue;
+      if (!is_keyword_only && !given.contains(name)) takes_more = true;
+      if (given.contains(name) || i < first_keyword) continue;
       if (!name.empty() && Fits(name, prefix))
         found.push_back(
             {std::string(name) + "=", "parameter", TextOfParameter(info, i, true), {}, Certainty::kCertain});
     }
+    is_full = is_full && !takes_more;
+    is_any = true;
   };
   const Value callee = inference.ValueOf(file.id, syntax.ChildOf(expr, 0));
   const auto add_all = [&](Value value, bool is_bound) {
@@ -345,6 +356,7 @@ void Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text 
       }
     }
   }
+  return is_any && is_full;
 }
 
 std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
@@ -460,7 +472,7 @@ std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
       return found;
     }
     const bool is_inside = in.IsInBrackets(*file, begin);
-    in.AddKeywords(*file, offset, prefix, found);
+    if (in.AddKeywords(*file, offset, prefix, found)) return found;
     in.AddNames(*file, offset, prefix, found);
     for (const Text keyword : kKeywords)
       if (Fits(keyword, prefix) && !(is_inside && OnlyBeginsStatement(CodeOfText(keyword))))

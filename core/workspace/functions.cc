@@ -63,7 +63,8 @@ Value Inference::ValueOfParameter(FunctionId id, size_t index, FrameId frame) {
   }
   if (is_in_frame && frames_[frame].parameters[index].IsKnown()) return frames_[frame].parameters[index];
   if (is_self) return SelfOf(info);
-  Value value = kUnknown;
+  Value value = is_in_frame ? kUnknown : ValueInDocstring(info, syntax.NameOf(parameters[index]));
+  if (value.IsKnown()) return value;
   if (!is_in_frame) value = GuessedParameter(id, index);
   if (value.IsKnown()) value.doubt |= Value::kGuessed | Value::kOpen;
   if (kind != ParameterKind::kPlain) return value.IsKnown() ? value : gathered(kUnknown);
@@ -256,6 +257,8 @@ Value Inference::ResultIn(FunctionId id, FrameId frame) {
     const Value stated = StatedResult(id, frame, is_stated);
     if (is_stated && (stated.IsKnown() || (stated.doubt & Value::kOpen) == 0)) return stated;
     const uint8_t flags = functions_[id].flags;
+    const Value documented = ValueInDocstring(functions_[id], {});
+    if (documented.IsKnown()) return documented;
     const Value returned = ReturnedIn(id, frame);
     if ((flags & kIsGenerator) != 0) {
       const Value yielded = YieldedIn(id, frame);

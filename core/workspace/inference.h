@@ -368,6 +368,10 @@ class Inference {
   Value YieldedIn(FunctionId function, FrameId frame);
   Value GuessedParameter(FunctionId function, size_t index);
   Value SelfOf(const FunctionInfo& info);
+  // ---- docstrings.cc ----
+  Value ValueInDocstring(const FunctionInfo& info, Text name);
+  Value ValueOfWords(const SourceFile& file, Text words, int depth = 0);
+
   ExprId HintOfParameter(const SourceFile& file, const FunctionInfo& info, size_t index);
 
   // ---- calls.cc ----

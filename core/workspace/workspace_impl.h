@@ -70,7 +70,8 @@ class Workspace::Impl final : public CallerSource {
   void AddNames(const SourceFile& file, uint32_t offset, Text prefix, std::vector<Completion>& found);
   void AddModules(ModuleId package, Text prefix, std::vector<Completion>& found);
   void AddModuleNames(ModuleId module, Text prefix, std::vector<Completion>& found, bool with_private);
-  void AddKeywords(const SourceFile& file, uint32_t offset, Text prefix, std::vector<Completion>& found);
+  // Whether nothing but a keyword can stand at the place: all positions of the call are taken.
+  bool AddKeywords(const SourceFile& file, uint32_t offset, Text prefix, std::vector<Completion>& found);
   void AddNamesOfFile(FileId file, Text module, Text prefix, std::vector<Completion>& found,
                       std::unordered_set<std::string>& seen);
   enum class NewName : uint8_t { kNone, kMethod, kOther };
