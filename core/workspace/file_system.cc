@@ -2,6 +2,7 @@
 // standard library on Windows.
 #include "workspace/file_system.h"
 
+#include <chrono>
 #include <filesystem>
 #include <system_error>
 
@@ -57,10 +58,10 @@ FileStamp StampOf(const std::string& path) {
   const fs::path native = NativePath(path);
   const fs::file_status status = fs::status(native, error);
   if (error || status.type() == fs::file_type::not_found) return {};
-  if (status.type() == fs::file_type::directory) return {.kind = FileStamp::Kind::kFolder};
-  if (status.type() != fs::file_type::regular) return {.kind = FileStamp::Kind::kOther};
-  FileStamp stamp{.kind = FileStamp::Kind::kFile};
-  stamp.size = fs::file_size(native, error);
+  const bool is_folder = status.type() == fs::file_type::directory;
+  if (!is_folder && status.type() != fs::file_type::regular) return {.kind = FileStamp::Kind::kOther};
+  FileStamp stamp{.kind = is_folder ? FileStamp::Kind::kFolder : FileStamp::Kind::kFile};
+  if (!is_folder) stamp.size = fs::file_size(native, error);
   stamp.modified = fs::last_write_time(native, error).time_since_epoch().count();
   return stamp;
 }
@@ -93,8 +94,8 @@ FileStamp StampOf(const std::string& path) {
   stamp.kind = S_ISREG(info.st_mode) ? FileStamp::Kind::kFile
                : S_ISDIR(info.st_mode) ? FileStamp::Kind::kFolder
                                        : FileStamp::Kind::kOther;
-  if (!stamp.is_file()) return stamp;
-  stamp.size = static_cast<uint64_t>(info.st_size);
+  if (!stamp.is_file() && !stamp.is_folder()) return stamp;
+  if (stamp.is_file()) stamp.size = static_cast<uint64_t>(info.st_size);
 #ifdef __APPLE__
   const timespec& time = info.st_mtimespec;
 #else
@@ -198,6 +199,16 @@ std::string Join(Text folder, Text name) {
   if (!folder.ends_with('/')) path += '/';
   path += name;
   return path;
+}
+
+FileStamp SettledStamp(FileStamp stamp) {
+  // Longer than the clocks of file systems stand still; Windows's has another beginning and finer steps.
+  static constexpr int64_t kTick = 50'000'000;
+  const int64_t now =
+      std::chrono::duration_cast<std::chrono::nanoseconds>(std::chrono::system_clock::now().time_since_epoch()).count();
+  const int64_t age = now - stamp.modified;
+  if (age < kTick && age > -kTick) stamp.kind = FileStamp::Kind::kUnsettled;
+  return stamp;
 }
 
 bool IsWithin(Text path, Text folder) {

@@ -10,11 +10,11 @@
 
 namespace quillet {
 
-// By which a change of a file is noticed.
+// By which a change of a file is noticed, and of a folder that something came or went.
 struct FileStamp {
-  enum class Kind : uint8_t { kNone, kFile, kFolder, kOther };
+  enum class Kind : uint8_t { kNone, kFile, kFolder, kOther, kUnsettled };
   Kind kind = Kind::kNone;
-  uint64_t size = 0;
+  uint64_t size = 0;     // of a file
   int64_t modified = 0;  // in nanoseconds
   uint64_t number = 0;   // of the file, which another one that takes its place has not
 
@@ -25,6 +25,9 @@ struct FileStamp {
 
 // Links are followed.
 FileStamp StampOf(const std::string& path);
+// The stamp to remember of what is about to be read: where it was changed so lately that another change could leave
+// the same stamp, one that equals none that StampOf gives.
+FileStamp SettledStamp(FileStamp stamp);
 
 struct FolderEntry {
   enum class Kind : uint8_t { kFile, kFolder, kLink, kOther };

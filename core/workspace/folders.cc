@@ -17,12 +17,40 @@ Text SourceModule(Text name) {
   return {};
 }
 
+// Whether an entry of a folder says where modules are; a link may lead to one.
+bool CountsForModules(const FolderEntry& entry) {
+  const Text name = entry.name;
+  switch (entry.kind) {
+    case FolderEntry::Kind::kFile:
+      return !SourceModule(name).empty() || !CompiledModule(name).empty();
+    case FolderEntry::Kind::kFolder:
+      return !name.starts_with('.') && name != "__pycache__";
+    case FolderEntry::Kind::kLink:
+      return true;
+    case FolderEntry::Kind::kOther:
+      return false;
+  }
+  return false;
+}
+
+// Of the entries that count, in any order.
+uint64_t DigestOf(const std::vector<FolderEntry>& entries) {
+  uint64_t digest = 0;
+  for (const FolderEntry& entry : entries) {
+    if (CountsForModules(entry)) digest += std::hash<Text>()(entry.name) * (2 * static_cast<uint64_t>(entry.kind) + 1);
+  }
+  return digest;
+}
+
 }  // namespace
 
 Folders::Listing& Folders::Of(const std::string& folder) {
   if (const auto found = listings_.find(folder); found != listings_.end()) return found->second;
   Listing listing;
-  for (FolderEntry& entry : EntriesOf(folder)) {
+  listing.stamp = SettledStamp(StampOf(folder));
+  std::vector<FolderEntry> entries = EntriesOf(folder);
+  listing.digest = DigestOf(entries);
+  for (FolderEntry& entry : entries) {
     const Kind kind = entry.kind == FolderEntry::Kind::kFile     ? Kind::kFile
                       : entry.kind == FolderEntry::Kind::kFolder ? Kind::kFolder
                       : entry.kind == FolderEntry::Kind::kLink   ? Kind::kLink
@@ -57,6 +85,18 @@ bool Folders::Has(const std::string& folder, Text name, Kind kind) {
 bool Folders::HasCompiled(const std::string& folder, Text module) {
   const Listing& listing = Of(folder);
   return !listing.compiled.empty() && listing.compiled.contains(module);
+}
+
+bool Folders::Refresh() {
+  for (auto& [folder, listing] : listings_) {
+    const FileStamp stamp = StampOf(folder);
+    if (stamp == listing.stamp) continue;
+    listing.stamp = SettledStamp(stamp);
+    if (DigestOf(EntriesOf(folder)) == listing.digest) continue;
+    listings_.clear();
+    return true;
+  }
+  return false;
 }
 
 Folders::Names Folders::NamesIn(const std::string& folder) {

@@ -31,6 +31,9 @@ class Folders {
   Names NamesIn(const std::string& folder);
 
   void Forget() { listings_.clear(); }
+  // Looks whether modules, or folders that may hold some, came to the folders that were read, or went; where any did,
+  // all are forgotten.
+  bool Refresh();
 
  private:
   enum class Kind : uint8_t { kFile, kFolder, kLink, kNone };
@@ -41,6 +44,8 @@ class Folders {
   template <class Value>
   using TextMap = std::unordered_map<std::string, Value, TextHash, std::equal_to<>>;
   struct Listing {
+    FileStamp stamp;      // in front of the reading
+    uint64_t digest = 0;  // of what lies there and counts for modules
     TextMap<Kind> entries;
     TextMap<bool> compiled;  // names of modules
   };

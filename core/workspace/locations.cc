@@ -172,7 +172,7 @@ std::vector<Location> Workspace::Impl::MembersNamed(Text name) {
   static constexpr size_t kMaxFiles = 400;
   std::vector<Location> found;
   size_t count = 0;
-  for (const FileId id : project.WithWords({name})) {
+  for (const FileId id : project.Defining(name)) {
     if (++count > kMaxFiles) {
       is_bounded = true;
       break;

@@ -106,6 +106,12 @@ class Modules::Impl {
     return names;
   }
 
+  bool Refresh() {
+    if (!folders_.Refresh()) return false;
+    Forget();
+    return true;
+  }
+
   void Forget() {
     folders_.Forget();
     Begin();
@@ -516,6 +522,7 @@ ModuleId Modules::FindFrom(FileId importer, int level, Text name) { return impl_
 ModuleId Modules::Child(ModuleId package, Text name) { return impl_->Child(package, name); }
 ModuleId Modules::OfFile(FileId file) { return impl_->OfFile(file); }
 std::vector<std::string> Modules::ChildNames(ModuleId package) { return impl_->ChildNames(package); }
+bool Modules::Refresh() { return impl_->Refresh(); }
 void Modules::Forget() { impl_->Forget(); }
 
 }  // namespace quillet

@@ -53,7 +53,9 @@ class Modules {
   // The names of submodules, or of top-level modules for kNoModule: sorted, each once.
   std::vector<std::string> ChildNames(ModuleId package);
 
-  // After files came or went.
+  // Looks whether modules came or went in the folders that were looked into; forgets all where any did, and says so.
+  bool Refresh();
+  // After buffers were opened or closed.
   void Forget();
 
  private:

@@ -54,7 +54,9 @@ void Workspace::Impl::Begin() {
   static constexpr size_t kMaxHeld = size_t{192} << 20;
   const auto now = std::chrono::steady_clock::now();
   if (now - last_refresh_ > kBreath) {
-    if (files.Refresh()) Forget();
+    const bool has_changed = files.Refresh();
+    const bool has_come_or_gone = project.Refresh() | modules.Refresh();
+    if (has_changed || has_come_or_gone) Forget();
     if (files.ByteSize() > kMaxHeld) {
       files.Trim(kMaxHeld / 2);
       inference.Clear();

@@ -353,5 +353,24 @@ TEST(SourceRoots, AreTheFolderSrcAndWhatHoldsAPackage) {
   EXPECT_EQ(SourceRootsOf(folder / "c/pack/inner"), (Paths{folder / "c"}));
 }
 
+TEST(Modules, SeeWhatComesAndGoes) {
+  const TemporaryFolder folder = {{"a.py", ""}, {"pack/__init__.py", ""}};
+  Files files(Version::Of(3, 12));
+  Modules modules(files, {.roots = {folder.path()}, .libraries = {}, .typeshed = ""});
+  EXPECT_NE(modules.Find("a"), kNoModule);
+  EXPECT_EQ(modules.Find("pack.b"), kNoModule);
+  EXPECT_FALSE(modules.Refresh());
+  folder.Write("pack/b.py", "");
+  EXPECT_TRUE(modules.Refresh());
+  EXPECT_NE(modules.Find("pack.b"), kNoModule);
+  // What says nothing about modules.
+  folder.Write("pack/__pycache__/b.cpython-312.pyc", "");
+  folder.Write("pack/notes.txt", "");
+  EXPECT_FALSE(modules.Refresh());
+  folder.Remove("pack/b.py");
+  EXPECT_TRUE(modules.Refresh());
+  EXPECT_EQ(modules.Find("pack.b"), kNoModule);
+}
+
 }  // namespace
 }  // namespace quillet

@@ -1,12 +1,14 @@
-// Which files belong to a project, and which of them hold words.
+// Which files belong to a project, which of them hold words or define names, and what is noticed when they change.
 #include "workspace/project_files.h"
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <string>
 #include <vector>
 
 #include "tests/core/support/temporary_folder.h"
+#include "workspace/word_filters.h"
 #include "workspace/word_search.h"
 
 namespace quillet {
@@ -109,6 +111,220 @@ TEST(ProjectFiles, AreFoundByWholeWords) {
   EXPECT_EQ(Below(folder, files, project.WithWords({"total"})), (Paths{"a.py", "c.py", "d.py", "many/m77.py"}));
   EXPECT_EQ(Below(folder, files, project.WithWords({"total", "cart"})), (Paths{"a.py"}));
   EXPECT_TRUE(project.WithWords({"total", "nothing"}).empty());
+}
+
+// A folder of files, of which a project was asked before they change.
+struct Changing {
+  TemporaryFolder folder = {{"a.py", "def total(): pass\n"}, {"b.py", "x = 1\n"}, {"sub/c.py", "total()\n"}};
+  Files files{Version::Of(3, 12)};
+  ProjectFiles project{files, {folder.path()}};
+
+  Changing() { EXPECT_EQ(With("total"), (Paths{"a.py", "sub/c.py"})); }
+  Paths All() { return Below(folder, files, project.All()); }
+  Paths With(Text word) { return Below(folder, files, project.WithWords({word})); }
+  Paths Defining(Text name) { return Below(folder, files, project.Defining(name)); }
+};
+
+TEST(ProjectFiles, SeeWhatComesAndGoes) {
+  Changing at;
+  EXPECT_FALSE(at.project.Refresh());
+  at.folder.Write("sub/new.py", "total = 2\n");
+  at.folder.Write("other/deep/d.py", "total\n");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.All(), (Paths{"a.py", "b.py", "other/deep/d.py", "sub/c.py", "sub/new.py"}));
+  EXPECT_EQ(at.With("total"), (Paths{"a.py", "other/deep/d.py", "sub/c.py", "sub/new.py"}));
+  EXPECT_FALSE(at.project.Refresh());
+  at.folder.Remove("a.py");
+  at.folder.Remove("other");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.With("total"), (Paths{"sub/c.py", "sub/new.py"}));
+  EXPECT_EQ(at.Defining("total"), (Paths{"sub/new.py"}));
+  at.folder.Write("sub/notes.txt", "total\n");
+  EXPECT_FALSE(at.project.Refresh());
+}
+
+TEST(ProjectFiles, SeeNewRules) {
+  Changing at;
+  at.folder.Write(".git/HEAD", "");
+  at.folder.Write(".gitignore", "b.py\n");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.All(), (Paths{"a.py", "sub/c.py"}));
+  at.folder.Write(".gitignore", "sub\n");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.All(), (Paths{"a.py", "b.py"}));
+}
+
+TEST(ProjectFiles, SeeARootThatComes) {
+  const TemporaryFolder folder;
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {folder / "later"});
+  EXPECT_TRUE(project.All().empty());
+  folder.Write("later/a.py", "total\n");
+  EXPECT_TRUE(project.Refresh());
+  EXPECT_EQ(Below(folder, files, project.WithWords({"total"})), (Paths{"later/a.py"}));
+}
+
+TEST(ProjectFiles, SeeWhatChanges) {
+  Changing at;
+  // Of the same size, and at once: a stamp may be the same.
+  at.folder.Write("b.py", "y = 2\n");
+  EXPECT_FALSE(at.project.Refresh());
+  EXPECT_EQ(at.With("y"), (Paths{"b.py"}));
+  EXPECT_TRUE(at.With("x").empty());
+  // Larger than its filter was, again and again.
+  std::string text;
+  for (int i = 0; i < 5; ++i) {
+    for (int k = 0; k < 100; ++k) text += "name_" + std::to_string(i) + "_" + std::to_string(k) + " = " + "total\n";
+    at.folder.Write("b.py", text);
+    at.project.Refresh();
+    EXPECT_EQ(at.Defining("name_" + std::to_string(i) + "_99"), (Paths{"b.py"}));
+    EXPECT_EQ(at.With("total"), (Paths{"a.py", "b.py", "sub/c.py"}));
+    EXPECT_EQ(at.Defining("total"), (Paths{"a.py"}));
+  }
+  at.folder.Write("b.py", "");
+  at.project.Forget();
+  EXPECT_EQ(at.With("total"), (Paths{"a.py", "sub/c.py"}));
+}
+
+TEST(ProjectFiles, TakeTheTextOfBuffers) {
+  Changing at;
+  const FileId b = at.files.NumberOf(at.folder / "b.py");
+  const FileId a = at.files.NumberOf(at.folder / "a.py");
+  at.files.Open(b, "def amount(): total\n");
+  at.files.Open(a, "nothing\n");
+  EXPECT_EQ(at.With("total"), (Paths{"b.py", "sub/c.py"}));
+  EXPECT_EQ(at.With("nothing"), (Paths{"a.py"}));
+  EXPECT_EQ(at.Defining("amount"), (Paths{"b.py"}));
+  at.files.Change(b, 4, 10, "number");
+  EXPECT_EQ(at.With("number"), (Paths{"b.py"}));
+  EXPECT_TRUE(at.With("amount").empty());
+  at.files.Open(at.files.NumberOf(at.folder / "none.py"), "total\n");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.With("total"), (Paths{"b.py", "none.py", "sub/c.py"}));
+  for (const FileId buffer : std::vector<FileId>(at.files.Buffers())) at.files.Close(buffer);
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.With("total"), (Paths{"a.py", "sub/c.py"}));
+  EXPECT_EQ(at.Defining("total"), (Paths{"a.py"}));
+}
+
+TEST(ProjectFiles, AreFoundByWhatIsNoWordAndByNothing) {
+  Changing at;
+  at.folder.Write("sub/c.py", "total.of 12 \xC3\xA4hnlich\n");
+  at.project.Refresh();
+  EXPECT_EQ(at.With("total.of"), (Paths{"sub/c.py"}));
+  EXPECT_EQ(at.With("12"), (Paths{"sub/c.py"}));
+  EXPECT_EQ(at.With("\xC3\xA4hnlich"), (Paths{"sub/c.py"}));
+  EXPECT_EQ(Below(at.folder, at.files, at.project.WithWords({})), at.All());
+  EXPECT_TRUE(at.Defining("").empty());
+}
+
+// Whether a source may define a name, by its keys.
+bool Defines(std::string source, Text name) {
+  const std::string before = source;
+  WordKeys keys;
+  keys.Read(source);
+  EXPECT_EQ(source, before);
+  EXPECT_FALSE(keys.may_define_any()) << source;
+  return std::ranges::count(keys.keys(), KeyOfDefinition(name)) == 1;
+}
+
+TEST(WordKeys, TellDefinitionsFromOtherWords) {
+  for (const char* source : {"def n(): pass",
+                             "async def  n(a): pass",
+                             "class n: pass",
+                             "class \\\n n(B): pass",
+                             "n = 1",
+                             "n=1",
+                             "self.n = 1",
+                             "  a.b.n  = 1",
+                             "n += 1",
+                             "self.n **= 2",
+                             "n >>= 2",
+                             "n //= 2",
+                             "n: int",
+                             "self.n: int = 3",
+                             "(n := 1)",
+                             "a = n = 2",
+                             "a, n = 1, 2",
+                             "n, a = 1, 2",
+                             "n, = a",
+                             "self.n, self.a = 1, 2",
+                             "(a, n) = 1, 2",
+                             "[n, a] = 1, 2",
+                             "a, (n, b) = c",
+                             "(\n  n,\n  b,\n) = c",
+                             "a, \\\n n = c",
+                             "n, \\\n a = c",
+                             "n, \\\r\n a = c",
+                             "*n, a = c",
+                             "n, x['('] = c",
+                             "n, x[0] = c",
+                             "x(1).n, a = c",
+                             "if a: n, b = c",
+                             "a = 1; n, b = c",
+                             "for n in c: pass",
+                             "  for a, (n, b) in c: pass",
+                             "async for n in c: pass",
+                             "for self.n in c: pass",
+                             "with c as n: pass",
+                             "with c as self.n, d as e: pass",
+                             "with c as (n, e): pass",
+                             "import a as n",
+                             "except E as n:",
+                             "except E, n:",
+                             "type n = int",
+                             "type n[T] = list[T]",
+                             "n \\\n = 1"})
+    EXPECT_TRUE(Defines(source, "n")) << source;
+  for (const char* source :
+       {"n",       "n()",       "n == 1",     "a = n",       "n.a = 1",        "n <= 1",   "n >= 1",   "n != 1",
+        "f(n, a)", "n[0] = 1",  "n(1).a = 1", "a, b = n, c", "[a for n in c]", "import n", "return n", "na = 1",
+        "an: int", "a(n, b=1)", "defn",       "a.n\nb = 2",  "n,\nb = 2",      ""})
+    EXPECT_FALSE(Defines(source, "n")) << source;
+}
+
+TEST(WordKeys, HoldEveryWordWhereverItStands) {
+  WordKeys keys;
+  for (size_t size = 1; size < 70; ++size) {
+    for (const size_t before : {0, 1, 7, 58, 59, 62, 63, 64, 65, 127, 128}) {
+      const std::string word(size, 'w');
+      std::string source = std::string(before, '.') + word;
+      keys.Read(source);
+      EXPECT_EQ(keys.keys(), std::vector<WordKey>{KeyOfWord(word)}) << size << " " << before;
+      source += " = 12";
+      keys.Read(source);
+      EXPECT_EQ(keys.keys(), (std::vector<WordKey>{KeyOfWord(word), KeyOfDefinition(word)})) << size << " " << before;
+    }
+  }
+}
+
+TEST(WordKeys, AreBoundedWhereTargetsDoNotEnd) {
+  std::string source;
+  for (int i = 0; i < 100'000; ++i) source += ")=";
+  WordKeys keys;
+  keys.Read(source);
+  EXPECT_TRUE(keys.may_define_any());
+  // What defines anything is asked for the word.
+  const TemporaryFolder folder = {{"b.py", "x"}};
+  folder.Write("a.py", "name" + source);
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {folder.path()});
+  EXPECT_EQ(Below(folder, files, project.Defining("name")), (Paths{"a.py"}));
+}
+
+TEST(WordFilters, HoldTheirKeysAndFewOthers) {
+  std::vector<WordKey> keys;
+  for (int i = 0; i < 1000; ++i) keys.push_back(KeyOfWord("word" + std::to_string(i)));
+  std::vector<uint64_t> bits = {0};  // of another one
+  AppendFilter(keys, bits);
+  int others = 0;
+  for (int i = 0; i < 10000; ++i) {
+    const bool may_hold = MayHold(bits.data() + 1, bits.size() - 1, KeyOfWord("word" + std::to_string(i)));
+    EXPECT_TRUE(may_hold || i >= 1000) << i;
+    others += i >= 1000 && may_hold;
+  }
+  EXPECT_LT(others, 90);
+  EXPECT_FALSE(MayHold(bits.data(), 0, keys[0]));
 }
 
 TEST(WordSearch, FindsWholeWordsAtEveryPlace) {
