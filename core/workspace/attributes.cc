@@ -299,6 +299,8 @@ Value Inference::AttributeOfType(TypeId id, Text name) {
     }
     case TypeKind::kSpecial:
       return kUnknown;
+    case TypeKind::kForeign:
+      return ForeignValue(std::string(names_[t.a]) + "." + std::string(name), ImportOfForeign(t.a));
     default:
       break;
   }
@@ -314,7 +316,7 @@ Value Inference::AttributeOfType(TypeId id, Text name) {
     }
     const ClassId metaclass = ClassOfType(id);
     if (const auto member = FindMember(metaclass, name)) return ValueOfMember(*member, name, id, false);
-    return kUnknown;
+    return ForeignMember(t.a, name);
   }
   if (t.kind == TypeKind::kInstance && t.args_count == 1 && classes_[t.a].name == "type") {
     Value value;
@@ -347,6 +349,16 @@ Value Inference::AttributeOfType(TypeId id, Text name) {
     Value result = CallMethod(Just(id), fallback, {InstanceNamed("builtins", "str")});
     result.doubt |= Value::kOpen;
     return result;
+  }
+  return ForeignMember(cls, name);
+}
+
+// What a class may have from a base that is not there.
+Value Inference::ForeignMember(ClassId cls, Text name) {
+  const std::vector<BaseClass> order = InfoOf(cls).order;
+  for (const BaseClass& entry : order) {
+    const uint32_t base = classes_[entry.cls].foreign_base;
+    if (base != kNoId) return ForeignValue(std::string(names_[base]) + "." + std::string(name), ImportOfForeign(base));
   }
   return kUnknown;
 }

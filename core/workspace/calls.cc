@@ -743,6 +743,8 @@ Value Inference::ResultOfType(TypeId callee, std::vector<Argument>& arguments, E
         return Just(types_.Add(TypeKind::kClass, MadeClass(*caller, place.expr, "TypedDict")));
       return kUnknown;
     }
+    case TypeKind::kForeign:
+      return Just(callee, Value::kOpen);
     case TypeKind::kTypeForm:
       return {types_.ArgOf(callee, 0), 0};
     case TypeKind::kInstance: {

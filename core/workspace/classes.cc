@@ -112,6 +112,7 @@ void Inference::FindBases(ClassId cls) {
         if (!is_there) info.bases.push_back({found, std::move(args)});
         is_found = true;
       };
+      if (t.kind == TypeKind::kForeign && info.foreign_base == kNoId) info.foreign_base = t.a;
       if (t.kind == TypeKind::kClass) {
         std::vector<TypeSetId> args;
         for (size_t i = 0; i < t.args_count; ++i) args.push_back(types_.ArgOf(id, i));

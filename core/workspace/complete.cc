@@ -429,7 +429,7 @@ std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
     if (attribute == kNoExpr) return found;
     const Value receiver = in.inference.ValueOf(id, syntax.ChildOf(attribute, 0));
     in.AddMembers(receiver, prefix, found);
-    if (found.empty() && !receiver.IsKnown()) {
+    if (found.empty() && !in.inference.WithoutForeign(receiver).IsKnown()) {
       // The names that are used of the same receiver elsewhere in the file.
       const Text written = syntax.TextOf(syntax[syntax.ChildOf(attribute, 0)]);
       std::unordered_set<std::string> seen;

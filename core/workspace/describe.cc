@@ -14,11 +14,13 @@ std::string Workspace::Impl::TextOfSet(TypeSetId set, bool is_short, int depth) 
       has_none = true;
       continue;
     }
+    if (inference.types()[id].kind == TypeKind::kForeign) continue;
     std::string text = TextOfType(id, is_short, depth + 1);
     if (std::ranges::find(parts, text) == parts.end()) parts.push_back(std::move(text));
   }
   std::ranges::sort(parts);
   if (has_none) parts.push_back("None");
+  if (parts.empty()) return is_short ? "Any" : "typing.Any";
   std::string text;
   for (const std::string& part : parts) {
     if (!text.empty()) text += " | ";
@@ -84,6 +86,8 @@ std::string Workspace::Impl::TextOfType(TypeId id, bool is_short, int depth) {
       }
     case TypeKind::kTypeForm:
       return "type[" + TextOfSet(inference.types().ArgOf(id, 0), is_short, depth + 1) + "]";
+    case TypeKind::kForeign:
+      return std::string(inference.NameOfNumber(t.a));
     case TypeKind::kCallable:
       return "def (" + (t.b == 1 ? args(1) : std::string("...")) + ") -> " +
              TextOfSet(inference.types().ArgOf(id, 0), is_short, depth + 1);
@@ -93,7 +97,7 @@ std::string Workspace::Impl::TextOfType(TypeId id, bool is_short, int depth) {
 
 std::vector<std::string> Workspace::Impl::TextsOf(Value value, bool is_short) {
   std::vector<std::string> texts;
-  for (const TypeId id : inference.types().CopyOf(value.set)) {
+  for (const TypeId id : inference.types().CopyOf(inference.WithoutForeign(value).set)) {
     std::string text = TextOfType(id, is_short);
     if (std::ranges::find(texts, text) == texts.end()) texts.push_back(std::move(text));
   }

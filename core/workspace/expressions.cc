@@ -573,6 +573,10 @@ Value Inference::Operate(Value left, Value right, Text method, Text reflected) {
   Value value{kNoTypes, static_cast<uint8_t>(left.doubt | right.doubt)};
   const Value plain_right = WithoutLiterals(right);
   for (const TypeId id : types_.CopyOf(WithoutLiterals(left).set)) {
+    if (types_[id].kind == TypeKind::kForeign) {
+      value.doubt |= Value::kOpen;
+      continue;
+    }
     const ClassId cls = ClassOfType(id);
     const auto member = FindMember(cls, method);
     Value result;
@@ -640,6 +644,16 @@ Value Inference::EvaluateBinary(const SourceFile& file, ExprId expr, FrameId fra
   for (const OperatorRow& row : kOperators)
     if (CodeOfText(row.text) == op) return Operate(left, right, row.method, row.reflected);
   return kUnknown;
+}
+
+// Lists and dictionaries of which it is no longer known what they hold where.
+Value Inference::WithoutDisplay(Value value) {
+  std::vector<TypeId> plain;
+  for (const TypeId id : types_.CopyOf(value.set)) {
+    const std::vector<TypeSetId> args(types_.ArgsOf(id).begin(), types_.ArgsOf(id).end());
+    plain.push_back(LiteralOf(types_[id]).starts_with('@') ? InstanceOf(types_[id].a, args) : id);
+  }
+  return {types_.SetOf(plain), value.doubt};
 }
 
 Value Inference::WithoutNone(Value value) {

@@ -29,6 +29,7 @@ void Inference::Clear() {
   hints_.clear();
   module_names_.clear();
   guesses_.clear();
+  imports_of_foreign_.clear();
   depth_ = 0;
   guess_depth_ = 0;
   shallowest_cycle_ = INT32_MAX;

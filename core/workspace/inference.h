@@ -81,7 +81,8 @@ struct ClassInfo {
   std::vector<TypeId> parameters;  // type variables
   ClassId metaclass = kNoId;
   std::vector<MadeField> fields;
-  std::unordered_map<Text, uint32_t> symbols;                       // of its scope
+  uint32_t foreign_base = kNoId;               // number of the dotted name of a base that is not there
+  std::unordered_map<Text, uint32_t> symbols;  // of its scope
   std::unordered_map<Text, std::vector<uint32_t>> self_attributes;  // where methods write `self.x`: offsets
   std::unordered_set<Text> class_written;                           // of those the ones that class methods write
 };
@@ -189,6 +190,11 @@ class Inference {
   Value ValueOfHint(FileId file, ExprId hint, FrameId frame = kNoFrame);
   Value AttributeOf(Value receiver, Text name);
   Value IterationOf(Value iterable, bool is_async = false);
+  // Without what comes from modules that are not there.
+  Value WithoutForeign(Value value);
+  Value ForeignMember(ClassId cls, Text name);
+  // Where the name that leads to it is imported.
+  Binding ImportOfForeign(uint32_t name) const;
   // What a call of the value gives.
   Value ResultOf(Value callee, std::vector<Argument>& arguments, ExprPlace place = {});
   Value ResultOfFunction(FunctionId function);
@@ -302,6 +308,7 @@ class Inference {
   Value ItemOf(Value container, const SourceFile& file, std::span<const ExprId> items, FrameId frame);
   Value Operate(Value left, Value right, Text method, Text reflected);
   Value WithoutNone(Value value);
+  Value WithoutDisplay(Value value);
   Value WithoutFalse(Value value, bool keeps_true);
   Value WithoutLiterals(Value value);
   Value CallMethod(Value receiver, Text name, std::initializer_list<Value> arguments, bool* has_method = nullptr);
@@ -317,6 +324,8 @@ class Inference {
   Value FindValueOfBinding(const SourceFile& file, uint32_t offset, FrameId frame);
   Value ValueOfTarget(const SourceFile& file, ExprId target, FrameId frame);
   Value ValueOfImport(const SourceFile& file, uint32_t offset);
+  Value ForeignValue(std::string name, Binding import);
+  std::string ForeignNameOf(const SourceFile& file, uint32_t offset);
   Value Unpack(const SourceFile& file, ExprId target, ExprId root, Value value, ExprPlace source, FrameId frame);
   Value ValueOfPattern(const SourceFile& file, ExprId pattern, FrameId frame);
   Value Entered(Value manager, bool is_async);
@@ -346,6 +355,7 @@ class Inference {
   // ---- attributes.cc ----
   Value AttributeOfType(TypeId type, Text name);
   Value AttributeOfModule(ModuleId module, Text name);
+
   Value ValueOfMember(const Member& member, Text name, TypeId receiver, bool on_class);
   Value Bound(Value value, TypeId receiver, bool on_class, ClassId owner);
   Value RawValueOfMember(const Member& member, Text name);
@@ -413,6 +423,7 @@ class Inference {
   std::unordered_map<uint64_t, Memo> hints_;
   std::unordered_map<FileId, ModuleNames> module_names_;
   std::unordered_map<uint64_t, Value> guesses_;
+  std::unordered_map<uint32_t, Binding> imports_of_foreign_;  // by the number of the name
   uint32_t steps_ = kMaxSteps;
   int depth_ = 0;
   int shallowest_cycle_ = INT32_MAX;  // the depth of what is being found that was met again

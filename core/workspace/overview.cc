@@ -85,7 +85,10 @@ std::vector<Workspace::Impl::Callee> Workspace::Impl::CalleesOf(Value callee) {
   };
   for (const TypeId id : inference.types().CopyOf(callee.set)) {
     const Type t = inference.types()[id];
-    if (t.kind == TypeKind::kFunction) {
+    if (t.kind == TypeKind::kForeign) {
+      const Binding import = inference.ImportOfForeign(t.a);
+      if (import.file != kNoFile) found.push_back({import, std::string(inference.NameOfNumber(t.a)), certainty});
+    } else if (t.kind == TypeKind::kFunction) {
       add_function(t.a);
     } else if (t.kind == TypeKind::kClass) {
       const ClassId object = inference.ClassNamed("builtins", "object");
@@ -98,6 +101,13 @@ std::vector<Workspace::Impl::Callee> Workspace::Impl::CalleesOf(Value callee) {
           add_function(inference.types()[inner].a);
           has_own = true;
         }
+      }
+      const Value foreign = has_own ? Value() : inference.ForeignMember(t.a, "__init__");
+      for (const TypeId inner : inference.types().CopyOf(foreign.set)) {
+        const uint32_t name = inference.types()[inner].a;
+        found.push_back(
+            {inference.ImportOfForeign(name), std::string(inference.NameOfNumber(name)), Certainty::kLikely});
+        has_own = true;
       }
       if (!has_own) {
         const ClassInfo& info = inference.InfoOf(t.a);
@@ -198,7 +208,8 @@ std::vector<Call> Workspace::Callees(FileId id, uint32_t offset) {
       if (only_project && !in.IsProject(callee.binding.file)) continue;
       call.certainty = callee.certainty;
       auto known = std::ranges::find_if(found, [&](const Call& other) {
-        return other.function.file == callee.binding.file && other.function.begin == callee.binding.offset;
+        return other.function.file == callee.binding.file && other.function.begin == callee.binding.offset &&
+               other.name == callee.name;
       });
       if (known == found.end()) {
         Call made;

@@ -29,6 +29,7 @@ enum class TypeKind : uint8_t {
   kSpecial,   // a: SpecialForm
   kTypeForm,  // an expression that is a type and no class, such as `X | None`: what it allows
   kCallable,  // b: 1 where its parameters are known; the result, the parameters...
+  kForeign,   // what comes from a module that is not there; a: number of its dotted name
 };
 
 struct Type {

@@ -436,13 +436,63 @@ Value Inference::ValueOfBinding(Binding binding, FrameId frame) {
                     [&] { return FindValueOfBinding(*file, binding.offset, own); });
 }
 
+Value Inference::ForeignValue(std::string name, Binding import) {
+  static constexpr size_t kMaxName = 200;
+  if (name.size() > kMaxName) return kUnknown;
+  const uint32_t number = NumberOfName(name);
+  imports_of_foreign_.try_emplace(number, import);
+  return Just(types_.Add(TypeKind::kForeign, number), Value::kOpen);
+}
+
+Binding Inference::ImportOfForeign(uint32_t name) const {
+  const auto known = imports_of_foreign_.find(name);
+  return known == imports_of_foreign_.end() ? Binding() : known->second;
+}
+
+Value Inference::WithoutForeign(Value value) {
+  std::vector<TypeId> rest;
+  for (const TypeId id : types_.CopyOf(value.set))
+    if (types_[id].kind != TypeKind::kForeign) rest.push_back(id);
+  if (rest.size() == types_.SizeOf(value.set)) return value;
+  return {types_.SetOf(rest), static_cast<uint8_t>(value.doubt | Value::kOpen)};
+}
+
+// The dotted name of what an import that leads nowhere binds; empty where the module is there and has no such name.
+std::string Inference::ForeignNameOf(const SourceFile& file, uint32_t offset) {
+  const FileSyntax& syntax = file.syntax;
+  const ExprId named = syntax.NamedAt(offset);
+  const ExprId parent = named == kNoExpr ? kNoExpr : syntax[named].parent;
+  if (parent == kNoExpr) return {};
+  const auto dotted = [&](ExprId path) {
+    std::string text;
+    for (const ExprId part : syntax.ChildrenOf(path)) {
+      if (!text.empty()) text += '.';
+      text += syntax.NameOf(part);
+    }
+    return text;
+  };
+  if (syntax[parent].kind == ExprKind::kModulePath) return std::string(syntax.NameOf(syntax.ChildOf(parent, 0)));
+  if (syntax[parent].kind != ExprKind::kImportAlias) return {};
+  const Stmt& stmt = syntax.stmt(syntax.StatementOf(named));
+  const auto exprs = syntax.ExprsOf(stmt);
+  if (stmt.kind == StmtKind::kImport) return dotted(syntax.ChildOf(parent, 0));
+  if (stmt.kind != StmtKind::kFromImport || exprs.empty() || syntax[exprs[0]].op != 0) return {};
+  const std::string module = dotted(exprs[0]);
+  if (modules_.FindFrom(file.id, 0, module) != kNoModule) return {};
+  return module + "." + std::string(syntax.NameOf(syntax.ChildOf(parent, 0)));
+}
+
 Value Inference::ValueOfImport(const SourceFile& file, uint32_t offset) {
   const FileSyntax& syntax = file.syntax;
   const ExprId named = syntax.NamedAt(offset);
   // `import a.b` binds `a`.
   const Entities entities = EntitiesOfImport(file, offset);
   Value value{kNoTypes, entities.doubt};
-  if (entities.found.empty() || named == kNoExpr) return kUnknown;
+  if (named == kNoExpr) return kUnknown;
+  if (entities.found.empty()) {
+    const std::string name = ForeignNameOf(file, offset);
+    return name.empty() ? kUnknown : ForeignValue(name, {file.id, offset});
+  }
   for (const Entity& entity : entities.found) value = types_.Union(value, ValueOfEntity(entity));
   return value;
 }
@@ -537,7 +587,8 @@ Value Inference::Decorated(const SourceFile& file, StmtId stmt, Value value, Fra
     std::vector<Argument> arguments(1);
     arguments[0].value = value;
     arguments[0].is_evaluated = true;
-    const Value result = callee.IsKnown() ? ResultOf(callee, arguments, {file.id, decorator}) : kUnknown;
+    const Value result =
+        callee.IsKnown() ? WithoutForeign(ResultOf(callee, arguments, {file.id, decorator})) : kUnknown;
     if (result.IsKnown()) {
       value = {result.set, static_cast<uint8_t>(result.doubt | value.doubt)};
     } else {
@@ -688,7 +739,14 @@ Value Inference::ValueOfTarget(const SourceFile& file, ExprId target, FrameId fr
       const ExprId value = exprs.back();
       if (root == target) {
         const Value items = ItemsPutInto(file, target);
-        if (items.IsKnown()) return items;
+        const Expr& display = syntax[value];
+        const bool is_empty = display.children_count == (display.kind == ExprKind::kCall ? 1u : 0u);
+        if (items.IsKnown() && is_empty) return items;
+        if (items.IsKnown()) {  // what it holds at first, and later
+          Value both = WithoutDisplay(ValueOf(file.id, value, frame));
+          both = types_.Union(both, items);
+          return both;
+        }
       }
       return Unpack(file, target, root, ValueOf(file.id, value, frame), {file.id, value}, frame);
     }
@@ -847,8 +905,8 @@ Value Inference::ItemsPutInto(const SourceFile& file, ExprId target) {
   const ExprId value = syntax.ExprsOf(syntax.stmt(syntax.StatementOf(target))).back();
   const Expr& display = syntax[value];
   Text cls;
-  if (display.kind == ExprKind::kList && display.children_count == 0) cls = "list";
-  if (display.kind == ExprKind::kDict && display.children_count == 0) cls = "dict";
+  if (display.kind == ExprKind::kList) cls = "list";
+  if (display.kind == ExprKind::kDict) cls = "dict";
   if (display.kind == ExprKind::kCall && display.children_count == 1) {
     const Text name = syntax.TextOf(syntax[syntax.ChildOf(value, 0)]);
     if (name == "list" || name == "dict" || name == "set") cls = name;
