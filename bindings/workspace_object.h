@@ -28,7 +28,12 @@ class WorkspaceObject {
     const std::unique_lock turn = TakeTurn();
     const Asking asking(*this);
     const ThreadStopQuestion signals(HandlesSignals());
-    return ask(*workspace_);
+    try {
+      return ask(*workspace_);
+    } catch (...) {
+      workspace_->Recover();
+      throw;
+    }
   }
 
  private:

@@ -178,6 +178,10 @@ class LibraryFinder {
       for (const auto& [folder, version] : VersionFolders(Join(prefix, lib))) {
         if (!IsOfVersion(version) || !StampOf(Join(folder, "os.py")).is_file()) continue;
         AddFolder(folder);
+        // Of Python 2, what the system's and the toolkit's modules are.
+        for (const FolderEntry& entry : EntriesOf(folder)) {
+          if (entry.name.starts_with("plat-") || entry.name == "lib-tk") AddFolder(Join(folder, entry.name));
+        }
         AddFolder(Join(folder, "lib-dynload"));
         return;
       }
@@ -217,8 +221,12 @@ class LibraryFinder {
     }
   }
 
+  // Once, by whatever links it is reached.
   bool AddFolder(const std::string& folder) {
-    if (std::ranges::find(found_.libraries, folder) != found_.libraries.end() || !IsFolder(folder)) return false;
+    if (!IsFolder(folder)) return false;
+    std::string real = RealPath(folder);
+    if (std::ranges::find(real_folders_, real) != real_folders_.end()) return false;
+    real_folders_.push_back(std::move(real));
     found_.libraries.push_back(folder);
     return true;
   }
@@ -287,6 +295,7 @@ class LibraryFinder {
   }
 
   Environment found_{{}, {{0, 0, 0}, 0}};
+  std::vector<std::string> real_folders_;
 };
 
 // The version in the name of an interpreter, such as python3.11.

@@ -171,6 +171,8 @@ void Workspace::Close(FileId file) {
   impl_->Forget();
 }
 
+void Workspace::Recover() { impl_->Forget(); }
+
 void Workspace::Refresh() {
   impl_->files.Refresh();
   impl_->Forget();

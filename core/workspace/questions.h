@@ -138,6 +138,8 @@ class Workspace {
   void Close(FileId file);
   // Looks for changed files; questions do it on their own unless they were asked a moment ago.
   void Refresh();
+  // For who ended a question by an exception (stop.h): what it was in the middle of is forgotten.
+  void Recover();
 
   std::vector<Location> Definitions(FileId file, uint32_t offset);
   // Where the types of what is there are defined.

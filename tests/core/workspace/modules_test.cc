@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <string>
 #include <vector>
 
@@ -282,6 +283,7 @@ TEST(Environments, ReadTheSettingsOfAVirtualOne) {
   };
   settings("false");
   folder.Link(folder / "base/bin/python3.11", "venv/bin/python");
+  folder.Link("lib", "venv/lib64");
   const std::vector<std::string> own = {"base/lib/python3.11", "base/lib/python3.11/lib-dynload",
                                         "venv/lib/python3.11/site-packages", "extra"};
   for (const char* path : {"venv", "venv/bin/python", "venv/bin", "venv/"}) {
@@ -300,6 +302,21 @@ TEST(Environments, ReadTheSettingsOfAVirtualOne) {
   folder.Link(folder / "base/bin/python3.11", "links/python");
   for (const char* path : {"base", "base/bin/python3.11", "links/python"})
     EXPECT_EQ(Below(folder, FindEnvironment(folder / path)), base) << path;
+}
+
+TEST(Environments, KnowTheFoldersOfPython2) {
+  const TemporaryFolder folder = {
+      {"bin/python2.7", ""},
+      {"lib/python2.7/os.py", ""},
+      {"lib/python2.7/lib-tk/Tkinter.py", ""},
+      {"lib/python2.7/plat-linux2/DLFCN.py", ""},
+      {"lib/python3.9/site-packages/other.py", ""},
+  };
+  const Environment environment = FindEnvironment(folder / "bin/python2.7");
+  std::vector<std::string> below = Below(folder, environment);
+  std::ranges::sort(below);
+  EXPECT_EQ(below, (std::vector<std::string>{"lib/python2.7", "lib/python2.7/lib-tk", "lib/python2.7/plat-linux2"}));
+  EXPECT_EQ(environment.version.parts[0], 2);
 }
 
 TEST(Environments, KnowTheLayoutOfWindows) {
