@@ -176,7 +176,9 @@ class StatementsWithWord : public RowFilter {
     const Text last = name.substr(name.rfind('.') + 1);
     const bool is_plain = !last.empty() && std::all_of(last.begin(), last.end(), IsWordByte);
     const bool has_word = question.match == Question::Match::kExact || question.match == Question::Match::kSuffix;
-    if (is_plain && has_word && !question.returns) word_ = last;
+    // What a function returns has a name that its head does not spell.
+    const bool is_spelled = last != "return" && last != "yield";
+    if (is_plain && has_word && is_spelled && !question.returns) word_ = last;
     is_name_alone_ = question.match == Question::Match::kExact && last.size() == name.size();
   }
 

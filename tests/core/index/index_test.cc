@@ -247,6 +247,7 @@ TEST(Questions, AreAnsweredAlikeOutOfTheStatementsThatHoldTheirWord) {
       kShop,
       "def f():\n  global x, y\n  x = 1; y.z = x\nx = 2\nclass A:\n  def x(self): return x\n",
       "def f():\n  x = 1\n  def g():\n    nonlocal x\n    x.y = 2; x += 1\n  def h(x): x.y\n",
+      "def f() -> A: yield A\n",
       "def f(a, b):\n  # type: (int, A.b) -> C\n  a.b = b  # type: A\n  return a\n",
       "from a.b import c as d, e\nimport a.b.c\nd.c(e, c=1)\n",
       "x: 'A.B[C]' = f'{A.c!r:{C}}'\n\n\nif A: x; A\nelse: C.A\n  # A\n",
@@ -257,8 +258,8 @@ TEST(Questions, AreAnsweredAlikeOutOfTheStatementsThatHoldTheirWord) {
   };
   for (const Text source : sources) {
     for (const Match match : {Match::kExact, Match::kSuffix, Match::kGlob}) {
-      for (const Text name :
-           {"x", "A", "b", "c", "f", "x.y", ".y", "A.x", "a.b", "f.x", "C", "a.b.c", "Shop.add", "*"}) {
+      for (const Text name : {"x", "A", "b", "c", "f", "x.y", ".y", "A.x", "a.b", "f.x", "C", "a.b.c", "Shop.add", "*",
+                              "return", "yield"}) {
         for (const bool returns : {false, true}) {
           Question question = QuestionFor(match, name);
           question.returns = returns;
