@@ -174,7 +174,9 @@ def Given(program: Program, engine: Engine) -> dict[Edge, str]:
         if not function.is_class:
             for call in engine.Callees(function.place):
                 for caller in program.Callers(call, Found(*function.place, end=0)):
-                    Add(caller, program.Name(call.function), call.function.certainty)
+                    # What no file of the program defines has the name that the import gives it.
+                    foreign = call.function.role == "import"
+                    Add(caller, call.name if foreign else program.Name(call.function), call.function.certainty)
         called = program.Name(Found(*function.place, end=function.place.column))
         for call in engine.Callers(function.place):
             for caller in program.Callers(call, call.function):

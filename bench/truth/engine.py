@@ -103,7 +103,9 @@ class QuilletEngine:
         return place.path, place.line, ByteColumn(self._texts.Line(place.path, place.line), place.column)
 
     def _Calls(self, calls: Iterable[Any]) -> list[Call]:
-        return [Call(self._Found([each])[0], [site.place for site in self._Found(each.calls)]) for each in calls]
+        return [
+            Call(self._Found([each])[0], [site.place for site in self._Found(each.calls)], each.name) for each in calls
+        ]
 
     def _Found(self, locations: Iterable[Any]) -> list[Found]:
         found = []

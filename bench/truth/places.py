@@ -47,6 +47,7 @@ class Call(NamedTuple):
 
     function: Found
     sites: list[Place]
+    name: str = ""
 
 
 class Change(NamedTuple):

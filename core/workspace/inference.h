@@ -262,6 +262,7 @@ class Inference {
   // What parameters of a function are, for signatures.
   std::span<const ExprId> ParametersOf(const FunctionInfo& info);
   Value ValueOfParameter(FunctionId function, size_t index, FrameId frame = kNoFrame);
+  ExprId HintOfParameter(const SourceFile& file, const FunctionInfo& info, size_t index);
 
  private:
   static constexpr uint32_t kMaxSteps = 400'000;
@@ -381,8 +382,6 @@ class Inference {
   // ---- docstrings.cc ----
   Value ValueInDocstring(const FunctionInfo& info, Text name);
   Value ValueOfWords(const SourceFile& file, Text words, int depth = 0);
-
-  ExprId HintOfParameter(const SourceFile& file, const FunctionInfo& info, size_t index);
 
   // ---- calls.cc ----
   Value ResultOfType(TypeId callee, std::vector<Argument>& arguments, ExprPlace place);

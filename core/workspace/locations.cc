@@ -5,6 +5,16 @@
 
 namespace quillet {
 
+namespace {
+
+// What a plain string holds.
+Text TextInString(Text string) {
+  while (!string.empty() && string.front() != '\'' && string.front() != '"') string.remove_prefix(1);
+  return string.size() >= 2 ? string.substr(1, string.size() - 2) : Text();
+}
+
+}  // namespace
+
 uint32_t Workspace::Impl::OccurrenceAt(const SourceFile& file, uint32_t offset) {
   if (const uint32_t at = file.OccurrenceBeginningAt(offset); at != kNoIndex) return at;
   return file.OccurrenceAt(offset);
@@ -195,13 +205,81 @@ std::vector<Location> Workspace::Impl::MembersNamed(Text name) {
   return found;
 }
 
+Value Workspace::Impl::ExpectedOf(const SourceFile& file, ExprId expr) {
+  const FileSyntax& syntax = file.syntax;
+  const ExprId parent = syntax[expr].parent;
+  if (parent == kNoExpr) {
+    const Stmt& stmt = syntax.stmt(syntax.StatementOf(expr));
+    if (stmt.kind == StmtKind::kAnnotated || stmt.kind == StmtKind::kAssign)
+      return stmt.hint == kNoExpr ? kUnknown : inference.ValueOfHint(file.id, stmt.hint);
+    return kUnknown;
+  }
+  if (syntax[parent].kind == ExprKind::kDict) {
+    const auto children = syntax.ChildrenOf(parent);
+    const auto index = static_cast<size_t>(std::ranges::find(children, expr) - children.begin());
+    if (index % 2 == 0) return kUnknown;
+    Value value;
+    const Text key = TextInString(syntax.TextOf(syntax[children[index - 1]]));
+    for (const TypeId type : inference.types().CopyOf(ExpectedOf(file, parent).set))
+      value = inference.types().Union(value, inference.AttributeOf(inference.Just(type), key));
+    return value;
+  }
+  const bool is_keyword = syntax[parent].kind == ExprKind::kKeyword;
+  const ExprId call = is_keyword ? syntax[parent].parent : parent;
+  if (call == kNoExpr || syntax[call].kind != ExprKind::kCall) return kUnknown;
+  const auto arguments = syntax.ChildrenOf(call).subspan(1);
+  const auto position = static_cast<size_t>(std::ranges::find(arguments, expr) - arguments.begin());
+  Value value;
+  for (const TypeId type : inference.types().CopyOf(inference.ValueOf(file.id, syntax.ChildOf(call, 0)).set)) {
+    const Type t = inference.types()[type];
+    if (t.kind != TypeKind::kFunction) continue;
+    const FunctionInfo info = inference.function(t.a);
+    const SourceFile* source = Get(info.file);
+    const auto parameters = inference.ParametersOf(info);
+    for (size_t i = 0; i < parameters.size(); ++i) {
+      const bool is_it =
+          is_keyword ? source->syntax.NameOf(parameters[i]) == syntax.NameOf(parent) : i == position + t.args_count;
+      const ExprId hint = is_it ? inference.HintOfParameter(*source, info, i) : kNoExpr;
+      if (hint != kNoExpr) value = inference.types().Union(value, inference.ValueOfHint(info.file, hint));
+    }
+  }
+  return value;
+}
+
+std::vector<Location> Workspace::Impl::KeyDefinitions(const SourceFile& file, uint32_t offset) {
+  std::vector<Location> found;
+  const FileSyntax& syntax = file.syntax;
+  const ExprId string = syntax.ExpressionAt(offset);
+  if (string == kNoExpr || syntax[string].kind != ExprKind::kString || syntax[string].parent == kNoExpr) return found;
+  const ExprId parent = syntax[string].parent;
+  Value owner;
+  if (syntax[parent].kind == ExprKind::kSubscript && syntax.ChildOf(parent, 0) != string) {
+    owner = inference.ValueOf(file.id, syntax.ChildOf(parent, 0));
+  } else if (syntax[parent].kind == ExprKind::kDict || syntax[parent].kind == ExprKind::kSet) {
+    const auto children = syntax.ChildrenOf(parent);
+    const auto index = static_cast<size_t>(std::ranges::find(children, string) - children.begin());
+    if (syntax[parent].kind == ExprKind::kSet || index % 2 == 0) owner = ExpectedOf(file, parent);
+  }
+  const Text key = TextInString(syntax.TextOf(syntax[string]));
+  for (const TypeId type : inference.types().CopyOf(owner.set)) {
+    const Type t = inference.types()[type];
+    if (t.kind != TypeKind::kInstance || !inference.InfoOf(t.a).is_typed_dict) continue;
+    const auto member = inference.FindMember(t.a, key);
+    if (!member) continue;
+    for (const Binding& binding : inference.BindingsOf(inference.EntityOfMember(*member, key)))
+      found.push_back(At(binding, CertaintyOf(owner.doubt)));
+  }
+  Sort(found);
+  return found;
+}
+
 std::vector<Location> Workspace::Definitions(FileId id, uint32_t offset) {
   Impl& in = *impl_;
   in.Begin();
   const SourceFile* file = in.Get(id);
   if (file == nullptr) return {};
   const uint32_t index = in.OccurrenceAt(*file, offset);
-  if (index == kNoIndex) return {};
+  if (index == kNoIndex) return in.KeyDefinitions(*file, offset);
   const Occurrence& occurrence = file->bindings.occurrences[index];
   std::vector<Location> found;
   if (occurrence.has_symbol && occurrence.kind != NameKind::kNone && occurrence.kind != NameKind::kImport &&

@@ -134,7 +134,13 @@ std::vector<Workspace::Impl::Callee> Workspace::Impl::CalleesOf(const SourceFile
   if (at == kNoIndex) return found;
   for (const Location& location : MembersBelow(file, function)) {
     const Binding binding{location.file, location.begin};
-    found.push_back({binding, QualifiedName(binding), Certainty::kLikely});
+    if (location.kind == "function") {
+      found.push_back({binding, QualifiedName(binding), Certainty::kLikely});
+      continue;
+    }
+    Value value = inference.ValueOfBinding(binding);
+    value.doubt |= Value::kGuessed;
+    for (Callee& callee : CalleesOf(value)) found.push_back(std::move(callee));
   }
   if (!found.empty()) return found;
   const Entities entities = inference.EntitiesOf(file, at);

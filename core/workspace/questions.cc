@@ -54,6 +54,7 @@ void Workspace::Impl::Begin() {
   static constexpr size_t kMaxHeld = size_t{192} << 20;
   const auto now = std::chrono::steady_clock::now();
   if (now - last_refresh_ > kBreath) {
+    last_refresh_ = now;
     const bool has_changed = files.Refresh();
     const bool has_come_or_gone = project.Refresh() | modules.Refresh();
     if (has_changed || has_come_or_gone) Forget();
@@ -63,7 +64,6 @@ void Workspace::Impl::Begin() {
       calls_by_name_.clear();
     }
   }
-  last_refresh_ = std::chrono::steady_clock::now();
   inference.Begin();
   is_bounded = false;
 }

@@ -34,6 +34,10 @@ class Workspace::Impl final : public CallerSource {
   std::vector<Location> LocationsOf(const Entities& entities, bool follows_source = true);
   // Where the source of a library's module says what its stub declares.
   Binding SourceOf(Binding binding);
+  // What a display has to be where it stands, by an annotation or the parameter that it is given to.
+  Value ExpectedOf(const SourceFile& file, ExprId expr);
+  // The field of a typed dictionary that a string names.
+  std::vector<Location> KeyDefinitions(const SourceFile& file, uint32_t offset);
   Binding OtherSideOf(Binding binding);
   void Sort(std::vector<Location>& locations) const;
   // Definitions of attributes of a name in the project, where nothing is known of the receiver.
