@@ -126,7 +126,9 @@ void CPGenAnalyzerImpl::WalkCompletely(CNode* tree, LogicalLine& logical, const 
   type_hint_walker_->in_class = place.in_class;
   type_hint_walker_->Walk(tree, &logical, place.first_in_def);
   if (const auto& error = type_hint_walker_->hint_error(); error && !hint_error_) hint_error_ = *error;
-  if (!logical.no_embedded || typing_->has_renamed_cast()) InspectEmbeddedCompletely(logical, place);
+  // A template that the parser met last may be that of a statement before: then there is nothing to find.
+  if (!logical.no_embedded || complete_parser_->met_template() || typing_->has_renamed_cast())
+    InspectEmbeddedCompletely(logical, place);
   node_walker_->set_met_doubtful(met_doubtful);
   if (tree != nullptr) {
     give_back.tree = nullptr;

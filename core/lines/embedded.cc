@@ -46,15 +46,20 @@ class EmbeddedSearch {
                 next_hint < may_be_text_.size() && may_be_text_[next_hint]);
         while (next_hint < hints_.size() && hints_[next_hint] == i) ++next_hint;
       }
-      if (toks_[i].code == tok::STRING && IsFormattedString(toks_[i])) AddFields(i);
+      if (toks_[i].code == tok::STRING && IsFormattedString(toks_[i])) AddFields(i, toks_[i]);
+      // Where they are no template string, the statement is rejected.
+      if (typing_ != nullptr && toks_[i].code == tok::STRING && i > 0 && IsTemplateString(toks_[i - 1], toks_[i])) {
+        const auto length = static_cast<uint32_t>(toks_[i].end() - toks_[i - 1].text);
+        AddFields(i - 1, Token{toks_[i - 1].text, length, tok::STRING});
+      }
       if (toks_[i].code == tok::COMMENT) AddCommentHint(i);
     }
   }
 
  private:
-  void AddFields(size_t i) {
+  void AddFields(size_t i, const Token& string) {
     fields_.clear();
-    AppendFieldTokens(toks_[i], tokens_, fields_);
+    AppendFieldTokens(string, tokens_, fields_);
     for (const TokenRange& field : fields_) AddFound(LineKind::kFstringFieldExp, field, i);
   }
 

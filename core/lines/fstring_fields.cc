@@ -191,6 +191,13 @@ bool IsFormattedString(const Token& string) {
   return PrefixOf(string.text, PrefixLength(string.view())).formatted;
 }
 
+bool IsTemplateString(const Token& name, const Token& string) {
+  if (name.end() != string.text || string.code != tok::STRING || !IsQuote(*string.text)) return false;
+  const auto lower = [&name](uint32_t i) { return static_cast<char>(name.text[i] | 0x20); };
+  if (name.length == 1) return lower(0) == 't';
+  return name.length == 2 && ((lower(0) == 't' && lower(1) == 'r') || (lower(0) == 'r' && lower(1) == 't'));
+}
+
 void AppendFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields) {
   std::vector<Token> strings{string};
   for (size_t i = 0; i < strings.size(); ++i) {

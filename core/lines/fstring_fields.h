@@ -18,6 +18,10 @@ struct TokenRange {
 // Whether a string token's prefix says that it is formatted.
 bool IsFormattedString(const Token& string);
 
+// Whether a name and the string behind it are a template string (3.14), whose fields are those of a formatted
+// one: the tokeniser knows no such prefix.
+bool IsTemplateString(const Token& name, const Token& string);
+
 // Appends the tokens of each field of a formatted string, and the ranges of them, at least one token
 // each. Where the language has no field (an empty one, one that is not closed, a lone closing brace),
 // the range ends with or consists of an error token in the place that is at fault, which no grammar

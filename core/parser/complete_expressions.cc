@@ -7,6 +7,7 @@
 #include <algorithm>
 
 #include "foundations/errors.h"
+#include "lines/fstring_fields.h"
 #include "parser/complete_depth.h"
 #include "parser/complete_parser.h"
 
@@ -353,6 +354,7 @@ void CompleteParser::Atom() {
       return PushLeaf();
     default:
       if (!IsName(Code())) FailHere();
+      if (CodeAt(1) == tok::STRING && Since(14) && IsTemplateString(TokenAt(at_), TokenAt(at_ + 1))) return Templates();
       return PushLeaf();
   }
 }
@@ -367,6 +369,20 @@ void CompleteParser::Strings() {
   }
   if (is_mixed && python3_) Fail("cannot mix bytes and nonbytes literals");
   Finish(symbols_.atom, mark);
+}
+
+// Side by side they are one template. It is no string: a leaf of its own, of which nothing is known.
+void CompleteParser::Templates() {
+  const size_t mark = Mark();
+  met_template_ = true;
+  while (Code() == tok::NAME && CodeAt(1) == tok::STRING && IsTemplateString(TokenAt(at_), TokenAt(at_ + 1))) {
+    const Token& prefix = TokenAt(at_);
+    const Text text(prefix.text, static_cast<size_t>(TokenAt(at_ + 1).end() - prefix.text));
+    nodes_.push_back(factory_.NewKeywordNode(text, Context::Index(index_[at_])));
+    at_ += 2;
+  }
+  if (Code() == tok::STRING) Fail("cannot mix t-string literals with string or bytes literals");
+  if (Mark() - mark > 1) FinishBare<CExpression>(mark);
 }
 
 void CompleteParser::Group() {

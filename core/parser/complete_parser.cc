@@ -182,6 +182,7 @@ void CompleteParser::SetTokens(TokenSpan toks) {
   at_ = 0;
   furthest_ = 0;
   is_trying_ = false;
+  met_template_ = false;
   depth_ = 0;
   brackets_ = 0;
   names_.clear();

@@ -61,6 +61,9 @@ class CompleteParser {
   // `return` outside of a function: an error of a statement that is understood all the same.
   const std::optional<ParseError>& postponed() const { return postponed_; }
 
+  // Whether the last statement holds a template string.
+  bool met_template() const { return met_template_; }
+
   CNodeFactory& factory() const { return factory_; }
 
  private:
@@ -207,6 +210,7 @@ class CompleteParser {
   void Trailer();
   void Atom();
   void Strings();
+  void Templates();
   void Group();
   void Elements(TokenCode close);
   void ListDisplay();
@@ -274,6 +278,7 @@ class CompleteParser {
   const LogicalLine* line_ = nullptr;  // where it is known
   size_t furthest_ = 0;                // the last token that was looked at in a reading that was given up
   bool is_trying_ = false;             // a reading that may be given up, which explains nothing
+  bool met_template_ = false;
   bool in_field_ = false;
   bool in_annotation_ = false;
   bool in_iterable_ = false;             // of a comprehension

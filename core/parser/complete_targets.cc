@@ -131,7 +131,8 @@ const CNode* CompleteParser::InvalidTarget(const CNode* node, TargetUse use) con
   }
   if (!node->IsLeaf() || !IsNameCode(node->code)) return node;
   const bool is_constant = node->code == word::kNone || node->code == word::kTrue || node->code == word::kFalse;
-  if (is_constant && (python3_ || node->code == word::kNone)) return node;
+  // 2 has one constant that is no name, and lets it be deleted.
+  if (is_constant && (python3_ || (node->code == word::kNone && use != TargetUse::kDelete))) return node;
   return nullptr;
 }
 

@@ -273,7 +273,9 @@ def mutated_sources(library: Library, count: int, each_nth: int, seed: int = 7) 
             continue
         words = TOKEN.findall(text)
         # A clause without what it is a clause of is for no statement alone to see.
-        if not words or (words[0] != statement.first and words[0] in ("elif", "else", "except", "finally", "case")):
+        if not words or words[0] == "#" or (words[0] != statement.first and {words[0], statement.first} & PARTNERS):
+            continue
+        if statement.first == "case" and not text.endswith(":") and ":" not in words:
             continue
         sources.append(wrapped(statement, text, library.version))
     return sources

@@ -53,6 +53,7 @@ FORMS = [
     ("except A, B:", ["A get", "B get"]),
     ("except* (A, B) as e:", None),
     ("x = {a := 1, b}", None),
+    ('x = t"{name!r:>{width}}" rt"{b.c}"', ["x set", "name get", "width get", "b get", "b.c get"]),
     ("x[a := 1]", None),
     ("x: ...", ["x hint ..."]),
     ("def f() -> ...: pass", ["f set", "return parameter hint ..."]),

@@ -190,7 +190,7 @@ TEST(Index, DefinitionsStandByNameWithTheirScopes) {
 TEST(Index, AnAttributeIsDefinedInMethodsAlone) {
   EXPECT_EQ(Site({"def f(self): self.x = 1\n"}).index->DefinitionsScript(),
             "quillet.take([\"\"],[\n[\"f\",\"f\",0,0,1]]);\n");
-  EXPECT_EQ(Site({"class A:\n  def f[T](self): self.x = 1\n"}).index->DefinitionsScript().substr(0, 20),
+  EXPECT_EQ(Site({"class A:\n  def f[T](self): self.x = 1\n"}).index->DefinitionsScript().substr(0, 21),
             "quillet.take([\"\",\"A\"]");
 }
 
