@@ -52,7 +52,11 @@ void CNodeWalker::VisitAssignment(CExprStmt* node) {
 
 void CNodeWalker::VisitAugAssign(CExprStmt* node) {
   // It changes a binding and makes none: x += 1 only reads x. That is meant.
-  if (is_complete_) DoubtTarget(node->GetInitialTestExpr());
+  if (is_complete_) {
+    const CNode* const target = node->GetInitialTestExpr();
+    DoubtTarget(target);
+    met_doubtful_ |= isa<CTestListStarExpr>(target) || isa<CAtom>(target);
+  }
   VisitChildren(node);
 }
 
