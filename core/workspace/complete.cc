@@ -319,15 +319,15 @@ bool Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text 
     size_t position = 0, first_keyword = 0;
     for (size_t i = 0; i < parameters.size(); ++i)
       if (source->syntax[parameters[i]].op == static_cast<uint8_t>(ParameterKind::kSlash)) first_keyword = i;
-    bool takes_more = has_star;
+    bool takes_more = has_star && given.empty();
     for (size_t i = is_bound ? 1 : 0; i < parameters.size(); ++i) {
       const auto kind = static_cast<ParameterKind>(source->syntax[parameters[i]].op);
       if (kind == ParameterKind::kStar || kind == ParameterKind::kBareStar) is_keyword_only = true;
-      if (kind == ParameterKind::kStar) takes_more = true;
+      if (kind == ParameterKind::kStar && given.empty()) takes_more = true;
       if (kind != ParameterKind::kPlain) continue;
       const Text name = source->syntax.NameOf(parameters[i]);
       if (!is_keyword_only && position++ < positions) continue;
-      if (!is_keyword_only && !given.contains(name)) takes_more = true;
+      if (!is_keyword_only && given.empty()) takes_more = true;
       if (given.contains(name) || i < first_keyword) continue;
       if (!name.empty() && Fits(name, prefix))
         found.push_back(
@@ -345,6 +345,7 @@ bool Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text 
   for (const TypeId id : inference.types().CopyOf(callee.set)) {
     const Type t = inference.types()[id];
     if (t.kind == TypeKind::kFunction) add_all(inference.Just(id), false);
+    if (t.kind == TypeKind::kInstance) add_all(inference.AttributeOf(inference.Just(id), "__call__"), true);
     if (t.kind == TypeKind::kClass) {
       const ClassInfo& info = inference.MembersOf(t.a);
       if (!info.fields.empty()) {
@@ -388,6 +389,14 @@ std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
     const Text head = text.substr(at.begin, begin - at.begin);
     const size_t behind_import = at.kind == StmtKind::kFromImport ? FindImport(head) : Text::npos;
     if (EndsWithWord(head, "as")) return found;  // a name of one's own
+    const size_t last = head.find_last_not_of(" \t");
+    const bool is_behind_path = at.kind == StmtKind::kFromImport && behind_import == Text::npos && last != Text::npos &&
+                                last + 1 < head.size() && IsNameByte(head[last]) &&
+                                !EndsWithWord(" " + std::string(head), "from");
+    if (is_behind_path) {
+      if (Text("import").starts_with(prefix)) found.push_back({"import", "keyword", {}, {}, Certainty::kCertain});
+      return found;
+    }
     if (at.kind == StmtKind::kFromImport && behind_import != Text::npos) {
       const ExprId path = exprs.empty() ? kNoExpr : exprs[0];
       if (path == kNoExpr) return found;
@@ -401,8 +410,10 @@ std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
     } else {
       // The dotted path up to the place.
       size_t start = head.size();
+      while (start > 0 && head[start - 1] == ' ' && last != Text::npos && head[last] == '.') --start;
+      const size_t path_end = start;
       while (start > 0 && (IsNameByte(head[start - 1]) || head[start - 1] == '.')) --start;
-      Text dotted = head.substr(start);
+      Text dotted = head.substr(start, path_end - start);
       int level = 0;
       while (!dotted.empty() && dotted.front() == '.') {
         ++level;

@@ -53,6 +53,21 @@ bool Workspace::Impl::Meets(const Entities& use, const std::vector<Entity>& targ
   return has_met;
 }
 
+// Whether all is known of what an attribute is taken from: what has no such attribute then is not meant.
+bool Workspace::Impl::IsReceiverKnown(const SourceFile& file, const Occurrence& occurrence) {
+  const ExprId named = file.syntax.NamedAt(occurrence.begin);
+  if (named == kNoExpr || file.syntax[named].kind != ExprKind::kAttribute) return false;
+  const Value receiver = inference.ValueOf(file.id, file.syntax.ChildOf(named, 0));
+  if (!receiver.IsKnown() || receiver.doubt != 0) return false;
+  for (const TypeId type : inference.types().CopyOf(receiver.set)) {
+    const Type t = inference.types()[type];
+    const ClassId cls = t.kind == TypeKind::kClass ? t.a : inference.ClassOfType(type);
+    if (cls == kNoId || inference.InfoOf(cls).open_from != SIZE_MAX || inference.FindMember(cls, "__getattr__"))
+      return false;
+  }
+  return true;
+}
+
 // What a stub declares and what its source defines are one.
 void Workspace::Impl::AddOtherSides(Entities& entities) {
   const size_t count = entities.found.size();
@@ -88,6 +103,10 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
   if (wanted.found.empty()) {
     // An attribute of what is not known: every one of its name.
     if (!occurrence.is_attribute) return hits;
+    if (IsReceiverKnown(file, occurrence)) {
+      hits.push_back({AtOccurrence(file, index, Certainty::kCertain), file.id, index});
+      return hits;
+    }
   }
   const bool is_by_name = wanted.found.empty();
   AddOtherSides(wanted);
@@ -175,7 +194,8 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
       } else {
         const Entities use = inference.EntitiesOf(*source, i);
         meets = Meets(use, wanted.found, certainty);
-        if (!meets && use.found.empty() && has_member && (other.is_attribute || other.role == NameRole::kKeyword)) {
+        if (!meets && use.found.empty() && has_member && !IsReceiverKnown(*source, other) &&
+            (other.is_attribute || other.role == NameRole::kKeyword)) {
           if (other.is_attribute) {
             Location location = AtOccurrence(*source, i, Certainty::kByName);
             unknown.push_back({location, id, i});
@@ -260,7 +280,8 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
   }
   const Occurrence occurrence = file->bindings.occurrences[index];
   const Text old_name = file->bindings.TextOf(occurrence);
-  const Entities wanted = in.inference.EntitiesOf(*file, index);
+  Entities wanted = in.inference.EntitiesOf(*file, index);
+  in.AddOtherSides(wanted);
   if (wanted.found.empty()) {
     rename.problem = "nothing is known of what '" + std::string(old_name) + "' stands for here";
     return rename;

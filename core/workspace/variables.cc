@@ -134,8 +134,24 @@ const Inference::ModuleNames& Inference::NamesOfModule(const SourceFile& file) {
       names.symbols.emplace(bindings.texts[bindings.symbols[symbol].name], symbol);
   }
   const FileSyntax& syntax = file.syntax;
-  const auto add_all = [&](ExprId list) {
+  const std::function<void(ExprId)> add_all = [&](ExprId list) {
     names.has_all = true;
+    if (syntax[list].kind == ExprKind::kBinary) {
+      add_all(syntax.ChildOf(list, 0));
+      add_all(syntax.ChildOf(list, 1));
+      return;
+    }
+    if (syntax[list].kind == ExprKind::kAttribute && syntax.NameOf(list) == "__all__") {
+      for (const TypeId id : types_.CopyOf(ValueOf(file.id, syntax.ChildOf(list, 0)).set)) {
+        const FileId other = types_[id].kind == TypeKind::kModule ? FileOfModule(types_[id].a) : kNoFile;
+        const SourceFile* source = other == kNoFile || other == file.id ? nullptr : FileOf(other);
+        if (source == nullptr) continue;
+        const std::vector<Text> all = NamesOfModule(*source).all;
+        std::vector<Text>& own = module_names_[file.id].all;
+        own.insert(own.end(), all.begin(), all.end());
+      }
+      return;
+    }
     for (const ExprId item : syntax.ChildrenOf(list)) {
       if (syntax[item].kind != ExprKind::kString) continue;
       Text text = syntax.TextOf(syntax[item]);

@@ -55,6 +55,7 @@ class Workspace::Impl final : public CallerSource {
   bool Meets(const Entities& use, const std::vector<Entity>& targets, Certainty& certainty);
   bool IsCommonAttribute(Text name);
   void AddOtherSides(Entities& entities);
+  bool IsReceiverKnown(const SourceFile& file, const Occurrence& occurrence);
 
   // ---- describe.cc ----
   std::string TextOfType(TypeId type, bool is_short = false, int depth = 0);
