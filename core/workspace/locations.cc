@@ -66,16 +66,21 @@ Binding Workspace::Impl::SourceOf(Binding binding) {
   return file != nullptr && file->is_stub ? OtherSideOf(binding) : binding;
 }
 
-// Of what a stub declares where its source defines it, and the other way around; itself where there is no other.
 Binding Workspace::Impl::OtherSideOf(Binding binding) {
+  const std::vector<Binding> others = OtherSidesOf(binding);
+  return others.empty() ? binding : others.front();
+}
+
+// Of what a stub declares where its source defines it, and the other way around.
+std::vector<Binding> Workspace::Impl::OtherSidesOf(Binding binding) {
   const SourceFile* stub = Get(binding.file);
-  if (stub == nullptr) return binding;
+  if (stub == nullptr) return {};
   const ModuleId id = modules.OfFile(binding.file);
   const FileId other = id == kNoModule ? kNoFile : stub->is_stub ? modules[id].file : modules[id].stub;
-  if (other == kNoFile || other == binding.file) return binding;
+  if (other == kNoFile || other == binding.file) return {};
   const SourceFile* source = Get(other);
   const uint32_t index = stub->OccurrenceBeginningAt(binding.offset);
-  if (source == nullptr || index == kNoIndex) return binding;
+  if (source == nullptr || index == kNoIndex) return {};
   // The dotted way to the name, from the module in.
   std::vector<Text> path{stub->bindings.TextOf(stub->bindings.occurrences[index])};
   for (uint32_t scope = stub->bindings.ScopeOf(stub->bindings.occurrences[index]); scope != 0 && scope != kNoIndex;
@@ -118,12 +123,12 @@ Binding Workspace::Impl::OtherSideOf(Binding binding) {
           file = inference.function(t.a).file;
           stmt = inference.function(t.a).stmt;
         }
-        if (stmt != kModuleStmt && Get(file) != nullptr) return {file, Get(file)->syntax.stmt(stmt).name_begin};
+        if (stmt != kModuleStmt && Get(file) != nullptr) return {{file, Get(file)->syntax.stmt(stmt).name_begin}};
       }
     }
-    return bindings.front();
+    return bindings;
   }
-  return binding;
+  return {};
 }
 
 void Workspace::Impl::Sort(std::vector<Location>& locations) const {
@@ -169,10 +174,11 @@ std::vector<Location> Workspace::Impl::LocationsOf(const Entities& entities, boo
         found.push_back(location);
         continue;
       }
-      const Binding source = follows_source ? SourceOf(binding) : binding;
-      found.push_back(At(source, certainty));
+      const bool is_stub = follows_source && Get(binding.file) != nullptr && Get(binding.file)->is_stub;
+      const std::vector<Binding> sources = is_stub ? OtherSidesOf(binding) : std::vector<Binding>();
+      for (const Binding& source : sources) found.push_back(At(source, certainty));
       // A stub that somebody wrote for this project is worth seeing as well.
-      if (!(source == binding) && IsProject(binding.file)) found.push_back(At(binding, certainty));
+      if (sources.empty() || IsProject(binding.file)) found.push_back(At(binding, certainty));
     }
   }
   return found;

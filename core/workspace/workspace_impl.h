@@ -39,6 +39,7 @@ class Workspace::Impl final : public CallerSource {
   // The field of a typed dictionary that a string names.
   std::vector<Location> KeyDefinitions(const SourceFile& file, uint32_t offset);
   Binding OtherSideOf(Binding binding);
+  std::vector<Binding> OtherSidesOf(Binding binding);
   void Sort(std::vector<Location>& locations) const;
   // Definitions of attributes of a name in the project, where nothing is known of the receiver.
   std::vector<Location> MembersNamed(Text name);
