@@ -119,7 +119,13 @@ Entity Inference::EntityOfVariable(const SourceFile& file, uint32_t symbol) {
   const uint32_t variable = file.bindings.symbols[symbol].variable;
   const NameSymbol& owner = file.bindings.symbols[variable];
   const ClassId cls = ClassOfScope(file, owner.scope);
-  if (cls != kNoId) return {Entity::kMember, cls, NumberOfName(file.bindings.texts[owner.name])};
+  if (cls != kNoId) {
+    // As it is spelled: a private name is mangled in its scope.
+    Text name = file.bindings.texts[owner.name];
+    const auto occurrences = file.occurrences().Of(variable);
+    if (!occurrences.empty()) name = file.bindings.TextOf(file.bindings.occurrences[occurrences.front()]);
+    return {Entity::kMember, cls, NumberOfName(name)};
+  }
   return {Entity::kVariable, file.id, variable};
 }
 
