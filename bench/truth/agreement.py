@@ -4,6 +4,9 @@ A name counts where both answer. They agree where the best place of the workspac
 as well. A place outside the project (typeshed's stubs, which each carries a copy of) is compared by its module and by
 the name that stands there. What is called certain and is none of the server's places is counted apart.
 
+Where a server does not know an attribute it may name the function of the call around it. So of its places for an
+attribute those count that are of a module or have the attribute's name.
+
 The answers of servers can be kept in a folder, so that another run of the same names need not ask them again.
 """
 
@@ -24,11 +27,15 @@ _TARGETS = {PLAIN: 99.0, OWN: 97.0, OTHER: 90.0}
 
 
 class Identity:
-    """What tells one place of an answer from another."""
+    """What tells one place of an answer from another, and whether one is of a name at all."""
 
     def __init__(self, folder: Path) -> None:
         self._folder = folder
         self._texts = Texts()
+
+    def IsOf(self, found: Found, name: Name) -> bool:
+        is_named = name.text in self._texts.Line(found.path, found.line)[found.column : found.end]
+        return name.group == PLAIN or is_named or (found.line, found.column) == (1, 0)
 
     def Of(self, found: Found) -> str:
         path = Path(found.path)
@@ -36,7 +43,8 @@ class Identity:
             return f"{path.relative_to(self._folder).as_posix()}:{found.line}"
         stem = path.parent.name if path.stem == "__init__" else path.stem
         line = self._texts.Line(found.path, found.line)
-        return f"{stem}: {line[found.column : found.end] or 'module'}"
+        is_module = (found.line, found.column) == (1, 0)
+        return f"{stem}: {'module' if is_module else line[found.column : found.end]}"
 
 
 def PeerAnswers(peer: str, folder: Path, names: list[Name], keep: Path | None) -> list[list[Found]]:
@@ -86,7 +94,8 @@ def Run(options: argparse.Namespace) -> int:
         for peer in options.peers:
             answers = PeerAnswers(peer, folder, names, options.answers)
             tally = Tally(f"Definitions in {folder.name}, held against {peer}", _TARGETS, failures=options.failures)
-            for name, own, other in zip(names, given, answers, strict=True):
+            for name, own, answer in zip(names, given, answers, strict=True):
+                other = [each for each in answer if identity.IsOf(each, name)]
                 expected = {identity.Of(each) for each in other}
                 shown = [f"{identity.Of(each)} ({each.certainty})" for each in own]
                 key = f"{Path(name.place.path).relative_to(folder)}:{name.place.line}:{name.place.column} {name.text}"
