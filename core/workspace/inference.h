@@ -265,7 +265,7 @@ class Inference {
   ExprId HintOfParameter(const SourceFile& file, const FunctionInfo& info, size_t index);
 
  private:
-  static constexpr uint32_t kMaxSteps = 400'000;
+  static constexpr uint32_t kMaxSteps = 120'000;
   static constexpr int kMaxDepth = 150;
   static constexpr size_t kMaxFrames = 20'000;
   static constexpr int kMaxFrameDepth = 10;
