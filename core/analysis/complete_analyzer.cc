@@ -14,6 +14,9 @@ namespace quillet {
 
 namespace {
 
+// A tree is no deeper than its statement has tokens.
+constexpr size_t kTokensOfDeepTree = 80;
+
 StatementPlace PlaceOfStatement(const LinePlace& place) {
   using Scope = StatementPlace::Scope;
   StatementPlace statement;
@@ -111,7 +114,7 @@ void CPGenAnalyzerImpl::InspectCompletely(LogicalLine& logical, const LinePlace&
     if (CNode* other = parse_completely()) WalkCompletely(other, logical, place);
     return;
   }
-  if (CNode* verdict = parse_completely()) complete_parser_->factory().DiscardNodes(verdict);
+  if (CNode* verdict = parse_completely()) complete_parser_->factory().pool().Reclaim(verdict);
 }
 
 void CPGenAnalyzerImpl::WalkCompletely(CNode* tree, LogicalLine& logical, const LinePlace& place) {
@@ -131,6 +134,8 @@ void CPGenAnalyzerImpl::WalkCompletely(CNode* tree, LogicalLine& logical, const 
     InspectEmbeddedCompletely(logical, place);
   node_walker_->set_met_doubtful(met_doubtful);
   if (tree != nullptr) {
+    // The quick way back has an end at a hundred levels, and says so.
+    if (logical.toks.size() >= kTokensOfDeepTree) return;
     give_back.tree = nullptr;
     FinishedWithNode(tree);
   }
@@ -197,7 +202,7 @@ void CPGenAnalyzerImpl::InspectField(LogicalLine& logical, LogicalLine& exp, con
   } give_back{tree};
   node_walker_->Walk(tree, &exp);
   if (!is_of_tables || (!node_walker_->met_doubtful() && !closer_look_->IsDoubtful(exp, place))) return;
-  if (CNode* verdict = parse_completely()) complete_parser_->factory().DiscardNodes(verdict);
+  if (CNode* verdict = parse_completely()) complete_parser_->factory().pool().Reclaim(verdict);
 }
 
 SyntaxError CPGenAnalyzerImpl::ErrorInEmbedded(const std::string& message, const LogicalLine& logical,

@@ -1,0 +1,93 @@
+// Complete readings: every form of every version, whole and cut short at each token, by analyzers whose nodes
+// are recycled and by fresh ones.
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "analysis/file_analyzer.h"
+
+namespace quillet {
+namespace {
+
+FileAnalyzer::Options CompleteOptions(Version version) {
+  const std::string folder = std::string(QUILLET_SOURCE_DIR) + "/resources/pgen-grammars/";
+  const bool py3 = version.AtLeast(3, 0);
+  FileAnalyzer::Options options;
+  options.version = version;
+  options.py3_grammar = py3;
+  options.grammar_file = folder + (py3 ? kPy3DefaultGrammar : kPy2DefaultGrammar);
+  options.hint_grammar_file = folder + kPy3DefaultGrammar;
+  for (const Text word : py3 ? Py3Keywords() : Py27Keywords()) options.keywords.emplace_back(word);
+  options.hint_keywords = options.keywords;
+  options.reads_completely = true;
+  return options;
+}
+
+constexpr const char* kSources[] = {
+    "match x, *y:\n case [a, *_] | {'k': -1 - 2j, **r} | C.D(0, x=(1 as z)) if (n := a): pass\n",
+    "case (a.b | 'x' 'y' | None), *rest: x = 1\n",
+    "def f[T: (int, str) = int, *Ts = *a, **P](a, /, b: 'B' = 1, *c: *Ts, d, **e) -> 'C[D]':  # type: ignore[x]\n",
+    "async def f(x): return [await a async for a in b if c] + (yield)\n",
+    "class C(x, metaclass=y, *z, **w): pass\n",
+    "with (open(a) as b, c as (d, e.f),): pass\nwith (a): pass\nasync with (a as b): pass\n",
+    "except* (A, B) as e: pass\nexcept A, B: pass\nexcept E, (a, b): pass\n",
+    "@a[0].b or (lambda x, *y, z=1: x)\n",
+    "x = y = *a, [b, *c], {d: e, **f}, {*g}, h if i else j, k ** -l, not m in n, o[p:q:r, *s, ...]\n",
+    "a, (b, *[c, d]) = e.f(g, *h, i=j, **k)[l].m\n",
+    "x: int = f'{a!r:>{b}} {c[\"d\"]}' t'{e:{f}}' 'g'\n",
+    "def g(a, b):  # type: (*int, **str) -> (None)\n# type: (int, (str)) -> x\nx = 1  # type: any text\n",
+    "from typing import cast as c, Literal as L\nx = c('A[B]', L['|'])\n",
+    "print >>f, `x`, y\nexec a in b, c\nraise E, 'x', y\ndef f(a, (b, (c, d))): pass\nx = lambda (a, b): 0777L\n",
+    "del (a), b[c], d.e\nglobal x, y\nnonlocal z\nimport a.b as c, d\nfrom ..a import (b as c, d,)\nassert a, b\n",
+    "f(a b)\nf(a=1, b)\nx = (1\nif x = 1: pass\nf() = g() = 1\na, b += 1\nx = 1 if 2\nprint x\nfor a b in c: pass\n",
+};
+
+std::string ResultOf(FileAnalyzer& files, const std::string& source) {
+  files.Analyze(source);
+  std::string shown;
+  for (const auto* rows : {&files.store().rows, &files.store().arg_rows})
+    for (const Record& record : *rows) shown.append(record.name()).append("\t").append(record.info()).append("\n");
+  for (const FileAnalyzer::Failure& error : files.errors())
+    shown += std::to_string(error.place.line) + ":" + std::to_string(error.place.col) + " " + error.message() + "\n";
+  return shown;
+}
+
+TEST(CompleteReading, WhateverIsCutShortIsReadAlikeByRecycledNodes) {
+  for (const Version version : {Version::Of(2, 7), Version::Of(3, 6), Version::Of(3, 14)}) {
+    const FileAnalyzer::Options options = CompleteOptions(version);
+    FileAnalyzer recycled(options);
+    for (const std::string source : kSources) {
+      FileAnalyzer fresh(options);
+      for (size_t size = 0; size <= source.size(); ++size) {
+        const std::string part = source.substr(0, size);
+        const std::string once = ResultOf(recycled, part);
+        // Without its first word, what is left is another statement.
+        (void)ResultOf(recycled, source.substr(size));
+        ASSERT_EQ(once, ResultOf(fresh, part)) << part;
+      }
+    }
+  }
+}
+
+TEST(CompleteReading, DeepNestingIsAnErrorOrIsRead) {
+  FileAnalyzer files(CompleteOptions(Version::Of(3, 13)));
+  const auto repeated = [](const char* text, int count) {
+    std::string all;
+    for (int i = 0; i < count; ++i) all += text;
+    return all;
+  };
+  for (const char* open : {"(", "[", "{", "f(", "not ", "-", "lambda: ", "x if y else ", "x ** ", "[*", "(yield "}) {
+    for (const int count : {50, 190, 250, 5000}) {
+      const std::string inner = repeated(open, count);
+      for (const std::string& source : {"x = " + inner + "a\n", "x = = " + inner + "a\n", "case " + inner + "a:\n"})
+        (void)ResultOf(files, source);
+    }
+  }
+  EXPECT_EQ(ResultOf(files, "x = " + repeated("(", 150) + "a" + repeated(")", 150) + "\n"), "x\t:s:\nx\ta\na\t:g:\n");
+  EXPECT_NE(ResultOf(files, "x = = " + repeated("(", 250) + "a" + repeated(")", 250) + "\n").find("too many nested"),
+            std::string::npos);
+}
+
+}  // namespace
+}  // namespace quillet
