@@ -87,14 +87,94 @@ uint32_t Flow::InFrontOf(StmtId head, uint32_t end) const {
   return std::min(syntax_.stmt(head).begin, behind == 0 ? end : bindings_[behind - 1]);
 }
 
-bool Flow::Head(StmtId id) {
+bool Flow::Head(StmtId id, bool holds) {
   const Stmt& stmt = syntax_.stmt(id);
-  if (!HasAny(stmt.begin, stmt.end)) return false;
-  All(stmt.begin, stmt.end);
+  return Bound(stmt.begin, stmt.end, UINT32_MAX, holds);
+}
+
+bool Flow::Bound(uint32_t begin, uint32_t end, uint32_t place, bool holds) {
+  bool is_sure = false;
+  for (size_t i = FirstAt(begin); i < bindings_.size() && bindings_[i] < end; ++i) {
+    Add(bindings_[i]);
+    is_sure = is_sure || IsSure(bindings_[i], place, holds);
+  }
+  return is_sure;
+}
+
+// What stands behind `and`, in a branch of `a if b else c` or in a comprehension's loop need not be evaluated.
+bool Flow::IsSure(uint32_t binding, uint32_t place, bool holds) const {
+  const auto is_and = [&](ExprId expr) {
+    return syntax_[expr].kind == ExprKind::kBoolean && syntax_[expr].op == word::kAnd;
+  };
+  for (ExprId expr = syntax_.NamedAt(binding); expr != kNoExpr; expr = syntax_[expr].parent) {
+    const ExprId parent = syntax_[expr].parent;
+    if (parent == kNoExpr) return true;
+    const Expr& around = syntax_[parent];
+    const bool holds_place = around.begin <= place && place < around.end;
+    switch (around.kind) {
+      case ExprKind::kConditional:
+        if (syntax_.ChildOf(parent, 1) != expr) return false;
+        break;
+      case ExprKind::kBoolean: {
+        if (holds_place || syntax_.ChildOf(parent, 0) == expr) break;
+        // `a or b or c` is `(a or b) or c`.
+        ExprId at = parent;
+        for (ExprId up = syntax_[at].parent;
+             syntax_[up].kind == ExprKind::kBoolean && syntax_[up].op == around.op && syntax_.ChildOf(up, 0) == at;
+             up = syntax_[at].parent)
+          at = up;
+        if (syntax_[at].begin <= place && place < syntax_[at].end) return true;
+        at = parent;
+        while (holds && at != kNoExpr && is_and(at)) at = syntax_[at].parent;
+        if (!holds || at != kNoExpr) return false;
+        break;
+      }
+      case ExprKind::kCompare:
+        if (!holds_place && syntax_.ChildOf(parent, 0) != expr && syntax_.ChildOf(parent, 1) != expr) return false;
+        break;
+      case ExprKind::kComprehensionFor:
+      case ExprKind::kListComprehension:
+      case ExprKind::kSetComprehension:
+      case ExprKind::kDictComprehension:
+      case ExprKind::kGenerator:
+        if (!holds_place) return false;
+        break;
+      default:
+        break;
+    }
+    if (holds_place) return true;
+  }
   return true;
 }
 
-bool Flow::Leaves(StmtId owner) const { return BlockLeaves(syntax_, owner, false); }
+bool Flow::Leaves(StmtId owner) const { return BlockLeaves(syntax_, owner, true); }
+
+// What a loop's jumps of one kind take along. Whether the variable is surely bound by the body in front of each.
+bool Flow::Jumps(StmtId loop, uint16_t word, bool* has_any) {
+  const Stmt& head = syntax_.stmt(loop);
+  bool is_bound = true;
+  for (StmtId id = loop + 1; id < syntax_.stmts.size() && syntax_.stmt(id).begin < head.block_end; ++id) {
+    if (syntax_.stmt(id).kind != StmtKind::kPass || syntax_.stmt(id).op != word) continue;
+    StmtId around = syntax_.stmt(id).parent;
+    const auto is_around = [&](StmtKind kind) {
+      return kind == StmtKind::kFor || kind == StmtKind::kWhile || kind == StmtKind::kDef || kind == StmtKind::kClass;
+    };
+    while (around != kModuleStmt && !is_around(syntax_.stmt(around).kind)) around = syntax_.stmt(around).parent;
+    if (around != loop) continue;
+    if (has_any != nullptr) *has_any = true;
+    if (!Before(id, loop)) is_bound = false;
+  }
+  return is_bound;
+}
+
+// What comes back to a loop's beginning.
+void Flow::BackEdges(StmtId loop) {
+  const Stmt& head = syntax_.stmt(loop);
+  if (!HasAny(head.end, head.block_end)) return;
+  if (steps_-- <= 0) return All(head.end, head.block_end);
+  BlockEnd(loop);
+  Jumps(loop, word::kContinue);
+}
 
 Flow::Outcome Flow::BlockEnd(StmtId owner) {
   if (Leaves(owner)) return Outcome::kLeaves;
@@ -115,41 +195,62 @@ Flow::Outcome Flow::Group(StmtId head) {
   };
   switch (stmt.kind) {
     case StmtKind::kIf: {
-      bool has_else = false, always = true;
-      const auto branch = [&](StmtId at) {
-        Head(at);
-        if (BlockEnd(at) == Outcome::kMaybe) always = false;
-      };
-      const int truth = TruthOf(head);
-      if (truth != 0) branch(head);
-      bool is_decided = truth == 1;
-      clauses([&](StmtId at, StmtKind kind) {
-        if (is_decided) return;
-        const int own = kind == StmtKind::kElse ? 1 : TruthOf(at);
-        if (own != 0) branch(at);
-        if (own == 1) is_decided = true;
-      });
-      has_else = is_decided;
-      return has_else && always ? Outcome::kAlways : Outcome::kMaybe;
+      std::vector<StmtId> branches{head};
+      clauses([&](StmtId at, StmtKind) { branches.push_back(at); });
+      bool is_open = true;  // whether a run comes to the end with what it came with
+      for (size_t i = 0; i < branches.size(); ++i) {
+        if ((syntax_.stmt(branches[i]).kind == StmtKind::kElse ? 1 : TruthOf(branches[i])) != 1) continue;
+        branches.resize(i + 1);
+        is_open = false;
+      }
+      for (size_t i = branches.size(); i-- > 0;) {
+        const bool is_else = syntax_.stmt(branches[i]).kind == StmtKind::kElse;
+        if ((is_else || TruthOf(branches[i]) != 0) && BlockEnd(branches[i]) == Outcome::kMaybe &&
+            !(HasAny(syntax_.stmt(branches[i]).begin, syntax_.stmt(branches[i]).end) && Head(branches[i], true)))
+          is_open = true;
+        if (is_open && Head(branches[i])) is_open = false;
+      }
+      return is_open ? Outcome::kMaybe : Outcome::kAlways;
     }
     case StmtKind::kFor:
     case StmtKind::kWhile: {
+      bool has_else = false;
+      clauses([&](StmtId, StmtKind) { has_else = true; });
+      if (!has_else && !HasAny(stmt.begin, stmt.block_end)) return Outcome::kMaybe;
+      if (steps_-- <= 0) {
+        All(stmt.begin, stmt.block_end);
+        clauses([&](StmtId at, StmtKind) { BlockEnd(at); });
+        return Outcome::kMaybe;
+      }
       // `while True` is left by a `break` in its body only.
-      const bool always = stmt.kind == StmtKind::kWhile && TruthOf(head) == 1;
-      Head(head);
-      const Outcome body = BlockEnd(head);
-      clauses([&](StmtId at, StmtKind) { BlockEnd(at); });
-      return always && body == Outcome::kAlways ? Outcome::kAlways : Outcome::kMaybe;
+      const bool is_endless = stmt.kind == StmtKind::kWhile && TruthOf(head) == 1;
+      bool has_break = false;
+      const bool is_broken_open = !Jumps(head, word::kBreak, &has_break);
+      if (is_endless && !has_break) return BlockEnd(head) == Outcome::kMaybe ? Outcome::kMaybe : Outcome::kAlways;
+      bool is_open = !is_endless;
+      clauses([&](StmtId at, StmtKind) {
+        if (!is_endless) is_open = BlockEnd(at) == Outcome::kMaybe;
+      });
+      if (!is_open && !is_broken_open) return Outcome::kAlways;
+      BackEdges(head);
+      const bool is_bound = Head(head);
+      if (is_bound && (stmt.kind == StmtKind::kWhile || !is_open)) return Outcome::kAlways;
+      return Outcome::kMaybe;
     }
     case StmtKind::kTry: {
-      bool body = BlockEnd(head) != Outcome::kMaybe, handlers = true, finally = false;
+      bool is_bound = false, has_else = false, is_open = false, is_caught = false;
       clauses([&](StmtId at, StmtKind kind) {
-        const Outcome outcome = BlockEnd(at);
-        if (kind == StmtKind::kFinally) finally = outcome == Outcome::kAlways;
-        if (kind == StmtKind::kExcept && outcome == Outcome::kMaybe) handlers = false;
-        if (kind == StmtKind::kElse && outcome != Outcome::kMaybe) body = true;
+        if (kind == StmtKind::kFinally) is_bound = BlockEnd(at) != Outcome::kMaybe;
       });
-      return (body && handlers) || finally ? Outcome::kAlways : Outcome::kMaybe;
+      if (is_bound) return Outcome::kAlways;
+      clauses([&](StmtId at, StmtKind kind) {
+        if (kind == StmtKind::kExcept && BlockEnd(at) == Outcome::kMaybe) is_caught = true;
+        if (kind == StmtKind::kElse) has_else = BlockEnd(at) != Outcome::kMaybe;
+      });
+      if (!has_else && BlockEnd(head) == Outcome::kMaybe) is_open = true;
+      // A handler begins behind any statement of the body.
+      if (is_caught) All(stmt.begin, stmt.block_end);
+      return is_open || is_caught ? Outcome::kMaybe : Outcome::kAlways;
     }
     case StmtKind::kWith: {
       const Outcome body = BlockEnd(head);
@@ -179,41 +280,41 @@ Flow::Outcome Flow::Group(StmtId head) {
 
 // What binds between the beginning of a clause's chain and its block, where the place is in that block.
 bool Flow::Above(StmtId clause) {
-  const Stmt& stmt = syntax_.stmt(clause);
-  switch (stmt.kind) {
-    case StmtKind::kFor:
-    case StmtKind::kWhile:
-      if (stmt.first_child != kModuleStmt) {
-        std::vector<uint32_t>* const all = reached_;
-        BlockEnd(clause);
-        // What a `continue` comes from reaches the beginning as well.
-        All(stmt.end, stmt.block_end);
-        reached_ = all;
-      }
-      return Head(clause);
-    case StmtKind::kElif:
-    case StmtKind::kExcept:
-    case StmtKind::kElse:
-    case StmtKind::kFinally: {
-      if (Head(clause)) return true;
-      const StmtId head = HeadOfChain(clause);
-      for (StmtId at = head; at != clause && at != kModuleStmt; at = syntax_.stmt(at).next) {
-        const StmtKind kind = syntax_.stmt(at).kind;
-        const Stmt& other = syntax_.stmt(at);
-        if (kind == StmtKind::kIf || kind == StmtKind::kElif) {
-          Head(at);
-        } else if (kind == StmtKind::kTry) {
-          if (stmt.kind == StmtKind::kElse && BlockEnd(at) == Outcome::kAlways) return true;
-          if (stmt.kind != StmtKind::kElse) All(other.begin, other.block_end);
-        } else if (stmt.kind == StmtKind::kFinally || kind == StmtKind::kFor || kind == StmtKind::kWhile) {
-          All(other.begin, other.block_end);
-        }
-      }
-      return false;
+  const StmtKind kind = syntax_.stmt(clause).kind;
+  if (kind == StmtKind::kFor || kind == StmtKind::kWhile) BackEdges(clause);
+  return Head(clause, true) || Chain(clause);
+}
+
+// The same for the clauses in front of one of its chain.
+bool Flow::Chain(StmtId clause) {
+  const StmtKind own = syntax_.stmt(clause).kind;
+  if (!ContinuesChain(own)) return false;
+  for (StmtId at = clause; ContinuesChain(syntax_.stmt(at).kind) && syntax_.stmt(at).previous != kModuleStmt;) {
+    at = syntax_.stmt(at).previous;
+    const Stmt& other = syntax_.stmt(at);
+    switch (other.kind) {
+      case StmtKind::kIf:
+      case StmtKind::kElif:
+        if (Head(at)) return true;
+        break;
+      case StmtKind::kFor:
+        BackEdges(at);
+        Head(at);
+        break;
+      case StmtKind::kWhile:
+        BackEdges(at);
+        if (Head(at)) return true;
+        break;
+      case StmtKind::kTry:
+        if (own == StmtKind::kElse && BlockEnd(at) == Outcome::kAlways) return true;
+        if (own != StmtKind::kElse) All(other.begin, other.block_end);
+        break;
+      default:
+        if (own == StmtKind::kFinally) All(other.begin, other.block_end);
+        break;
     }
-    default:
-      return Head(clause);
   }
+  return false;
 }
 
 bool Flow::Before(StmtId stmt, StmtId top) {
@@ -233,30 +334,26 @@ bool Flow::Before(StmtId stmt, StmtId top) {
 
 bool Flow::Reach(uint32_t offset, StmtId top, std::vector<uint32_t>& reached) {
   reached_ = &reached;
+  steps_ = kMaxLoops;
   const StmtId at = syntax_.StatementAt(offset);
   bool is_bound = false;
   if (at != kModuleStmt && at != top) {
     const Stmt& stmt = syntax_.stmt(at);
     // A name that its own statement binds in front of it: by `:=`, the target of a `with` or of a comprehension's
     // loop. What stands in the head of a `for` is evaluated before its target is bound.
+    const uint32_t end = std::min(offset, stmt.end);
     if (stmt.kind != StmtKind::kAssign && stmt.kind != StmtKind::kAugmentedAssign && stmt.kind != StmtKind::kFor &&
         stmt.kind != StmtKind::kAnnotated && stmt.kind != StmtKind::kDef && stmt.kind != StmtKind::kClass) {
-      All(stmt.begin, std::min(offset, stmt.end));
+      is_bound = Bound(stmt.begin, end, offset);
     } else {
-      for (size_t i = FirstAt(stmt.begin); i < bindings_.size() && bindings_[i] < std::min(offset, stmt.end); ++i) {
+      for (size_t i = FirstAt(stmt.begin); i < bindings_.size() && bindings_[i] < end; ++i) {
         const ExprId named = syntax_.NamedAt(bindings_[i]);
-        if (named != kNoExpr && syntax_[syntax_[named].parent].kind == ExprKind::kNamed) Add(bindings_[i]);
+        if (named == kNoExpr || syntax_[syntax_[named].parent].kind != ExprKind::kNamed) continue;
+        is_bound = Bound(bindings_[i], bindings_[i] + 1, offset) || is_bound;
       }
     }
-    if (ContinuesChain(stmt.kind)) {
-      const StmtId head = HeadOfChain(at);
-      if (syntax_.stmt(head).kind == StmtKind::kTry) All(syntax_.stmt(head).begin, syntax_.stmt(head).block_end);
-      for (StmtId clause = head; clause != at && clause != kModuleStmt; clause = syntax_.stmt(clause).next)
-        Head(clause);
-    } else if (stmt.kind == StmtKind::kWhile) {
-      All(stmt.end, stmt.block_end);
-    }
-    is_bound = Before(at, top);
+    if (!is_bound && stmt.kind == StmtKind::kWhile) BackEdges(at);
+    is_bound = is_bound || Chain(at) || Before(at, top);
   }
   std::ranges::sort(reached);
   return is_bound;
@@ -264,6 +361,7 @@ bool Flow::Reach(uint32_t offset, StmtId top, std::vector<uint32_t>& reached) {
 
 bool Flow::ReachEnd(StmtId top, std::vector<uint32_t>& reached) {
   reached_ = &reached;
+  steps_ = kMaxLoops;
   uint32_t end = top == kModuleStmt ? static_cast<uint32_t>(file_.source->size()) + 1 : syntax_.stmt(top).block_end;
   bool is_bound = false;
   while (const StmtId last = LastIn(top, end)) {

@@ -18,6 +18,8 @@ class Flow {
  public:
   // More bindings than this are not told apart.
   static constexpr size_t kMaxBindings = 64;
+  // What more loops than this bind counts as bound anywhere in them.
+  static constexpr int kMaxLoops = 400;
 
   // The offsets, sorted, at which names of the variable's own scope bind it. `truth` says of a condition whether it
   // holds in every run: 1, 0, or -1 where that is not known.
@@ -37,7 +39,15 @@ class Flow {
   Outcome Group(StmtId head);
   Outcome BlockEnd(StmtId owner);
   bool Leaves(StmtId owner) const;
-  bool Head(StmtId stmt);
+  bool Chain(StmtId clause);
+  bool Jumps(StmtId loop, uint16_t word, bool* has_any = nullptr);
+  void BackEdges(StmtId loop);
+  // Adds what the head of a statement binds. Whether one is surely bound behind it; where `holds`, of a condition
+  // that holds.
+  bool Head(StmtId stmt, bool holds = false);
+  // The same for what is bound from `begin` to `end`, of a place behind it in the same statement.
+  bool Bound(uint32_t begin, uint32_t end, uint32_t place, bool holds = false);
+  bool IsSure(uint32_t binding, uint32_t place, bool holds) const;
   void All(uint32_t begin, uint32_t end);
   size_t FirstAt(uint32_t offset) const;
   bool HasAny(uint32_t begin, uint32_t end) const;
@@ -53,6 +63,7 @@ class Flow {
   std::span<const uint32_t> bindings_;
   const std::function<int(ExprId)>& truth_;
   std::vector<uint32_t>* reached_ = nullptr;
+  int steps_ = 0;
 };
 
 // Whether a clause goes on with the statement in front of it: `elif`, `else`, `except`, `finally`.
