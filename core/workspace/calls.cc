@@ -534,8 +534,12 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
         // What the constructor says of `self` settles variables as well: `self: dict[str, V]`.
         const FunctionInfo made = functions_[types_[function].a];
         const auto parameters = ParametersOf(made);
-        const ExprId hint = parameters.empty() ? kNoExpr : HintOfParameter(*FileOf(made.file), made, 0);
-        if (hint != kNoExpr && name == "__init__") {
+        // And what `__new__` says that it makes: `zip[tuple[T, S]]`.
+        const FileSyntax& syntax = FileOf(made.file)->syntax;
+        const ExprId hint = name == "__new__"    ? syntax.stmt(made.stmt).hint
+                            : parameters.empty() ? kNoExpr
+                                                 : HintOfParameter(*FileOf(made.file), made, 0);
+        if (hint != kNoExpr && syntax[hint].kind != ExprKind::kSignatureHint) {
           for (const TypeId self : types_.CopyOf(ValueOfHint(made.file, hint).set)) {
             if (types_[self].kind != TypeKind::kInstance || types_[self].a != cls) continue;
             const std::vector<TypeId> variables = info.parameters;

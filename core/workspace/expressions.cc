@@ -201,9 +201,12 @@ Value Inference::EvaluateTuple(const SourceFile& file, ExprId expr, FrameId fram
       for (size_t i = 0; i < types_[tuple].args_count; ++i) items.push_back(types_.ArgOf(tuple, i));
       continue;
     }
-    TypeSetId all = IterationOf(value).set;
-    for (const TypeSetId known : items) all = types_.Union(all, known);
-    return InstanceNamed("builtins", "tuple", {all});
+    Value all;
+    for (const ExprId one : file.syntax.ChildrenOf(expr)) {
+      const Value part = ValueOf(file.id, one, frame);
+      all = types_.Union(all, file.syntax[one].kind == ExprKind::kStarred ? IterationOf(part) : part);
+    }
+    return InstanceNamed("builtins", "tuple", {WithoutLiterals(all).set});
   }
   static constexpr size_t kMaxItems = 64;
   if (items.size() > kMaxItems) {

@@ -211,10 +211,7 @@ Value Inference::ReturnedIn(FunctionId id, FrameId frame) {
       skipped_to = stmt;
       continue;
     }
-    if (at.kind == StmtKind::kRaise && at.parent == info.stmt) {
-      const auto exprs = syntax.ExprsOf(at);
-      raises_only = !exprs.empty() && syntax.TextOf(syntax[exprs[0]]).starts_with("NotImplemented");
-    }
+    if (at.kind == StmtKind::kRaise && at.parent == info.stmt) raises_only = true;
     if (at.kind != StmtKind::kReturn || !IsReachable(*file, stmt)) continue;
     const int reached = IsReached(*file, stmt, info.stmt, frame);
     if (reached == 0) continue;
@@ -224,7 +221,7 @@ Value Inference::ReturnedIn(FunctionId id, FrameId frame) {
     value = types_.Union(value, exprs.empty() ? NoneValue() : ValueOf(info.file, exprs[0], frame));
   }
   if (has_return) return value;
-  // One that a subclass has to write says nothing.
+  // One that always raises, or that a subclass has to write, says nothing.
   if (raises_only || (info.flags & kIsAbstract) != 0) return kUnknown;
   return NoneValue();
 }

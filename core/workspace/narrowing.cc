@@ -55,6 +55,18 @@ class Inference::Narrowing {
         return e.children_count == 2 ? Comparison(condition, holds, value) : value;
       case ExprKind::kCall:
         return Call(condition, holds, value);
+      // What a `case` is met by.
+      case ExprKind::kPatternClass:
+        return holds ? OfClass(in_.ValueOf(file_.id, syntax_.ChildOf(condition, 0), frame_), value, true) : value;
+      case ExprKind::kPatternAs:
+        return Where(syntax_.ChildOf(condition, 0), holds, value, depth + 1);
+      case ExprKind::kPatternOr: {
+        if (!holds) return value;
+        Value either;
+        for (const ExprId pattern : syntax_.ChildrenOf(condition))
+          either = in_.types_.Union(either, Where(pattern, true, value, depth + 1));
+        return either;
+      }
       default:
         return value;
     }
@@ -113,6 +125,21 @@ class Inference::Narrowing {
       if (!IsSubject(subject)) return value;
       const Value cls = in_.ValueOf(file_.id, children[2], frame_);
       return name == "isinstance" ? OfClass(cls, value, holds) : value;
+    }
+    if (children.size() == 2 && IsSubject(children[1])) {
+      // A function that says of what it is given what it is.
+      for (const TypeId id : in_.types_.CopyOf(in_.ValueOf(file_.id, children[0], frame_).set)) {
+        if (in_.types_[id].kind != TypeKind::kFunction) continue;
+        const FunctionInfo info = in_.functions_[in_.types_[id].a];
+        const SourceFile* source = in_.FileOf(info.file);
+        if (source == nullptr || info.lambda != kNoExpr) continue;
+        const ExprId hint = source->syntax.stmt(info.stmt).hint;
+        if (hint == kNoExpr || source->syntax[hint].kind != ExprKind::kSubscript) continue;
+        const Text form = source->syntax.TextOf(source->syntax[source->syntax.ChildOf(hint, 0)]);
+        if (!holds || !(form.ends_with("TypeGuard") || form.ends_with("TypeIs"))) continue;
+        const Value said = in_.ValueOfHint(info.file, source->syntax.ChildOf(hint, 1));
+        if (said.IsKnown()) return said;
+      }
     }
     if (children.size() == 2 && name == "callable" && IsSubject(children[1])) {
       std::vector<TypeId> rest;
@@ -237,7 +264,9 @@ Value Inference::Narrowed(const SourceFile& file, ExprId expr, Value value, Fram
     const bool in_own_head = in_head(stmt);
     if (!in_own_head && (own.kind == StmtKind::kIf || own.kind == StmtKind::kElif || own.kind == StmtKind::kWhile))
       add(condition_of(stmt), true);
-    if (own.kind == StmtKind::kAssert && in_own_head) {
+    if (!in_own_head && own.kind == StmtKind::kCase) {
+      const ExprId subject = condition_of(own.parent);
+      if (subject != kNoExpr && SameChain(syntax, subject, expr)) conditions.push_back({condition_of(stmt), true});
     }
     StmtId at = stmt;
     if (own.kind == StmtKind::kElif || own.kind == StmtKind::kElse) {
@@ -254,6 +283,12 @@ Value Inference::Narrowed(const SourceFile& file, ExprId expr, Value value, Fram
       const Stmt& before = syntax.stmt(at);
       if (before.kind == StmtKind::kAssert) {
         add(condition_of(at), true);
+      } else if (before.kind == StmtKind::kWhile && mentions(before.begin, before.end)) {
+        bool has_break = false;
+        for (StmtId inner = at + 1; inner < syntax.stmts.size() && syntax.stmt(inner).begin < before.block_end; ++inner)
+          has_break =
+              has_break || (syntax.stmt(inner).kind == StmtKind::kPass && syntax.stmt(inner).op == word::kBreak);
+        if (!has_break) add(condition_of(at), false);
       } else if (before.kind == StmtKind::kIf && mentions(before.begin, before.end)) {
         const StmtKind next = before.next == kModuleStmt ? StmtKind::kPass : syntax.stmt(before.next).kind;
         if (next != StmtKind::kElif && next != StmtKind::kElse && BlockLeaves(syntax, at, true))

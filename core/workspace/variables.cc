@@ -701,6 +701,9 @@ Value Inference::Unpack(const SourceFile& file, ExprId target, ExprId root, Valu
         const size_t behind = targets.size() - star - 1;
         for (size_t i = star; i + behind < t.args_count; ++i) rest = types_.Union(rest, Value{types_.ArgOf(id, i), 0});
         item = types_.Union(item, InstanceNamed("builtins", "list", {rest.set}));
+      } else if (t.kind == TypeKind::kInstance && star == SIZE_MAX && InfoOf(t.a).is_named_tuple &&
+                 index < MembersOf(t.a).fields.size()) {
+        item = types_.Union(item, AttributeOfType(id, MembersOf(t.a).fields[index].name));
       } else {
         const Value items = IterationOf(Just(id));
         item = types_.Union(item, index == star ? InstanceNamed("builtins", "list", {items.set}) : items);
@@ -729,6 +732,10 @@ Value Inference::ValueOfTarget(const SourceFile& file, ExprId target, FrameId fr
       case ExprKind::kWithItem: {
         const StmtId stmt = syntax.StatementOf(parent);
         const bool is_async = (syntax.stmt(stmt).flags & kAsyncStmt) != 0;
+        if (syntax.stmt(stmt).hint != kNoExpr) {
+          const Value hint = ValueOfHint(file.id, syntax.stmt(stmt).hint, frame);
+          if (hint.IsKnown()) return Unpack(file, target, root, hint, {}, frame);
+        }
         const Value entered = Entered(ValueOf(file.id, syntax.ChildOf(parent, 0), frame), is_async);
         return Unpack(file, target, root, entered, {}, frame);
       }
@@ -819,8 +826,13 @@ Value Inference::ValueOfTarget(const SourceFile& file, ExprId target, FrameId fr
       const Value iterable = ValueOf(file.id, exprs[1], frame);
       return Unpack(file, target, root, IterationOf(iterable, (stmt.flags & kAsyncStmt) != 0), {}, frame);
     }
-    case StmtKind::kExcept:
-      return exprs.empty() ? kUnknown : Caught(ValueOf(file.id, exprs[0], frame));
+    case StmtKind::kExcept: {
+      const Value caught = exprs.empty() ? kUnknown : Caught(ValueOf(file.id, exprs[0], frame));
+      if ((stmt.flags & kExceptGroup) == 0) return caught;
+      Value group = InstanceNamed("builtins", "ExceptionGroup", {caught.set});
+      group.doubt |= caught.doubt;
+      return group;
+    }
     default:
       return kUnknown;
   }

@@ -72,7 +72,7 @@ class Program {
                        : path.starts_with(folder_.path())       ? path.substr(folder_.path().size() + 1)
                        : path.starts_with(SmallLibrary() + "/") ? path.substr(SmallLibrary().size() + 1)
                                                                 : path;
-    said += ":" + std::to_string(place.line) + ":" + std::to_string(place.column);
+    said += ":" + std::to_string(place.line) + ":" + std::to_string(place.col);
     if (certainty != Certainty::kCertain) said += " " + std::string(WordOf(certainty));
     return said;
   }

@@ -1,0 +1,414 @@
+// What expressions are: small programs and the types at their marked places.
+#include <gtest/gtest.h>
+
+#include <initializer_list>
+#include <string>
+#include <vector>
+
+#include "tests/core/support/program.h"
+
+namespace quillet {
+namespace {
+
+using testing::Program;
+
+struct Case {
+  const char* text;
+  std::vector<std::string> types;  // at each mark; without "builtins."
+};
+
+std::string WithoutBuiltins(std::string type) {
+  for (size_t at = type.find("builtins."); at != std::string::npos; at = type.find("builtins.", at)) type.erase(at, 9);
+  return type;
+}
+
+void Check(std::initializer_list<Case> cases, Version version = Version::Of(3, 12)) {
+  for (const Case& one : cases) {
+    Program program(one.text, version);
+    std::vector<std::string> types = program.AllTypes();
+    for (std::string& type : types) type = WithoutBuiltins(type);
+    EXPECT_EQ(types, one.types) << one.text;
+  }
+}
+
+TEST(Inference, ReadsLiterals) {
+  Check({
+      {"$a = 1\n$b = 1.5\n$c = 2j\n$d = 'x'\n$e = b'x'\n$f = True\n$g = None\n$h = ...\n$i = f'{a}'\n",
+       {"int", "float", "complex", "str", "bytes", "bool", "None", "types.EllipsisType", "str"}},
+      {"$a = [1, 2]\n$b = {1}\n$c = {'a': 1}\n$d = 1, 'a'\n$e = ()\n$f = []\n$g = [1, 'a']\n",
+       {"list[int]", "set[int]", "dict[str, int]", "tuple[int, str]", "tuple[()]", "list", "list[int | str]"}},
+      {"$a = 'x' 'y'\n$b = b'x' b'y'\n$c = u'x'\n$d = r'x'\n", {"str", "bytes", "str", "str"}},
+      {"a = [1]\n$b = [*a, 'x']\nc = {'a': 1}\n$d = {**c, 'b': 'x'}\n$e = (*a, 'x')\n",
+       {"list[int | str]", "dict[str, int | str]", "tuple[int | str]"}},
+      {"$a = lambda: 1\n$b = (lambda x: x)(1)\n", {"def () -> int", "int"}},
+  });
+}
+
+TEST(Inference, KnowsWhatOperatorsGive) {
+  Check({
+      {"$a = 1 + 2\n$b = 1 / 2\n$c = 1 + 1.5\n$d = -1\n$e = not 1\n$f = 1 < 2\n$g = 'a' + 'b'\n$h = 'a' % 1\n",
+       {"int", "float", "float", "int", "bool", "bool", "str", "str"}},
+      {"$a = 1 is None\n$b = 'a' in 'ab'\n$c = 'a' * 2\n$d = [1] + ['a']\n",
+       {"bool", "bool", "str", "list[int | str]"}},
+      {"class A:\n  def __add__(self, other): return 'x'\n  def __radd__(self, other): return b'x'\n"
+       "  def __neg__(self): return 1\n  def __getitem__(self, i): return 1.5\n  def __lt__(self, other): return [1]\n"
+       "  def __iadd__(self, other): return 1\n"
+       "a = A()\n$b = a + 1\n$c = 1 + a\n$d = -a\n$e = a[0]\n$f = a < a\na += 1\n$a\n",
+       {"str", "bytes", "int", "float", "list[int]", "int"}},
+      {"def f(a: int, b: str, c: int | None):\n  $x = a and b\n  $y = a or b\n  $z = c or b\n  $w = a if b else b\n",
+       {"int | str", "int | str", "int | str", "int | str"}},
+      {"$a = None or 1\n$b = [] and 1\n", {"int", "int | list"}},
+  });
+}
+
+TEST(Inference, FollowsCallsToWhatTheyReturn) {
+  Check({
+      {"def f(): return 1\n$a = f()\n$b = f\n", {"int", "def () -> int"}},
+      {"def f(x):\n  if x: return 1\n  return 'a'\n$a = f(0)\n", {"int | str"}},
+      {"def f(): pass\n$a = f()\n", {"None"}},
+      {"def f(): raise E\n$a = f()\n", {""}},
+      {"def f(x): return x\n$a = f(1)\n$b = f('a')\n", {"int", "str"}},
+      {"def f(x, y=2, *z, w='a', **k): return x, y, z, w, k\n$a = f(b'', 1.5, None, w=3, v=4)\n",
+       {"tuple[bytes, float, tuple[None], int, dict[str, int]]"}},
+      {"def f(x, y): return y\n$a = f(y=1, x='a')\n$b = f(*('a', 1))\n$c = f(**{'y': 1, 'x': 'a'})\n",
+       {"int", "int", "int"}},
+      {"def f(g): return g(1)\n$a = f(lambda x: [x])\n$b = f(str)\n", {"list[int]", "str"}},
+      {"def f() -> 'int': return g()\n$a = f()\n", {"int"}},
+      {"class A:\n  def __call__(self): return 1\n$a = A()()\n", {"int"}},
+      {"def f():\n  def g(): return 1\n  return g\n$a = f()()\n", {"int"}},
+      {"def f(x):\n  def g(): return x\n  return g\n$a = f('a')()\n$b = f(1)()\n", {"str", "int"}},
+      {"def f(n):\n  if n: return f(n - 1)\n  return 1\n$a = f(3)\n", {"int"}},
+      {"def f(n): return g(n)\ndef g(n): return f(n)\n$a = f(3)\n", {""}},
+  });
+}
+
+TEST(Inference, KnowsAttributesOfInstances) {
+  Check({
+      {"class A:\n  def __init__(self):\n    self.x = 1\n  def m(self):\n    self.y = 'a'\n    $self.x\n"
+       "a = A()\na.$x\na.$y\na.$m\n$a\n",
+       {"a.A", "int", "str", "def () -> None", "a.A"}},
+      {"class A:\n  x = 1\n  def __init__(self):\n    self.x = 'a'\na = A()\na.$x\nA.$x\n", {"int | str", "int"}},
+      {"class A:\n  x: int = None\n  y: 'str'\nA().$x\nA().$y\n", {"int", "str"}},
+      {"class A:\n  def __init__(self, x): self.x = x\nA(1).$x\n", {"int"}},
+      {"class A:\n  def m(self): return self\nclass B(A): pass\nB().$m()\n$b = B().m()\n", {"def () -> a.A", "a.B"}},
+      {"class A:\n  class B:\n    x = 1\n$a = A.B()\nA.B.$x\n", {"a.A.B", "int"}},
+      {"class A:\n  def m(self): return 1\n$a = A.m\n$b = A().m\n", {"def (self) -> int", "def () -> int"}},
+      {"class A: pass\n$a = A\n$b = A()\nb.$__class__\n", {"type[a.A]", "a.A", "type[a.A]"}},
+  });
+}
+
+TEST(Inference, CallsPropertiesAndDescriptors) {
+  Check({
+      {"class A:\n  @property\n  def p(self): return 1\n  @p.setter\n  def p(self, value): pass\n"
+       "a = A()\na.$p\nA.$p\n",
+       {"int", "property"}},
+      {"class A:\n  def get(self): return 1\n  p = property(get)\nA().$p\n", {"int"}},
+      {"class D:\n  def __get__(self, instance, owner): return 1\nclass A:\n  d = D()\nA().$d\nA.$d\n", {"int", "int"}},
+      {"from functools import cached_property\nclass A:\n  @cached_property\n  def p(self): return 'a'\nA().$p\n",
+       {"str"}},
+      {"class D:\n  def __get__(self, instance: None, owner) -> int: ...\nclass A:\n  def __init__(self):\n"
+       "    self.d = D()\nA().$d\n",
+       {"a.D"}},
+  });
+}
+
+TEST(Inference, TellsStaticAndClassMethodsApart) {
+  Check({
+      {"class A:\n  @staticmethod\n  def s(x): return x\n  @classmethod\n  def c(cls): return cls()\n"
+       "  @classmethod\n  def d(cls):\n    $cls\n    return cls\nclass B(A): pass\n"
+       "$a = A.s(1)\n$b = A().s('a')\n$c = B.c()\n$d = B().c()\n$e = B.d()\n",
+       {"type[a.A]", "int", "str", "a.B", "a.B", "type[a.B]"}},
+      {"class A:\n  def __new__(cls, x): return super().__new__(cls)\n$a = A(1)\n", {"a.A"}},
+      {"class A:\n  def __new__(cls): return 1\n$a = A()\n", {"int"}},
+      {"class M(type):\n  def m(cls): return 1\nclass A(metaclass=M): pass\n$a = A.m()\n", {"int"}},
+      {"class M(type):\n  def __call__(cls): return 1\nclass A(metaclass=M): pass\n$a = A()\n", {"int"}},
+      {"class A:\n  def __init_subclass__(cls): $cls\n", {"type[a.A]"}},
+  });
+}
+
+TEST(Inference, GoesToBasesBySuper) {
+  Check({
+      {"class A:\n  def m(self): return 1\nclass B(A):\n  def m(self):\n    return $super().m(), 'a'\n$b = B().m()\n",
+       {"type[super]", "tuple[int, str]"}},
+      {"class A:\n  def m(self): return 1\nclass B(A):\n  def m(self):\n    $x = super(B, self).m()\n", {"int"}},
+      {"class A:\n  @classmethod\n  def c(cls): return cls()\nclass B(A):\n  @classmethod\n  def c(cls):\n"
+       "    return super().c()\n$b = B.c()\n",
+       {"a.B"}},
+      {"class A:\n  def m(self): return 1\nclass B(A):\n  def m(self): return 'a'\nclass C(A):\n"
+       "  def m(self): return super().m()\nclass D(C, B): pass\n$c = C().m()\n$d = D().m()\n",
+       {"int", "str"}},
+      {"class A:\n  def m(self): return 1\nclass B(A):\n  def m(self): return 'a'\n  def n(self):\n"
+       "    $x = super().m()\n    $y = self.m()\n",
+       {"int", "str"}},
+  });
+}
+
+TEST(Inference, OrdersBasesByC3) {
+  Check({
+      {"class A: x = 1\nclass B(A): pass\nclass C(A): x = 'a'\nclass D(B, C): pass\nD.$x\n", {"str"}},
+      {"class A: x = 1\nclass B(A): x = b''\nclass C(A): x = 'a'\nclass D(B, C): pass\nD.$x\n", {"bytes"}},
+      {"class O: pass\nclass A(O): pass\nclass B(O): x = 1\nclass C(A, B): pass\nC().$x\n", {"int"}},
+      {"from nowhere import U\nclass A: x = 1\nclass B(A, U): pass\nclass C(U, A): pass\nB().$x\nC().$x\n",
+       {"int", "int"}},
+      {"class A(A): x = 1\nA.$x\nclass B(C): y = 1\nclass C(B): z = 'a'\nC.$y\nB.$y\n", {"int", "int", "int"}},
+      {"class A: x = 1\nclass B(A): pass\nclass C(A, B): pass\nC.$x\n", {"int"}},
+  });
+}
+
+TEST(Inference, SolvesGenerics) {
+  Check({
+      {"from typing import TypeVar\nT = TypeVar('T')\ndef f(x: T, y: list[T]) -> dict[str, T]: ...\n$a = f(1, [2])\n",
+       {"dict[str, int]"}},
+      {"def f[T](x: T) -> list[T]: ...\n$a = f('a')\n", {"list[str]"}},
+      {"from typing import Generic, TypeVar\nT = TypeVar('T')\nclass Box(Generic[T]):\n"
+       "  def __init__(self, item: T): self.item = item\n  def get(self) -> T: return self.item\n"
+       "$a = Box(1)\n$b = Box('a').get()\nBox(b'').$item\ndef f(x: Box[float]):\n  x.$item\n  $y = x.get()\n",
+       {"a.Box[int]", "str", "bytes", "float", "float"}},
+      {"class Box[T]:\n  def get(self) -> T: ...\nclass Sub(Box[int]): pass\nclass More[U](Box[list[U]]): pass\n"
+       "$a = Sub().get()\ndef f(x: More[str]):\n  $y = x.get()\n",
+       {"int", "list[str]"}},
+      {"from typing import Self\nclass A:\n  def m(self) -> Self: ...\n  @classmethod\n  def c(cls) -> Self: ...\n"
+       "class B(A): pass\n$a = B().m()\n$b = B.c()\n",
+       {"a.B", "a.B"}},
+      {"from typing import overload\n@overload\ndef f(x: int) -> str: ...\n@overload\ndef f(x: str) -> int: ...\n"
+       "def f(x): return x\n$a = f(1)\n$b = f('a')\n",
+       {"str", "int"}},
+      {"d = {'a': [1]}\n$a = d.items()\n$b = d.get('b')\n$c = d.get('b', [2])\n$e = d['a'][0]\n",
+       {"dict_items[str, list[int]]", "None | list[int]", "list[int]", "int"}},
+      {"$a = sorted({'a': 1})\n$b = max([1.5])\n$c = next(iter([b'']))\n$d = list(map(len, ['a']))\n"
+       "$e = list(zip([1], ['a']))\n$f = dict({1: 'a'})\n",
+       {"list[str]", "float", "bytes", "list[int]", "list[tuple[int, str]]", "dict[int, str]"}},
+      {"from typing import Callable, TypeVar\nT = TypeVar('T')\ndef f(g: Callable[[], T]) -> T: ...\n"
+       "$a = f(lambda: 1)\nclass A: pass\n$b = f(A)\n",
+       {"int", "a.A"}},
+      {"def f(x: type[int], y: 'list[str]'):\n  $a = x()\n  $b = y[0]\n  $c = y[1:]\n", {"int", "str", "list[str]"}},
+  });
+}
+
+TEST(Inference, UnpacksAndIterates) {
+  Check({
+      {"$a, $b = 1, 'a'\n($c, [$d, $e]) = 1, ('a', b'')\n", {"int", "str", "int", "str", "bytes"}},
+      {"$a, *$b, $c = 1, 'a', 'b', 1.5\n*$d, $e = [1, 2]\n", {"int", "list[str]", "float", "list[int]", "int"}},
+      {"for $a in [1]: pass\nfor $b in 'ab': pass\nfor $c, $d in {'a': 1}.items(): pass\nfor $e in {1: 2}: pass\n",
+       {"int", "str", "str", "int", "int"}},
+      {"for $i, $x in enumerate(['a']): pass\nfor $a, $b in zip([1], [b'']): pass\nfor $c in range(3): pass\n",
+       {"int", "str", "int", "bytes", "int"}},
+      {"for $a in (1, 'a'): pass\nfor $b in (1,) + (2,): pass\n", {"int | str", "int"}},
+      {"class A:\n  def __iter__(self): return self\n  def __next__(self): return 1\nfor $a in A(): pass\n"
+       "[$b, $c] = A()\n",
+       {"int", "int", "int"}},
+      {"class A:\n  def __getitem__(self, i): return 'a'\nfor $a in A(): pass\n", {"str"}},
+      {"t = 1, 'a', b''\n$a = t[0]\n$b = t[-1]\n$c = t[g()]\n", {"int", "bytes", "bytes | int | str"}},
+      {"d = {'a': 1, 'b': 'x'}\n$a = d['a']\n$b = d['b']\n", {"int", "str"}},
+      {"a = []\na.append(1)\nfor $x in a: pass\n", {"int"}},
+      {"x = [1, 2]\nx[$i], y = 1, 2\n", {""}},
+  });
+}
+
+TEST(Inference, EntersManagersAndCatchesErrors) {
+  Check({
+      {"class A:\n  def __enter__(self): return 1\n  def __exit__(self, *a): pass\nwith A() as $a: pass\n"
+       "with A() as b, A() as $c: pass\n",
+       {"int", "int"}},
+      {"class A:\n  def __enter__(self): return 1, 'a'\nwith A() as ($a, $b): pass\n", {"int", "str"}},
+      {"class A:\n  async def __aenter__(self): return 1\nasync def f():\n  async with A() as $a: pass\n", {"int"}},
+      {"from contextlib import contextmanager\n@contextmanager\ndef f():\n  yield 'a'\nwith f() as $a: pass\n",
+       {"str"}},
+      {"try: pass\nexcept ValueError as $e: pass\nexcept (KeyError, OSError) as $f:\n  f.$errno\n",
+       {"ValueError", "KeyError | OSError", "None | int"}},
+      {"class E(Exception):\n  def __init__(self, x): self.x = x\ntry: pass\nexcept E as e:\n  $e.x\n", {"a.E"}},
+      {"es = (ValueError, KeyError)\ntry: pass\nexcept es as $e: pass\n", {"KeyError | ValueError"}},
+      {"try: pass\nexcept* ValueError as $e: pass\n", {"ExceptionGroup[ValueError]"}},
+  });
+}
+
+TEST(Inference, ReadsComprehensionsAndLambdas) {
+  Check({
+      {"$a = [x for x in [1]]\n$b = {x for x in 'a'}\n$c = {k: v for k, v in [(1, 'a')]}\n"
+       "$d = (x for x in [1])\n$e = [($y, z) for y in [1] for z in [y]]\n",
+       {"list[int]", "set[str]", "dict[int, str]", "typing.Generator[int, None, None]", "list[tuple[int, int]]",
+        "int"}},
+      {"for $x in (str(i) for i in [1]): pass\n", {"str"}},
+      {"f = lambda x, y=1: (x, y)\n$a = f('a')\n", {"tuple[str, int]"}},
+      {"$a = [x for x in [1, None] if x is not None]\n", {"list[int]"}},
+      {"$a = [y := 1 for _ in 'a']\n$b = y\nif ($z := 'a'): pass\n", {"list[int]", "int", "str"}},
+  });
+}
+
+TEST(Inference, LooksThroughDecorators) {
+  Check({
+      {"from functools import wraps\ndef d(f):\n  @wraps(f)\n  def w(*args, **kw): return f(*args, **kw)\n  return w\n"
+       "@d\ndef f(x): return 1\n$a = f(2)\n",
+       {"int"}},
+      {"def d(f): return f\n@d\ndef f(): return 1\n$a = f()\n", {"int"}},
+      {"def d(n):\n  def e(f): return f\n  return e\n@d(1)\ndef f(): return 'a'\n$a = f()\n", {"str"}},
+      {"def d(f): return 1\n@d\ndef f(): pass\n$a = f\n", {"int"}},
+      {"def d(c):\n  c.x = 1\n  return c\n@d\nclass A: pass\n$a = A()\n", {"a.A"}},
+      {"class D:\n  def __init__(self, f): self.f = f\n  def __call__(self): return 1\n@D\ndef f(): pass\n$a = f()\n"
+       "$f\n",
+       {"int", "a.D"}},
+      {"from nowhere import d\n@d\ndef f(): return 1\n$a = f()\n", {"int"}},
+  });
+}
+
+TEST(Inference, KnowsDataclasses) {
+  Check({
+      {"from dataclasses import dataclass, field\n@dataclass\nclass A:\n  x: int\n  y: str = 'a'\n"
+       "  z: list[int] = field(default_factory=list)\na = A(1)\na.$x\na.$y\na.$z\n",
+       {"int", "str", "list[int]"}},
+      {"import dataclasses\n@dataclasses.dataclass(frozen=True)\nclass A[T]:\n  x: T\n$a = A(1)\n", {"a.A"}},
+  });
+}
+
+TEST(Inference, KnowsNamedTuplesTypedDictsAndEnums) {
+  Check({
+      {"from typing import NamedTuple\nclass P(NamedTuple):\n  x: int\n  y: str = ''\n  def m(self): return self.x\n"
+       "p = P(1)\np.$x\n$a, $b = p\n$c = p[1]\n$d = p.m()\n$p\n",
+       {"int", "int", "str", "str", "int", "a.P"}},
+      {"from collections import namedtuple\nP = namedtuple('P', 'x y')\n$p = P(1, 'a')\n$q = p._asdict()\n",
+       {"a.P", "dict[str, typing.Any]"}},
+      {"from typing import NamedTuple\nP = NamedTuple('P', [('x', int), ('y', str)])\nP(1, 'a').$y\n", {"str"}},
+      {"from typing import TypedDict\nclass D(TypedDict):\n  x: int\n  y: 'str'\ndef f(d: D):\n  $a = d['x']\n"
+       "  $b = d['y']\n  $c = d.copy()\n",
+       {"int", "str", "a.D"}},
+      {"from enum import Enum\nclass C(Enum):\n  RED = 1\n  BLUE = 'b'\n  def m(self): return self.value\n"
+       "$a = C.RED\nC.RED.$name\nC.RED.$value\nC.BLUE.$value\nfor $c in C: pass\n$d = C['RED']\n$e = C(1)\n",
+       {"a.C", "str", "int", "str", "a.C", "a.C", "a.C"}},
+  });
+}
+
+TEST(Inference, NarrowsByConditions) {
+  Check({
+      {"def f(x: int | None):\n  if x is None:\n    $x\n  else:\n    $x\n  if x is not None:\n    $x\n  $x\n",
+       {"None", "int", "int", "None | int"}},
+      {"def f(x: int | None):\n  if x:\n    $x\n  if not x:\n    $x\n", {"int", "None | int"}},
+      {"def f(x: int | None):\n  if x is None:\n    return\n  $x\n", {"int"}},
+      {"def f(x: int | None):\n  if x is None:\n    raise ValueError\n  $x\n", {"int"}},
+      {"def f(x: int | None):\n  assert x is not None\n  $x\n", {"int"}},
+      {"def f(x: int | str | None):\n  if isinstance(x, int):\n    $x\n  elif isinstance(x, str):\n    $x\n  else:\n"
+       "    $x\n",
+       {"int", "str", "None"}},
+      {"def f(x: int | str | bytes):\n  if isinstance(x, (int, str)):\n    $x\n  else:\n    $x\n",
+       {"int | str", "bytes"}},
+      {"def f(x: int | str | bytes):\n  if isinstance(x, int) or isinstance(x, str):\n    $x\n  else:\n    $x\n",
+       {"int | str", "bytes"}},
+      {"def f(x: int | None, y):\n  $a = x is not None and $x\n  if y and x is not None:\n    $x\n",
+       {"bool | int", "int", "int"}},
+      {"def f(x: int | None):\n  $a = x if x is not None else 0\n", {"int"}},
+      {"def f(x: int | None):\n  while x is None:\n    $x\n  $x\n", {"None", "int"}},
+      {"class A:\n  x: 'int | None'\n  def m(self):\n    if self.x is not None:\n      self.$x\n    self.$x\n",
+       {"int", "None | int"}},
+      {"def f(x):\n  if isinstance(x, str):\n    $x\n", {"str"}},
+      {"class A: pass\nclass B(A): pass\ndef f(x: A):\n  if isinstance(x, B):\n    $x\n  else:\n    $x\n",
+       {"a.B", "a.A"}},
+      {"def f(x: type[int] | None):\n  if x is None: return\n  $x\n", {"type[int]"}},
+      {"def f(x: int | str):\n  match x:\n    case int():\n      $x\n    case str() as $y: pass\n", {"int", "str"}},
+      {"def f(x: int | None):\n  if (y := x) is not None:\n    $y\n", {"int"}},
+      {"from typing import TypeGuard\ndef g(x) -> TypeGuard[int]: ...\ndef f(x):\n  if g(x):\n    $x\n", {"int"}},
+      {"def f(x: int | None):\n  if x == None:\n    return 1\n  $x\n", {"int"}},
+  });
+}
+
+TEST(Inference, ReadsPatterns) {
+  Check({
+      {"match (1, 'a'):\n  case ($x, $y): pass\n", {"int", "str"}},
+      {"match [1]:\n  case [$x, *$y]: pass\n", {"int", "list[int]"}},
+      {"match {'a': 1}:\n  case {'a': $x, **$rest}: pass\n", {"int", "dict[str, int]"}},
+      {"class P:\n  __match_args__ = ('x',)\n  def __init__(self):\n    self.x = 1\n    self.y = 'a'\n"
+       "def f(p):\n  match p:\n    case P($x, y=$y): pass\n",
+       {"int", "str"}},
+      {"def f(x):\n  match x:\n    case str() | int() as $y: pass\n", {"int | str"}},
+  });
+}
+
+TEST(Inference, AwaitsAndGenerates) {
+  Check({
+      {"async def f(): return 1\nasync def g():\n  $a = await f()\n  $b = f()\n",
+       {"int", "typing.Coroutine[typing.Any, typing.Any, int]"}},
+      {"def f():\n  x = yield 1\n  return 'a'\n$a = f()\nfor $b in f(): pass\ndef g():\n  $c = yield from f()\n",
+       {"typing.Generator[int, typing.Any, str]", "int", "str"}},
+      {"async def f():\n  yield 1\nasync def g():\n  async for $x in f(): pass\n  $y = [z async for z in f()]\n",
+       {"int", "list[int]"}},
+      {"class A:\n  def __await__(self):\n    yield\n    return 1\nasync def f():\n  $a = await A()\n", {"int"}},
+      {"from typing import Iterator\ndef f() -> Iterator[int]:\n  yield 1\nfor $a in f(): pass\n", {"int"}},
+      {"async def f() -> int: ...\nasync def g():\n  $a = await f()\n", {"int"}},
+      {"def f():\n  yield from [1]\nfor $a in f(): pass\n", {"int"}},
+  });
+}
+
+TEST(Inference, ReadsAnnotationsAndTypeComments) {
+  Check({
+      {"def f(x, y):\n  # type: (int, str) -> bytes\n  $x\n  $y\n$a = f(1, 'a')\n", {"int", "str", "bytes"}},
+      {"def f(x,  # type: int\n      y,  # type: str\n      ):\n  # type: (...) -> bytes\n  $x\n  $y\n",
+       {"int", "str"}},
+      {"class A:\n  def m(self, x):\n    # type: (int) -> str\n    $x\n$a = A().m(1)\n", {"int", "str"}},
+      {"x = g()  # type: int\n$x\n", {"int"}},
+      {"for x in g():  # type: int\n  $x\nwith g() as y:  # type: str\n  $y\n", {"int", "str"}},
+      {"x: int = g()\n$x\ny: 'list[A]'\n$y\nclass A: pass\n", {"int", "list[a.A]"}},
+      {"from typing import Optional, Union, List, Dict, Tuple\ndef f(a: Optional[int], b: Union[int, str], c: "
+       "List[int],"
+       " d: Dict[str, int], e: Tuple[int, ...]):\n  $a; $b; $c; $d; $e\n",
+       {"None | int", "int | str", "list[int]", "dict[str, int]", "tuple[int]"}},
+      {"from typing import Literal, Final, ClassVar, Annotated, Any\na: Final = 1\n$a\nclass A:\n  x: ClassVar[int]\n"
+       "A.$x\ndef f(m: Literal['a', 1], n: Annotated[str, 1], o: Any):\n  $m; $n; $o\n",
+       {"int", "int", "int | str", "str", ""}},
+      {"from typing import Callable\ndef f(g: Callable[[int], str], *args: int, **kw: str):\n  $a = g(1)\n  $args\n"
+       "  $kw\n",
+       {"str", "tuple[int]", "dict[str, str]"}},
+      {"type L = list[int]\nM = dict[str, int]\nx: L\ny: M\n$x\n$y\n", {"list[int]", "dict[str, int]"}},
+      {"def f(x=1, y='a', z=None):\n  $x; $y\n", {"int", "str"}},
+  });
+}
+
+TEST(Inference, KnowsNamesOfPython2) {
+  Check(
+      {
+          {"$a = unicode('a')\n$b = raw_input()\n$c = long(1)\n$d = unichr(1)\nfor $e in xrange(3): pass\n",
+           {"str", "str", "int", "str", "int"}},
+          {"try: pass\nexcept ValueError, $e: pass\n", {"ValueError"}},
+          {"$a = `1`\n$b = 10L\n$c = 0777\n", {"str", "int", "int"}},
+          {"class A:\n  __metaclass__ = M\n  x = 1\nA.$x\n", {"int"}},
+      },
+      Version::Of(2, 7));
+}
+
+TEST(Inference, GuessesParametersFromCallers) {
+  Check({
+      {"def f(x):\n  $x\nf(1)\nf('a')\n", {"int | str"}},
+      {"class A:\n  def __init__(self, x):\n    self.x = x\n  def m(self):\n    self.$x\nA(1)\n", {"int"}},
+      {"def f(x, *args, **kw):\n  $args\n  $kw\nf(1, 'a', k=2)\n", {"tuple[str]", "dict[str, int]"}},
+      {"class A:\n  def m(self, x):\n    $x\nA().m(1)\n", {"int"}},
+      {"def f(x):\n  $x\n  f(x)\n", {""}},
+  });
+}
+
+TEST(Inference, AsksGetattr) {
+  Check({
+      {"class A:\n  x = 'a'\n  def __getattr__(self, name): return 1\nA().$y\nA().$x\n", {"int", "str"}},
+      {"class A:\n  def __getattr__(self, name): return 1\nclass B(A): pass\nB().$y\nB.$y\n", {"int", ""}},
+  });
+}
+
+TEST(Inference, EndsInRings) {
+  Check({
+      {"x = x\n$x\n", {""}},
+      {"a = b\nb = a\n$a\n", {""}},
+      {"def f(x): return [f(x)]\n$a = f(1)\n", {"list"}},
+      {"class A(B): x = 1\nclass B(A): pass\nB().$x\n", {"int"}},
+      {"class A:\n  def m(self):\n    self.x = self.m()\n    return self.x\nA().$x\n", {""}},
+      {"x = 1\nfor i in g():\n  x = x + 1\n$x\n", {"int"}},
+      {"def f(n):\n  if n == 0: return 1\n  return n * f(n - 1)\n$a = f(3)\n", {"int"}},
+  });
+  std::string chain = "x0 = 1\n";
+  for (int i = 1; i < 10000; ++i) chain += "x" + std::to_string(i) + " = x" + std::to_string(i - 1) + "\n";
+  Program(chain + "$x9999\n").AllTypes();
+  std::string dots = "$a";
+  for (int i = 0; i < 10000; ++i) dots += ".a";
+  Program(dots + "\n").AllTypes();
+  std::string classes = "class C0: x = 1\n";
+  for (int i = 1; i < 2000; ++i) classes += "class C" + std::to_string(i) + "(C" + std::to_string(i - 1) + "): pass\n";
+  Program(classes + "C1999.$x\n").AllTypes();
+}
+
+}  // namespace
+}  // namespace quillet
