@@ -6,14 +6,22 @@
 namespace quillet {
 
 ClassInfo& Inference::InfoOf(ClassId cls) {
-  if (!classes_[cls].has_bases && !classes_[cls].is_finding_bases) {
-    classes_[cls].is_finding_bases = true;
-    FindBases(cls);
-    FindOrder(cls);
-    classes_[cls].has_bases = true;
-    classes_[cls].is_finding_bases = false;
+  ClassInfo& info = classes_[cls];
+  if (info.has_bases || info.is_finding_bases) return info;
+  static constexpr int kMaxChain = 100;
+  if (class_depth_ >= kMaxChain) {  // a chain of classes longer than people write: what is above is not known
+    info.is_open = true;
+    info.open_from = 0;
+    return info;
   }
-  return classes_[cls];
+  ++class_depth_;
+  info.is_finding_bases = true;
+  FindBases(cls);
+  FindOrder(cls);
+  info.has_bases = true;
+  info.is_finding_bases = false;
+  --class_depth_;
+  return info;
 }
 
 ClassInfo& Inference::MembersOf(ClassId cls) {
@@ -186,6 +194,8 @@ void Inference::FindOrder(ClassId cls) {
   std::vector<ClassId> doubtful;
   for (size_t i = 0; i < sequences.size(); ++i)
     for (size_t j = open_from[i]; j < sequences[i].size(); ++j) doubtful.push_back(sequences[i][j].cls);
+  for (const BaseClass& base : info.bases)
+    if (classes_[base.cls].order.empty()) info.is_open = true;
   sequences.push_back(std::move(direct));
   std::vector<size_t> heads(sequences.size(), 0);
   static constexpr size_t kMaxOrder = 400;

@@ -427,6 +427,7 @@ class Inference {
   int depth_ = 0;
   int shallowest_cycle_ = INT32_MAX;  // the depth of what is being found that was met again
   int guess_depth_ = 0;
+  int class_depth_ = 0;
 };
 
 }  // namespace quillet
