@@ -354,6 +354,20 @@ std::vector<Location> Workspace::TypeDefinitions(FileId id, uint32_t offset) {
   return found;
 }
 
+// The methods that a place names.
+Entities Workspace::Impl::MethodsAt(const SourceFile& file, uint32_t occurrence) {
+  Entities methods = inference.EntitiesOf(file, occurrence);
+  std::erase_if(methods.found, [&](const Entity& entity) {
+    if (entity.kind != Entity::kMember) return true;
+    return std::ranges::none_of(inference.BindingsOf(entity), [&](const Binding& binding) {
+      const SourceFile* source = Get(binding.file);
+      const uint32_t at = source == nullptr ? kNoIndex : source->OccurrenceBeginningAt(binding.offset);
+      return at != kNoIndex && source->bindings.occurrences[at].kind == NameKind::kFunction;
+    });
+  });
+  return methods;
+}
+
 std::vector<Location> Workspace::Supertypes(FileId id, uint32_t offset) {
   Impl& in = *impl_;
   in.Begin();
@@ -362,6 +376,24 @@ std::vector<Location> Workspace::Supertypes(FileId id, uint32_t offset) {
   const uint32_t index = in.OccurrenceAt(*file, offset);
   if (index == kNoIndex) return {};
   std::vector<Location> found;
+  const Entities methods = in.MethodsAt(*file, index);
+  for (const Entity& method : methods.found) {
+    // The next that has it in the order of bases.
+    const Text name = in.inference.NameOfNumber(method.b);
+    const std::vector<BaseClass> order = in.inference.InfoOf(method.a).order;
+    for (size_t i = 1; i < order.size(); ++i) {
+      if (!in.inference.MembersOf(order[i].cls).symbols.contains(name)) continue;
+      const auto member = in.inference.FindMember(order[i].cls, name);
+      if (!member) continue;
+      for (const Binding& binding : in.inference.BindingsOf(in.inference.EntityOfMember(*member, name)))
+        found.push_back(in.At(in.SourceOf(binding), CertaintyOf(methods.doubt)));
+      break;
+    }
+  }
+  if (!methods.found.empty()) {
+    in.Sort(found);
+    return found;
+  }
   for (const TypeId type : in.inference.types().CopyOf(in.ValueAt(*file, index).set)) {
     const Type t = in.inference.types()[type];
     if (t.kind != TypeKind::kClass && t.kind != TypeKind::kInstance) continue;
@@ -385,12 +417,35 @@ std::vector<Location> Workspace::Subtypes(FileId id, uint32_t offset) {
   if (file == nullptr) return {};
   const uint32_t index = in.OccurrenceAt(*file, offset);
   if (index == kNoIndex) return {};
+  std::vector<Location> found;
+  const Entities methods = in.MethodsAt(*file, index);
+  for (const Entity& method : methods.found) {
+    const Text name = in.inference.NameOfNumber(method.b);
+    for (const FileId candidate : in.project.WithWords({name})) {
+      const SourceFile* source = in.Get(candidate);
+      if (source == nullptr) continue;
+      for (StmtId stmt = 1; stmt < source->syntax.stmts.size(); ++stmt) {
+        if (source->syntax.stmt(stmt).kind != StmtKind::kClass) continue;
+        const ClassId sub = in.inference.ClassOfStmt(candidate, stmt);
+        if (sub == method.a || !in.inference.MembersOf(sub).symbols.contains(name) ||
+            !in.inference.IsSubclass(sub, method.a))
+          continue;
+        const auto member = in.inference.FindMember(sub, name);
+        if (!member) continue;
+        for (const Binding& binding : in.inference.BindingsOf(in.inference.EntityOfMember(*member, name)))
+          found.push_back(in.At(binding, CertaintyOf(methods.doubt)));
+      }
+    }
+  }
+  if (!methods.found.empty()) {
+    in.Sort(found);
+    return found;
+  }
   std::vector<ClassId> wanted;
   for (const TypeId type : in.inference.types().CopyOf(in.ValueAt(*file, index).set)) {
     const Type t = in.inference.types()[type];
     if (t.kind == TypeKind::kClass || t.kind == TypeKind::kInstance) wanted.push_back(t.a);
   }
-  std::vector<Location> found;
   for (const ClassId cls : wanted) {
     const Text name = in.inference.InfoOf(cls).name;
     for (const FileId candidate : in.project.WithWords({name})) {

@@ -286,18 +286,24 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
     rename.problem = "nothing is known of what '" + std::string(old_name) + "' stands for here";
     return rename;
   }
+  bool is_bound = false;
   for (const Entity& entity : wanted.found) {
     if (entity.kind == Entity::kModule) {
       rename.problem = "'" + std::string(old_name) + "' is a module: rename its file";
       return rename;
     }
     for (const Binding& binding : in.inference.BindingsOf(entity)) {
+      is_bound = true;
       if (!in.IsProject(binding.file)) {
         rename.problem =
             "'" + std::string(old_name) + "' is defined outside of the project, in " + in.files.PathOf(binding.file);
         return rename;
       }
     }
+  }
+  if (!is_bound) {
+    rename.problem = "nothing is known of what '" + std::string(old_name) + "' stands for here";
+    return rename;
   }
   std::vector<Impl::Hit> hits = in.Uses(*file, index, true);
   for (const Impl::Hit& hit : hits) {

@@ -44,6 +44,7 @@ class Workspace::Impl final : public CallerSource {
   // Definitions of attributes of a name in the project, where nothing is known of the receiver.
   std::vector<Location> MembersNamed(Text name);
   uint32_t OccurrenceAt(const SourceFile& file, uint32_t offset);
+  Entities MethodsAt(const SourceFile& file, uint32_t occurrence);
 
   // ---- references.cc ----
   struct Hit {

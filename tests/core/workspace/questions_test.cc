@@ -1,0 +1,542 @@
+// Questions about programs of a few files, at marked places.
+#include "workspace/questions.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <string>
+#include <vector>
+
+#include "tests/core/support/program.h"
+
+namespace quillet {
+namespace {
+
+using testing::Program;
+using Words = std::vector<std::string>;
+
+// ---- definitions ----
+
+TEST(Definitions, LieInOtherFiles) {
+  Program program({
+      {"main.py",
+       "import shop\nfrom shop import $Shop as S\nshop.$Shop\n$S().$total()\nimport $shop.tax\nshop.tax.$rate\n"},
+      {"shop/__init__.py", "class Shop:\n  def total(self): pass\n"},
+      {"shop/tax.py", "rate = 1\n"},
+  });
+  EXPECT_EQ(program.Definitions(0), Words{"shop/__init__.py:1:7"});
+  EXPECT_EQ(program.Definitions(1), Words{"shop/__init__.py:1:7"});
+  EXPECT_EQ(program.Definitions(2), Words{"shop/__init__.py:1:7"});
+  EXPECT_EQ(program.Definitions(3), Words{"shop/__init__.py:2:7"});
+  EXPECT_EQ(program.Definitions(4), Words{"shop/__init__.py:1:1"});
+  EXPECT_EQ(program.Definitions(5), Words{"shop/tax.py:1:1"});
+}
+
+TEST(Definitions, FollowRelativeStarAndHandedOnImports) {
+  Program program({
+      {"main.py", "from pack import *\n$one\n$two\n$_hidden\nfrom pack import $deep\nfrom pack.inner.b import $top\n"},
+      {"pack/__init__.py",
+       "from .a import one, two as renamed\nfrom .a import *\nfrom .inner import deep\n_hidden = 1\n"},
+      {"pack/a.py", "one = 1\ntwo = 2\n"},
+      {"pack/inner/__init__.py", "from .b import deep\n"},
+      {"pack/inner/b.py", "def deep(): pass\nfrom ..a import one as top\n"},
+  });
+  EXPECT_EQ(program.Definitions(0), Words{"pack/a.py:1:1"});
+  EXPECT_EQ(program.Definitions(1), Words{"pack/a.py:2:1"});
+  EXPECT_EQ(program.Definitions(2), Words{});
+  EXPECT_EQ(program.Definitions(3), Words{"pack/inner/b.py:1:5"});
+  EXPECT_EQ(program.Definitions(4), Words{"pack/a.py:1:1"});
+}
+
+TEST(Definitions, OfStarImportsAreThoseOfAll) {
+  Program program({
+      {"main.py", "from a import *\n$_listed\n$left_out\n$later\n$extended\n"},
+      {"a.py",
+       "__all__ = ['_listed']\n__all__ += ['later']\n__all__.extend(['extended'])\n"
+       "_listed = left_out = later = extended = 1\n"},
+  });
+  EXPECT_EQ(program.Definitions(0), Words{"a.py:4:1"});
+  EXPECT_EQ(program.Definitions(1), Words{});
+  EXPECT_EQ(program.Definitions(2), Words{"a.py:4:22"});
+  EXPECT_EQ(program.Definitions(3), Words{"a.py:4:30"});
+}
+
+TEST(Definitions, TakeBothSidesOfATriedImport) {
+  Program program({
+      {"main.py", "try:\n  from fast import f\nexcept ImportError:\n  from slow import f\n$f\n"},
+      {"fast.py", "def f(): pass\n"},
+      {"slow.py", "def f(): pass\n"},
+  });
+  EXPECT_EQ(program.Definitions(), (Words{"fast.py:1:5", "slow.py:1:5"}));
+}
+
+TEST(Definitions, DependOnTheVersion) {
+  const char* const text = "import sys\nif sys.version_info[0] >= 3:\n  def f(): pass\nelse:\n  def f(): pass\n$f()\n";
+  EXPECT_EQ(Program(text).Definitions(), Words{"a.py:3:7"});
+  EXPECT_EQ(Program(text, Version::Of(2, 7)).Definitions(), Words{"a.py:5:7"});
+}
+
+TEST(Definitions, AreThoseThatReach) {
+  EXPECT_EQ(Program("x = 1\nif a:\n  x = 2\n$x\n").Definitions(), (Words{"a.py:1:1", "a.py:3:3"}));
+  EXPECT_EQ(Program("x = 1\nx = 2\n$x\n").Definitions(), Words{"a.py:2:1"});
+  EXPECT_EQ(Program("def f(x): return $x\n").Definitions(), Words{"a.py:1:7"});
+  EXPECT_EQ(Program("class A:\n  x = 1\n  def m(self): return $x\nx = 2\n").Definitions(), Words{"a.py:4:1"});
+  EXPECT_EQ(Program("$nothing\n").Definitions(), Words{});
+}
+
+TEST(Definitions, OfAttributesGoByTheOrderOfBases) {
+  Program program(
+      "class A:\n  def m(self): self.x = 1\nclass B(A):\n  def m(self): pass\nB().$m\nB().$x\nA().$m\nA.m\n"
+      "class C:\n  def __init__(self, y): pass\nC($y=1)\n");
+  EXPECT_EQ(program.Definitions(0), Words{"a.py:4:7"});
+  EXPECT_EQ(program.Definitions(1), Words{"a.py:2:21"});
+  EXPECT_EQ(program.Definitions(2), Words{"a.py:2:7"});
+  EXPECT_EQ(program.Definitions(3), Words{"a.py:10:22"});
+}
+
+TEST(Definitions, SayHowSureTheyAre) {
+  // Nothing is known of the receiver: one that has the name is likely it, several are so by name only.
+  EXPECT_EQ(Program("class A:\n  def one(self): pass\ndef f(x): x.$one()\n").Definitions(), Words{"a.py:2:7 likely"});
+  EXPECT_EQ(
+      Program("class A:\n  def m1(self): pass\nclass B:\n  def m1(self): pass\ndef f(x): x.$m1()\n").Definitions(),
+      (Words{"a.py:2:7 by name", "a.py:4:7 by name"}));
+  // `split` is a method of text as well.
+  EXPECT_EQ(Program("class A:\n  def split(self): pass\ndef f(x): x.$split()\n").Definitions(),
+            Words{"a.py:2:7 by name"});
+  // By a call of its function.
+  EXPECT_EQ(
+      Program("class A:\n  def m(self): pass\nclass B:\n  def m(self): pass\ndef f(x): x.$m()\nf(A())\n").Definitions(),
+      Words{"a.py:2:7 likely"});
+  EXPECT_EQ(
+      Program("class A:\n  def m(self): pass\nclass B:\n  def m(self): pass\ndef f(x: A): x.$m()\n").Definitions(),
+      Words{"a.py:2:7"});
+}
+
+TEST(Definitions, OfStubsLieInTheirSources) {
+  Program program({
+      {"main.py", "import lib, only\nlib.$f\nlib.C().$m\nonly.$g\nlen.$x\n$len\n"},
+      {"library/lib.py", "\ndef f(): pass\nclass C:\n  def m(self): pass\n"},
+      {"library/lib.pyi", "def f() -> int: ...\nclass C:\n  def m(self) -> str: ...\n"},
+      {"library/only.pyi", "def g() -> int: ...\n"},
+  });
+  EXPECT_EQ(program.Definitions(0), Words{"library/lib.py:2:5"});
+  EXPECT_EQ(program.Definitions(1), Words{"library/lib.py:4:7"});
+  EXPECT_EQ(program.Definitions(2), Words{"library/only.pyi:1:5"});
+  EXPECT_EQ(program.Definitions(3), Words{});
+  ASSERT_EQ(program.Definitions(4).size(), 1u);
+  EXPECT_TRUE(program.Definitions(4)[0].starts_with("builtins.pyi:"));
+}
+
+// ---- references ----
+
+TEST(References, AreFoundInTheWholeProject) {
+  Program program({
+      {"a.py", "class Shop:\n  def $total(self): return 1\n  def more(self): return self.total()\n"},
+      {"b.py", "from a import Shop\nShop().total()\ndef f(shop: Shop): return shop.total\n"},
+      {"c.py", "class Other:\n  def total(self): pass\nOther().total()\ntotal = 1\n# total\n'total'\n"},
+  });
+  EXPECT_EQ(program.References(), (Words{"a.py:2:7", "a.py:3:31", "b.py:2:8", "b.py:3:32"}));
+  const std::vector<Location> found = program->References(program[0].file, program[0].offset);
+  ASSERT_EQ(found.size(), 4u);
+  EXPECT_EQ(found[0].role, "definition");
+  EXPECT_EQ(found[0].kind, "function");
+  EXPECT_EQ(found[2].role, "call");
+  EXPECT_EQ(found[3].role, "read");
+  EXPECT_EQ(program.Say(program->References(program[0].file, program[0].offset, false)),
+            (Words{"a.py:2:7", "a.py:3:31"}));
+}
+
+TEST(References, AreTheSameFromEachOfThem) {
+  Program program({
+      {"a.py", "def $f(): pass\n__all__ = ['f']\n"},
+      {"b.py", "from a import $f\n$f()\n"},
+      {"c.py", "import a\na.$f()\n"},
+  });
+  const Words all = {"a.py:1:5", "a.py:2:13", "b.py:1:15", "b.py:2:1", "c.py:2:3"};
+  for (size_t i = 0; i < program.places().size(); ++i) EXPECT_EQ(program.References(i), all) << i;
+}
+
+TEST(References, SayHowSureTheyAre) {
+  Program program({
+      {"a.py",
+       "class A:\n  def $only(self): pass\nclass B:\n  def $both(self): pass\nclass C:\n  def both(self): pass\n"},
+      {"b.py", "from a import A, B\ndef f(x):\n  x.only()\n  x.both()\nA().only()\nB().both()\n"},
+  });
+  EXPECT_EQ(program.References(0), (Words{"a.py:2:7", "b.py:3:5 likely", "b.py:5:5"}));
+  EXPECT_EQ(program.References(1), (Words{"a.py:4:7", "b.py:4:5 by name", "b.py:6:5"}));
+}
+
+TEST(References, OfVariablesAreThoseOfTheirScope) {
+  EXPECT_EQ(Program("x = 1\ndef f():\n  $x = 2\n  return x\nprint(x)\n").References(),
+            (Words{"a.py:3:3", "a.py:4:10"}));
+  EXPECT_EQ(Program("$x = 1\ndef f():\n  global x\n  x = 2\nclass C:\n  x = 3\n").References(),
+            (Words{"a.py:1:1", "a.py:3:10", "a.py:4:3"}));
+  EXPECT_EQ(Program("def f($x):\n  return lambda: x\nf(x=1)\nx = 2\n").References(),
+            (Words{"a.py:1:7", "a.py:2:18", "a.py:3:3"}));
+  EXPECT_EQ(Program("y = [$x for x in x]\nx = 1\n").References(), (Words{"a.py:1:6", "a.py:1:12"}));
+}
+
+TEST(References, OfAttributesThatMethodsSet) {
+  Program program(
+      "class A:\n  def __init__(self):\n    self.$x = 1\n  def m(self):\n    self.x += 1\nclass B(A):\n  def n(self):\n"
+      "    return self.x\nclass C:\n  def __init__(self): self.x = 1\n");
+  EXPECT_EQ(program.References(), (Words{"a.py:3:10", "a.py:5:10", "a.py:8:17"}));
+}
+
+// ---- renames ----
+
+Words Edited(Program& program, Text name, bool only_certain = true, size_t place = 0) {
+  const Rename rename = program->RenameTo(program[place].file, program[place].offset, name, only_certain);
+  if (!rename.problem.empty()) return {rename.problem};
+  Words edits;
+  for (const TextEdit& edit : rename.edits) {
+    EXPECT_EQ(edit.text, name);
+    edits.push_back(program.Say(edit.file, edit.begin) + "+" + std::to_string(edit.end - edit.begin));
+  }
+  return edits;
+}
+
+TEST(Renames, ChangeWhatIsCertain) {
+  Program program({
+      {"a.py", "class A:\n  def $only(self): pass\n__all__ = ['A']\n"},
+      {"b.py", "from a import A as X\nX().only()\ndef f(x): x.only()\n"},
+  });
+  EXPECT_EQ(Edited(program, "new"), (Words{"a.py:2:7+4", "b.py:2:5+4"}));
+  EXPECT_EQ(Edited(program, "new", false), (Words{"a.py:2:7+4", "b.py:2:5+4", "b.py:3:13+4"}));
+}
+
+TEST(Renames, LeaveOtherNamesOfImports) {
+  Program program({
+      {"a.py", "class $A: pass\n__all__ = ['A']\n"},
+      {"b.py", "from a import A as X\nX()\n"},
+      {"c.py", "from a import A\nA()\nimport a\na.A\n"},
+  });
+  EXPECT_EQ(Edited(program, "New"),
+            (Words{"a.py:1:7+1", "a.py:2:13+1", "b.py:1:15+1", "c.py:1:15+1", "c.py:2:1+1", "c.py:4:3+1"}));
+}
+
+TEST(Renames, AreRefusedWhereTheyCannotBe) {
+  Program program("import $typing\n$x = 1\ny = x\n$len\n$nothing\n( $)\n");
+  const auto problem = [&](size_t place, Text name) {
+    const Rename rename = program->RenameTo(program[place].file, program[place].offset, name);
+    EXPECT_TRUE(rename.edits.empty());
+    return rename.problem;
+  };
+  EXPECT_EQ(problem(0, "other"), "'typing' is a module: rename its file");
+  EXPECT_EQ(problem(1, "1x"), "'1x' is no name that code can use");
+  EXPECT_EQ(problem(1, "class"), "'class' is no name that code can use");
+  EXPECT_EQ(problem(1, ""), "'' is no name that code can use");
+  EXPECT_TRUE(problem(1, "y").starts_with("'y' means something else already in "));
+  EXPECT_TRUE(problem(2, "size").starts_with("'len' is defined outside of the project, in "));
+  EXPECT_EQ(problem(3, "other"), "nothing is known of what 'nothing' stands for here");
+  EXPECT_EQ(problem(4, "other"), "there is no name here");
+}
+
+// ---- completions ----
+
+Words Completed(Program& program, size_t place = 0) {
+  Words names;
+  for (const Completion& one : program->Complete(program[place].file, program[place].offset))
+    if (!one.name.starts_with("__")) names.push_back(one.name);
+  return names;
+}
+
+bool Holds(const Words& words, const std::string& word) { return std::ranges::find(words, word) != words.end(); }
+
+TEST(Completions, FollowTheDot) {
+  Program program(
+      "class A:\n  x = 1\n  def m(self): self.y = 1\n  @property\n  def p(self): pass\n  class In: pass\n"
+      "class B(A):\n  def _own(self): pass\nB().$\nB().m$\n'a'.up$\n");
+  EXPECT_EQ(Completed(program, 0), (Words{"x", "m", "p", "In", "y", "_own"}));
+  EXPECT_EQ(Completed(program, 1), Words{"m"});
+  EXPECT_EQ(Completed(program, 2), Words{"upper"});
+  const auto found = program->Complete(program[0].file, program[0].offset);
+  const auto kind_of = [&](Text name) {
+    const auto at = std::ranges::find(found, name, &Completion::name);
+    return at == found.end() ? "-" : at->kind;
+  };
+  EXPECT_EQ(kind_of("x"), "attribute");
+  EXPECT_EQ(kind_of("m"), "method");
+  EXPECT_EQ(kind_of("p"), "property");
+  EXPECT_EQ(kind_of("In"), "class");
+  EXPECT_EQ(kind_of("y"), "attribute");
+}
+
+TEST(Completions, OfNamesAreThoseOfTheScopesAround) {
+  Program program(
+      "value = 1\nclass Class:\n  valve = 1\n  def method(self, vast):\n    vary = 1\n    va$\ndef other(): vain = "
+      "1\n");
+  EXPECT_EQ(Completed(program), (Words{"vast", "vary", "value", "ValueError"}));
+}
+
+TEST(Completions, KnowImports) {
+  Program program({
+      {"main.py",
+       "import pa$\nfrom pack import $\nfrom pack.a import o$\nfrom . import ma$\nimport pack.$\nfrom x import y as "
+       "$\n"},
+      {"pack/__init__.py", "name = 1\n"},
+      {"pack/a.py", "one = 1\n_own = 2\nother = 3\n"},
+      {"parts.py", ""},
+  });
+  EXPECT_EQ(Completed(program, 0), (Words{"pack", "parts"}));
+  Words names = Completed(program, 1);
+  std::ranges::sort(names);
+  EXPECT_EQ(names, (Words{"a", "name"}));
+  EXPECT_EQ(Completed(program, 2), (Words{"one", "other"}));
+  EXPECT_EQ(Completed(program, 3), Words{"main"});
+  EXPECT_EQ(Completed(program, 4), Words{"a"});
+  EXPECT_EQ(Completed(program, 5), Words{});
+}
+
+TEST(Completions, OfferTheKeywordsOfACall) {
+  Program program(
+      "def f(first, second=1, *, third=2): pass\nf(1, $)\nf(third=1, $)\nclass A:\n  def __init__(self, size): "
+      "pass\nA(si$)\n");
+  const auto keywords = [&](size_t place) {
+    Words names = Completed(program, place);
+    std::erase_if(names, [](const std::string& name) { return !name.ends_with('='); });
+    return names;
+  };
+  EXPECT_EQ(keywords(0), (Words{"second=", "third="}));
+  EXPECT_EQ(keywords(1), (Words{"first=", "second="}));
+  EXPECT_EQ(keywords(2), Words{"size="});
+}
+
+TEST(Completions, SayNothingWhereAPlaceGivesANewName) {
+  for (const char* const text :
+       {"def f$\n", "class C$\n", "x = 'a$'\n", "x = 1$\n", "def f(a$): pass\n", "import a as b$\n"}) {
+    Program program(text);
+    EXPECT_EQ(Completed(program), Words{}) << text;
+  }
+}
+
+TEST(Completions, OfferStatementsOutsideOfBrackets) {
+  Program program("re$\nf(re$)\ntr$\nf(la$)\n");
+  EXPECT_TRUE(Holds(Completed(program, 0), "return"));
+  EXPECT_FALSE(Holds(Completed(program, 1), "return"));
+  EXPECT_TRUE(Holds(Completed(program, 2), "try"));
+  EXPECT_TRUE(Holds(Completed(program, 3), "lambda"));
+}
+
+// ---- signatures and hovers ----
+
+TEST(Signatures, KnowTheActiveParameter) {
+  Program program(
+      "def f(a: int, b=1, *rest, c, **more) -> str:\n  'Words.'\nf($)\nf(1, $)\nf(1, 2, 3, $)\nf(c=$1)\nf(d=$1)\nf(1, "
+      "g(2, $3))\nf(1, (2, $3))\n"
+      "class A:\n  def __init__(self, x): pass\n  def m(self, y): pass\nA($)\nA(1).m($)\nA.m(1, $)\nf(1$\n");
+  const auto at = [&](size_t place) -> std::string {
+    const std::vector<Signature> found = program->Signatures(program[place].file, program[place].offset);
+    if (found.size() != 1) return std::to_string(found.size());
+    const Signature& one = found[0];
+    return one.label + (one.active < 0 ? "" : " @" + one.parameters[static_cast<size_t>(one.active)].name);
+  };
+  const std::string f = "f(a: int, b=1, *rest, c, **more) -> str";
+  EXPECT_EQ(at(0), f + " @a");
+  EXPECT_EQ(at(1), f + " @b");
+  EXPECT_EQ(at(2), f + " @rest");
+  EXPECT_EQ(at(3), f + " @c");
+  EXPECT_EQ(at(4), f + " @more");
+  EXPECT_EQ(at(5), "0");
+  EXPECT_EQ(at(6), f + " @b");
+  EXPECT_EQ(at(7), "A(x) @x");
+  EXPECT_EQ(at(8), "m(y) @y");
+  EXPECT_EQ(at(9), "m(self, y) @y");
+  EXPECT_EQ(at(10), f + " @a");
+  EXPECT_EQ(program->Signatures(program[0].file, program[0].offset)[0].documentation, "Words.");
+}
+
+TEST(Signatures, AreThoseOfEveryOverload) {
+  Program program(
+      "from typing import overload\n@overload\ndef f(x: int) -> int: ...\n@overload\ndef f(x: str, y: int) -> str: "
+      "...\n"
+      "def f(*a): pass\nf($)\n");
+  Words labels;
+  for (const Signature& one : program->Signatures(program[0].file, program[0].offset)) labels.push_back(one.label);
+  EXPECT_EQ(labels, (Words{"f(x: int) -> int", "f(x: str, y: int) -> str"}));
+}
+
+TEST(Hovers, ShowDeclarationsAndDocumentation) {
+  Program program(
+      "def f(a, b=1):\n  '''One.\n\n    Two.\n  '''\n  return 1\n$f\nx = 1\n$x\nclass C:\n  'About C.'\n$C\n$ \n");
+  const auto at = [&](size_t i) { return program->HoverAt(program[i].file, program[i].offset); };
+  EXPECT_EQ(at(0).text, "def f(a, b=1) -> int");
+  EXPECT_EQ(at(0).documentation, "One.\n\nTwo.");
+  EXPECT_EQ(at(0).end - at(0).begin, 1u);
+  EXPECT_EQ(at(1).text, "x: int");
+  EXPECT_EQ(at(1).types, Words{"builtins.int"});
+  EXPECT_EQ(at(2).text, "class C");
+  EXPECT_EQ(at(2).documentation, "About C.");
+  EXPECT_EQ(at(3).text, "");
+}
+
+// ---- outlines and symbols ----
+
+TEST(Outlines, AreTreesOfWhatAFileDefines) {
+  Program program(
+      "X = 1\n@deco\nclass A:\n  y = 2\n  def m(self, z):\n    def inner(): pass\n    local = 1\nasync def f(): pass\n"
+      "if a:\n  def g(): pass\nX = 2\n");
+  std::string said;
+  const std::vector<OutlineItem> items = program->Outline(program.File("a.py"));
+  for (const OutlineItem& item : items)
+    said += item.kind + " " + item.name + (item.parent < 0 ? "" : "<" + items[static_cast<size_t>(item.parent)].name) +
+            "\n";
+  EXPECT_EQ(said, "variable X\nclass A\nattribute y<A\nmethod m<A\nfunction inner<m\nfunction f\nfunction g\n");
+  EXPECT_EQ(program.Say(program.File("a.py"), items[1].begin), "a.py:2:1");
+  EXPECT_EQ(program.Say(program.File("a.py"), items[1].name_begin), "a.py:3:7");
+}
+
+TEST(Symbols, AreRanked) {
+  Program program({
+      {"a.py", "total = 1\nclass Total: pass\ndef total_of(): pass\nclass Basket:\n  def total(self): pass\n"},
+      {"b.py", "def subtotal(): pass\ndef two_or_ten_apples(l): pass\ndef nothing(): local_total = 1\n"},
+  });
+  Words said;
+  for (const SymbolInfo& symbol : program->Symbols("total"))
+    said.push_back(symbol.kind + " " + symbol.container + "." + symbol.name);
+  EXPECT_EQ(said, (Words{"method a.Basket.total", "variable a.total", "class a.Total", "function a.total_of",
+                         "function b.subtotal", "function b.two_or_ten_apples"}));
+  EXPECT_EQ(program->Symbols("total", 2).size(), 2u);
+  EXPECT_EQ(program->Symbols("twoten").size(), 1u);
+  EXPECT_EQ(program->Symbols("zzz").size(), 0u);
+}
+
+TEST(Named, TakesDottedNames) {
+  Program program({{"shop.py", "class Shop:\n  def total(self): self.sum = 1\ndef total(): pass\n"}});
+  EXPECT_EQ(program.Say(program->Named("Shop.total")), Words{"shop.py:2:7"});
+  EXPECT_EQ(program.Say(program->Named("shop.total")), Words{"shop.py:3:5"});
+  EXPECT_EQ(program.Say(program->Named("shop.Shop.total")), Words{"shop.py:2:7"});
+  EXPECT_EQ(program.Say(program->Named("total")), (Words{"shop.py:2:7", "shop.py:3:5"}));
+  EXPECT_EQ(program.Say(program->Named("Other.total")), Words{});
+}
+
+// ---- calls and classes ----
+
+Words SayCalls(Program& program, const std::vector<Call>& calls) {
+  Words said;
+  for (const Call& call : calls) {
+    std::string one = call.name + ":";
+    for (const Location& location : call.calls) one += " " + program.Say(location);
+    said.push_back(one);
+  }
+  std::ranges::sort(said);
+  return said;
+}
+
+TEST(Calls, AreKnownFromBothSides) {
+  Program program({
+      {"a.py",
+       "class A:\n  def $m(self): $helper()\n  def n(self):\n    self.m()\n    return lambda: self.m()\n"
+       "def helper(): pass\nA().m()\n"},
+      {"b.py", "from a import A, helper\ndef $f(a: A):\n  a.m()\n  helper()\n  A()\n  def inner(): helper()\n"},
+  });
+  EXPECT_EQ(SayCalls(program, program->Callers(program[0].file, program[0].offset)),
+            (Words{"a.A.n: a.py:4:10 a.py:5:25", "a: a.py:7:5", "b.f: b.py:3:5"}));
+  EXPECT_EQ(SayCalls(program, program->Callers(program[1].file, program[1].offset)),
+            (Words{"a.A.m: a.py:2:16", "b.f.inner: b.py:6:16", "b.f: b.py:4:3"}));
+  EXPECT_EQ(SayCalls(program, program->Callees(program[2].file, program[2].offset)),
+            (Words{"a.A.m: b.py:3:5", "a.A: b.py:5:3", "a.helper: b.py:4:3"}));
+}
+
+TEST(Classes, KnowTheirBasesAndWhatDerivesFromThem) {
+  Program program({
+      {"a.py", "class $A:\n  def $m(self): pass\n"},
+      {"b.py", "import a\nclass $B(a.A):\n  def $m(self): pass\nclass C(B): pass\nclass Other: pass\n"},
+  });
+  const auto up = [&](size_t i) { return program.Say(program->Supertypes(program[i].file, program[i].offset)); };
+  const auto down = [&](size_t i) { return program.Say(program->Subtypes(program[i].file, program[i].offset)); };
+  EXPECT_EQ(down(0), Words{"b.py:2:7"});
+  EXPECT_EQ(down(1), Words{"b.py:3:7"});
+  EXPECT_EQ(up(2), Words{"a.py:1:7"});
+  EXPECT_EQ(down(2), Words{"b.py:4:7"});
+  EXPECT_EQ(up(3), Words{"a.py:2:7"});
+}
+
+// ---- problems ----
+
+Words ProblemsOf(Program& program, std::string_view path = "a.py") {
+  Words said;
+  for (const Problem& problem : program->Problems(program.File(path)))
+    said.push_back(program.Say(program.File(path), problem.begin) + " " + problem.code + ": " + problem.message);
+  return said;
+}
+
+TEST(Problems, AreImportsOfNothingAndUnboundNames) {
+  Program program({
+      {"a.py",
+       "import nowhere\nimport b.missing\nfrom b import there, absent\nfrom nowhere.deep import x\n"
+       "try:\n  import fast\nexcept ImportError:\n  fast = None\nprint(there, unheard, __name__, fast)\n"
+       "def f():\n  return later\nlater = 1\nclass C:\n  def m(self): return __class__\ndel undone\n"},
+      {"b.py", "there = 1\n"},
+  });
+  EXPECT_EQ(ProblemsOf(program), (Words{"a.py:1:8 unresolved-import: no module named 'nowhere'",
+                                        "a.py:2:10 unresolved-import: no module named 'missing'",
+                                        "a.py:3:22 unresolved-import: nothing is named 'absent' there",
+                                        "a.py:4:6 unresolved-import: no module named 'nowhere'",
+                                        "a.py:9:14 unbound-name: nothing binds the name 'unheard'"}));
+}
+
+TEST(Problems, AreNoneBehindStarsOfAnythingAndWhatIsNeverRun) {
+  Program star("from nowhere import *\nanything\n");
+  EXPECT_EQ(ProblemsOf(star), Words{"a.py:1:6 unresolved-import: no module named 'nowhere'"});
+  Program old("import sys\nif sys.version_info < (3,):\n  import urllib2\n");
+  EXPECT_EQ(ProblemsOf(old), Words{});
+}
+
+// ---- buffers ----
+
+TEST(Buffers, StandForTheirFiles) {
+  Program program({{"a.py", "from b import $f\n"}, {"b.py", "def f(): return 1\n"}});
+  EXPECT_EQ(program.Types(0), "def () -> builtins.int");
+  program.Open("b.py", "\ndef f(): return 'a'\n");
+  EXPECT_EQ(program.Types(0), "def () -> builtins.str");
+  EXPECT_EQ(program.Definitions(0), Words{"b.py:2:5"});
+  program->Change(program.File("b.py"), 5, 6, "g");
+  EXPECT_EQ(program.Definitions(0), Words{"a.py:1:15"});  // no more than what binds the name
+  EXPECT_EQ(ProblemsOf(program), Words{"a.py:1:15 unresolved-import: nothing is named 'f' there"});
+  program->Close(program.File("b.py"));
+  EXPECT_EQ(program.Types(0), "def () -> builtins.int");
+  EXPECT_EQ(ProblemsOf(program), Words{});
+}
+
+TEST(Buffers, NeedNoFile) {
+  Program program({{"a.py", "from fresh import $f\n"}});
+  EXPECT_EQ(program.Definitions(0), Words{"a.py:1:19"});
+  program.Open("fresh.py", "def f(): pass\n");
+  EXPECT_EQ(program.Definitions(0), Words{"fresh.py:1:5"});
+  EXPECT_EQ(program.References(0), (Words{"a.py:1:19", "fresh.py:1:5"}));
+  program->Close(program.File("fresh.py"));
+  EXPECT_EQ(program.Definitions(0), Words{"a.py:1:19"});
+}
+
+// ---- any place of any file ----
+
+TEST(Questions, AreAnsweredAtEveryPlace) {
+  const std::string_view text =
+      "from a import *\nimport a.a as b\nclass A(A, B[int]):\n  x: 'A' = f(\n  def m(self, *a, **k): return self.\n"
+      "with x as y, : z = [i for i in\nmatch a:\n  case {'k': v, **r}: f'{x!r:{w}}'\nlambda: (yield)\n@\n\xC3\xA4 = "
+      "\xFF\n";
+  Program program(text);
+  const FileId file = program.File("a.py");
+  for (const FileId at : {file, program.File("nothing.py")}) {
+    for (uint32_t offset = 0; offset < text.size() + 3; ++offset) {
+      program->Definitions(at, offset);
+      program->TypeDefinitions(at, offset);
+      program->References(at, offset);
+      program->Types(at, offset);
+      program->HoverAt(at, offset);
+      program->Signatures(at, offset);
+      program->Complete(at, offset);
+      program->Callers(at, offset);
+      program->Callees(at, offset);
+      program->Supertypes(at, offset);
+      program->Subtypes(at, offset);
+      EXPECT_NE(program->RenameTo(at, offset, "new name").problem, "") << offset;
+    }
+    program->Problems(at);
+    program->Outline(at);
+  }
+}
+
+}  // namespace
+}  // namespace quillet
