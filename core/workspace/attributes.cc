@@ -5,10 +5,31 @@
 
 namespace quillet {
 
+// Whether a class says what its member is: by a definition or an annotation, in its body or in a method.
+bool Inference::IsDeclared(const Member& member) {
+  if (member.field != nullptr) return true;
+  const SourceFile* file = FileOf(classes_[member.owner].file);
+  if (file == nullptr) return false;
+  const auto is_annotated = [&](uint32_t offset) {
+    const Stmt& stmt = file->syntax.stmt(file->syntax.StatementAt(offset));
+    return stmt.hint != kNoExpr && (stmt.kind == StmtKind::kAnnotated || stmt.kind == StmtKind::kAssign);
+  };
+  if (member.symbol != kNoIndex) {
+    for (const uint32_t i : file->occurrences().Of(member.symbol)) {
+      const Occurrence& occurrence = file->bindings.occurrences[i];
+      if (occurrence.kind == NameKind::kFunction || occurrence.kind == NameKind::kClass) return true;
+      if (occurrence.kind == NameKind::kVariable && is_annotated(occurrence.begin)) return true;
+    }
+  }
+  return member.self_attributes != nullptr && std::ranges::any_of(*member.self_attributes, is_annotated);
+}
+
+// What a class only assigns, and a class above it declares, is the attribute of that one.
 std::optional<Member> Inference::FindMember(ClassId cls, Text name, bool on_class) {
   if (cls == kNoId) return std::nullopt;
   InfoOf(cls);
   const size_t size = classes_[cls].order.size();
+  std::optional<Member> assigned;
   for (size_t i = 0; i < size; ++i) {
     const ClassId owner = classes_[cls].order[i].cls;
     ClassInfo& info = MembersOf(owner);
@@ -25,9 +46,11 @@ std::optional<Member> Inference::FindMember(ClassId cls, Text name, bool on_clas
     member.owner = owner;
     member.args = classes_[cls].order[i].args;
     member.is_behind_open_base = i >= classes_[cls].open_from;
-    return member;
+    if (assigned && member.is_behind_open_base) break;
+    if (info.is_enum || IsDeclared(member)) return member;
+    if (!assigned) assigned = std::move(member);
   }
-  return std::nullopt;
+  return assigned;
 }
 
 std::vector<Member> Inference::MembersOf(Value receiver, Text name, uint8_t& doubt) {

@@ -355,6 +355,7 @@ class Inference {
 
   // ---- attributes.cc ----
   Value AttributeOfType(TypeId type, Text name);
+  bool IsDeclared(const Member& member);
   Value AttributeOfModule(ModuleId module, Text name);
 
   Value ValueOfMember(const Member& member, Text name, TypeId receiver, bool on_class);
