@@ -43,7 +43,7 @@ constexpr std::pair<Text, Text> kRenamed[] = {
     {"xmlrpclib", "xmlrpc.client"},
 };
 
-Text Trimmed(Text text) {
+Text WithoutSpaces(Text text) {
   const size_t begin = text.find_first_not_of(" \t\r");
   if (begin == Text::npos) return {};
   return text.substr(begin, text.find_last_not_of(" \t\r") - begin + 1);
@@ -85,12 +85,12 @@ void Typeshed::Read(Text line) {
   line = line.substr(0, line.find('#'));
   const size_t colon = line.find(':');
   if (colon == Text::npos) return;
-  const Text range = Trimmed(line.substr(colon + 1));
+  const Text range = WithoutSpaces(line.substr(colon + 1));
   const size_t dash = range.find('-');
   if (dash == Text::npos) return;
-  const int last = NumberOfVersion(Trimmed(range.substr(dash + 1)));
-  ranges_[std::string(Trimmed(line.substr(0, colon)))] = {NumberOfVersion(Trimmed(range.substr(0, dash))),
-                                                          last == 0 ? INT_MAX : last};
+  const int last = NumberOfVersion(WithoutSpaces(range.substr(dash + 1)));
+  ranges_[std::string(WithoutSpaces(line.substr(0, colon)))] = {NumberOfVersion(WithoutSpaces(range.substr(0, dash))),
+                                                                last == 0 ? INT_MAX : last};
 }
 
 bool Typeshed::Has(Text module) const {
