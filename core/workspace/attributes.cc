@@ -214,6 +214,14 @@ Value Inference::Bound(Value value, TypeId receiver, bool on_class, ClassId owne
         bound = types_.Union(bound, getter.IsKnown() ? ResultOf(getter, none) : kUnknown);
         continue;
       }
+      if (t.args_count == 1 && t.a == ClassNamed("builtins", "staticmethod")) {
+        bound = types_.Union(bound, Value{types_.ArgOf(id, 0), 0});
+        continue;
+      }
+      if (t.args_count == 1 && t.a == ClassNamed("builtins", "classmethod")) {
+        bound = types_.Union(bound, Bound({types_.ArgOf(id, 0), 0}, itself(), false, owner));
+        continue;
+      }
       const bool may_be_descriptor = classes_[t.a].file != classes_[property].file;
       if (may_be_descriptor && FindMember(t.a, "__get__")) {
         bound = types_.Union(

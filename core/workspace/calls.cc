@@ -664,8 +664,12 @@ Value Inference::ResultOfSpecialCall(TypeId callee, std::vector<Argument>& argum
       return answer(Just(types_.Add(TypeKind::kInstance, property, 0, {getter})));
     }
     if (name == "staticmethod" || name == "classmethod") {
-      // `f = staticmethod(f)`: a callable that binds nothing, or what calls it with the class.
-      return arguments.empty() ? Value{} : answer(at(0));
+      // `f = staticmethod(f)`: it holds what it was given, and says when it is looked up what that is bound to.
+      if (arguments.empty()) return answer(kUnknown);
+      const ClassId holder = ClassNamed("builtins", name);
+      const Value given = at(0);
+      return holder == kNoId ? answer(given)
+                             : answer(Just(types_.Add(TypeKind::kInstance, holder, 0, {given.set}), given.doubt));
     }
     if ((name == "TypeVar" || name == "ParamSpec" || name == "TypeVarTuple") && has_call)
       return answer(Just(types_.Add(TypeKind::kTypeVar, place.file, place.expr)));
@@ -753,6 +757,8 @@ Value Inference::ResultOfType(TypeId callee, std::vector<Argument>& arguments, E
       return {types_.ArgOf(callee, 0), 0};
     case TypeKind::kInstance: {
       if (t.args_count == 1 && classes_[t.a].name == "type") return {types_.ArgOf(callee, 0), 0};
+      if (t.args_count == 1 && t.a == ClassNamed("builtins", "staticmethod"))
+        return ResultOf({types_.ArgOf(callee, 0), 0}, arguments, place);
       const auto member = FindMember(t.a, "__call__");
       if (!member) return kUnknown;
       return ResultOf(ValueOfMember(*member, "__call__", callee, false), arguments, place);

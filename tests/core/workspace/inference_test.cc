@@ -120,6 +120,9 @@ TEST(Inference, TellsStaticAndClassMethodsApart) {
        {"type[a.A]", "int", "str", "a.B", "a.B", "type[a.B]"}},
       {"class A:\n  def __new__(cls, x): return super().__new__(cls)\n$a = A(1)\n", {"a.A"}},
       {"class A:\n  def __new__(cls): return 1\n$a = A()\n", {"int"}},
+      {"class A:\n  def f(x): return x\n  def g(cls): return cls()\n  f = staticmethod(f)\n  g = classmethod(g)\n"
+       "class B(A): pass\n$a = A().f(1)\n$b = A.f('a')\n$c = B.g()\n$d = B().g()\n",
+       {"int", "str", "a.B", "a.B"}},
       {"class M(type):\n  def m(cls): return 1\nclass A(metaclass=M): pass\n$a = A.m()\n", {"int"}},
       {"class M(type):\n  def __call__(cls): return 1\nclass A(metaclass=M): pass\n$a = A()\n", {"int"}},
       {"class A:\n  def __init_subclass__(cls): $cls\n", {"type[a.A]"}},
