@@ -70,6 +70,31 @@ TEST(Definitions, TakeBothSidesOfATriedImport) {
   EXPECT_EQ(program.Definitions(), (Words{"fast.py:1:5", "slow.py:1:5"}));
 }
 
+TEST(Definitions, ComeThroughRingsOfImports) {
+  Program program({
+      {"a.py", "from b import f\nfrom a import g\nimport a\n$f\n$g\na.a.a.$h\ndef h(): pass\n"},
+      {"b.py", "from a import g\nfrom c import *\n"},
+      {"c.py", "from b import *\ndef f(): pass\n"},
+  });
+  EXPECT_EQ(program.Definitions(0), Words{"c.py:2:5"});
+  EXPECT_EQ(program.Definitions(1), Words{"a.py:2:15"});  // its own import is all that binds it
+  EXPECT_EQ(program.Definitions(2), Words{"a.py:7:5"});
+}
+
+TEST(Definitions, OfNamespacesAndSubmodules) {
+  Program program({
+      {"main.py",
+       "import space.one\nimport space.two as t\nspace.one.$x\nt.$y\nfrom space import $one\nfrom space.one import "
+       "$x\n"},
+      {"space/one.py", "x = 1\n"},
+      {"library/space/two.py", "y = 1\n"},
+  });
+  EXPECT_EQ(program.Definitions(0), Words{"space/one.py:1:1"});
+  EXPECT_EQ(program.Definitions(1), Words{"library/space/two.py:1:1"});
+  EXPECT_EQ(program.Definitions(2), Words{"space/one.py:1:1"});
+  EXPECT_EQ(program.Definitions(3), Words{"space/one.py:1:1"});
+}
+
 TEST(Definitions, DependOnTheVersion) {
   const char* const text = "import sys\nif sys.version_info[0] >= 3:\n  def f(): pass\nelse:\n  def f(): pass\n$f()\n";
   EXPECT_EQ(Program(text).Definitions(), Words{"a.py:3:7"});
@@ -164,6 +189,44 @@ TEST(References, SayHowSureTheyAre) {
   });
   EXPECT_EQ(program.References(0), (Words{"a.py:2:7", "b.py:3:5 likely", "b.py:5:5"}));
   EXPECT_EQ(program.References(1), (Words{"a.py:4:7", "b.py:4:5 by name", "b.py:6:5"}));
+}
+
+TEST(References, OfOtherClassesAreNeverCertain) {
+  // What derives from what is not known may have any attribute of its own.
+  EXPECT_EQ(
+      Program("from nowhere import U\nclass A:\n  def $m(self): pass\nclass B(U, A): pass\nB().m()\n").References(),
+      (Words{"a.py:3:7", "a.py:5:5 likely"}));
+  // One of two.
+  EXPECT_EQ(
+      Program("class A:\n  def $m(self): pass\nclass B:\n  def m(self): pass\ndef f(x: A | B): x.m()\n").References(),
+      (Words{"a.py:2:7", "a.py:5:20"}));
+  // What overrides it is another.
+  EXPECT_EQ(Program("class A:\n  def $m(self): pass\nclass B(A):\n  def m(self): super().m()\nB().m()\n").References(),
+            (Words{"a.py:2:7", "a.py:4:24"}));
+  EXPECT_EQ(
+      Program("class A:\n  def $m(self): pass\nclass B:\n  def m(self): pass\nx = A() if c else B()\nx = B()\nx.m()\n")
+          .References(),
+      Words{"a.py:2:7"});
+  EXPECT_EQ(Program("class A:\n  def $m(self): pass\ndef f(x):\n  if isinstance(x, A): x.m()\n").References(),
+            (Words{"a.py:2:7", "a.py:4:26"}));
+}
+
+TEST(References, OfKeywordsAreThoseOfTheFunctionThatIsCalled) {
+  EXPECT_EQ(Program("def f($x): pass\ndef g(x): pass\nf(x=1)\ng(x=1)\n").References(), (Words{"a.py:1:7", "a.py:3:3"}));
+  EXPECT_EQ(Program("class A:\n  def __init__(self, $x): self.x = x\nA(x=1).x\n").References(),
+            (Words{"a.py:2:22", "a.py:2:35", "a.py:3:3"}));
+  EXPECT_EQ(Program("from dataclasses import dataclass\n@dataclass\nclass A:\n  $x: int\nA(x=1).x\n").References(),
+            (Words{"a.py:4:3", "a.py:5:3", "a.py:5:8"}));
+}
+
+TEST(References, OfModulesAreWhatImportsThem) {
+  Program program({
+      {"main.py", "import pack.$a\nfrom pack import a as other\nfrom pack.a import x\npack.a.x\nother.x\n"},
+      {"pack/__init__.py", ""},
+      {"pack/a.py", "x = 1\n"},
+  });
+  EXPECT_EQ(program.References(),
+            (Words{"main.py:1:13", "main.py:2:18", "main.py:3:11", "main.py:4:6", "pack/a.py:1:1"}));
 }
 
 TEST(References, OfVariablesAreThoseOfTheirScope) {
