@@ -156,6 +156,16 @@ std::vector<Location> Workspace::Impl::LocationsOf(const Entities& entities, boo
         return has_several && at != kNoIndex && owner->bindings.occurrences[at].kind == NameKind::kImport;
       });
     }
+    // What is declared somewhere is defined there, wherever else it is assigned.
+    std::vector<Binding> declared;
+    for (const Binding& binding : bindings) {
+      const SourceFile* file = entity.kind == Entity::kModule ? nullptr : Get(binding.file);
+      if (file == nullptr) continue;
+      const StmtId stmt = file->syntax.StatementAt(binding.offset);
+      const bool is_annotated = file->syntax.stmt(stmt).kind == StmtKind::kAnnotated;
+      if (is_annotated || file->syntax.StatementNamedAt(binding.offset) != kModuleStmt) declared.push_back(binding);
+    }
+    if (!declared.empty()) bindings = std::move(declared);
     // What the version asked for never sees is no definition, unless nothing else is.
     std::vector<Binding> seen;
     for (const Binding& binding : bindings) {
