@@ -287,7 +287,22 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
     return rename;
   }
   bool is_bound = false;
+  if (old_name.starts_with("__") && old_name.ends_with("__")) {
+    rename.problem = "'" + std::string(old_name) + "' is a name that the language uses";
+    return rename;
+  }
   for (const Entity& entity : wanted.found) {
+    if (entity.kind == Entity::kMember) {
+      // What a library calls by its name keeps it.
+      const std::vector<BaseClass> order = in.inference.InfoOf(entity.a).order;
+      for (const BaseClass& base : order) {
+        const ClassInfo& info = in.inference.MembersOf(base.cls);
+        if (in.IsProject(info.file) || !info.symbols.contains(old_name)) continue;
+        rename.problem = "'" + std::string(old_name) + "' overrides what '" + in.inference.QualifiedName(base.cls) +
+                         "' defines outside of the project";
+        return rename;
+      }
+    }
     if (entity.kind == Entity::kModule) {
       rename.problem = "'" + std::string(old_name) + "' is a module: rename its file";
       return rename;
