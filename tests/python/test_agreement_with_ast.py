@@ -123,7 +123,7 @@ def test_what_is_said_of_another_source_is_a_difference(
     monkeypatch: pytest.MonkeyPatch, source: str, other: str, problems: list[str]
 ) -> None:
     analyze = agreement.analyze
-    monkeypatch.setattr(agreement, "analyze", lambda _: analyze(other))
+    monkeypatch.setattr(agreement, "analyze", lambda _, exact: analyze(other, exact=exact))
     report = Report()
     report.compare("example", source.encode())
     assert len(report.unexplained) == len(problems), report.unexplained
@@ -133,7 +133,7 @@ def test_what_is_said_of_another_source_is_a_difference(
 
 def test_a_rejection_without_a_reason_is_a_fault(monkeypatch: pytest.MonkeyPatch) -> None:
     analyze = agreement.analyze
-    monkeypatch.setattr(agreement, "analyze", lambda _: analyze("x y"))
+    monkeypatch.setattr(agreement, "analyze", lambda _, exact: analyze("x y", exact=exact))
     report = Report()
     report.compare("example", b"x")
     assert len(report.faults) == 1
