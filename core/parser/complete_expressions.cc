@@ -81,7 +81,12 @@ void CompleteParser::TargetList(TargetUse use) {
     one();
   }
   Finish(symbols_.exprlist, mark);
-  if (use != TargetUse::kFor || Code() == word::kIn) return CheckTarget(Top(), use, false);
+  if (use != TargetUse::kFor || Code() == word::kIn) {
+    CheckTarget(Top(), use, false);
+    if (isa<CStarExpression>(Top()))
+      PostponeAtNode(Top(), "starred assignment target must be in a list or tuple", kCompiler);
+    return;
+  }
   // What a target may not be, such as a comparison, explains more than the missing word does.
   const size_t stopped = at_;
   at_ = start;

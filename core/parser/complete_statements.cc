@@ -559,7 +559,7 @@ void CompleteParser::ExpressionStatement() {
       StarExpressions(symbols_.testlist_star_expr);
     if (!Since(8)) CheckNoStars(Top());
     CheckNoLoneStar(Top());
-    const bool is_sequence = isa<CTestListStarExpr>(target) || IsBracketed(target);
+    const bool is_sequence = isa<CTestListStarExpr>(target) || isa<CStarExpression>(target) || IsBracketed(target);
     if (is_sequence || InvalidTarget(target, TargetUse::kAugment) != nullptr) {
       FailAtNode(target,
                  std::string("'") + NameOfExpression(target) + "' is an illegal expression for augmented assignment");

@@ -180,6 +180,8 @@ ERRORS = [
     ((3, 13), "x, None = 1, 2", "1:4 cannot assign to None"),
     ((3, 13), "a, *b, *c = d", "1:1 multiple starred expressions in assignment"),
     ((3, 13), "del f()", "1:5 cannot delete function call"),
+    ((3, 13), "for *a in b: pass", "1:5 starred assignment target must be in a list or tuple"),
+    ((3, 13), "*a -= b", "1:1 'starred' is an illegal expression for augmented assignment"),
     ((3, 13), "a, -= b", "1:1 'tuple' is an illegal expression for augmented assignment"),
     ((3, 13), "f() += 1", "1:1 'function call' is an illegal expression for augmented assignment"),
     ((3, 13), "f(a=1, a=2)", "1:8 keyword argument repeated: a"),
