@@ -4,7 +4,8 @@
 // size and at four times that size. Each is analysed as 3.12 and as 2.7, cut into records and written in
 // each format, in a process of its own, on a thread with a small stack. What costs more a byte at the
 // larger size, costs more than any honest input does, or ends the process, is named; exit code 1 then.
-// The last phase makes the tree and the text of each statement, and the lines embedded in it.
+// The last phases make the tree and the text of each statement, and the lines embedded in it, and the statements and
+// expressions of all of it at once.
 //
 //   quillet_scaling                     the list below
 //   quillet_scaling --pairs             all pairs of fragments, repeated
@@ -30,6 +31,7 @@
 #include "foundations/console.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
+#include "syntax/reader.h"
 
 namespace quillet::bench {
 namespace {
@@ -567,8 +569,8 @@ std::string Shown(const std::string& text) {
 
 // ---- one measurement, in a process of its own ----
 
-constexpr int kPhases = 4;
-constexpr const char* kPhaseNames[kPhases] = {"3.12", "2.7", "output", "text"};
+constexpr int kPhases = 5;
+constexpr const char* kPhaseNames[kPhases] = {"3.12", "2.7", "output", "text", "syntax"};
 
 struct Costs {
   double seconds[kPhases][2];
@@ -655,6 +657,18 @@ void RenderAll(Text text) {
   }
 }
 
+void ReadSyntax(Text text) {
+  const Ref<SourceText> source = SourceText::Copy(text);
+  for (const Version version : {Version::Of(3, 12), Version::Of(2, 7)}) {
+    std::vector<LineRow> rows;
+    CutLines(*source, version, rows);
+    FileSyntax file;
+    SyntaxReader(version).Read(*source, rows, file);
+    for (uint32_t place = 0; place < text.size(); place += static_cast<uint32_t>(text.size() / 8 + 1))
+      (void)file.StatementAt(place);
+  }
+}
+
 Costs MeasureHere(const Shape& shape, size_t size) {
   Costs costs{};
   Tools& tools = TheTools();
@@ -674,6 +688,8 @@ Costs MeasureHere(const Shape& shape, size_t size) {
       at[3] = ProcessorSeconds();
       RenderAll(text);
       at[4] = ProcessorSeconds();
+      ReadSyntax(text);
+      at[5] = ProcessorSeconds();
       for (int phase = 0; phase < kPhases; ++phase) costs.seconds[phase][step] = at[phase + 1] - at[phase];
     }
     costs.memory[step] = PeakBytes() - memory;

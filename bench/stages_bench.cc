@@ -1,10 +1,11 @@
 // What each stage costs, over a corpus held in memory (see corpus.h), on one core:
 // tokenising, cutting into logical lines, parsing with discard, walking (hints included), all of it, and
-// binding names, alone and with all of it.
+// binding names, alone and with all of it, and reading statements and expressions.
 //
 // Counters: ns per token, MB/s, physical lines/s. Before a stage is timed its result is checked: the
 // tokens cover the source in order, trees come out the same twice, recycled nodes give the records
-// that fresh ones give, a recycled binder what a fresh one gives.
+// that fresh ones give, a recycled binder and a recycled reader what fresh
+// ones give.
 #include <benchmark/benchmark.h>
 
 #include <chrono>
@@ -16,6 +17,7 @@
 #include "analysis/file_analyzer.h"
 #include "bench/corpus.h"
 #include "names/binder.h"
+#include "syntax/reader.h"
 
 namespace quillet::bench {
 namespace {
@@ -313,6 +315,42 @@ void BytesToRecordsAndNames(benchmark::State& state) {
   Report(state);
 }
 BENCHMARK(BytesToRecordsAndNames)->Unit(benchmark::kMillisecond);
+
+bool IsSameSyntax(const FileSyntax& a, const FileSyntax& b) {
+  if (a.exprs.size() != b.exprs.size() || a.stmts.size() != b.stmts.size() || a.lists != b.lists) return false;
+  for (size_t i = 0; i < a.exprs.size(); ++i) {
+    const Expr& left = a.exprs[i];
+    const Expr& right = b.exprs[i];
+    if (left.kind != right.kind || left.begin != right.begin || left.end != right.end || left.parent != right.parent)
+      return false;
+  }
+  return true;
+}
+
+// Reads the statements and expressions of a file that was cut.
+void Syntax(benchmark::State& state) {
+  SyntaxReader recycled(kVersion);
+  FileSyntax file;
+  size_t exprs = 0, stmts = 0;
+  for (const CutFile& cut : CutCorpus()) {
+    FileSyntax fresh;
+    SyntaxReader(kVersion).Read(*cut.source, cut.rows, fresh);
+    recycled.Read(*cut.source, cut.rows, file);
+    Require(IsSameSyntax(file, fresh), "a recycled reader says otherwise");
+    exprs += file.exprs.size();
+    stmts += file.stmts.size();
+  }
+  for (auto _ : state) {
+    for (const CutFile& cut : CutCorpus()) {
+      recycled.Read(*cut.source, cut.rows, file);
+      benchmark::DoNotOptimize(file.exprs.data());
+    }
+  }
+  state.counters["expressions"] = static_cast<double>(exprs);
+  state.counters["statements"] = static_cast<double>(stmts);
+  Report(state);
+}
+BENCHMARK(Syntax)->Unit(benchmark::kMillisecond);
 
 }  // namespace
 }  // namespace quillet::bench

@@ -159,7 +159,11 @@ void SyntaxReader::Impl::EndOfHead(StmtId stmt, size_t mark) {
     out_->stmts[stmt].flags |= kStmtIsBroken;
     Fault();
     const bool is_bare = kind == StmtKind::kElse || kind == StmtKind::kTry || kind == StmtKind::kFinally;
-    if (!AtEnd() && !BeginsStatement() && !(is_bare && (Is(word::kIf) || Is(word::kFor)))) Broken(true);
+    if (!AtEnd() && !BeginsStatement() && !(is_bare && (Is(word::kIf) || Is(word::kFor)))) {
+      Broken(true);
+      // Comments in the middle of it are nobody's.
+      while (next_comment_ < comments_.size() && comments_[next_comment_].index <= Index()) ++next_comment_;
+    }
   }
   Take(tok::COLON);
   out_->stmts[stmt].end = out_->stmts[stmt].block_end = LastEnd();

@@ -82,7 +82,10 @@ void SyntaxReader::Impl::Read(const SourceText& source, std::span<const LineRow>
   out.exprs.reserve(tokens_.size() * 5 / 8 + 1);
   out.named.reserve(tokens_.size() / 2);
   out.lists.reserve(tokens_.size() * 5 / 8);
-  out.stmts.reserve(rows.size() + 1);
+  const auto holds_none = [](const LineRow& row) {
+    return row.kind == LineKind::kBlankLine || row.kind == LineKind::kComment;
+  };
+  out.stmts.reserve(rows.size() + 1 - static_cast<size_t>(std::count_if(rows.begin(), rows.end(), holds_none)));
   out.exprs.emplace_back();
   Stmt& module = out.stmts.emplace_back();
   module.end = module.block_end = static_cast<uint32_t>(source.size());

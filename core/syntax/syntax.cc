@@ -171,13 +171,14 @@ StmtId FileSyntax::StatementOf(ExprId expr) const {
   if (expr == kNoExpr || stmts.empty()) return kModuleStmt;
   const uint32_t begin = exprs[expr].begin;
   const StmtId stmt = LastBegunAt(begin);
-  if (stmts[stmt].kind != StmtKind::kBroken) return stmt;
-  // What is left over of a head stands in front of the comment that says what the head is, and may begin where
-  // an expression of the statement in front is missing.
-  if (stmts[stmt].end < begin) return stmts[stmt].parent;
-  if (stmts[stmt].begin < begin || exprs[expr].end > begin) return stmt;
-  while (exprs[expr].parent != kNoExpr) expr = exprs[expr].parent;
-  return exprs[expr].end > begin ? stmt : stmt - 1;
+  if (stmts[stmt].begin == begin && exprs[expr].end == begin && stmts[stmt].decorator_count == 0) {
+    // What is missing may end the statement in front of the one that begins there.
+    while (exprs[expr].parent != kNoExpr) expr = exprs[expr].parent;
+    return exprs[expr].end > begin ? stmt : stmt - 1;
+  }
+  // What is left over of a head stands in front of the comment that says what the head is.
+  const bool is_behind = stmts[stmt].kind == StmtKind::kBroken && stmts[stmt].end < begin;
+  return is_behind ? stmts[stmt].parent : stmt;
 }
 
 size_t FileSyntax::ByteSize() const {

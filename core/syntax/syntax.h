@@ -7,6 +7,9 @@
 //
 // Nodes are numbers. Expression 0 is the absent one, statement 0 the module. Offsets are bytes of the
 // source, so that a name finds its occurrence in Bindings by where it begins.
+//
+// Brackets nest to a depth of 200, in which the rest of a bracket is kMissing. What chains has no limit
+// (`a.b.c...`, `a + b + c...`, `not not...`): who goes down such a tree goes in a loop, or counts.
 #pragma once
 
 #include <cstdint>
@@ -25,11 +28,11 @@ inline constexpr StmtId kModuleStmt = 0;
 
 // Behind each kind its children, in order; those in brackets may be kNoExpr. "name" is Expr::name_begin..name_end.
 enum class ExprKind : uint8_t {
-  kMissing,            // nothing stands where an expression has to
+  kMissing,            // nothing stands where an expression has to, behind the token in front (empty), or too deep
   kName,               // name
   kNumber,             // op: NumberType
   kString,             // op: bits of StringBits; the values of its replacement fields, or the hint that it holds
-  kConstant,           // op: ConstantValue
+  kConstant,           // op: ConstantValue; name, in Python 2, where the words are names
   kAttribute,          // name (empty for `x.`); value
   kSubscript,          // value, items...
   kSlice,              // [lower], [upper], [step]
@@ -47,7 +50,8 @@ enum class ExprKind : uint8_t {
   kCompare,            // op: CompareOperator of the first; operands...
   kConditional,        // value, condition, otherwise
   kLambda,             // parameters..., body
-  kParameter,          // op: ParameterKind; name; [annotation], [default], [the tuple of a Python 2 parameter]
+  kParameter,          // op: ParameterKind; name; [annotation], [default], [the tuple of a Python 2 parameter];
+                       // the annotation may be a comment behind it
   kListComprehension,  // element, clauses...
   kSetComprehension,   // element, clauses...
   kDictComprehension,  // key, value, clauses...
@@ -58,7 +62,7 @@ enum class ExprKind : uint8_t {
   kYieldFrom,          // value
   kNamed,              // `:=`: kName, value
   kBackquote,          // value
-  kModulePath,         // op: leading dots (at most 255); kName for each part
+  kModulePath,         // op: leading dots (at most 255); kName for each part, kMissing behind a last dot
   kImportAlias,        // of `import`: kModulePath, [kName behind `as`]; of `from`: kName, [kName]; `*`: kIsStar, none
   kWithItem,           // value, [target]
   kPatternCapture,     // name (empty for `_`)
@@ -136,7 +140,7 @@ enum class StmtKind : uint8_t {
   kGlobal,           // kName...
   kNonlocal,         // kName...
   kTypeAlias,        // name; type parameters..., value
-  kPrint,            // values... (Python 2)
+  kPrint,            // values..., a file behind `>>` among them (Python 2)
   kExec,             // values... (Python 2)
   kPass,             // also break and continue: op is the word's code
   kFor,              // target, iterable
@@ -152,7 +156,8 @@ enum class StmtKind : uint8_t {
   kCase,    // pattern, [guard]
   kDef,     // name; decorators..., type parameters..., parameters...; hint: the result's annotation
   kClass,   // name; decorators..., type parameters..., arguments as of a call...
-  kBroken,  // what could be read of it...
+  kBroken,  // what could be read of it...: what is left over of the statement in front, or of the head that it is
+            // the first of the block of; decorators without a definition
 };
 
 enum StmtFlag : uint16_t {

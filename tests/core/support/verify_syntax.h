@@ -101,7 +101,9 @@ inline std::string VerifyStmts(const FileSyntax& file, size_t size) {
       if (!check(expr))
         return At("expression of statement", i) + ": " + std::string(WordOf(stmt.kind)) + " '" +
                std::string(file.source + stmt.begin, stmt.end - stmt.begin) + "'";
-    if (!check(stmt.hint)) return At("hint of statement", i);
+    // In what is broken a comment may stand where something else has begun.
+    const bool may_stand_elsewhere = (stmt.flags & kStmtIsBroken) != 0 && (stmt.flags & kHintIsComment) != 0;
+    if (!check(stmt.hint) && !may_stand_elsewhere) return At("hint of statement", i);
     if (stmt.name_end > stmt.name_begin && file.StatementNamedAt(stmt.name_begin) != i)
       return At("look-up of statement", i);
   }

@@ -21,7 +21,7 @@ constexpr Version kVersions[] = {Version::Of(2, 7), Version::Of(3, 6), Version::
 
 std::vector<std::string> Sources() {
   std::vector<std::string> paths;
-  for (const char* folder : {"/fuzz/corpus/names", "/fuzz/corpus/lines"}) {
+  for (const char* folder : {"/fuzz/corpus/syntax", "/fuzz/corpus/names", "/fuzz/corpus/lines"}) {
     for (const auto& entry : std::filesystem::directory_iterator(std::string(QUILLET_SOURCE_DIR) + folder))
       paths.push_back(entry.path().string());
   }

@@ -320,6 +320,15 @@ TEST(Syntax, AnExpressionKnowsItsStatement) {
   EXPECT_EQ(statement_of("e\n"), "Assign");
 }
 
+TEST(Syntax, WhatIsMissingBelongsInFrontOfWhatFollows) {
+  for (const Text source : {"x:class A: pass", "x =]", "if x=:y"}) {
+    const ReadSource read(source);
+    const Stmt& first = read.file.stmt(1);
+    const ExprId last = first.hint != kNoExpr ? first.hint : read.file.ExprsOf(first).back();
+    EXPECT_EQ(read.file.StatementOf(last), 1u) << source;
+  }
+}
+
 TEST(Syntax, BracketsOfItsOwnAreNoPartOfAnExpression) {
   const ReadSource read("x = ((a) + b)\ny = (c, d)\n");
   const FileSyntax& file = read.file;
