@@ -152,6 +152,16 @@ ExprId FileSyntax::ExpressionAt(uint32_t offset) const {
   return kNoExpr;
 }
 
+std::string FileSyntax::DottedNameOf(ExprId path, size_t parts) const {
+  std::string dotted;
+  for (const ExprId part : ChildrenOf(path)) {
+    if (parts-- == 0) break;
+    if (!dotted.empty()) dotted += '.';
+    dotted += NameOf(part);
+  }
+  return dotted;
+}
+
 ExprId FileSyntax::NamedAt(uint32_t offset) const {
   const auto found = std::lower_bound(named.begin(), named.end(), offset,
                                       [this](ExprId expr, uint32_t at) { return exprs[expr].name_begin < at; });

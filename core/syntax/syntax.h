@@ -14,6 +14,7 @@
 
 #include <cstdint>
 #include <span>
+#include <string>
 #include <vector>
 
 #include "foundations/text.h"
@@ -224,6 +225,8 @@ struct FileSyntax {
   Text NameOf(const Expr& expr) const { return {source + expr.name_begin, expr.name_end - expr.name_begin}; }
   Text NameOf(const Stmt& stmt) const { return {source + stmt.name_begin, stmt.name_end - stmt.name_begin}; }
   Text NameOf(ExprId expr) const { return NameOf(exprs[expr]); }
+  // The names of a kModulePath with dots between them, all or the first `parts` of them.
+  std::string DottedNameOf(ExprId path, size_t parts = SIZE_MAX) const;
 
   // The innermost statement in whose extent (its block included, decorators too) a place lies, kModuleStmt
   // without one; logarithmic.

@@ -174,12 +174,7 @@ void Workspace::Impl::AddModuleNames(ModuleId module, Text prefix, std::vector<C
       if (file->syntax.stmt(stmt).kind != StmtKind::kFromImport || exprs.size() < 2 ||
           (file->syntax[exprs[1]].flags & kIsStar) == 0)
         continue;
-      std::string dotted;
-      for (const ExprId part : file->syntax.ChildrenOf(exprs[0])) {
-        if (!dotted.empty()) dotted += '.';
-        dotted += file->syntax.NameOf(part);
-      }
-      const ModuleId other = modules.FindFrom(id, file->syntax[exprs[0]].op, dotted);
+      const ModuleId other = modules.FindFrom(id, file->syntax[exprs[0]].op, file->syntax.DottedNameOf(exprs[0]));
       if (other != kNoModule) pending.push_back(other);
     }
   }
@@ -242,12 +237,7 @@ void Workspace::Impl::AddNames(const SourceFile& file, uint32_t offset, Text pre
       if (file.syntax.stmt(id).kind != StmtKind::kFromImport || exprs.size() < 2 ||
           (file.syntax[exprs[1]].flags & kIsStar) == 0)
         continue;
-      std::string dotted;
-      for (const ExprId part : file.syntax.ChildrenOf(exprs[0])) {
-        if (!dotted.empty()) dotted += '.';
-        dotted += file.syntax.NameOf(part);
-      }
-      const ModuleId other = modules.FindFrom(file.id, file.syntax[exprs[0]].op, dotted);
+      const ModuleId other = modules.FindFrom(file.id, file.syntax[exprs[0]].op, file.syntax.DottedNameOf(exprs[0]));
       if (other != kNoModule) AddModuleNames(other, prefix, found, false);
     }
   }
@@ -400,12 +390,7 @@ std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
     if (at.kind == StmtKind::kFromImport && behind_import != Text::npos) {
       const ExprId path = exprs.empty() ? kNoExpr : exprs[0];
       if (path == kNoExpr) return found;
-      std::string dotted;
-      for (const ExprId part : syntax.ChildrenOf(path)) {
-        if (!dotted.empty()) dotted += '.';
-        dotted += syntax.NameOf(part);
-      }
-      const ModuleId module = in.modules.FindFrom(id, syntax[path].op, dotted);
+      const ModuleId module = in.modules.FindFrom(id, syntax[path].op, syntax.DottedNameOf(path));
       if (module != kNoModule) in.AddModuleNames(module, prefix, found, true);
     } else {
       // The dotted path up to the place.

@@ -224,12 +224,7 @@ Entities Inference::EntitiesInFile(ModuleId module, FileId file_id, Text name, i
     for (const StmtId star : names.stars) {
       if (!IsReachable(*file, star)) continue;
       const ExprId path = file->syntax.ExprsOf(file->syntax.stmt(star))[0];
-      std::string dotted;
-      for (const ExprId part : file->syntax.ChildrenOf(path)) {
-        if (!dotted.empty()) dotted += '.';
-        dotted += file->syntax.NameOf(part);
-      }
-      const ModuleId source = modules_.FindFrom(file_id, file->syntax[path].op, dotted);
+      const ModuleId source = modules_.FindFrom(file_id, file->syntax[path].op, file->syntax.DottedNameOf(path));
       if (source == kNoModule) {
         found.doubt |= Value::kOpen;
         continue;
@@ -258,13 +253,7 @@ Entities Inference::EntitiesOfImport(const SourceFile& file, uint32_t offset, in
   if (stmt == kModuleStmt) return found;
   const auto exprs = syntax.ExprsOf(syntax.stmt(stmt));
   const auto add_module = [&](ExprId path, size_t parts) {
-    std::string dotted;
-    const auto names = syntax.ChildrenOf(path);
-    for (size_t i = 0; i < parts && i < names.size(); ++i) {
-      if (i > 0) dotted += '.';
-      dotted += syntax.NameOf(names[i]);
-    }
-    const ModuleId module = modules_.FindFrom(file.id, syntax[path].op, dotted);
+    const ModuleId module = modules_.FindFrom(file.id, syntax[path].op, syntax.DottedNameOf(path, parts));
     if (module != kNoModule) found.found.push_back({Entity::kModule, module, 0});
     return module;
   };
@@ -485,21 +474,13 @@ std::string Inference::ForeignNameOf(const SourceFile& file, uint32_t offset) {
   const ExprId named = syntax.NamedAt(offset);
   const ExprId parent = named == kNoExpr ? kNoExpr : syntax[named].parent;
   if (parent == kNoExpr) return {};
-  const auto dotted = [&](ExprId path) {
-    std::string text;
-    for (const ExprId part : syntax.ChildrenOf(path)) {
-      if (!text.empty()) text += '.';
-      text += syntax.NameOf(part);
-    }
-    return text;
-  };
   if (syntax[parent].kind == ExprKind::kModulePath) return std::string(syntax.NameOf(syntax.ChildOf(parent, 0)));
   if (syntax[parent].kind != ExprKind::kImportAlias) return {};
   const Stmt& stmt = syntax.stmt(syntax.StatementOf(named));
   const auto exprs = syntax.ExprsOf(stmt);
-  if (stmt.kind == StmtKind::kImport) return dotted(syntax.ChildOf(parent, 0));
+  if (stmt.kind == StmtKind::kImport) return syntax.DottedNameOf(syntax.ChildOf(parent, 0));
   if (stmt.kind != StmtKind::kFromImport || exprs.empty() || syntax[exprs[0]].op != 0) return {};
-  const std::string module = dotted(exprs[0]);
+  const std::string module = syntax.DottedNameOf(exprs[0]);
   if (modules_.FindFrom(file.id, 0, module) != kNoModule) return {};
   return module + "." + std::string(syntax.NameOf(syntax.ChildOf(parent, 0)));
 }
