@@ -505,7 +505,6 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
   bool is_special = false;
   const Value special = ResultOfSpecialCall(callee, arguments, place, is_special);
   if (is_special) return special;
-  const uint8_t doubt = 0;
   // A metaclass that calls otherwise, and `__new__` that makes something else.
   if (info.metaclass != kNoId && !info.is_enum) {
     const auto call = FindMember(info.metaclass, "__call__");
@@ -573,7 +572,7 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
       const auto known = std::ranges::find(solution, variable, &std::pair<TypeId, TypeSetId>::first);
       args.push_back(known == solution.end() ? kNoTypes : known->second);
     }
-    return Just(InstanceOf(cls, args), doubt);
+    return Just(InstanceOf(cls, args));
   }
   if (const auto maker = FindMember(cls, "__new__"); maker && maker->owner != ClassNamed("builtins", "object")) {
     const SourceFile* file = FileOf(classes_[maker->owner].file);
@@ -593,7 +592,7 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
     }
   }
   const std::vector<TypeSetId> args(types_.ArgsOf(callee).begin(), types_.ArgsOf(callee).end());
-  return Just(InstanceOf(cls, args), doubt);
+  return Just(InstanceOf(cls, args));
 }
 
 Value Inference::RawValueOfMember(const Member& member, Text) {

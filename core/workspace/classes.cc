@@ -164,7 +164,7 @@ void Inference::FindBases(ClassId cls) {
   if (info.bases.empty() && object != kNoId && object != cls) info.bases.push_back({object, {}});
 }
 
-// The third order of Cecil and others; where there is none, bases from left to right, each class once.
+// C3; where it gives no order, bases from left to right, each class once.
 void Inference::FindOrder(ClassId cls) {
   ClassInfo& info = classes_[cls];
   std::vector<std::vector<BaseClass>> sequences;

@@ -707,7 +707,6 @@ Value Inference::ValueOfTarget(const SourceFile& file, ExprId target, FrameId fr
   const ExprId parent = syntax[root].parent;
   if (syntax[root].kind == ExprKind::kPatternCapture || syntax[root].kind == ExprKind::kPatternStar)
     return ValueOfPattern(file, root, frame);
-  const auto plain = [](Value value) { return value; };
   if (parent != kNoExpr) {
     switch (syntax[parent].kind) {
       case ExprKind::kWithItem: {
@@ -726,7 +725,7 @@ Value Inference::ValueOfTarget(const SourceFile& file, ExprId target, FrameId fr
         return Unpack(file, target, root, IterationOf(ValueOf(file.id, iterable, frame), is_async), {}, frame);
       }
       case ExprKind::kNamed:
-        return plain(ValueOf(file.id, syntax.ChildOf(parent, 1), frame));
+        return ValueOf(file.id, syntax.ChildOf(parent, 1), frame);
       case ExprKind::kPatternAs:
         return ValueOfPattern(file, syntax.ChildOf(parent, 0), frame);
       default:
