@@ -13,9 +13,9 @@
 #include <vector>
 
 #include "bench/corpus.h"
-#include "workspace/project_files.h"
-#include "workspace/word_filters.h"
-#include "workspace/word_search.h"
+#include "program/project_files.h"
+#include "project/word_filters.h"
+#include "project/word_search.h"
 
 namespace quillet::bench {
 namespace {

@@ -9,8 +9,8 @@
 #include "bindings/signals.h"
 #include "bindings/workspace_object.h"
 #include "foundations/stop.h"
-#include "workspace/find_files.h"
-#include "workspace/ignore_rules.h"
+#include "project/find_files.h"
+#include "project/ignore_rules.h"
 
 namespace quillet::host {
 

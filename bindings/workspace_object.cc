@@ -4,8 +4,8 @@
 #include <chrono>
 
 #include "bindings/convert.h"
-#include "workspace/files.h"
-#include "workspace/modules.h"
+#include "program/files.h"
+#include "program/modules.h"
 
 namespace quillet::host {
 

@@ -80,7 +80,7 @@ std::string Workspace::Impl::TextOfType(TypeId id, bool is_short, int depth) {
 #define QUILLET_SPECIAL_FORM(identifier, name) \
   case SpecialForm::k##identifier:             \
     return (is_short ? "" : "typing.") + std::string(name);
-#include "workspace/special_forms.def"
+#include "inference/special_forms.def"
         default:
           return "typing.Any";
       }

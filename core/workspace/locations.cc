@@ -227,13 +227,13 @@ Value Workspace::Impl::ExpectedOf(const SourceFile& file, ExprId expr) {
   if (parent == kNoExpr) {
     const Stmt& stmt = syntax.stmt(syntax.StatementOf(expr));
     if (stmt.kind == StmtKind::kAnnotated || stmt.kind == StmtKind::kAssign)
-      return stmt.hint == kNoExpr ? kUnknown : inference.ValueOfHint(file.id, stmt.hint);
-    return kUnknown;
+      return stmt.hint == kNoExpr ? kUnknownValue : inference.ValueOfHint(file.id, stmt.hint);
+    return kUnknownValue;
   }
   if (syntax[parent].kind == ExprKind::kDict) {
     const auto children = syntax.ChildrenOf(parent);
     const auto index = static_cast<size_t>(std::ranges::find(children, expr) - children.begin());
-    if (index % 2 == 0) return kUnknown;
+    if (index % 2 == 0) return kUnknownValue;
     Value value;
     const Text key = TextInString(syntax.TextOf(syntax[children[index - 1]]));
     for (const TypeId type : inference.types().CopyOf(ExpectedOf(file, parent).set))
@@ -242,7 +242,7 @@ Value Workspace::Impl::ExpectedOf(const SourceFile& file, ExprId expr) {
   }
   const bool is_keyword = syntax[parent].kind == ExprKind::kKeyword;
   const ExprId call = is_keyword ? syntax[parent].parent : parent;
-  if (call == kNoExpr || syntax[call].kind != ExprKind::kCall) return kUnknown;
+  if (call == kNoExpr || syntax[call].kind != ExprKind::kCall) return kUnknownValue;
   const auto arguments = syntax.ChildrenOf(call).subspan(1);
   const auto position = static_cast<size_t>(std::ranges::find(arguments, expr) - arguments.begin());
   Value value;

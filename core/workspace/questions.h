@@ -11,8 +11,8 @@
 #include <vector>
 
 #include "analysis/file_analyzer.h"
-#include "workspace/files.h"
-#include "workspace/modules.h"
+#include "program/files.h"
+#include "program/modules.h"
 
 namespace quillet {
 

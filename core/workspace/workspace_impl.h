@@ -9,8 +9,8 @@
 #include <unordered_set>
 #include <vector>
 
-#include "workspace/inference.h"
-#include "workspace/project_files.h"
+#include "inference/inference.h"
+#include "program/project_files.h"
 #include "workspace/questions.h"
 
 namespace quillet {

@@ -1,5 +1,5 @@
 """Which files a command reads: the arguments, with each folder walked in sorted order by the core
-(core/workspace/find_files.h says what it gives). An argument is read whatever excludes it.
+(core/project/find_files.h says what it gives). An argument is read whatever excludes it.
 """
 
 from __future__ import annotations

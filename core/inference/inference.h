@@ -1,0 +1,434 @@
+// Inference: what an expression may be, and what a name stands for, in a program of many files.
+//
+// A value is a set of types (types.h) with a doubt: whether it may be something else too, and whether it was guessed
+// from uses. Everything is found when it is asked for and remembered until Clear: nothing is done file by file
+// or in an order of its own. What a function returns is found from its annotation or its own statements; where
+// what it was called with matters, its statements are evaluated again in a frame, which says what its parameters
+// are. Work is bounded: by steps a question, by depth, by frames. Beyond a bound the answer is open.
+//
+// The parts: flow.cc (which assignments reach a place), narrowing.cc (what a condition says), variables.cc (what a
+// name was given), classes.cc (bases, order, members), attributes.cc (what stands behind a dot), functions.cc
+// (parameters and results), calls.cc, annotations.cc, expressions.cc, entities.cc (what a name stands for).
+#pragma once
+
+#include <cstdint>
+#include <deque>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <unordered_map>
+#include <unordered_set>
+#include <vector>
+
+#include "foundations/text.h"
+#include "inference/types.h"
+#include "program/files.h"
+#include "program/modules.h"
+
+namespace quillet {
+
+using ClassId = uint32_t;
+using FunctionId = uint32_t;
+using FrameId = uint32_t;
+inline constexpr uint32_t kNoId = UINT32_MAX;
+inline constexpr FrameId kNoFrame = 0;  // nothing is known of parameters but what they say themselves
+
+enum class SpecialForm : uint8_t {
+  kNone,
+#define QUILLET_SPECIAL_FORM(identifier, name) k##identifier,
+#include "inference/special_forms.def"
+};
+
+// A node of a file.
+struct ExprPlace {
+  FileId file = kNoFile;
+  ExprId expr = kNoExpr;
+};
+
+struct BaseClass {
+  ClassId cls = kNoId;
+  std::vector<TypeSetId> args;
+};
+
+// A member of a class that a call makes: of `namedtuple("P", "x y")` and the like.
+struct MadeField {
+  Text name;
+  uint32_t offset = 0;     // of its name, in the file of the class
+  ExprId hint = kNoExpr;   // its annotation, or
+  ExprId value = kNoExpr;  // what it is
+};
+
+struct ClassInfo {
+  FileId file = kNoFile;
+  StmtId stmt = kModuleStmt;  // its statement, or
+  ExprId call = kNoExpr;      // the call that makes it
+  uint32_t scope = kNoIndex;  // of its body; kNoIndex for a made one
+  Text name;
+  bool has_bases = false;  // the following are there
+  bool has_members = false;
+  bool is_finding_bases = false;
+  bool is_enum = false;
+  bool is_typed_dict = false;
+  bool is_named_tuple = false;
+  bool is_dataclass = false;
+  bool is_protocol = false;
+  bool is_open = false;  // a base is not known
+  std::vector<BaseClass> bases;
+  std::vector<BaseClass> order;    // C3, itself first; arguments in terms of its own type parameters
+  size_t open_from = SIZE_MAX;     // of `order`: what stands here or behind may be overridden by an unknown base
+  std::vector<TypeId> parameters;  // type variables
+  ClassId metaclass = kNoId;
+  std::vector<MadeField> fields;
+  uint32_t foreign_base = kNoId;               // number of the dotted name of a base that is not there
+  std::unordered_map<Text, uint32_t> symbols;  // of its scope
+  std::unordered_map<Text, std::vector<uint32_t>> self_attributes;  // where methods write `self.x`: offsets
+  std::unordered_set<Text> class_written;                           // of those the ones that class methods write
+};
+
+enum FunctionFlag : uint8_t {
+  kIsAsync = 1,
+  kIsGenerator = 2,
+  kIsStatic = 4,
+  kIsClassMethod = 8,
+  kIsOverload = 16,
+  kIsAbstract = 32,
+};
+
+struct FunctionInfo {
+  FileId file = kNoFile;
+  StmtId stmt = kModuleStmt;  // its statement, or
+  ExprId lambda = kNoExpr;
+  uint32_t scope = kNoIndex;
+  ClassId cls = kNoId;  // in whose body it stands
+  uint8_t flags = 0;
+};
+
+// What a name stands for.
+struct Entity {
+  enum Kind : uint8_t {
+    kVariable,  // a: file, b: symbol, which owns its variable and is of no class
+    kMember,    // a: class, b: number of the name
+    kModule,    // a: module
+  };
+  Kind kind = kVariable;
+  uint32_t a = 0;
+  uint32_t b = 0;
+  friend bool operator==(const Entity&, const Entity&) = default;
+  friend auto operator<=>(const Entity&, const Entity&) = default;
+};
+
+// Entities of a name, with the doubt that it is one of them.
+struct Entities {
+  std::vector<Entity> found;
+  uint8_t doubt = 0;
+};
+
+// Where a name is bound.
+struct Binding {
+  FileId file = kNoFile;
+  uint32_t offset = 0;  // of the name
+  friend bool operator==(const Binding&, const Binding&) = default;
+  friend auto operator<=>(const Binding&, const Binding&) = default;
+};
+
+// What a lookup found behind a dot.
+struct Member {
+  ClassId owner = kNoId;
+  std::vector<TypeSetId> args;  // of the owner, as the receiver has them
+  uint32_t symbol = kNoIndex;   // of the owner's scope
+  const std::vector<uint32_t>* self_attributes = nullptr;
+  const MadeField* field = nullptr;
+  bool is_behind_open_base = false;
+};
+
+// An argument of a call that was evaluated or will be.
+struct Argument {
+  enum Kind : uint8_t { kPlain, kKeyword, kStar, kDoubleStar };
+  Kind kind = kPlain;
+  Text name;
+  ExprPlace place;  // kNoExpr where there is only a value
+  FrameId frame = kNoFrame;
+  Value value;
+  bool is_evaluated = false;
+};
+
+// Type variables and what they are.
+using Solution = std::vector<std::pair<TypeId, TypeSetId>>;
+
+// Who calls a function: asked for parameters that nothing says anything about.
+class CallerSource {
+ public:
+  virtual ~CallerSource() = default;
+  // Calls of a function by its name, each with the place of the call's expression. Bounded.
+  virtual std::vector<ExprPlace> CallsOf(const FunctionInfo& function) = 0;
+};
+
+class Inference {
+ public:
+  Inference(Files& files, Modules& modules);
+  ~Inference();
+  Inference(const Inference&) = delete;
+  Inference& operator=(const Inference&) = delete;
+
+  // Forgets everything, after a file changed.
+  void Clear();
+  // Begins a question: steps are counted anew.
+  void Begin() { steps_ = kMaxSteps; }
+  bool IsExhausted() const { return steps_ == 0; }
+  void set_callers(CallerSource* callers) { callers_ = callers; }
+
+  // ---- values ----
+  Value ValueOf(FileId file, ExprId expr, FrameId frame = kNoFrame);
+  // What a name is given where it is bound.
+  Value ValueOfBinding(Binding binding, FrameId frame = kNoFrame);
+  Value ValueOfEntity(const Entity& entity);
+  // What the decorators from a definition up to one of them, which is left out, make of it.
+  Value DecoratedBelow(const SourceFile& file, StmtId stmt, ExprId decorator);
+  // What an annotation says that a value of it is.
+  Value ValueOfHint(FileId file, ExprId hint, FrameId frame = kNoFrame);
+  Value AttributeOf(Value receiver, Text name);
+  Value IterationOf(Value iterable, bool is_async = false);
+  // Without what comes from modules that are not there.
+  Value WithoutForeign(Value value);
+  Value ForeignMember(ClassId cls, Text name);
+  // Where the name that leads to it is imported.
+  Binding ImportOfForeign(uint32_t name) const;
+  // What a call of the value gives.
+  Value ResultOf(Value callee, std::vector<Argument>& arguments, ExprPlace place = {});
+  Value ResultOfFunction(FunctionId function);
+
+  // ---- names ----
+  // What the name of an occurrence stands for.
+  Entities EntitiesOf(const SourceFile& file, uint32_t occurrence);
+  // The places that bind an entity, in order of files and offsets.
+  std::vector<Binding> BindingsOf(const Entity& entity);
+  // The bindings that reach a name; empty for attributes.
+  std::vector<Binding> BindingsReaching(const SourceFile& file, uint32_t occurrence, bool* may_be_unbound = nullptr);
+  // The bindings of a variable that its scope is left with.
+  std::vector<Binding> BindingsAtEnd(const SourceFile& file, uint32_t symbol);
+  // The members that an attribute of this name may be, one for each type of the receiver that has it.
+  std::vector<Member> MembersOf(Value receiver, Text name, uint8_t& doubt);
+  // On a class only what classes have: no attribute that methods give their instances.
+  std::optional<Member> FindMember(ClassId cls, Text name, bool on_class = false);
+  Entity EntityOfMember(const Member& member, Text name);
+  Entity EntityOfVariable(const SourceFile& file, uint32_t symbol);
+  // The variable of a name in a module, its star imports included.
+  Entities EntitiesInModule(ModuleId module, Text name, int depth = 0);
+  // The same for one of the files that say what a module holds.
+  Entities EntitiesInFile(ModuleId module, FileId file, Text name, int depth = 0);
+  // Whether the language has a name of its own.
+  bool IsBuiltin(Text name);
+  // What an import binds, followed to where it is defined.
+  Entities EntitiesOfImport(const SourceFile& file, uint32_t offset, int depth = 0);
+
+  // ---- what there is ----
+  ClassId ClassOfStmt(FileId file, StmtId stmt);
+  ClassInfo& InfoOf(ClassId cls);              // with its bases
+  ClassInfo& MembersOf(ClassId cls);           // with its members as well
+  ClassId ClassNamed(Text module, Text name);  // of the library; kNoId where there is none
+  FunctionId FunctionOfStmt(FileId file, StmtId stmt);
+  FunctionId FunctionOfLambda(FileId file, ExprId lambda);
+  FunctionInfo& function(FunctionId id) { return functions_[id]; }
+  // The `def` or `class` statement in whose body a scope is, and the function of a scope; kNoId without one.
+  FunctionId FunctionOfScope(const SourceFile& file, uint32_t scope);
+  ClassId ClassOfScope(const SourceFile& file, uint32_t scope);
+  bool IsSubclass(ClassId cls, ClassId base);
+  bool IsReachable(const SourceFile& file, StmtId stmt);  // in the version and on the platform asked for
+  std::string QualifiedName(ClassId cls);
+
+  TypeTable& types() { return types_; }
+  Files& files() { return files_; }
+  Modules& modules() { return modules_; }
+  const SourceFile* FileOf(FileId file) { return files_.Get(file); }
+  // The file that says what a module holds: its stub, or its source.
+  FileId FileOfModule(ModuleId module) const;
+  uint32_t NumberOfName(Text name);
+  Text NameOfNumber(uint32_t number) const { return names_[number]; }
+  Text LiteralOf(const Type& type) const {
+    return type.kind == TypeKind::kInstance && type.b != 0 ? Text(literals_[type.b - 1]) : kNoText;
+  }
+
+  TypeId InstanceOf(ClassId cls, std::span<const TypeSetId> args = {}) {
+    return types_.Add(TypeKind::kInstance, cls, 0, args);
+  }
+  Value Just(TypeId type, uint8_t doubt = 0) { return {types_.SetOf(type), doubt}; }
+  Value InstanceNamed(Text module, Text name, std::initializer_list<TypeSetId> args = {});
+  Value NoneValue() { return Just(0); }
+  // The class whose attributes a type has; kNoId for modules and the like.
+  ClassId ClassOfType(TypeId type);
+
+  // What parameters of a function are, for signatures.
+  std::span<const ExprId> ParametersOf(const FunctionInfo& info);
+  Value ValueOfParameter(FunctionId function, size_t index, FrameId frame = kNoFrame);
+  ExprId HintOfParameter(const SourceFile& file, const FunctionInfo& info, size_t index);
+
+ private:
+  static constexpr uint32_t kMaxSteps = 120'000;
+  static constexpr int kMaxDepth = 150;
+  static constexpr size_t kMaxFrames = 20'000;
+  static constexpr int kMaxFrameDepth = 10;
+  static constexpr uint32_t kMaxFramesOfFunction = 32;
+
+  struct Frame {
+    FunctionId function = kNoId;
+    FrameId outer = kNoFrame;
+    int depth = 0;
+    std::vector<Value> parameters;
+  };
+  struct Memo {
+    Value value;
+    int depth = 0;  // while it is being found: how deep; 0 when it is there
+  };
+  struct ModuleNames {
+    std::unordered_map<Text, uint32_t> symbols;  // that the module's scope binds
+    std::vector<StmtId> stars;
+    bool has_all = false;
+    std::vector<Text> all;  // `__all__`
+  };
+
+  // What `find()` gives, remembered in `memos`. What is met again while it is being found is nothing then, and what
+  // was found by way of that is not remembered.
+  template <class Find>
+  Value Remembered(std::unordered_map<uint64_t, Memo>& memos, uint64_t key, Find&& find);
+
+  // ---- expressions.cc ----
+  Value Evaluate(const SourceFile& file, ExprId expr, FrameId frame);
+  Value EvaluateName(const SourceFile& file, ExprId expr, FrameId frame);
+  Value EvaluateAttribute(const SourceFile& file, ExprId expr, FrameId frame);
+  Value EvaluateSubscript(const SourceFile& file, ExprId expr, FrameId frame);
+  Value EvaluateCall(const SourceFile& file, ExprId expr, FrameId frame);
+  Value EvaluateBinary(const SourceFile& file, ExprId expr, FrameId frame);
+  Value EvaluateString(const SourceFile& file, ExprId expr);
+  Value EvaluateDict(const SourceFile& file, ExprId expr, FrameId frame);
+  Value EvaluateItems(const SourceFile& file, ExprId expr, FrameId frame, Text cls);
+  Value EvaluateTuple(const SourceFile& file, ExprId expr, FrameId frame);
+  Value EvaluateComprehension(const SourceFile& file, ExprId expr, FrameId frame);
+  Value EvaluateAwait(Value awaited);
+  Value ItemOf(Value container, const SourceFile& file, std::span<const ExprId> items, FrameId frame);
+  Value Operate(Value left, Value right, Text method, Text reflected);
+  Value WithoutNone(Value value);
+  Value WithoutDisplay(Value value);
+  Value WithoutFalse(Value value, bool keeps_true);
+  Value WithoutLiterals(Value value);
+  Value CallMethod(Value receiver, Text name, std::initializer_list<Value> arguments, bool* has_method = nullptr);
+  uint32_t LiteralNumber(Text text);
+  // What a display that a value came from, or the keywords of a call, have for each key: name, value.
+  std::vector<std::pair<Text, Value>> EntriesOf(TypeId dict);
+  Value LiteralValue(Text cls, Text text);
+
+  // ---- variables.cc ----
+  Value ValueOfName(const SourceFile& file, uint32_t occurrence, FrameId frame);
+  Value ValueOfVariable(const SourceFile& file, uint32_t symbol, FrameId frame);
+  Value ValueOfBindings(std::span<const Binding> bindings, FrameId frame);
+  Value FindValueOfBinding(const SourceFile& file, uint32_t offset, FrameId frame);
+  Value ValueOfTarget(const SourceFile& file, ExprId target, FrameId frame);
+  Value ValueOfImport(const SourceFile& file, uint32_t offset);
+  Value ForeignValue(std::string name, Binding import);
+  std::string ForeignNameOf(const SourceFile& file, uint32_t offset);
+  Value Unpack(const SourceFile& file, ExprId target, ExprId root, Value value, ExprPlace source, FrameId frame);
+  Value ValueOfPattern(const SourceFile& file, ExprId pattern, FrameId frame);
+  Value Entered(Value manager, bool is_async);
+  Value Caught(Value type);
+  Value BuiltinNamed(Text name);
+  Value Decorated(const SourceFile& file, StmtId stmt, Value value, FrameId frame, ExprId until = kNoExpr);
+  const ModuleNames& NamesOfModule(const SourceFile& file);
+  FrameId FrameFor(const SourceFile& file, uint32_t scope, FrameId frame);
+  Value ItemsPutInto(const SourceFile& file, ExprId target);
+
+  // ---- narrowing.cc ----
+  class Narrowing;
+  Value Narrowed(const SourceFile& file, ExprId expr, Value value, FrameId frame);
+  // -1 where it is not known before the program runs.
+  int StaticTruth(const SourceFile& file, ExprId condition);
+  // The same by what parameters are in a frame.
+  int TruthIn(const SourceFile& file, ExprId condition, FrameId frame);
+
+  // ---- classes.cc ----
+  void FindBases(ClassId cls);
+  void FindFields(ClassId cls);
+  void FindOrder(ClassId cls);
+  void FindMembers(ClassId cls);
+  ClassId MadeClass(const SourceFile& file, ExprId call, Text kind);
+  void CollectTypeVars(TypeSetId set, std::vector<TypeId>& found, int depth = 0);
+
+  // ---- attributes.cc ----
+  Value AttributeOfType(TypeId type, Text name);
+  bool IsDeclared(const Member& member);
+  Value AttributeOfModule(ModuleId module, Text name);
+
+  Value ValueOfMember(const Member& member, Text name, TypeId receiver, bool on_class);
+  Value Bound(Value value, TypeId receiver, bool on_class, ClassId owner);
+  Value RawValueOfMember(const Member& member, Text name);
+  Solution SolutionFor(const Member& member, TypeId receiver);
+
+  // ---- annotations.cc ----
+  Value HintOf(const SourceFile& file, ExprId hint, FrameId frame);
+  Value HintOfName(const SourceFile& file, ExprId hint, FrameId frame);
+  Value HintOfSubscript(const SourceFile& file, ExprId hint, FrameId frame);
+  Value HintOfValue(Value value);
+  Value HintOfSpecial(SpecialForm form, const SourceFile& file, std::span<const ExprId> items, FrameId frame);
+  SpecialForm SpecialFormOf(const Binding& binding, const SourceFile& file);
+  Value FormOf(const SourceFile& file, ExprId target);
+
+  // ---- functions.cc ----
+  Value ResultIn(FunctionId function, FrameId frame);
+  Value StatedResult(FunctionId function, FrameId frame, bool& is_stated);
+  Value ReturnedIn(FunctionId function, FrameId frame);
+  int IsReached(const SourceFile& file, StmtId stmt, StmtId function, FrameId frame);
+  Value YieldedIn(FunctionId function, FrameId frame);
+  Value GuessedParameter(FunctionId function, size_t index);
+  Value SelfOf(const FunctionInfo& info);
+  // ---- docstrings.cc ----
+  Value ValueInDocstring(const FunctionInfo& info, Text name);
+  Value ValueOfWords(const SourceFile& file, Text words, int depth = 0);
+
+  // ---- calls.cc ----
+  Value ResultOfType(TypeId callee, std::vector<Argument>& arguments, ExprPlace place);
+  Value ResultOfSpecialCall(TypeId callee, std::vector<Argument>& arguments, ExprPlace place, bool& is_special);
+  Value ResultOfFunctionCall(TypeId callee, std::vector<Argument>& arguments);
+  Value ResultOfClassCall(TypeId callee, std::vector<Argument>& arguments, ExprPlace place);
+  std::vector<Argument> ArgumentsOf(const SourceFile& file, std::span<const ExprId> exprs, FrameId frame);
+  Value ValueOfArgument(Argument& argument);
+  // The argument each parameter is given, and how well they fit: below 0 not at all.
+  int MatchArguments(FunctionId function, bool is_bound, std::vector<Argument>& arguments, Solution& solution,
+                     std::vector<Value>* parameters);
+  FrameId FrameOf(FunctionId function, FrameId outer, std::vector<Value> parameters);
+  void Solve(TypeSetId hint, TypeSetId value, Solution& solution, int depth = 0);
+  Value Substitute(Value value, const Solution& solution, bool drops_unsolved = false, int depth = 0);
+  int Assignable(TypeSetId hint, Value value, int depth = 0);
+  TypeSetId ArgsAs(TypeId type, ClassId base, size_t index);
+
+  Files& files_;
+  Modules& modules_;
+  CallerSource* callers_ = nullptr;
+  TypeTable types_;
+  std::deque<ClassInfo> classes_;
+  std::deque<FunctionInfo> functions_;
+  std::deque<Frame> frames_;
+  std::vector<Text> names_;
+  std::deque<std::string> literals_;
+  std::unordered_map<Text, uint32_t> numbers_of_names_;
+  std::vector<std::unique_ptr<std::string>> owned_names_;
+  std::unordered_map<std::string, uint32_t> numbers_of_literals_;
+  std::unordered_map<uint64_t, ClassId> classes_by_place_;
+  std::unordered_map<uint64_t, FunctionId> functions_by_place_;
+  std::unordered_map<std::string, ClassId> classes_by_name_;
+  std::unordered_map<uint64_t, std::vector<FrameId>> frames_by_hash_;
+  std::unordered_map<FunctionId, uint32_t> frame_counts_;
+  std::unordered_map<uint64_t, Memo> values_;    // of expressions, by file, expression and frame
+  std::unordered_map<uint64_t, Memo> bindings_;  // of bound names, by file, offset and frame
+  std::unordered_map<uint64_t, Memo> results_;   // of functions, by function and frame
+  std::unordered_map<uint64_t, Memo> hints_;
+  std::unordered_map<FileId, ModuleNames> module_names_;
+  std::unordered_map<uint64_t, Value> guesses_;
+  std::unordered_map<uint32_t, Binding> imports_of_foreign_;  // by the number of the name
+  uint32_t steps_ = kMaxSteps;
+  int depth_ = 0;
+  int shallowest_cycle_ = INT32_MAX;  // the depth of what is being found that was met again
+  int guess_depth_ = 0;
+  int class_depth_ = 0;
+};
+
+}  // namespace quillet

@@ -1,0 +1,493 @@
+// What conditions say: which value a name has where they hold, and which of them hold in every run.
+#include <algorithm>
+
+#include "inference/flow.h"
+#include "inference/inference.h"
+
+namespace quillet {
+
+namespace {
+
+// Names and attributes of names, whose value stays what a condition found until something is assigned.
+bool IsChain(const FileSyntax& syntax, ExprId expr) {
+  while (syntax[expr].kind == ExprKind::kAttribute) expr = syntax.ChildOf(expr, 0);
+  return syntax[expr].kind == ExprKind::kName;
+}
+
+bool SameChain(const FileSyntax& syntax, ExprId a, ExprId b) {
+  while (syntax[a].kind == ExprKind::kAttribute && syntax[b].kind == ExprKind::kAttribute) {
+    if (syntax.NameOf(a) != syntax.NameOf(b)) return false;
+    a = syntax.ChildOf(a, 0);
+    b = syntax.ChildOf(b, 0);
+  }
+  return syntax[a].kind == ExprKind::kName && syntax[b].kind == ExprKind::kName &&
+         syntax.TextOf(syntax[a]) == syntax.TextOf(syntax[b]);
+}
+
+}  // namespace
+
+class Inference::Narrowing {
+ public:
+  Narrowing(Inference& inference, const SourceFile& file, ExprId subject, FrameId frame)
+      : in_(inference), file_(file), syntax_(file.syntax), subject_(subject), frame_(frame) {}
+
+  // The value where the condition holds, or where it does not.
+  Value Where(ExprId condition, bool holds, Value value, int depth = 0) {
+    static constexpr int kMaxNesting = 16;
+    if (condition == kNoExpr || depth > kMaxNesting) return value;
+    const Expr& e = syntax_[condition];
+    switch (e.kind) {
+      case ExprKind::kUnary:
+        return e.op == word::kNot ? Where(syntax_.ChildOf(condition, 0), !holds, value, depth + 1) : value;
+      case ExprKind::kBoolean: {
+        const ExprId left = syntax_.ChildOf(condition, 0), right = syntax_.ChildOf(condition, 1);
+        if ((e.op == word::kAnd) == holds) return Where(right, holds, Where(left, holds, value, depth + 1), depth + 1);
+        return in_.types_.Union(Where(left, holds, value, depth + 1),
+                                Where(right, holds, Where(left, !holds, value, depth + 1), depth + 1));
+      }
+      case ExprKind::kNamed:
+        if (SameChain(syntax_, syntax_.ChildOf(condition, 0), subject_)) return Truth(value, holds);
+        return value;
+      case ExprKind::kName:
+      case ExprKind::kAttribute:
+        return IsSubject(condition) ? Truth(value, holds) : value;
+      case ExprKind::kCompare:
+        return e.children_count == 2 ? Comparison(condition, holds, value) : value;
+      case ExprKind::kCall:
+        return Call(condition, holds, value);
+      // What a `case` is met by.
+      case ExprKind::kPatternClass:
+        return holds ? OfClass(in_.ValueOf(file_.id, syntax_.ChildOf(condition, 0), frame_), value, true) : value;
+      case ExprKind::kPatternAs:
+        return Where(syntax_.ChildOf(condition, 0), holds, value, depth + 1);
+      case ExprKind::kPatternOr: {
+        if (!holds) return value;
+        Value either;
+        for (const ExprId pattern : syntax_.ChildrenOf(condition))
+          either = in_.types_.Union(either, Where(pattern, true, value, depth + 1));
+        return either;
+      }
+      default:
+        return value;
+    }
+  }
+
+ private:
+  bool IsSubject(ExprId expr) const { return SameChain(syntax_, expr, subject_); }
+
+  Value Truth(Value value, bool holds) { return in_.WithoutFalse(value, !holds); }
+
+  Value Comparison(ExprId condition, bool holds, Value value) {
+    const Expr& e = syntax_[condition];
+    ExprId left = syntax_.ChildOf(condition, 0), right = syntax_.ChildOf(condition, 1);
+    const auto op = static_cast<CompareOperator>(e.op);
+    if (syntax_[left].kind == ExprKind::kNamed) left = syntax_.ChildOf(left, 0);
+    const bool is_same = op == CompareOperator::kIs || op == CompareOperator::kEqual;
+    const bool is_other = op == CompareOperator::kIsNot || op == CompareOperator::kNotEqual;
+    if (!is_same && !is_other) return value;
+    const bool says_same = is_same == holds;
+    // `type(x) is C`
+    if (syntax_[left].kind == ExprKind::kCall && says_same && syntax_.ChildrenOf(left).size() == 2 &&
+        syntax_.TextOf(syntax_[syntax_.ChildOf(left, 0)]) == "type" && IsSubject(syntax_.ChildOf(left, 1)))
+      return OfClass(in_.ValueOf(file_.id, right, frame_), value, true);
+    if (!IsSubject(left)) {
+      if (!IsSubject(right)) return value;
+      std::swap(left, right);
+    }
+    const Expr& other = syntax_[right];
+    if (other.kind == ExprKind::kConstant && other.op == static_cast<uint8_t>(ConstantValue::kNone)) {
+      if (!says_same) return in_.WithoutNone(value);
+      const auto types = in_.types_.CopyOf(value.set);
+      const bool may_be = std::ranges::any_of(types, [&](TypeId id) { return in_.types_[id].kind == TypeKind::kNone; });
+      return may_be || (value.doubt & Value::kOpen) != 0 ? in_.NoneValue() : value;
+    }
+    // A member of an enumeration or a literal.
+    const Value compared = in_.ValueOf(file_.id, right, frame_);
+    if (in_.types_.SizeOf(compared.set) != 1) return value;
+    const TypeId literal = in_.types_.TypesOf(compared.set)[0];
+    if (in_.types_[literal].b == 0 || in_.types_[literal].kind != TypeKind::kInstance) return value;
+    std::vector<TypeId> rest;
+    for (const TypeId id : in_.types_.CopyOf(value.set)) {
+      const bool is_literal = id == literal;
+      const bool is_plain = in_.types_[id].kind == TypeKind::kInstance && in_.types_[id].a == in_.types_[literal].a &&
+                            in_.types_[id].b == 0;
+      if (says_same ? is_literal || is_plain : !is_literal) rest.push_back(id);
+    }
+    return rest.empty() ? value : Value{in_.types_.SetOf(rest), value.doubt};
+  }
+
+  Value Call(ExprId condition, bool holds, Value value) {
+    const auto children = syntax_.ChildrenOf(condition);
+    const Text name = syntax_.TextOf(syntax_[children[0]]);
+    if (children.size() == 3 && (name == "isinstance" || name == "issubclass")) {
+      ExprId subject = children[1];
+      if (syntax_[subject].kind == ExprKind::kNamed) subject = syntax_.ChildOf(subject, 0);
+      if (!IsSubject(subject)) return value;
+      const Value cls = in_.ValueOf(file_.id, children[2], frame_);
+      return name == "isinstance" ? OfClass(cls, value, holds) : value;
+    }
+    if (children.size() == 2 && IsSubject(children[1])) {
+      // A function that says of what it is given what it is.
+      for (const TypeId id : in_.types_.CopyOf(in_.ValueOf(file_.id, children[0], frame_).set)) {
+        if (in_.types_[id].kind != TypeKind::kFunction) continue;
+        const FunctionInfo info = in_.functions_[in_.types_[id].a];
+        const SourceFile* source = in_.FileOf(info.file);
+        if (source == nullptr || info.lambda != kNoExpr) continue;
+        const ExprId hint = source->syntax.stmt(info.stmt).hint;
+        if (hint == kNoExpr || source->syntax[hint].kind != ExprKind::kSubscript) continue;
+        const Text form = source->syntax.TextOf(source->syntax[source->syntax.ChildOf(hint, 0)]);
+        if (!holds || !(form.ends_with("TypeGuard") || form.ends_with("TypeIs"))) continue;
+        const Value said = in_.ValueOfHint(info.file, source->syntax.ChildOf(hint, 1));
+        if (said.IsKnown()) return said;
+      }
+    }
+    if (children.size() == 2 && name == "callable" && IsSubject(children[1])) {
+      std::vector<TypeId> rest;
+      for (const TypeId id : in_.types_.CopyOf(value.set)) {
+        const Type t = in_.types_[id];
+        const bool can = t.kind == TypeKind::kFunction || t.kind == TypeKind::kClass || t.kind == TypeKind::kCallable ||
+                         (t.kind == TypeKind::kInstance && in_.FindMember(t.a, "__call__"));
+        if (can == holds) rest.push_back(id);
+      }
+      return rest.empty() ? value : Value{in_.types_.SetOf(rest), value.doubt};
+    }
+    return value;
+  }
+
+  void Classes(Value cls, std::vector<TypeId>& found, int depth = 0) {
+    if (depth > 4) return;
+    for (const TypeId id : in_.types_.CopyOf(cls.set)) {
+      const Type t = in_.types_[id];
+      if (t.kind == TypeKind::kClass) found.push_back(id);
+      if (t.kind == TypeKind::kTypeForm) {
+        for (const TypeId inner : in_.types_.CopyOf(in_.types_.ArgOf(id, 0))) {
+          if (in_.types_[inner].kind == TypeKind::kInstance)
+            found.push_back(in_.types_.Add(TypeKind::kClass, in_.types_[inner].a));
+        }
+      }
+      if (t.kind == TypeKind::kTuple)
+        for (size_t i = 0; i < t.args_count; ++i) Classes({in_.types_.ArgOf(id, i), 0}, found, depth + 1);
+    }
+  }
+
+  Value OfClass(Value cls, Value value, bool holds) {
+    std::vector<TypeId> classes;
+    Classes(cls, classes);
+    if (classes.empty()) return value;
+    std::vector<TypeId> kept;
+    const std::vector<TypeId> types = in_.types_.CopyOf(value.set);
+    for (const TypeId id : types) {
+      const ClassId own = in_.ClassOfType(id);
+      bool is_one = false;
+      for (const TypeId candidate : classes)
+        is_one = is_one || (own != kNoId && in_.IsSubclass(own, in_.types_[candidate].a));
+      if (is_one == holds) kept.push_back(id);
+    }
+    if (!holds)
+      return kept.empty() && !types.empty() && (value.doubt & Value::kOpen) == 0
+                 ? value
+                 : Value{in_.types_.SetOf(kept), value.doubt};
+    // Those that are no instance of it may be one of a class that is both; and what is not known is one.
+    bool adds_all = kept.empty();
+    if (adds_all || (value.doubt & Value::kOpen) != 0) {
+      for (const TypeId candidate : classes) {
+        const ClassId wanted = in_.types_[candidate].a;
+        bool is_narrower = false;  // something more exact is known
+        for (const TypeId id : kept) {
+          const ClassId own = in_.ClassOfType(id);
+          is_narrower = is_narrower || (own != kNoId && in_.IsSubclass(own, wanted));
+        }
+        if (!is_narrower) kept.push_back(in_.InstanceOf(wanted));
+      }
+    }
+    return {in_.types_.SetOf(kept), static_cast<uint8_t>(value.doubt & ~(Value::kOpen | Value::kGuessed))};
+  }
+
+  Inference& in_;
+  const SourceFile& file_;
+  const FileSyntax& syntax_;
+  ExprId subject_;
+  FrameId frame_;
+};
+
+// Conditions are applied from the outermost to the innermost, those only behind which nothing was assigned.
+Value Inference::Narrowed(const SourceFile& file, ExprId expr, Value value, FrameId frame) {
+  const FileSyntax& syntax = file.syntax;
+  if (!IsChain(syntax, expr) || (syntax[expr].flags & kIsTarget) != 0) return value;
+  struct Condition {
+    ExprId expr;
+    bool holds;
+  };
+  std::vector<Condition> conditions;
+  ExprId root = expr;
+  while (syntax[root].kind == ExprKind::kAttribute) root = syntax.ChildOf(root, 0);
+  const Text name = syntax.TextOf(syntax[root]);
+  const auto mentions = [&](uint32_t begin, uint32_t end) {
+    return Text(syntax.source + begin, end - begin).find(name) != Text::npos;
+  };
+  const auto add = [&](ExprId condition, bool holds) {
+    if (condition != kNoExpr && mentions(syntax[condition].begin, syntax[condition].end))
+      conditions.push_back({condition, holds});
+  };
+  // In the expression itself.
+  for (ExprId at = expr; syntax[at].parent != kNoExpr; at = syntax[at].parent) {
+    const ExprId parent = syntax[at].parent;
+    if (syntax[parent].kind == ExprKind::kBoolean && syntax.ChildOf(parent, 1) == at) {
+      add(syntax.ChildOf(parent, 0), syntax[parent].op == word::kAnd);
+    } else if (syntax[parent].kind == ExprKind::kConditional) {
+      if (syntax.ChildOf(parent, 0) == at) add(syntax.ChildOf(parent, 1), true);
+      if (syntax.ChildOf(parent, 2) == at) add(syntax.ChildOf(parent, 1), false);
+    } else if (syntax[parent].kind == ExprKind::kListComprehension ||
+               syntax[parent].kind == ExprKind::kSetComprehension || syntax[parent].kind == ExprKind::kGenerator ||
+               syntax[parent].kind == ExprKind::kDictComprehension) {
+      for (const ExprId clause : syntax.ChildrenOf(parent)) {
+        if (clause == at || syntax[clause].kind != ExprKind::kComprehensionFor) continue;
+        const auto parts = syntax.ChildrenOf(clause);
+        for (size_t i = 2; i < parts.size(); ++i) add(parts[i], true);
+      }
+    }
+  }
+  // In the statements around and in front, as far as the scope reaches.
+  StmtId stmt = syntax.StatementAt(syntax[expr].begin);
+  static constexpr int kMaxStatements = 400;
+  int budget = kMaxStatements;
+  const auto condition_of = [&](StmtId clause) {
+    const auto exprs = syntax.ExprsOf(syntax.stmt(clause));
+    return exprs.empty() ? kNoExpr : exprs[0];
+  };
+  const auto in_head = [&](StmtId clause) { return syntax[expr].begin < syntax.stmt(clause).end; };
+  for (; stmt != kModuleStmt; stmt = syntax.stmt(stmt).parent) {
+    const Stmt& own = syntax.stmt(stmt);
+    if (own.kind == StmtKind::kDef || own.kind == StmtKind::kClass) {
+      if (!in_head(stmt)) break;
+    }
+    const bool in_own_head = in_head(stmt);
+    if (!in_own_head && (own.kind == StmtKind::kIf || own.kind == StmtKind::kElif || own.kind == StmtKind::kWhile))
+      add(condition_of(stmt), true);
+    if (!in_own_head && own.kind == StmtKind::kCase) {
+      const ExprId subject = condition_of(own.parent);
+      if (subject != kNoExpr && SameChain(syntax, subject, expr)) conditions.push_back({condition_of(stmt), true});
+    }
+    StmtId at = stmt;
+    if (own.kind == StmtKind::kElif || own.kind == StmtKind::kElse) {
+      for (;;) {
+        at = syntax.stmt(at).previous;
+        if (at == kModuleStmt) break;
+        const StmtKind kind = syntax.stmt(at).kind;
+        if (kind == StmtKind::kIf || kind == StmtKind::kElif) add(condition_of(at), false);
+        if (kind != StmtKind::kElif && kind != StmtKind::kElse) break;
+      }
+    }
+    for (at = at == kModuleStmt ? kModuleStmt : syntax.stmt(at).previous; at != kModuleStmt && --budget > 0;
+         at = syntax.stmt(at).previous) {
+      const Stmt& before = syntax.stmt(at);
+      if (before.kind == StmtKind::kAssert) {
+        add(condition_of(at), true);
+      } else if (before.kind == StmtKind::kWhile && mentions(before.begin, before.end)) {
+        bool has_break = false;
+        for (StmtId inner = at + 1; inner < syntax.stmts.size() && syntax.stmt(inner).begin < before.block_end; ++inner)
+          has_break =
+              has_break || (syntax.stmt(inner).kind == StmtKind::kPass && syntax.stmt(inner).op == word::kBreak);
+        if (!has_break) add(condition_of(at), false);
+      } else if (before.kind == StmtKind::kIf && mentions(before.begin, before.end)) {
+        const StmtKind next = before.next == kModuleStmt ? StmtKind::kPass : syntax.stmt(before.next).kind;
+        if (next != StmtKind::kElif && next != StmtKind::kElse && BlockLeaves(syntax, at, true))
+          add(condition_of(at), false);
+        if (next == StmtKind::kElse && BlockLeaves(syntax, before.next, true) && !BlockLeaves(syntax, at, true))
+          add(condition_of(at), true);
+      }
+    }
+  }
+  if (conditions.empty()) return value;
+  // What was assigned in between.
+  const uint32_t index = file.OccurrenceBeginningAt(syntax[root].begin);
+  if (index == kNoIndex) return value;
+  uint32_t last_bound = 0;
+  const uint32_t variable = file.bindings.VariableOf(file.bindings.occurrences[index]);
+  if (variable != kNoIndex) {
+    for (const uint32_t i : file.occurrences().Of(variable)) {
+      const Occurrence& other = file.bindings.occurrences[i];
+      if (other.begin >= syntax[expr].begin) break;
+      if (other.kind != NameKind::kNone && other.kind != NameKind::kParameter) {
+        const ExprId named = syntax.NamedAt(other.begin);
+        const bool is_walrus = named != kNoExpr && syntax[named].parent != kNoExpr &&
+                               syntax[syntax[named].parent].kind == ExprKind::kNamed;
+        last_bound = std::max(last_bound, is_walrus ? syntax.stmt(syntax.StatementAt(other.begin)).begin : other.begin);
+      }
+      if (root != expr) {  // the attribute itself
+        const ExprId read = syntax.NamedAt(other.begin);
+        ExprId chain = read == kNoExpr ? kNoExpr : syntax[read].parent;
+        while (chain != kNoExpr && syntax[chain].kind == ExprKind::kAttribute) {
+          if ((syntax[chain].flags & kIsTarget) != 0 && SameChain(syntax, chain, expr))
+            last_bound = std::max(last_bound, other.begin);
+          chain = syntax[chain].parent;
+        }
+      }
+    }
+  }
+  Narrowing narrowing(*this, file, expr, frame);
+  for (size_t i = conditions.size(); i-- > 0;)
+    if (syntax[conditions[i].expr].begin >= last_bound)
+      value = narrowing.Where(conditions[i].expr, conditions[i].holds, value);
+  return value;
+}
+
+int Inference::TruthIn(const SourceFile& file, ExprId condition, FrameId frame) {
+  const int always = StaticTruth(file, condition);
+  if (always >= 0 || frame == kNoFrame || condition == kNoExpr) return always;
+  const FileSyntax& syntax = file.syntax;
+  const Expr& e = syntax[condition];
+  switch (e.kind) {
+    case ExprKind::kUnary: {
+      const int inner = e.op == word::kNot ? TruthIn(file, syntax.ChildOf(condition, 0), frame) : -1;
+      return inner < 0 ? -1 : 1 - inner;
+    }
+    case ExprKind::kBoolean: {
+      const int left = TruthIn(file, syntax.ChildOf(condition, 0), frame);
+      const int right = TruthIn(file, syntax.ChildOf(condition, 1), frame);
+      if (e.op == word::kAnd) return left == 0 || right == 0 ? 0 : left == 1 && right == 1 ? 1 : -1;
+      return left == 1 || right == 1 ? 1 : left == 0 && right == 0 ? 0 : -1;
+    }
+    case ExprKind::kCompare: {
+      if (e.children_count != 2) return -1;
+      const auto op = static_cast<CompareOperator>(e.op);
+      const ExprId right = syntax.ChildOf(condition, 1);
+      const bool is_none =
+          syntax[right].kind == ExprKind::kConstant && syntax[right].op == static_cast<uint8_t>(ConstantValue::kNone);
+      if (!is_none || (op != CompareOperator::kIs && op != CompareOperator::kIsNot)) return -1;
+      const Value value = ValueOf(file.id, syntax.ChildOf(condition, 0), frame);
+      if (!value.IsKnown() || value.doubt != 0) return -1;
+      size_t nones = 0;
+      for (const TypeId id : types_.CopyOf(value.set)) nones += types_[id].kind == TypeKind::kNone;
+      if (nones != 0 && nones != types_.SizeOf(value.set)) return -1;
+      return (nones != 0) == (op == CompareOperator::kIs) ? 1 : 0;
+    }
+    case ExprKind::kCall: {
+      const auto children = syntax.ChildrenOf(condition);
+      if (children.size() != 3 || syntax.TextOf(syntax[children[0]]) != "isinstance") return -1;
+      const Value value = ValueOf(file.id, children[1], frame);
+      if (!value.IsKnown() || value.doubt != 0) return -1;
+      std::vector<ClassId> wanted;
+      const Value classes = ValueOf(file.id, children[2], frame);
+      for (const TypeId id : types_.CopyOf(classes.set)) {
+        if (types_[id].kind == TypeKind::kClass) {
+          wanted.push_back(types_[id].a);
+        } else if (types_[id].kind == TypeKind::kTuple) {
+          for (size_t i = 0; i < types_[id].args_count; ++i)
+            for (const TypeId item : types_.CopyOf(types_.ArgOf(id, i)))
+              if (types_[item].kind == TypeKind::kClass) wanted.push_back(types_[item].a);
+        } else {
+          return -1;
+        }
+      }
+      if (wanted.empty() || classes.doubt != 0) return -1;
+      size_t are = 0;
+      for (const TypeId id : types_.CopyOf(value.set)) {
+        const ClassId own = ClassOfType(id);
+        if (own == kNoId || InfoOf(own).is_open) return -1;
+        are += std::ranges::any_of(wanted, [&](ClassId cls) { return IsSubclass(own, cls); });
+      }
+      return are == types_.SizeOf(value.set) ? 1 : are == 0 ? 0 : -1;
+    }
+    default:
+      return -1;
+  }
+}
+
+int Inference::StaticTruth(const SourceFile& file, ExprId condition) {
+  const FileSyntax& syntax = file.syntax;
+  if (condition == kNoExpr) return -1;
+  const Expr& e = syntax[condition];
+  const Text text = syntax.TextOf(e);
+  const Version version = files_.version();
+  switch (e.kind) {
+    case ExprKind::kConstant:
+      return e.op == static_cast<uint8_t>(ConstantValue::kTrue) ? 1 : 0;
+    case ExprKind::kNumber:
+      return text.find_first_not_of("0.") == Text::npos ? 0 : 1;
+    case ExprKind::kName:
+    case ExprKind::kAttribute:
+      if (text == "TYPE_CHECKING" || text == "typing.TYPE_CHECKING" || text == "t.TYPE_CHECKING") return 1;
+      if (text.ends_with("PY2")) return version.AtLeast(3, 0) ? 0 : 1;
+      if (text.ends_with("PY3")) return version.AtLeast(3, 0) ? 1 : 0;
+      return -1;
+    case ExprKind::kUnary: {
+      if (e.op != word::kNot) return -1;
+      const int inner = StaticTruth(file, syntax.ChildOf(condition, 0));
+      return inner < 0 ? -1 : 1 - inner;
+    }
+    case ExprKind::kBoolean: {
+      const int left = StaticTruth(file, syntax.ChildOf(condition, 0)),
+                right = StaticTruth(file, syntax.ChildOf(condition, 1));
+      if (e.op == word::kAnd) return left == 0 || right == 0 ? 0 : left == 1 && right == 1 ? 1 : -1;
+      return left == 1 || right == 1 ? 1 : left == 0 && right == 0 ? 0 : -1;
+    }
+    case ExprKind::kCall: {  // sys.platform.startswith("win")
+      const auto children = syntax.ChildrenOf(condition);
+      if (children.size() != 2 || syntax.TextOf(syntax[children[0]]) != "sys.platform.startswith") return -1;
+      const Text wanted = syntax.TextOf(syntax[children[1]]);
+      return wanted.size() > 2 && Text("linux").starts_with(wanted.substr(1, wanted.size() - 2)) ? 1 : 0;
+    }
+    case ExprKind::kCompare: {
+      if (e.children_count != 2) return -1;
+      const ExprId left = syntax.ChildOf(condition, 0), right = syntax.ChildOf(condition, 1);
+      const Text subject = syntax.TextOf(syntax[left]);
+      const auto op = static_cast<CompareOperator>(e.op);
+      const auto decide = [&](int order) {  // of the version to what it is compared with
+        switch (op) {
+          case CompareOperator::kEqual:
+            return order == 0 ? 1 : 0;
+          case CompareOperator::kNotEqual:
+            return order != 0 ? 1 : 0;
+          case CompareOperator::kLess:
+            return order < 0 ? 1 : 0;
+          case CompareOperator::kGreater:
+            return order > 0 ? 1 : 0;
+          case CompareOperator::kLessEqual:
+            return order <= 0 ? 1 : 0;
+          case CompareOperator::kGreaterEqual:
+            return order >= 0 ? 1 : 0;
+          default:
+            return -1;
+        }
+      };
+      if (subject == "sys.platform" || subject == "os.name") {
+        const Text wanted = syntax.TextOf(syntax[right]);
+        if (syntax[right].kind != ExprKind::kString || wanted.size() < 2) return -1;
+        const Text own = subject == "os.name" ? "posix" : "linux";
+        return decide(wanted.substr(1, wanted.size() - 2) == own ? 0 : 1);
+      }
+      const auto number = [&](ExprId expr) {
+        int value = 0;
+        const Text digits = syntax.TextOf(syntax[expr]);
+        if (syntax[expr].kind != ExprKind::kNumber || digits.size() > 4) return -1;
+        for (const char c : digits) {
+          if (c < '0' || c > '9') return -1;
+          value = value * 10 + (c - '0');
+        }
+        return value;
+      };
+      if (subject == "sys.version_info" || subject == "sys.version_info[:2]" || subject == "version_info") {
+        if (syntax[right].kind != ExprKind::kTuple) return -1;
+        const auto parts = syntax.ChildrenOf(right);
+        for (size_t i = 0; i < parts.size() && i < 3; ++i) {
+          const int wanted = number(parts[i]);
+          if (wanted < 0) return -1;
+          const int own = static_cast<int>(i) < version.count ? version.parts[i] : 0;
+          if (own != wanted) return decide(own < wanted ? -1 : 1);
+        }
+        // (3, 8, 0) is more than (3, 8).
+        return decide(parts.size() < 3 && subject != "sys.version_info[:2]" ? 1 : 0);
+      }
+      if (subject == "sys.version_info[0]" || subject == "sys.version_info.major") {
+        const int wanted = number(right);
+        return wanted < 0 ? -1 : decide(version.parts[0] < wanted ? -1 : version.parts[0] > wanted ? 1 : 0);
+      }
+      return -1;
+    }
+    default:
+      return -1;
+  }
+}
+
+}  // namespace quillet

@@ -1,0 +1,49 @@
+// Inference::Remembered: how a value is found once.
+#pragma once
+
+#include <algorithm>
+
+#include "inference/inference.h"
+
+namespace quillet {
+
+// File, node and frame as one number; 0 where they are too large to be remembered.
+inline uint64_t KeyOf(uint64_t file, uint64_t node, uint64_t frame) {
+  if (file >= 1u << 20 || node >= 1u << 24 || frame >= 1u << 20) return 0;
+  return (file << 44 | node << 20 | frame) + 1;
+}
+
+template <class Find>
+Value Inference::Remembered(std::unordered_map<uint64_t, Memo>& memos, uint64_t key, Find&& find) {
+  if (key != 0) {
+    const auto known = memos.find(key);
+    if (known != memos.end()) {
+      if (known->second.depth == 0) return known->second.value;
+      shallowest_cycle_ = std::min(shallowest_cycle_, known->second.depth);
+      return {};
+    }
+  }
+  if (steps_ == 0 || depth_ >= kMaxDepth) {
+    shallowest_cycle_ = 0;  // nothing on the way here may be remembered
+    return kUnknownValue;
+  }
+  --steps_;
+  const int own_depth = ++depth_;
+  const int cycle_outside = shallowest_cycle_;
+  shallowest_cycle_ = INT32_MAX;
+  if (key != 0) memos.emplace(key, Memo{{}, own_depth});
+  const Value value = find();
+  --depth_;
+  const bool is_whole = shallowest_cycle_ >= own_depth;
+  if (key != 0) {
+    if (is_whole) {
+      memos[key] = {value, 0};
+    } else {
+      memos.erase(key);
+    }
+  }
+  shallowest_cycle_ = std::min(cycle_outside, is_whole ? INT32_MAX : shallowest_cycle_);
+  return value;
+}
+
+}  // namespace quillet

@@ -1,0 +1,88 @@
+// The numbering of types and sets.
+#include "inference/types.h"
+
+#include <algorithm>
+
+namespace quillet {
+
+namespace {
+
+uint64_t Stir(uint64_t hash, uint64_t value) {
+  hash = (hash ^ value) * 0x9E3779B97F4A7C15u;
+  return hash ^ hash >> 32;
+}
+
+}  // namespace
+
+bool TypeTable::Same(TypeId type, TypeKind kind, uint32_t a, uint32_t b, std::span<const TypeSetId> args) const {
+  const Type& t = types_[type];
+  return t.kind == kind && t.a == a && t.b == b && std::ranges::equal(ArgsOf(type), args);
+}
+
+TypeId TypeTable::Add(TypeKind kind, uint32_t a, uint32_t b, std::span<const TypeSetId> args) {
+  uint64_t hash = Stir(Stir(Stir(0, static_cast<uint64_t>(kind)), a), b);
+  for (const TypeSetId arg : args) hash = Stir(hash, arg);
+  for (auto [at, end] = types_by_hash_.equal_range(hash); at != end; ++at)
+    if (Same(at->second, kind, a, b, args)) return at->second;
+  const auto id = static_cast<TypeId>(types_.size());
+  const std::vector<TypeSetId> copy(args.begin(), args.end());  // `args` may be a view of args_
+  types_.push_back({kind, a, b, static_cast<uint32_t>(args_.size()), static_cast<uint32_t>(copy.size())});
+  args_.insert(args_.end(), copy.begin(), copy.end());
+  types_by_hash_.emplace(hash, id);
+  return id;
+}
+
+TypeSetId TypeTable::SetOf(std::span<const TypeId> types) {
+  if (types.empty()) return kNoTypes;
+  std::vector<TypeId> sorted(types.begin(), types.end());
+  std::ranges::sort(sorted);
+  sorted.erase(std::ranges::unique(sorted).begin(), sorted.end());
+  uint64_t hash = sorted.size();
+  for (const TypeId type : sorted) hash = Stir(hash, type);
+  for (auto [at, end] = sets_by_hash_.equal_range(hash); at != end; ++at)
+    if (std::ranges::equal(TypesOf(at->second), sorted)) return at->second;
+  const auto id = static_cast<TypeSetId>(sets_.size());
+  sets_.push_back({static_cast<uint32_t>(members_.size()), static_cast<uint32_t>(sorted.size())});
+  members_.insert(members_.end(), sorted.begin(), sorted.end());
+  sets_by_hash_.emplace(hash, id);
+  return id;
+}
+
+std::vector<TypeId> TypeTable::CopyOf(TypeSetId set) const {
+  const auto types = TypesOf(set);
+  return {types.begin(), types.end()};
+}
+
+TypeSetId TypeTable::Union(TypeSetId a, TypeSetId b) {
+  if (a == b || b == kNoTypes) return a;
+  if (a == kNoTypes) return b;
+  if (a > b) std::swap(a, b);
+  const uint64_t key = uint64_t{a} << 32 | b;
+  if (const auto known = unions_.find(key); known != unions_.end()) return known->second;
+  std::vector<TypeId> all = CopyOf(a);
+  const auto more = TypesOf(b);
+  all.insert(all.end(), more.begin(), more.end());
+  const TypeSetId set = SetOf(all);
+  unions_.emplace(key, set);
+  return set;
+}
+
+Value TypeTable::Union(Value a, Value b) {
+  const auto doubt = static_cast<uint8_t>(a.doubt | b.doubt);
+  const TypeSetId set = Union(a.set, b.set);
+  if (SizeOf(set) <= kMaxSet) return {set, doubt};
+  return {SizeOf(a.set) >= SizeOf(b.set) ? a.set : b.set, static_cast<uint8_t>(doubt | Value::kOpen)};
+}
+
+void TypeTable::Clear() {
+  types_.clear();
+  args_.clear();
+  members_.clear();
+  types_by_hash_.clear();
+  sets_by_hash_.clear();
+  unions_.clear();
+  sets_.assign(1, {0, 0});
+  Add(TypeKind::kNone, 0);
+}
+
+}  // namespace quillet

@@ -1,0 +1,106 @@
+// Types of values, by number.
+//
+// Equal types have one number, and so have equal sets of them, so that what an expression may be is one
+// number as well, and asking whether two are the same compares numbers. Nothing is freed before Clear.
+#pragma once
+
+#include <cstdint>
+#include <initializer_list>
+#include <span>
+#include <unordered_map>
+#include <vector>
+
+namespace quillet {
+
+using TypeId = uint32_t;
+using TypeSetId = uint32_t;
+inline constexpr TypeSetId kNoTypes = 0;
+
+// Behind each kind what `a` and `b` are, and the arguments.
+enum class TypeKind : uint8_t {
+  kNone,      // the value None
+  kModule,    // a: module
+  kClass,     // the class itself. a: class; its type arguments, none where they are not said
+  kInstance,  // a: class; b: literal + 1, or 0; its type arguments
+  kTuple,     // a tuple of so many items: the items
+  kFunction,  // a: function; b: frame; the receiver that it is bound to, if any
+  kTypeVar,   // a: type variable
+  kSuper,     // a: class behind which attributes are looked for; the receiver
+  kSpecial,   // a: SpecialForm
+  kTypeForm,  // an expression that is a type and no class, such as `X | None`: what it allows
+  kCallable,  // b: 1 where its parameters are known; the result, the parameters...
+  kForeign,   // what comes from a module that is not there; a: number of its dotted name
+};
+
+struct Type {
+  TypeKind kind = TypeKind::kNone;
+  uint32_t a = 0;
+  uint32_t b = 0;
+  uint32_t args_begin = 0;
+  uint32_t args_count = 0;
+};
+
+// What an expression may be.
+struct Value {
+  enum Doubt : uint8_t {
+    kOpen = 1,     // it may be something else too: something on the way is not known
+    kGuessed = 2,  // inferred from uses, such as the calls of a function
+  };
+  TypeSetId set = kNoTypes;
+  uint8_t doubt = 0;
+
+  bool IsKnown() const { return set != kNoTypes; }
+  friend bool operator==(const Value&, const Value&) = default;
+};
+inline constexpr Value kUnknownValue{kNoTypes, Value::kOpen};
+
+class TypeTable {
+ public:
+  // A set of more types than this is open instead.
+  static constexpr size_t kMaxSet = 24;
+
+  TypeTable() { Clear(); }
+
+  TypeId Add(TypeKind kind, uint32_t a, uint32_t b = 0, std::span<const TypeSetId> args = {});
+  TypeId Add(TypeKind kind, uint32_t a, uint32_t b, std::initializer_list<TypeSetId> args) {
+    return Add(kind, a, b, std::span(args.begin(), args.size()));
+  }
+  const Type& operator[](TypeId type) const { return types_[type]; }
+  // Valid until the next type is added.
+  std::span<const TypeSetId> ArgsOf(TypeId type) const {
+    return std::span(args_).subspan(types_[type].args_begin, types_[type].args_count);
+  }
+  TypeSetId ArgOf(TypeId type, size_t i) const {
+    return i < types_[type].args_count ? args_[types_[type].args_begin + i] : kNoTypes;
+  }
+
+  TypeSetId SetOf(TypeId type) { return SetOf(std::span(&type, 1)); }
+  TypeSetId SetOf(std::span<const TypeId> types);  // in any order, repeated or not
+  // Valid until the next set is added: copy where evaluation goes on.
+  std::span<const TypeId> TypesOf(TypeSetId set) const {
+    return std::span(members_).subspan(sets_[set].begin, sets_[set].count);
+  }
+  std::vector<TypeId> CopyOf(TypeSetId set) const;
+  size_t SizeOf(TypeSetId set) const { return sets_[set].count; }
+  TypeSetId Union(TypeSetId a, TypeSetId b);
+  Value Union(Value a, Value b);
+
+  size_t size() const { return types_.size(); }
+  void Clear();
+
+ private:
+  struct Set {
+    uint32_t begin, count;
+  };
+  bool Same(TypeId type, TypeKind kind, uint32_t a, uint32_t b, std::span<const TypeSetId> args) const;
+
+  std::vector<Type> types_;
+  std::vector<TypeSetId> args_;
+  std::vector<Set> sets_;
+  std::vector<TypeId> members_;
+  std::unordered_multimap<uint64_t, TypeId> types_by_hash_;
+  std::unordered_multimap<uint64_t, TypeSetId> sets_by_hash_;
+  std::unordered_map<uint64_t, TypeSetId> unions_;
+};
+
+}  // namespace quillet

@@ -1,0 +1,277 @@
+// One binder and one reader for each version serve all files; what they give is copied, so that a file holds no more
+// memory than it needs. Tokens go back when a file was read.
+#include "program/files.h"
+
+#include <algorithm>
+#include <atomic>
+#include <deque>
+#include <optional>
+#include <utility>
+
+#include "analysis/source_bytes.h"
+#include "foundations/utf8.h"
+#include "lines/cutter.h"
+#include "names/binder.h"
+#include "project/file_system.h"
+#include "project/word_search.h"
+#include "syntax/reader.h"
+
+namespace quillet {
+
+namespace {
+
+std::atomic<SourceDecoder> decoder_of_all{nullptr};
+
+// Stubs are written in the newest language, whatever the version that they describe.
+constexpr Version kStubVersion = Version::Of(3, 14);
+
+void AppendLatin1(Text bytes, std::string& out) {
+  out.reserve(out.size() + bytes.size() + bytes.size() / 8);
+  for (const char byte : bytes) AppendUtf8(static_cast<unsigned char>(byte), out);
+}
+
+// Makes UTF-8 of the bytes of a file in place.
+void DecodeSource(std::string& bytes) {
+  if (!NeedsHostDecoding(bytes)) return;
+  std::string utf8;
+  const SourceDecoder decode = decoder_of_all.load(std::memory_order_acquire);
+  if (decode == nullptr || !decode(bytes, utf8)) {
+    utf8.clear();
+    AppendLatin1(bytes, utf8);
+  }
+  bytes = std::move(utf8);
+}
+
+// Reads what a stamp was taken of, decoded; false where that cannot be.
+bool ReadDecoded(const std::string& path, const FileStamp& stamp, std::string& bytes) {
+  if (!stamp.is_file() || stamp.size > Files::kMaxSourceSize || !ReadSourceFile(path, bytes).empty()) return false;
+  DecodeSource(bytes);
+  return bytes.size() <= SourceText::kMaxSize;
+}
+
+}  // namespace
+
+void SetSourceDecoder(SourceDecoder decoder) { decoder_of_all.store(decoder, std::memory_order_release); }
+
+class Files::Impl {
+  // What reads sources of a version.
+  class SourceReader {
+   public:
+    explicit SourceReader(Version version) : version_(version), binder_(version), syntax_reader_(version) {}
+
+    void Read(Text text, SourceFile& file) {
+      file.source = SourceText::Copy(text);
+      file.source->tokens.swap(tokens_);
+      file.source->tokens.clear();
+      rows_.clear();
+      CutLines(*file.source, version_, rows_);
+      file.bindings = binder_.Bind(*file.source, rows_);
+      syntax_.Clear();
+      syntax_reader_.Read(*file.source, rows_, syntax_);
+      file.syntax = syntax_;
+      file.is_python2 = !version_.AtLeast(3, 0);
+      tokens_.swap(file.source->tokens);
+      file.source->tokens = {};
+      if (tokens_.capacity() > kMostTokensKept) tokens_ = {};
+    }
+
+   private:
+    static constexpr size_t kMostTokensKept = 1 << 20;
+
+    Version version_;
+    NameBinder binder_;
+    SyntaxReader syntax_reader_;
+    std::vector<Token> tokens_;
+    std::vector<LineRow> rows_;
+    FileSyntax syntax_;
+  };
+
+ public:
+  explicit Impl(Version version) : version_(version) {}
+
+  FileId NumberOf(Text path) {
+    if (const auto found = numbers_.find(path); found != numbers_.end()) return found->second;
+    std::string normal = NormalPath(path);
+    if (const auto found = numbers_.find(Text(normal)); found != numbers_.end()) return found->second;
+    const auto number = static_cast<FileId>(entries_.size());
+    entries_.emplace_back();
+    entries_.back().path = std::move(normal);
+    numbers_.emplace(entries_.back().path, number);
+    return number;
+  }
+
+  const std::string& PathOf(FileId file) const { return entries_[file].path; }
+  bool IsOpen(FileId file) const { return entries_[file].buffer.has_value(); }
+  const std::vector<FileId>& Buffers() const { return buffers_; }
+  size_t ByteSize() const { return held_; }
+
+  bool Exists(FileId file) {
+    Entry& entry = entries_[file];
+    return entry.buffer.has_value() || StampOfEntry(entry).is_file();
+  }
+
+  const SourceFile* Get(FileId file) {
+    Entry& entry = entries_[file];
+    entry.asked = ++asked_;
+    if (entry.file == nullptr && !entry.is_unreadable) Read(file, entry);
+    return entry.file.get();
+  }
+
+  Text SourceOf(FileId file, std::string& memory) const {
+    const Entry& entry = entries_[file];
+    if (entry.buffer) return *entry.buffer;
+    if (entry.file != nullptr) return entry.file->text();
+    if (!ReadDecoded(entry.path, StampOf(entry.path), memory)) return Text("");
+    return memory;
+  }
+
+  bool Refresh() {
+    bool has_changed = false;
+    for (Entry& entry : entries_) {
+      if (entry.buffer || !entry.stamp) continue;
+      const FileStamp stamp = StampOf(entry.path);
+      if (stamp == *entry.stamp) continue;
+      entry.stamp = stamp;
+      // One that was only written anew is the same.
+      if (entry.file != nullptr && ReadDecoded(entry.path, stamp, memory_) && memory_ == entry.file->text()) continue;
+      Drop(entry);
+      has_changed = true;
+    }
+    return has_changed;
+  }
+
+  void Open(FileId file, std::string text) {
+    Entry& entry = entries_[file];
+    text.resize(std::min(text.size(), SourceText::kMaxSize));
+    if (!entry.buffer) buffers_.push_back(file);
+    entry.buffer = std::move(text);
+    if (entry.file == nullptr || entry.file->text() != *entry.buffer) Drop(entry);
+  }
+
+  void Change(FileId file, uint32_t begin, uint32_t end, Text text) {
+    Entry& entry = entries_[file];
+    if (!entry.buffer) {
+      std::string content(SourceOf(file, memory_));
+      Open(file, std::move(content));
+    }
+    std::string& buffer = *entry.buffer;
+    const size_t from = std::min<size_t>(begin, buffer.size());
+    const size_t to = std::clamp<size_t>(end, from, buffer.size());
+    buffer.replace(from, to - from, text);
+    buffer.resize(std::min(buffer.size(), SourceText::kMaxSize));
+    Drop(entry);
+  }
+
+  void Close(FileId file) {
+    Entry& entry = entries_[file];
+    if (!entry.buffer) return;
+    std::erase(buffers_, file);
+    entry.buffer.reset();
+    entry.stamp.reset();
+    if (entry.file == nullptr) {
+      entry.is_unreadable = false;
+    } else if (!ReadDecoded(entry.path, StampOfEntry(entry), memory_) || memory_ != entry.file->text()) {
+      Drop(entry);
+    }
+  }
+
+  void Trim(size_t bytes) {
+    if (held_ <= bytes) return;
+    std::vector<Entry*> held;
+    for (Entry& entry : entries_) {
+      if (entry.file != nullptr && !entry.buffer) held.push_back(&entry);
+    }
+    std::sort(held.begin(), held.end(), [](const Entry* a, const Entry* b) { return a->asked < b->asked; });
+    for (Entry* entry : held) {
+      if (held_ <= bytes) break;
+      Drop(*entry);
+    }
+  }
+
+ private:
+  struct Entry {
+    std::string path;
+    std::unique_ptr<SourceFile> file;
+    size_t byte_size = 0;  // of it
+    uint64_t asked = 0;    // when it was asked for last
+    bool is_unreadable = false;
+    std::optional<FileStamp> stamp;  // of what was read, or looked for
+    std::optional<std::string> buffer;
+  };
+
+  static const FileStamp& StampOfEntry(Entry& entry) {
+    if (!entry.stamp) entry.stamp = StampOf(entry.path);
+    return *entry.stamp;
+  }
+
+  void Drop(Entry& entry) {
+    entry.file.reset();
+    held_ -= std::exchange(entry.byte_size, 0);
+    entry.is_unreadable = false;
+  }
+
+  void Read(FileId number, Entry& entry) {
+    Text text;
+    if (entry.buffer) {
+      text = *entry.buffer;
+    } else {
+      // Before it is read: what is written in between is noticed later.
+      entry.stamp = StampOf(entry.path);
+      entry.is_unreadable = !ReadDecoded(entry.path, *entry.stamp, memory_);
+      if (entry.is_unreadable) return;
+      text = memory_;
+    }
+    auto file = std::make_unique<SourceFile>();
+    file->id = number;
+    file->path = entry.path;
+    file->is_stub = entry.path.ends_with(".pyi");
+    ReaderFor(file->is_stub).Read(text, *file);
+    entry.byte_size = file->ByteSize();
+    held_ += entry.byte_size;
+    entry.file = std::move(file);
+    if (memory_.capacity() > kMostMemoryKept) memory_ = {};
+  }
+
+  SourceReader& ReaderFor(bool is_stub) {
+    std::optional<SourceReader>& reader = is_stub ? stub_reader_ : reader_;
+    if (!reader) reader.emplace(is_stub ? kStubVersion : version_);
+    return *reader;
+  }
+
+  static constexpr size_t kMostMemoryKept = size_t{4} << 20;
+
+  const Version version_;
+  std::deque<Entry> entries_;
+  std::unordered_map<Text, FileId> numbers_;  // by the paths of the entries
+  std::vector<FileId> buffers_;
+  std::optional<SourceReader> reader_;
+  std::optional<SourceReader> stub_reader_;
+  std::string memory_;
+  size_t held_ = 0;
+  uint64_t asked_ = 0;
+};
+
+Files::Files(Version version) : version_(version), impl_(std::make_unique<Impl>(version)) {}
+Files::~Files() = default;
+
+FileId Files::NumberOf(Text path) { return impl_->NumberOf(path); }
+const std::string& Files::PathOf(FileId file) const { return impl_->PathOf(file); }
+bool Files::Exists(FileId file) { return impl_->Exists(file); }
+const SourceFile* Files::Get(FileId file) { return impl_->Get(file); }
+Text Files::SourceOf(FileId file, std::string& memory) const { return impl_->SourceOf(file, memory); }
+
+bool Files::Holds(FileId file, Text word) {
+  std::string memory;
+  return HoldsWord(SourceOf(file, memory), word);
+}
+
+bool Files::Refresh() { return impl_->Refresh(); }
+void Files::Open(FileId file, std::string text) { impl_->Open(file, std::move(text)); }
+void Files::Change(FileId file, uint32_t begin, uint32_t end, Text text) { impl_->Change(file, begin, end, text); }
+void Files::Close(FileId file) { impl_->Close(file); }
+bool Files::IsOpen(FileId file) const { return impl_->IsOpen(file); }
+const std::vector<FileId>& Files::Buffers() const { return impl_->Buffers(); }
+void Files::Trim(size_t bytes) { impl_->Trim(bytes); }
+size_t Files::ByteSize() const { return impl_->ByteSize(); }
+
+}  // namespace quillet

@@ -1,0 +1,521 @@
+// The walk asks the rules of a folder, then those of the folders around it: the last rule that matches decides, and
+// whatever lies in a folder that is left out is left out. The stamps of all folders and rules that were read say
+// whether a walk would find something else.
+#include "program/project_files.h"
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <exception>
+#include <optional>
+#include <thread>
+#include <unordered_map>
+#include <unordered_set>
+#include <utility>
+
+#include "analysis/source_bytes.h"
+#include "foundations/stop.h"
+#include "project/file_system.h"
+#include "project/ignore_rules.h"
+#include "project/word_filters.h"
+#include "project/word_search.h"
+
+namespace quillet {
+
+namespace {
+
+// Fewer files than this are searched before another thread has begun.
+constexpr size_t kFilesWorthAThread = 64;
+
+bool IsSourceName(Text name) { return name.ends_with(".py") || name.ends_with(".pyi"); }
+
+// The rules of one folder, in front of those that they overrule.
+struct FolderRules {
+  std::shared_ptr<FolderRules> outer;
+  std::string folder;
+  IgnoreRules rules;
+
+  // Whether a path below is left out.
+  static bool Exclude(FolderRules* at, Text path, bool is_folder) {
+    for (; at != nullptr; at = at->outer.get()) {
+      const size_t start = at->folder.ends_with('/') ? at->folder.size() : at->folder.size() + 1;
+      const IgnoreRules::Verdict verdict = at->rules.Of(path.substr(start), is_folder);
+      if (verdict != IgnoreRules::Verdict::kNone) return verdict == IgnoreRules::Verdict::kExcluded;
+    }
+    return false;
+  }
+};
+using Rules = std::shared_ptr<FolderRules>;
+
+// What a walk read besides sources, as it was in front of the reading.
+struct Watched {
+  std::string path;
+  FileStamp stamp;
+};
+using WatchList = std::vector<Watched>;
+
+void Watch(std::string path, WatchList& watched) {
+  FileStamp stamp = SettledStamp(StampOf(path));
+  watched.push_back({std::move(path), stamp});
+}
+
+Rules WithRulesOf(Rules outer, const std::string& folder, const std::string& path, WatchList& watched) {
+  Watch(path, watched);
+  const std::string text = ReadSmallFile(path);
+  if (text.empty()) return outer;
+  return std::make_shared<FolderRules>(std::move(outer), folder, IgnoreRules(text));
+}
+
+Text WithoutLineEnd(Text text) {
+  while (text.ends_with('\n') || text.ends_with('\r') || text.ends_with(' ')) text.remove_suffix(1);
+  return text;
+}
+
+std::string PathFrom(const std::string& folder, Text path) {
+  return NormalPath(path.starts_with('/') ? std::string(path) : Join(folder, path));
+}
+
+// The rules of a repository that are in no folder of it.
+Rules RepositoryRules(const std::string& root, WatchList& watched) {
+  std::string git = Join(root, ".git");
+  if (!StampOf(git).is_folder()) {  // a worktree or a submodule: a file names the folder
+    const std::string text = ReadSmallFile(git);
+    Text path = WithoutLineEnd(text);
+    if (!path.starts_with("gitdir:")) return nullptr;
+    path.remove_prefix(7);
+    path.remove_prefix(std::min(path.find_first_not_of(' '), path.size()));
+    git = PathFrom(root, path);
+    if (const std::string common = ReadSmallFile(Join(git, "commondir")); !common.empty())
+      git = PathFrom(git, WithoutLineEnd(common));
+  }
+  return WithRulesOf(nullptr, root, Join(git, "info/exclude"), watched);
+}
+
+// The rules that hold in a folder from outside it. A folder that is named is wanted: where they exclude it, they do
+// not count.
+Rules RulesAbove(const std::string& folder, WatchList& watched) {
+  std::vector<std::string> chain = {folder};
+  while (!IsThere(Join(chain.back(), ".git"))) {
+    std::string parent(FolderOf(chain.back()));
+    if (parent == chain.back()) return nullptr;
+    chain.push_back(std::move(parent));
+  }
+  Rules rules = RepositoryRules(chain.back(), watched);
+  for (size_t i = chain.size() - 1; i > 0; --i) {
+    rules = WithRulesOf(std::move(rules), chain[i], Join(chain[i], ".gitignore"), watched);
+    if (FolderRules::Exclude(rules.get(), chain[i - 1], true)) return nullptr;
+  }
+  return rules;
+}
+
+class ProjectWalk {
+ public:
+  ProjectWalk(const std::vector<std::string>& roots, WatchList& watched) : roots_(roots), watched_(watched) {
+    for (const std::string& root : roots) real_roots_.push_back(RealPath(root));
+  }
+
+  std::vector<std::string> Paths() {
+    for (size_t i = 0; i < roots_.size(); ++i) {
+      if (const FileStamp stamp = StampOf(roots_[i]); !stamp.is_folder()) {
+        Watch(roots_[i], watched_);
+        if (stamp.is_file()) AddFile(roots_[i], real_roots_[i]);
+      } else if (!folders_.contains(real_roots_[i])) {
+        Walk(roots_[i], real_roots_[i], RulesAbove(real_roots_[i], watched_));
+      }
+    }
+    for (auto& [path, target] : links_) {
+      if (met_.insert(std::move(target)).second) paths_.push_back(std::move(path));
+    }
+    return std::move(paths_);
+  }
+
+ private:
+  struct Pending {
+    std::string folder;
+    std::string real_folder;
+    Rules rules;
+  };
+
+  void Walk(const std::string& top, const std::string& real_top, Rules rules) {
+    std::vector<Pending> pending;
+    pending.push_back({top, real_top, std::move(rules)});
+    while (!pending.empty()) {
+      Pending next = std::move(pending.back());
+      pending.pop_back();
+      if (!folders_.insert(next.real_folder).second) continue;
+      CountSteps(kStepsOfFolder);
+      WalkFolder(std::move(next), next.real_folder == real_top, pending);
+    }
+  }
+
+  void WalkFolder(Pending at, bool is_top, std::vector<Pending>& pending) {
+    Watch(at.folder, watched_);
+    const std::vector<FolderEntry> entries = EntriesOf(at.folder);
+    bool has_rules = false;
+    bool is_repository = false;
+    for (const FolderEntry& entry : entries) {
+      has_rules |= entry.name == ".gitignore" && entry.kind == FolderEntry::Kind::kFile;
+      is_repository |= entry.name == ".git";
+      if (entry.name == "pyvenv.cfg" && !is_top) return;
+    }
+    if (is_repository && !is_top)
+      at.rules = RepositoryRules(at.real_folder, watched_);  // one within, with rules of its own
+    if (has_rules) at.rules = WithRulesOf(at.rules, at.real_folder, Join(at.real_folder, ".gitignore"), watched_);
+    for (const FolderEntry& entry : entries) {
+      const bool is_folder = entry.kind == FolderEntry::Kind::kFolder;
+      if (!is_folder && (entry.kind == FolderEntry::Kind::kOther || !IsSourceName(entry.name))) continue;
+      if (is_folder && IsLeftOut(entry.name)) continue;
+      std::string real_path = Join(at.real_folder, entry.name);
+      if (at.rules != nullptr && FolderRules::Exclude(at.rules.get(), real_path, is_folder)) continue;
+      std::string path = Join(at.folder, entry.name);
+      if (is_folder) {
+        pending.push_back({std::move(path), std::move(real_path), at.rules});
+      } else if (entry.kind == FolderEntry::Kind::kFile) {
+        AddFile(std::move(path), std::move(real_path));
+      } else if (StampOf(path).is_file()) {
+        std::string target = RealPath(path);
+        if (std::ranges::any_of(real_roots_, [&](const std::string& root) { return IsWithin(target, root); }))
+          links_.emplace_back(std::move(path), std::move(target));
+      }
+    }
+  }
+
+  static bool IsLeftOut(Text folder) {
+    return folder.starts_with('.') || folder == "__pycache__" || folder == "node_modules";
+  }
+
+  void AddFile(std::string path, std::string real_path) {
+    if (met_.insert(std::move(real_path)).second) paths_.push_back(std::move(path));
+  }
+
+  static constexpr int64_t kStepsOfFolder = 100;
+
+  const std::vector<std::string>& roots_;
+  WatchList& watched_;
+  std::vector<std::string> real_roots_;
+  std::vector<std::string> paths_;
+  std::unordered_set<std::string> met_;      // files, by real paths
+  std::unordered_set<std::string> folders_;  // likewise
+  std::vector<std::pair<std::string, std::string>> links_;
+};
+
+// Calls `fn(i, worker)` for each number below `count`, by this thread with one worker and by another one with the
+// other. What one of them throws ends it, and is thrown.
+template <class Worker, class Function>
+void ForEachByThreads(size_t count, std::array<Worker, 2>& workers, Function&& fn) {
+  std::atomic<size_t> next{0};
+  const auto work = [&](Worker& worker) {
+    try {
+      for (size_t i = next++; i < count; i = next++) fn(i, worker);
+    } catch (...) {
+      next = count;
+      throw;
+    }
+  };
+  std::exception_ptr failure;
+  std::optional<std::thread> helper;
+  if (count >= kFilesWorthAThread) {
+    try {
+      helper.emplace([&] {
+        try {
+          work(workers[1]);
+        } catch (...) {
+          failure = std::current_exception();
+        }
+      });
+    } catch (const std::exception&) {  // one thread does the same work
+    }
+  }
+  try {
+    work(workers[0]);
+  } catch (...) {
+    if (helper) helper->join();
+    throw;
+  }
+  if (helper) helper->join();
+  if (failure) std::rethrow_exception(failure);
+}
+
+}  // namespace
+
+class ProjectFiles::Impl {
+ public:
+  Impl(Files& files, std::vector<std::string> roots) : files_(files), roots_(std::move(roots)) {
+    for (std::string& root : roots_) root = NormalPath(root);
+  }
+
+  const std::vector<FileId>& All() {
+    if (!has_walked_ || (is_doubtful_ && HasChanged())) Walk();
+    is_doubtful_ = false;
+    return all_;
+  }
+
+  std::vector<FileId> WithWords(std::vector<Text> words) {
+    // The longest is most likely the one that is not there.
+    std::ranges::stable_sort(words, std::greater(), &Text::size);
+    std::vector<WordKey> keys;
+    for (const Text word : words) {
+      if (HasWordKey(word)) keys.push_back(KeyOfWord(word));
+    }
+    return Candidates(words, [&](const Filter& filter) {
+      const uint64_t* bits = bits_.data() + filter.begin;
+      return std::ranges::all_of(keys, [&](WordKey key) { return MayHold(bits, filter.size, key); });
+    });
+  }
+
+  std::vector<FileId> Defining(Text name) {
+    if (!HasWordKey(name)) return {};
+    const WordKey word = KeyOfWord(name);
+    const WordKey definition = KeyOfDefinition(name);
+    return Candidates({name}, [&](const Filter& filter) {
+      return MayHold(bits_.data() + filter.begin, filter.size, filter.may_define_any ? word : definition);
+    });
+  }
+
+  bool Refresh() {
+    are_filters_fresh_ = false;
+    if (!has_walked_ || !HasChanged()) return false;
+    const std::vector<FileId> before = all_;
+    Walk();
+    return all_ != before;
+  }
+
+  void Forget() {
+    is_doubtful_ = true;
+    are_filters_fresh_ = false;
+  }
+
+  size_t ByteSize() const {
+    return bits_.capacity() * sizeof(bits_[0]) + filters_.capacity() * sizeof(filters_[0]) +
+           stamps_.capacity() * sizeof(stamps_[0]);
+  }
+
+ private:
+  // Where the filter of a file lies among the bits.
+  struct Filter {
+    uint32_t begin = 0;
+    uint32_t size = 0;
+    bool may_define_any = false;
+  };
+  // What a thread needs to make filters, and what it made: their places among its own bits.
+  struct FilterMaker {
+    WordKeys keys;
+    std::string source;
+    std::vector<uint64_t> bits;
+    struct Made {
+      size_t index;
+      FileStamp stamp;
+      Filter filter;
+    };
+    std::vector<Made> made;
+  };
+
+  static constexpr size_t kBytesOfAStep = 64;
+  // Searching a hundred files costs what analysing one does. So many are searched to spare the few in which nothing
+  // is, or this share of a large project; short words are everywhere.
+  static constexpr size_t kMostFilesSearched = 64;
+  static constexpr size_t kShareSearched = 16;
+  static constexpr size_t kLongestWordNotSearched = 3;
+
+  bool IsBelowRoots(const std::string& path) const {
+    return std::ranges::any_of(roots_, [&](const std::string& root) { return IsWithin(path, root); });
+  }
+
+  bool HasChanged() const {
+    return buffers_ != files_.Buffers() ||
+           std::ranges::any_of(watched_, [](const Watched& at) { return StampOf(at.path) != at.stamp; });
+  }
+
+  void Walk() {
+    WatchList watched;
+    std::vector<std::string> paths = ProjectWalk(roots_, watched).Paths();
+    buffers_ = files_.Buffers();
+    for (const FileId buffer : buffers_) {
+      if (const std::string& path = files_.PathOf(buffer); IsBelowRoots(path)) paths.push_back(path);
+    }
+    std::ranges::sort(paths);
+    paths.erase(std::unique(paths.begin(), paths.end()), paths.end());
+    std::vector<FileId> all;
+    all.reserve(paths.size());
+    for (const std::string& path : paths) all.push_back(files_.NumberOf(path));
+    if (all != all_) KeepFilters(all);
+    all_ = std::move(all);
+    watched_ = std::move(watched);
+    has_walked_ = true;
+  }
+
+  // The filters of the files that were there before.
+  void KeepFilters(const std::vector<FileId>& all) {
+    std::unordered_map<FileId, size_t> old_indexes;
+    for (size_t i = 0; i < all_.size(); ++i) old_indexes.emplace(all_[i], i);
+    std::vector<Filter> filters(all.size());
+    std::vector<FileStamp> stamps(all.size());
+    used_ = 0;
+    for (size_t i = 0; i < all.size(); ++i) {
+      const auto found = old_indexes.find(all[i]);
+      if (found == old_indexes.end()) continue;
+      filters[i] = filters_[found->second];
+      stamps[i] = stamps_[found->second];
+      used_ += filters[i].size;
+    }
+    filters_ = std::move(filters);
+    stamps_ = std::move(stamps);
+    are_filters_fresh_ = false;
+  }
+
+  // Makes the filters of files that have none or have changed. Those of buffers are not asked.
+  void UpdateFilters() {
+    if (are_filters_fresh_) return;
+    std::array<FilterMaker, 2> makers;
+    ForEachByThreads(all_.size(), makers, [&](size_t i, FilterMaker& maker) {
+      if (files_.IsOpen(all_[i])) return;
+      const FileStamp stamp = StampOf(files_.PathOf(all_[i]));
+      if (stamp != stamps_[i]) MakeFilter(i, stamp, maker);
+    });
+    // A vector that grew as vectors do would take twice the memory.
+    const size_t size = bits_.size() + makers[0].bits.size() + makers[1].bits.size();
+    if (size > bits_.capacity()) bits_.reserve(bits_.empty() ? size : size + size / 8);
+    for (const FilterMaker& maker : makers) AddFilters(maker);
+    if (bits_.size() > 2 * used_) DropUnusedBits();
+    are_filters_fresh_ = true;
+  }
+
+  void MakeFilter(size_t i, const FileStamp& stamp, FilterMaker& maker) const {
+    ReadSource(i, stamp, maker.source);
+    maker.keys.Read(maker.source);
+    const size_t begin = maker.bits.size();
+    AppendFilter(maker.keys.keys(), maker.bits);
+    const Filter filter = {static_cast<uint32_t>(begin), static_cast<uint32_t>(maker.bits.size() - begin),
+                           maker.keys.may_define_any()};
+    maker.made.push_back({i, SettledStamp(stamp), filter});
+  }
+
+  // From the file itself: what is held of it may be older than its stamp.
+  void ReadSource(size_t i, const FileStamp& stamp, std::string& source) const {
+    if (!stamp.is_file() || stamp.size > Files::kMaxSourceSize ||
+        !ReadSourceFile(files_.PathOf(all_[i]), source).empty()) {
+      source.clear();
+    } else if (NeedsHostDecoding(source)) {
+      std::string memory;
+      source = files_.SourceOf(all_[i], memory);
+    }
+  }
+
+  // One that fits in the place of the old one takes it.
+  void AddFilters(const FilterMaker& maker) {
+    for (const auto& [i, stamp, made] : maker.made) {
+      Filter& filter = filters_[i];
+      const auto from = maker.bits.begin() + made.begin;
+      used_ = used_ - filter.size + made.size;
+      if (made.size <= filter.size) {
+        std::copy(from, from + made.size, bits_.begin() + filter.begin);
+      } else {
+        filter.begin = static_cast<uint32_t>(bits_.size());
+        bits_.insert(bits_.end(), from, from + made.size);
+      }
+      filter.size = made.size;
+      filter.may_define_any = made.may_define_any;
+      stamps_[i] = stamp;
+    }
+  }
+
+  void DropUnusedBits() {
+    std::vector<uint64_t> bits;
+    bits.reserve(used_);
+    for (Filter& filter : filters_) {
+      const auto from = bits_.begin() + filter.begin;
+      filter.begin = static_cast<uint32_t>(bits.size());
+      bits.insert(bits.end(), from, from + filter.size);
+    }
+    bits_ = std::move(bits);
+  }
+
+  // Those whose filters hold what is asked for; the bytes of buffers are searched, and of all that are left where
+  // these are few or filters do not know a word.
+  template <class Question>
+  std::vector<FileId> Candidates(const std::vector<Text>& words, Question&& may_be) {
+    All();
+    UpdateFilters();
+    std::vector<uint32_t> candidates;
+    for (uint32_t i = 0; i < all_.size(); ++i) {
+      if (may_be(filters_[i])) candidates.push_back(i);
+    }
+    const bool are_known = std::ranges::all_of(words, HasWordKey);
+    const bool is_cheap = candidates.size() <= std::max(kMostFilesSearched, all_.size() / kShareSearched);
+    const bool are_all_searched =
+        !are_known || (is_cheap && !words.empty() && words.front().size() > kLongestWordNotSearched);
+    const std::vector<uint32_t> open = OpenFiles();
+    std::vector<uint32_t> searched = open;
+    if (are_all_searched) {
+      searched.insert(searched.end(), candidates.begin(), candidates.end());
+      candidates.clear();
+    } else {
+      std::erase_if(candidates, [&](uint32_t i) { return std::ranges::binary_search(open, i); });
+    }
+    std::ranges::sort(searched);
+    searched.erase(std::unique(searched.begin(), searched.end()), searched.end());
+    Search(words, searched);
+    candidates.insert(candidates.end(), searched.begin(), searched.end());
+    std::ranges::sort(candidates);
+    std::vector<FileId> found;
+    found.reserve(candidates.size());
+    for (const uint32_t i : candidates) found.push_back(all_[i]);
+    return found;
+  }
+
+  // The indexes of the files that buffers hold, sorted.
+  std::vector<uint32_t> OpenFiles() const {
+    std::vector<uint32_t> open;
+    for (const FileId buffer : files_.Buffers()) {
+      const auto at = std::ranges::lower_bound(all_, files_.PathOf(buffer), {},
+                                               [&](FileId file) -> const std::string& { return files_.PathOf(file); });
+      if (at != all_.end() && *at == buffer) open.push_back(static_cast<uint32_t>(at - all_.begin()));
+    }
+    std::ranges::sort(open);
+    return open;
+  }
+
+  // Leaves those in which all words occur.
+  void Search(const std::vector<Text>& words, std::vector<uint32_t>& files) const {
+    std::vector<char> holds(files.size());
+    std::array<std::string, 2> memories;
+    ForEachByThreads(files.size(), memories, [&](size_t i, std::string& memory) {
+      const Text source = files_.SourceOf(all_[files[i]], memory);
+      CountSteps(static_cast<int64_t>(source.size() / kBytesOfAStep));
+      holds[i] = std::ranges::all_of(words, [&](Text word) { return HoldsWord(source, word); });
+    });
+    size_t kept = 0;
+    for (size_t i = 0; i < files.size(); ++i) {
+      if (holds[i] != 0) files[kept++] = files[i];
+    }
+    files.resize(kept);
+  }
+
+  Files& files_;
+  std::vector<std::string> roots_;
+  std::vector<FileId> all_;
+  // Of the walk.
+  WatchList watched_;
+  std::vector<FileId> buffers_;
+  bool has_walked_ = false;
+  bool is_doubtful_ = false;
+  // Of each file, and whether they have been compared with the files.
+  std::vector<Filter> filters_;
+  std::vector<FileStamp> stamps_;
+  std::vector<uint64_t> bits_;
+  size_t used_ = 0;  // of the bits
+  bool are_filters_fresh_ = false;
+};
+
+ProjectFiles::ProjectFiles(Files& files, std::vector<std::string> roots)
+    : impl_(std::make_unique<Impl>(files, std::move(roots))) {}
+ProjectFiles::~ProjectFiles() = default;
+
+const std::vector<FileId>& ProjectFiles::All() { return impl_->All(); }
+std::vector<FileId> ProjectFiles::WithWords(const std::vector<Text>& words) { return impl_->WithWords(words); }
+std::vector<FileId> ProjectFiles::Defining(Text name) { return impl_->Defining(name); }
+bool ProjectFiles::Refresh() { return impl_->Refresh(); }
+void ProjectFiles::Forget() { impl_->Forget(); }
+size_t ProjectFiles::ByteSize() const { return impl_->ByteSize(); }
+
+}  // namespace quillet

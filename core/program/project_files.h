@@ -1,0 +1,47 @@
+// The Python files below the roots of a project, and which of them hold a word.
+//
+// The first question about words reads all files and keeps a filter of each one's words, about a byte a word; those
+// behind it ask the filters, and read again what has changed.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "foundations/text.h"
+#include "program/files.h"
+
+namespace quillet {
+
+class ProjectFiles {
+ public:
+  ProjectFiles(Files& files, std::vector<std::string> roots);
+  ~ProjectFiles();
+
+  // All *.py and *.pyi files below the roots and open buffers there, in the order of their paths; what .gitignore
+  // leaves out is not there, nor are hidden folders, `__pycache__`, `node_modules` and virtual environments. A root
+  // that is a file is one of them. Links to folders are not followed, and those to files where these lie below a
+  // root. Walked once, and again when Refresh, or the next question behind Forget, finds that folders changed.
+  const std::vector<FileId>& All();
+  // Those in which all the words occur as whole words, in the order of their paths, and maybe a few more. Nothing is
+  // analysed.
+  std::vector<FileId> WithWords(const std::vector<Text>& words);
+  // Those in which a name may be defined as a function, a class, a variable or an attribute that is assigned: all in
+  // which it is, and some more. By an import or as a parameter is not counted.
+  std::vector<FileId> Defining(Text name);
+
+  // Looks whether files came or went; true where any did. What the files hold is looked at by the next question about
+  // words. Costs a look at each folder.
+  bool Refresh();
+  // The next question does so; for when buffers were opened or closed.
+  void Forget();
+
+  // Of the filters.
+  size_t ByteSize() const;
+
+ private:
+  class Impl;
+  std::unique_ptr<Impl> impl_;
+};
+
+}  // namespace quillet

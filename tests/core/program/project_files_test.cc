@@ -1,0 +1,348 @@
+// Which files belong to a project, which of them hold words or define names, and what is noticed when they change.
+#include "program/project_files.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <string>
+#include <vector>
+
+#include "project/word_filters.h"
+#include "project/word_search.h"
+#include "tests/core/support/temporary_folder.h"
+
+namespace quillet {
+namespace {
+
+using testing::TemporaryFolder;
+using Paths = std::vector<std::string>;
+
+Paths Below(const TemporaryFolder& folder, const Files& files, const std::vector<FileId>& ids) {
+  Paths paths;
+  for (const FileId file : ids) paths.push_back(files.PathOf(file).substr(folder.path().size() + 1));
+  return paths;
+}
+
+Paths All(const TemporaryFolder& folder, const Paths& roots = {""}) {
+  Files files(Version::Of(3, 12));
+  Paths whole;
+  for (const std::string& root : roots) whole.push_back(folder / root);
+  return Below(folder, files, ProjectFiles(files, whole).All());
+}
+
+TEST(ProjectFiles, AreSourcesAndStubsInOrder) {
+  const TemporaryFolder folder = {
+      {"b.py", ""},
+      {"a/c.pyi", ""},
+      {"a/notes.txt", ""},
+      {"a/b/d.py", ""},
+      {".hidden/e.py", ""},
+      {"a/__pycache__/f.py", ""},
+      {"node_modules/x/g.py", ""},
+      {"env/pyvenv.cfg", ""},
+      {"env/lib/python3.12/site-packages/h.py", ""},
+      {"tool", "#!/usr/bin/env python3\n"},
+  };
+  EXPECT_EQ(All(folder), (Paths{"a/b/d.py", "a/c.pyi", "b.py"}));
+  EXPECT_EQ(All(folder, {"a", "", "a/b"}), (Paths{"a/b/d.py", "a/c.pyi", "b.py"}));
+  EXPECT_EQ(All(folder, {"b.py"}), (Paths{"b.py"}));
+  EXPECT_EQ(All(folder, {"env"}), (Paths{"env/lib/python3.12/site-packages/h.py"}));
+  EXPECT_EQ(All(folder, {"nothing"}), Paths());
+}
+
+TEST(ProjectFiles, LeaveOutWhatRulesExclude) {
+  const TemporaryFolder folder = {
+      {".git/info/exclude", "secret.py\n"},
+      {".gitignore", "build/\n*.gen.py\n!keep.gen.py\n/only_top.py\n"},
+      {"build/a.py", ""},
+      {"pack/a.gen.py", ""},
+      {"pack/keep.gen.py", ""},
+      {"pack/secret.py", ""},
+      {"only_top.py", ""},
+      {"pack/only_top.py", ""},
+      {"pack/.gitignore", "!secret.py\n"},
+      {"other/secret.py", ""},
+      {"sub/.git/HEAD", ""},
+      {"sub/a.gen.py", ""},
+  };
+  const Paths kept = {"pack/keep.gen.py", "pack/only_top.py", "pack/secret.py", "sub/a.gen.py"};
+  EXPECT_EQ(All(folder), kept);
+  // Those of the folders above hold, too; what is named is wanted all the same.
+  EXPECT_EQ(All(folder, {"pack"}), (Paths{"pack/keep.gen.py", "pack/only_top.py", "pack/secret.py"}));
+  EXPECT_EQ(All(folder, {"build"}), (Paths{"build/a.py"}));
+}
+
+TEST(ProjectFiles, FollowNoLinksToFolders) {
+  const TemporaryFolder folder = {{"project/a/b.py", ""}, {"elsewhere/c.py", ""}};
+  folder.Link("..", "project/a/up");
+  folder.Link("../elsewhere", "project/out");
+  folder.Link("a/b.py", "project/same.py");
+  folder.Link("../elsewhere/c.py", "project/c.py");
+  folder.Link("nothing", "project/dangling.py");
+  EXPECT_EQ(All(folder, {"project"}), (Paths{"project/a/b.py"}));
+}
+
+TEST(ProjectFiles, CountBuffers) {
+  const TemporaryFolder folder = {{"a.py", "one\n"}};
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {folder.path()});
+  EXPECT_EQ(project.All().size(), 1u);
+  files.Open(files.NumberOf(folder / "b.py"), "two = 1\n");
+  files.Open(files.NumberOf("/elsewhere.py"), "two = 1\n");
+  EXPECT_EQ(project.All().size(), 1u);
+  project.Forget();
+  EXPECT_EQ(Below(folder, files, project.All()), (Paths{"a.py", "b.py"}));
+  EXPECT_EQ(Below(folder, files, project.WithWords({"two"})), (Paths{"b.py"}));
+}
+
+TEST(ProjectFiles, AreFoundByWholeWords) {
+  const TemporaryFolder folder = {
+      {"a.py", "def total(cart): pass\n"},
+      {"b.py", "subtotal = total_of(x)\n"},
+      {"c.py", "print(total)\n"},
+      {"d.py", "total"},
+      {"e.py", ""},
+  };
+  // So many that another thread helps.
+  for (int i = 0; i < 200; ++i) folder.Write("many/m" + std::to_string(i) + ".py", "x = " + std::to_string(i) + "\n");
+  folder.Write("many/m77.py", "total\n");
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {folder.path()});
+  EXPECT_EQ(Below(folder, files, project.WithWords({"total"})), (Paths{"a.py", "c.py", "d.py", "many/m77.py"}));
+  EXPECT_EQ(Below(folder, files, project.WithWords({"total", "cart"})), (Paths{"a.py"}));
+  EXPECT_TRUE(project.WithWords({"total", "nothing"}).empty());
+}
+
+// A folder of files, of which a project was asked before they change.
+struct Changing {
+  TemporaryFolder folder = {{"a.py", "def total(): pass\n"}, {"b.py", "x = 1\n"}, {"sub/c.py", "total()\n"}};
+  Files files{Version::Of(3, 12)};
+  ProjectFiles project{files, {folder.path()}};
+
+  Changing() { EXPECT_EQ(With("total"), (Paths{"a.py", "sub/c.py"})); }
+  Paths All() { return Below(folder, files, project.All()); }
+  Paths With(Text word) { return Below(folder, files, project.WithWords({word})); }
+  Paths Defining(Text name) { return Below(folder, files, project.Defining(name)); }
+};
+
+TEST(ProjectFiles, SeeWhatComesAndGoes) {
+  Changing at;
+  EXPECT_FALSE(at.project.Refresh());
+  at.folder.Write("sub/new.py", "total = 2\n");
+  at.folder.Write("other/deep/d.py", "total\n");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.All(), (Paths{"a.py", "b.py", "other/deep/d.py", "sub/c.py", "sub/new.py"}));
+  EXPECT_EQ(at.With("total"), (Paths{"a.py", "other/deep/d.py", "sub/c.py", "sub/new.py"}));
+  EXPECT_FALSE(at.project.Refresh());
+  at.folder.Remove("a.py");
+  at.folder.Remove("other");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.With("total"), (Paths{"sub/c.py", "sub/new.py"}));
+  EXPECT_EQ(at.Defining("total"), (Paths{"sub/new.py"}));
+  at.folder.Write("sub/notes.txt", "total\n");
+  EXPECT_FALSE(at.project.Refresh());
+}
+
+TEST(ProjectFiles, SeeNewRules) {
+  Changing at;
+  at.folder.Write(".git/HEAD", "");
+  at.folder.Write(".gitignore", "b.py\n");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.All(), (Paths{"a.py", "sub/c.py"}));
+  at.folder.Write(".gitignore", "sub\n");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.All(), (Paths{"a.py", "b.py"}));
+}
+
+TEST(ProjectFiles, SeeARootThatComes) {
+  const TemporaryFolder folder;
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {folder / "later"});
+  EXPECT_TRUE(project.All().empty());
+  folder.Write("later/a.py", "total\n");
+  EXPECT_TRUE(project.Refresh());
+  EXPECT_EQ(Below(folder, files, project.WithWords({"total"})), (Paths{"later/a.py"}));
+}
+
+TEST(ProjectFiles, SeeWhatChanges) {
+  Changing at;
+  // Of the same size, and at once: a stamp may be the same.
+  at.folder.Write("b.py", "y = 2\n");
+  EXPECT_FALSE(at.project.Refresh());
+  EXPECT_EQ(at.With("y"), (Paths{"b.py"}));
+  EXPECT_TRUE(at.With("x").empty());
+  // Larger than its filter was, again and again.
+  std::string text;
+  for (int i = 0; i < 5; ++i) {
+    for (int k = 0; k < 100; ++k) text += "name_" + std::to_string(i) + "_" + std::to_string(k) + " = " + "total\n";
+    at.folder.Write("b.py", text);
+    at.project.Refresh();
+    EXPECT_EQ(at.Defining("name_" + std::to_string(i) + "_99"), (Paths{"b.py"}));
+    EXPECT_EQ(at.With("total"), (Paths{"a.py", "b.py", "sub/c.py"}));
+    EXPECT_EQ(at.Defining("total"), (Paths{"a.py"}));
+  }
+  at.folder.Write("b.py", "");
+  at.project.Forget();
+  EXPECT_EQ(at.With("total"), (Paths{"a.py", "sub/c.py"}));
+}
+
+TEST(ProjectFiles, TakeTheTextOfBuffers) {
+  Changing at;
+  const FileId b = at.files.NumberOf(at.folder / "b.py");
+  const FileId a = at.files.NumberOf(at.folder / "a.py");
+  at.files.Open(b, "def amount(): total\n");
+  at.files.Open(a, "nothing\n");
+  EXPECT_EQ(at.With("total"), (Paths{"b.py", "sub/c.py"}));
+  EXPECT_EQ(at.With("nothing"), (Paths{"a.py"}));
+  EXPECT_EQ(at.Defining("amount"), (Paths{"b.py"}));
+  at.files.Change(b, 4, 10, "number");
+  EXPECT_EQ(at.With("number"), (Paths{"b.py"}));
+  EXPECT_TRUE(at.With("amount").empty());
+  at.files.Open(at.files.NumberOf(at.folder / "none.py"), "total\n");
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.With("total"), (Paths{"b.py", "none.py", "sub/c.py"}));
+  for (const FileId buffer : std::vector<FileId>(at.files.Buffers())) at.files.Close(buffer);
+  EXPECT_TRUE(at.project.Refresh());
+  EXPECT_EQ(at.With("total"), (Paths{"a.py", "sub/c.py"}));
+  EXPECT_EQ(at.Defining("total"), (Paths{"a.py"}));
+}
+
+TEST(ProjectFiles, AreFoundByWhatIsNoWordAndByNothing) {
+  Changing at;
+  at.folder.Write("sub/c.py", "total.of 12 \xC3\xA4hnlich\n");
+  at.project.Refresh();
+  EXPECT_EQ(at.With("total.of"), (Paths{"sub/c.py"}));
+  EXPECT_EQ(at.With("12"), (Paths{"sub/c.py"}));
+  EXPECT_EQ(at.With("\xC3\xA4hnlich"), (Paths{"sub/c.py"}));
+  EXPECT_EQ(Below(at.folder, at.files, at.project.WithWords({})), at.All());
+  EXPECT_TRUE(at.Defining("").empty());
+}
+
+// Whether a source may define a name, by its keys.
+bool Defines(std::string source, Text name) {
+  const std::string before = source;
+  WordKeys keys;
+  keys.Read(source);
+  EXPECT_EQ(source, before);
+  EXPECT_FALSE(keys.may_define_any()) << source;
+  return std::ranges::count(keys.keys(), KeyOfDefinition(name)) == 1;
+}
+
+TEST(WordKeys, TellDefinitionsFromOtherWords) {
+  for (const char* source : {"def n(): pass",
+                             "async def  n(a): pass",
+                             "class n: pass",
+                             "class \\\n n(B): pass",
+                             "n = 1",
+                             "n=1",
+                             "self.n = 1",
+                             "  a.b.n  = 1",
+                             "n += 1",
+                             "self.n **= 2",
+                             "n >>= 2",
+                             "n //= 2",
+                             "n: int",
+                             "self.n: int = 3",
+                             "(n := 1)",
+                             "a = n = 2",
+                             "a, n = 1, 2",
+                             "n, a = 1, 2",
+                             "n, = a",
+                             "self.n, self.a = 1, 2",
+                             "(a, n) = 1, 2",
+                             "[n, a] = 1, 2",
+                             "a, (n, b) = c",
+                             "(\n  n,\n  b,\n) = c",
+                             "a, \\\n n = c",
+                             "n, \\\n a = c",
+                             "n, \\\r\n a = c",
+                             "*n, a = c",
+                             "n, x['('] = c",
+                             "n, x[0] = c",
+                             "x(1).n, a = c",
+                             "if a: n, b = c",
+                             "a = 1; n, b = c",
+                             "for n in c: pass",
+                             "  for a, (n, b) in c: pass",
+                             "async for n in c: pass",
+                             "for self.n in c: pass",
+                             "with c as n: pass",
+                             "with c as self.n, d as e: pass",
+                             "with c as (n, e): pass",
+                             "import a as n",
+                             "except E as n:",
+                             "except E, n:",
+                             "type n = int",
+                             "type n[T] = list[T]",
+                             "n \\\n = 1"})
+    EXPECT_TRUE(Defines(source, "n")) << source;
+  for (const char* source :
+       {"n",       "n()",       "n == 1",     "a = n",       "n.a = 1",        "n <= 1",   "n >= 1",   "n != 1",
+        "f(n, a)", "n[0] = 1",  "n(1).a = 1", "a, b = n, c", "[a for n in c]", "import n", "return n", "na = 1",
+        "an: int", "a(n, b=1)", "defn",       "a.n\nb = 2",  "n,\nb = 2",      ""})
+    EXPECT_FALSE(Defines(source, "n")) << source;
+}
+
+TEST(WordKeys, HoldEveryWordWhereverItStands) {
+  WordKeys keys;
+  for (size_t size = 1; size < 70; ++size) {
+    for (const size_t before : {0, 1, 7, 58, 59, 62, 63, 64, 65, 127, 128}) {
+      const std::string word(size, 'w');
+      std::string source = std::string(before, '.') + word;
+      keys.Read(source);
+      EXPECT_EQ(keys.keys(), std::vector<WordKey>{KeyOfWord(word)}) << size << " " << before;
+      source += " = 12";
+      keys.Read(source);
+      EXPECT_EQ(keys.keys(), (std::vector<WordKey>{KeyOfWord(word), KeyOfDefinition(word)})) << size << " " << before;
+    }
+  }
+}
+
+TEST(WordKeys, AreBoundedWhereTargetsDoNotEnd) {
+  std::string source;
+  for (int i = 0; i < 100'000; ++i) source += ")=";
+  WordKeys keys;
+  keys.Read(source);
+  EXPECT_TRUE(keys.may_define_any());
+  // What defines anything is asked for the word.
+  const TemporaryFolder folder = {{"b.py", "x"}};
+  folder.Write("a.py", "name" + source);
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {folder.path()});
+  EXPECT_EQ(Below(folder, files, project.Defining("name")), (Paths{"a.py"}));
+}
+
+TEST(WordFilters, HoldTheirKeysAndFewOthers) {
+  std::vector<WordKey> keys;
+  for (int i = 0; i < 1000; ++i) keys.push_back(KeyOfWord("word" + std::to_string(i)));
+  std::vector<uint64_t> bits = {0};  // of another one
+  AppendFilter(keys, bits);
+  int others = 0;
+  for (int i = 0; i < 10000; ++i) {
+    const bool may_hold = MayHold(bits.data() + 1, bits.size() - 1, KeyOfWord("word" + std::to_string(i)));
+    EXPECT_TRUE(may_hold || i >= 1000) << i;
+    others += i >= 1000 && may_hold;
+  }
+  EXPECT_LT(others, 90);
+  EXPECT_FALSE(MayHold(bits.data(), 0, keys[0]));
+}
+
+TEST(WordSearch, FindsWholeWordsAtEveryPlace) {
+  const std::string word = "total";
+  for (size_t before = 0; before < 40; ++before) {
+    for (size_t behind = 0; behind < 40; ++behind) {
+      const std::string text = std::string(before, ' ') + word + std::string(behind, '.');
+      EXPECT_EQ(FindWord(text, word), before) << before << " " << behind;
+      EXPECT_EQ(FindWord(std::string(before, ' ') + "x" + text.substr(before), word), Text::npos);
+      EXPECT_EQ(FindWord(text.substr(0, before + 5) + "_" + std::string(behind, '.'), word), Text::npos);
+      EXPECT_EQ(FindWord(text.substr(0, before + 4) + std::string(behind, '.'), word), Text::npos);
+    }
+  }
+  EXPECT_EQ(FindWord("a b a", "a", 1), 4u);
+  EXPECT_EQ(FindWord("a", ""), Text::npos);
+  EXPECT_EQ(FindWord("", "a"), Text::npos);
+  EXPECT_FALSE(HoldsWord("\xC3\xA4total", "total"));
+}
+
+}  // namespace
+}  // namespace quillet
