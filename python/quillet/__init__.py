@@ -8,6 +8,8 @@ which takes one logical line at a time; `quillet.logicalline`, `quillet.optpgen`
 
 from __future__ import annotations
 
+__version__ = "0.1.0"
+
 # As typing has it, which takes longer to load than a question to answer.
 TYPE_CHECKING = False
 if TYPE_CHECKING:

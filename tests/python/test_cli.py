@@ -11,6 +11,7 @@ from pathlib import Path
 
 import pytest
 
+import quillet
 from quillet.cli.show import printable, source_and_caret
 
 ENVIRONMENT = {**os.environ, "PYTHONUTF8": "1", "NO_COLOR": "1"}
@@ -435,6 +436,25 @@ def test_what_cannot_be_read_is_named_and_the_rest_is_served(tmp_path: Path) -> 
         "quillet: ./odd.py: cannot read the source as 'no-such': unknown encoding: no-such",
         "quillet: 3 files could not be read",
     ]
+
+
+def test_the_version_is_told_at_once_and_as_click_tells_it() -> None:
+    plain = run("--version")
+    assert plain.stdout == f"quillet {quillet.__version__}\n".encode()
+    assert plain.stdout == run("--version", "stats").stdout
+
+
+def test_what_asks_for_the_version_loads_no_parser_of_options() -> None:
+    script = """
+import sys
+from quillet.cli import main
+try:
+    main(["--version"])
+except SystemExit:
+    print("click" in sys.modules)
+"""
+    output = subprocess.run([sys.executable, "-c", script], capture_output=True, check=True).stdout
+    assert output.split() == [b"quillet", quillet.__version__.encode(), b"False"]
 
 
 @pytest.mark.parametrize(

@@ -59,6 +59,10 @@ def test_types_are_declared() -> None:
     assert (PACKAGE / "tarvex.pyi").is_file()
 
 
+def test_the_package_is_installed_as_the_version_that_it_says() -> None:
+    assert importlib.metadata.version("quillet") == quillet.__version__
+
+
 def test_the_command_is_installed() -> None:
     scripts = importlib.metadata.entry_points(group="console_scripts", name="quillet")
     assert [script.load() for script in scripts] == [cli.main]

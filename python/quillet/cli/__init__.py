@@ -28,6 +28,12 @@ def main(arguments: Sequence[str] | None = None) -> None:
 
 
 def _run(given: list[str]) -> None:
+    # What needs none of click, which takes longer to load than either takes to answer.
+    if given == ["--version"]:
+        from quillet import __version__
+
+        print(f"{PROGRAM} {__version__}")
+        sys.exit(0)
     if given[:1] == ["find"] and "_QUILLET_COMPLETE" not in os.environ:
         from quillet.cli.find_options import plain_parameters
 

@@ -9,6 +9,7 @@ import sys
 
 import click
 
+from quillet import __version__
 from quillet.cli import index_commands, question_commands
 from quillet.cli.options import PathArgument, exclude_option, python_option
 
@@ -21,7 +22,7 @@ _stdin_filename = click.option(
 
 
 @click.group(context_settings={"help_option_names": ["-h", "--help"]})
-@click.version_option(package_name="quillet", message="quillet %(version)s")
+@click.version_option(__version__, message="quillet %(version)s")
 def group() -> None:
     """Says what each statement of a Python source tells about names."""
 

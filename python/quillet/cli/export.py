@@ -78,10 +78,10 @@ def _parts(index: Index, form: str, base: str) -> Iterator[bytes]:
 
         yield from (line + b"\n" for line in tag_lines(index, base))
     elif form == "scip":
+        from quillet import __version__
         from quillet.index.scip import scip_parts
-        from quillet.index.update import engine_version
 
-        yield from scip_parts(index, index.base, engine_version(), _say_skipped)
+        yield from scip_parts(index, index.base, __version__, _say_skipped)
     else:
         from quillet.index.jsonl import json_lines
 

@@ -85,16 +85,6 @@ def update(index: str, settings: Settings, reports: Reports) -> Outcome:
         return _Run(index, settings, reports).run()
 
 
-def engine_version() -> str:
-    """The version of the package."""
-    from importlib.metadata import PackageNotFoundError, version
-
-    try:
-        return version("quillet")
-    except PackageNotFoundError:  # run from a build folder
-        return "0"
-
-
 def watched_files(index: str, settings: Settings) -> Watched:
     """What a run with these settings looks at."""
     base = os.path.dirname(os.path.abspath(index))
