@@ -54,12 +54,15 @@ nb::tuple EnvironmentOf(nb::handle path) {
 
 }  // namespace
 
-WorkspaceObject::WorkspaceObject(nb::handle roots, nb::handle libraries, nb::handle typeshed, nb::handle version) {
+WorkspaceObject::WorkspaceObject(nb::handle roots, nb::handle libraries, nb::handle typeshed, nb::handle version,
+                                 nb::handle exclude, const Language& language) {
   Workspace::Settings settings;
   settings.roots = PathsOf(roots);
   settings.libraries = PathsOf(libraries);
   settings.typeshed = HostText::FromBytes(typeshed).text();
   settings.version = VersionOf(version);
+  settings.exclude = HostText::FromBytes(exclude).text();
+  settings.analyzer = std::make_shared<FileAnalyzer::Options>(language.options());
   const Unlocked unlocked;
   workspace_ = std::make_unique<Workspace>(std::move(settings));
 }
@@ -67,6 +70,25 @@ WorkspaceObject::WorkspaceObject(nb::handle roots, nb::handle libraries, nb::han
 void WorkspaceObject::CheckNotAsking() const {
   if (asking_ == ThreadUse::ThisThread())
     ThrowError(ErrorKind::kRuntimeError, "the workspace is in the middle of an answer");
+}
+
+void WorkspaceObject::Stop(double patience) {
+  const auto least = std::chrono::duration_cast<Clock::duration>(std::chrono::duration<double>(patience));
+  stops_at_ = proceeded_.load() + least;
+}
+
+void WorkspaceObject::Proceed() {
+  proceeded_ = Clock::now();
+  stops_at_ = Clock::time_point::max();
+}
+
+void WorkspaceObject::CheckStop() const {
+  if (const Clock::time_point at = stops_at_; at == Clock::time_point::max() || Clock::now() < at) return;
+  const Locked lock;
+  const nb::object stopped = nb::module_::import_("quillet._workspace").attr("Stopped");
+  PyErr_SetString(stopped.ptr(), "the question was stopped");
+  nb::python_error error;
+  throw StoppedByHost(error);
 }
 
 std::unique_lock<std::timed_mutex> WorkspaceObject::TakeTurn() {

@@ -2,12 +2,14 @@
 #pragma once
 
 #include <atomic>
+#include <chrono>
 #include <memory>
 #include <mutex>
 #include <utility>
 
 #include "bindings/bindings.h"
 #include "bindings/interpreter_lock.h"
+#include "bindings/language_object.h"
 #include "bindings/signals.h"
 #include "foundations/thread_use.h"
 #include "workspace/questions.h"
@@ -16,8 +18,10 @@ namespace quillet::host {
 
 class WorkspaceObject {
  public:
-  // Sequences of paths as bytes, a path as bytes (empty for none) and a version.
-  WorkspaceObject(nb::handle roots, nb::handle libraries, nb::handle typeshed, nb::handle version);
+  // Sequences of paths as bytes, a path as bytes (empty for none), a version, lines of an ignore file as bytes, and
+  // what errors of syntax are found with.
+  WorkspaceObject(nb::handle roots, nb::handle libraries, nb::handle typeshed, nb::handle version, nb::handle exclude,
+                  const Language& language);
 
   // Calls `ask(workspace)` when no other thread does. Signals are heard meanwhile, and in front of it; a handler that
   // asks the same workspace is told that it cannot (RuntimeError).
@@ -28,6 +32,7 @@ class WorkspaceObject {
     const std::unique_lock turn = TakeTurn();
     const Asking asking(*this);
     const ThreadStopQuestion signals(HandlesSignals());
+    const ThreadStopQuestion stop([this] { CheckStop(); });
     try {
       return ask(*workspace_);
     } catch (...) {
@@ -35,6 +40,11 @@ class WorkspaceObject {
       throw;
     }
   }
+
+  // For other threads: ends the question that is being answered, and those behind it, with quillet._workspace.Stopped
+  // once this many seconds have passed since Proceed was called.
+  void Stop(double patience);
+  void Proceed();
 
  private:
   // Which thread has its turn.
@@ -47,10 +57,14 @@ class WorkspaceObject {
   };
 
   void CheckNotAsking() const;
+  void CheckStop() const;
   std::unique_lock<std::timed_mutex> TakeTurn();
 
   std::timed_mutex mutex_;
   std::atomic<const void*> asking_{nullptr};
+  using Clock = std::chrono::steady_clock;
+  std::atomic<Clock::time_point> proceeded_{Clock::time_point::min()};
+  std::atomic<Clock::time_point> stops_at_{Clock::time_point::max()};
   std::unique_ptr<Workspace> workspace_;
 };
 

@@ -3,6 +3,7 @@
 
 #include <algorithm>
 
+#include "foundations/stop.h"
 #include "inference/inference.h"
 
 namespace quillet {
@@ -12,6 +13,9 @@ inline uint64_t KeyOf(uint64_t file, uint64_t node, uint64_t frame) {
   if (file >= 1u << 20 || node >= 1u << 24 || frame >= 1u << 20) return 0;
   return (file << 44 | node << 20 | frame) + 1;
 }
+
+// What finding a value takes beside the values that it is found from.
+inline constexpr int64_t kStepsOfValue = 8;
 
 template <class Find>
 Value Inference::Remembered(std::unordered_map<uint64_t, Memo>& memos, uint64_t key, Find&& find) {
@@ -28,6 +32,7 @@ Value Inference::Remembered(std::unordered_map<uint64_t, Memo>& memos, uint64_t 
     return kUnknownValue;
   }
   --steps_;
+  CountSteps(kStepsOfValue);
   const int own_depth = ++depth_;
   const int cycle_outside = shallowest_cycle_;
   shallowest_cycle_ = INT32_MAX;

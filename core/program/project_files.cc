@@ -35,11 +35,14 @@ struct FolderRules {
   std::string folder;
   IgnoreRules rules;
 
+  // What they say themselves of a path below.
+  IgnoreRules::Verdict Of(Text path, bool is_folder) {
+    return rules.Of(path.substr(folder.ends_with('/') ? folder.size() : folder.size() + 1), is_folder);
+  }
   // Whether a path below is left out.
   static bool Exclude(FolderRules* at, Text path, bool is_folder) {
     for (; at != nullptr; at = at->outer.get()) {
-      const size_t start = at->folder.ends_with('/') ? at->folder.size() : at->folder.size() + 1;
-      const IgnoreRules::Verdict verdict = at->rules.Of(path.substr(start), is_folder);
+      const IgnoreRules::Verdict verdict = at->Of(path, is_folder);
       if (verdict != IgnoreRules::Verdict::kNone) return verdict == IgnoreRules::Verdict::kExcluded;
     }
     return false;
@@ -110,7 +113,8 @@ Rules RulesAbove(const std::string& folder, WatchList& watched) {
 
 class ProjectWalk {
  public:
-  ProjectWalk(const std::vector<std::string>& roots, WatchList& watched) : roots_(roots), watched_(watched) {
+  ProjectWalk(const std::vector<std::string>& roots, const std::string& exclude, WatchList& watched)
+      : roots_(roots), exclude_(exclude), watched_(watched) {
     for (const std::string& root : roots) real_roots_.push_back(RealPath(root));
   }
 
@@ -120,6 +124,8 @@ class ProjectWalk {
         Watch(roots_[i], watched_);
         if (stamp.is_file()) AddFile(roots_[i], real_roots_[i]);
       } else if (!folders_.contains(real_roots_[i])) {
+        if (!exclude_.empty())
+          excluded_ = std::make_unique<FolderRules>(nullptr, real_roots_[i], IgnoreRules(exclude_));
         Walk(roots_[i], real_roots_[i], RulesAbove(real_roots_[i], watched_));
       }
     }
@@ -166,7 +172,7 @@ class ProjectWalk {
       if (!is_folder && (entry.kind == FolderEntry::Kind::kOther || !IsSourceName(entry.name))) continue;
       if (is_folder && IsLeftOut(entry.name)) continue;
       std::string real_path = Join(at.real_folder, entry.name);
-      if (at.rules != nullptr && FolderRules::Exclude(at.rules.get(), real_path, is_folder)) continue;
+      if (IsExcluded(at.rules.get(), real_path, is_folder)) continue;
       std::string path = Join(at.folder, entry.name);
       if (is_folder) {
         pending.push_back({std::move(path), std::move(real_path), at.rules});
@@ -180,6 +186,13 @@ class ProjectWalk {
     }
   }
 
+  bool IsExcluded(FolderRules* rules, Text path, bool is_folder) const {
+    const IgnoreRules::Verdict own =
+        excluded_ == nullptr ? IgnoreRules::Verdict::kNone : excluded_->Of(path, is_folder);
+    if (own != IgnoreRules::Verdict::kNone) return own == IgnoreRules::Verdict::kExcluded;
+    return FolderRules::Exclude(rules, path, is_folder);
+  }
+
   static bool IsLeftOut(Text folder) {
     return folder.starts_with('.') || folder == "__pycache__" || folder == "node_modules";
   }
@@ -191,6 +204,8 @@ class ProjectWalk {
   static constexpr int64_t kStepsOfFolder = 100;
 
   const std::vector<std::string>& roots_;
+  const std::string& exclude_;
+  std::unique_ptr<FolderRules> excluded_;  // by `exclude_`, for the root that is walked
   WatchList& watched_;
   std::vector<std::string> real_roots_;
   std::vector<std::string> paths_;
@@ -240,7 +255,8 @@ void ForEachByThreads(size_t count, std::array<Worker, 2>& workers, Function&& f
 
 class ProjectFiles::Impl {
  public:
-  Impl(Files& files, std::vector<std::string> roots) : files_(files), roots_(std::move(roots)) {
+  Impl(Files& files, std::vector<std::string> roots, Text exclude)
+      : files_(files), roots_(std::move(roots)), exclude_(exclude) {
     for (std::string& root : roots_) root = NormalPath(root);
   }
 
@@ -328,7 +344,7 @@ class ProjectFiles::Impl {
 
   void Walk() {
     WatchList watched;
-    std::vector<std::string> paths = ProjectWalk(roots_, watched).Paths();
+    std::vector<std::string> paths = ProjectWalk(roots_, exclude_, watched).Paths();
     buffers_ = files_.Buffers();
     for (const FileId buffer : buffers_) {
       if (const std::string& path = files_.PathOf(buffer); IsBelowRoots(path)) paths.push_back(path);
@@ -493,6 +509,7 @@ class ProjectFiles::Impl {
 
   Files& files_;
   std::vector<std::string> roots_;
+  const std::string exclude_;
   std::vector<FileId> all_;
   // Of the walk.
   WatchList watched_;
@@ -507,8 +524,8 @@ class ProjectFiles::Impl {
   bool are_filters_fresh_ = false;
 };
 
-ProjectFiles::ProjectFiles(Files& files, std::vector<std::string> roots)
-    : impl_(std::make_unique<Impl>(files, std::move(roots))) {}
+ProjectFiles::ProjectFiles(Files& files, std::vector<std::string> roots, Text exclude)
+    : impl_(std::make_unique<Impl>(files, std::move(roots), exclude)) {}
 ProjectFiles::~ProjectFiles() = default;
 
 const std::vector<FileId>& ProjectFiles::All() { return impl_->All(); }

@@ -15,7 +15,8 @@ namespace quillet {
 
 class ProjectFiles {
  public:
-  ProjectFiles(Files& files, std::vector<std::string> roots);
+  // `exclude` are lines of an ignore file for each root that is a folder; they overrule others.
+  explicit ProjectFiles(Files& files, std::vector<std::string> roots, Text exclude = Text(""));
   ~ProjectFiles();
 
   // All *.py and *.pyi files below the roots and open buffers there, in the order of their paths; what .gitignore

@@ -35,7 +35,7 @@ Workspace::Impl::Impl(Settings given)
     : settings(std::move(given)),
       files(settings.version),
       modules(files, ModuleSettings(settings)),
-      project(files, settings.roots),
+      project(files, settings.roots, settings.exclude),
       inference(files, modules) {
   inference.set_callers(this);
 }

@@ -112,6 +112,7 @@ class Workspace {
  public:
   struct Settings {
     std::vector<std::string> roots;      // folders of the project
+    std::string exclude;                 // lines of an ignore file for each of them
     std::vector<std::string> libraries;  // the environment's
     std::string typeshed;
     Version version;

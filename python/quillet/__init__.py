@@ -28,6 +28,7 @@ if TYPE_CHECKING:
         Problem,
         RenameError,
         Signature,
+        Stopped,
         Workspace,
         WorkspaceSymbol,
     )
@@ -58,6 +59,7 @@ __all__ = [
     "Scope",
     "Signature",
     "SourceEncodingError",
+    "Stopped",
     "Symbol",
     "Workspace",
     "WorkspaceSymbol",
@@ -91,6 +93,7 @@ _HOMES = {
     "Scope": "_names",
     "Signature": "_workspace",
     "SourceEncodingError": "_source",
+    "Stopped": "_workspace",
     "Symbol": "_names",
     "Workspace": "_workspace",
     "WorkspaceSymbol": "_workspace",

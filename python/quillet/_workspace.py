@@ -12,7 +12,7 @@ import sys
 from collections.abc import Iterable, Sequence
 from typing import Literal, NamedTuple, Union, cast
 
-from quillet._languages import language_version
+from quillet._languages import language_version, native_language_of
 from quillet._source import to_utf8
 from quillet.tarvex import _host
 
@@ -149,6 +149,10 @@ class Problem(NamedTuple):
     message: str
 
 
+class Stopped(Exception):
+    """A question was ended by `Workspace.stop`."""
+
+
 class RenameError(ValueError):
     """A name cannot be changed; the message says why not."""
 
@@ -157,7 +161,8 @@ class Workspace:
     """The programs below some folders, for questions about them.
 
     `roots` are project folders, the working folder without any; a `src` folder in them is one of sources, and what
-    .gitignore files exclude does not belong to them. `environment` is a virtual environment, an interpreter or the
+    .gitignore files exclude does not belong to them, nor what `exclude` does, lines of such a file for each root.
+    `environment` is a virtual environment, an interpreter or the
     folder of an installation; without it the active one (VIRTUAL_ENV), or `.venv` in the first root, or that of the
     running interpreter is taken. `version` is the Python that the sources are written for, without it the
     environment's.
@@ -167,7 +172,11 @@ class Workspace:
     """
 
     def __init__(
-        self, *roots: StrPath, environment: StrPath | None = None, version: tuple[int, ...] | None = None
+        self,
+        *roots: StrPath,
+        exclude: Iterable[str] = (),
+        environment: StrPath | None = None,
+        version: tuple[int, ...] | None = None,
     ) -> None:
         folders = [os.path.abspath(os.fsencode(root)) for root in roots or (".",)]
         for folder in folders:
@@ -183,7 +192,12 @@ class Workspace:
         self._version = found_version
         self._roots = tuple(os.fsdecode(folder) for folder in folders)
         self._native = _host.Workspace(
-            folders, [os.fsencode(library) for library in libraries], _typeshed(), (*found_version, 0)
+            folders,
+            [os.fsencode(library) for library in libraries],
+            _typeshed(),
+            (*found_version, 0),
+            _utf8("\n".join(exclude)),
+            native_language_of(found_version),
         )
 
     @property
@@ -326,6 +340,16 @@ class Workspace:
     def refresh(self) -> None:
         """Looks at once which files changed. Questions do so themselves, unless they did a moment ago."""
         self._native.Refresh()
+
+    def stop(self, *, patience: float = 0) -> None:
+        """Ends what another thread asks, and what is asked behind it, by `Stopped`, until `proceed` says otherwise; not
+        before `patience` seconds have passed since it last did.
+        """
+        self._native.Stop(patience)
+
+    def proceed(self) -> None:
+        """Questions are answered again."""
+        self._native.Proceed()
 
     def source_line(self, path: StrPath, line: int) -> bytes:
         """A line of a file, in UTF-8 and without its end."""

@@ -12,7 +12,7 @@ from pathlib import Path
 import pytest
 
 import quillet
-from quillet import Edit, Location, RenameError, Workspace
+from quillet import Edit, Location, RenameError, Stopped, Workspace
 from quillet.cli.edits import edited_files
 from quillet.cli.questions import place_of, project_of
 
@@ -71,6 +71,25 @@ def places(locations: list[Location], project: Path) -> list[str]:
 
 
 # ---- questions ----
+
+
+def test_questions_are_stopped_until_they_may_go_on(project: Path) -> None:
+    for number in range(300):
+        (project / f"more_{number}.py").write_text("from shop.cart import pay\n" + "pay(None)\n" * 300)
+    workspace = Workspace(project)
+    workspace.stop()
+    with pytest.raises(Stopped):
+        workspace.references(project / "main.py", 4, 1)
+    workspace.proceed()
+    assert len(workspace.references(project / "main.py", 4, 1)) == 3 + 300 * 301
+    workspace.stop(patience=3600)
+    assert workspace.definitions(project / "main.py", 4, 1)
+
+
+def test_what_settings_exclude_does_not_belong_to_the_program(project: Path) -> None:
+    (project / "old.py").write_text("from shop.cart import pay\n")
+    found = Workspace(project, exclude=["/old.py", "*.txt"]).references(project / "main.py", 4, 1)
+    assert places(found, project) == ["main.py:1:29-32", "main.py:4:1-4", "src/shop/cart.py:20:5-8"]
 
 
 def test_definitions_are_found_in_other_files(project: Path) -> None:

@@ -72,6 +72,22 @@ TEST(ProjectFiles, LeaveOutWhatRulesExclude) {
   EXPECT_EQ(All(folder, {"build"}), (Paths{"build/a.py"}));
 }
 
+TEST(ProjectFiles, LeaveOutWhatSettingsExclude) {
+  const TemporaryFolder folder = {{".git/HEAD", ""},         {".gitignore", "made/\n"}, {"a.py", ""},
+                                  {"made/b.py", ""},         {"old/c.py", ""},          {"sub/old/d.py", ""},
+                                  {"sub/made/e_gen.py", ""}, {"sub/f_gen.py", ""},      {"sub/keep_gen.py", ""}};
+  Files files(Version::Of(3, 12));
+  const auto all = [&](const Paths& roots, Text exclude) {
+    Paths whole;
+    for (const std::string& root : roots) whole.push_back(folder / root);
+    return Below(folder, files, ProjectFiles(files, whole, exclude).All());
+  };
+  EXPECT_EQ(all({""}, "/old/\n*_gen.py\n!keep_gen.py"), (Paths{"a.py", "sub/keep_gen.py", "sub/old/d.py"}));
+  EXPECT_EQ(all({"sub", "old"}, "/old"), (Paths{"old/c.py", "sub/f_gen.py", "sub/keep_gen.py"}));
+  EXPECT_EQ(all({""}, "!made/"), (Paths{"a.py", "made/b.py", "old/c.py", "sub/f_gen.py", "sub/keep_gen.py",
+                                        "sub/made/e_gen.py", "sub/old/d.py"}));
+}
+
 TEST(ProjectFiles, FollowNoLinksToFolders) {
   const TemporaryFolder folder = {{"project/a/b.py", ""}, {"elsewhere/c.py", ""}};
   folder.Link("..", "project/a/up");
