@@ -333,6 +333,44 @@ std::vector<Call> Workspace::Callers(FileId id, uint32_t offset) {
   return found;
 }
 
+// What stands behind the name of a function or class, as one would write it on one line: without comments, line ends
+// and the comma behind the last parameter, and not longer than a reader wants it.
+static std::string OnOneLine(Text head) {
+  static constexpr size_t kMaxHead = 200;
+  std::string line;
+  char quote = 0;
+  for (size_t i = 0; i < head.size(); ++i) {
+    const char c = head[i];
+    if (quote != 0) {
+      line += c;
+      if (c == '\\' && i + 1 < head.size())
+        line += head[++i];
+      else if (c == quote)
+        quote = 0;
+      continue;
+    }
+    if (c == '#') {
+      while (i + 1 < head.size() && head[i + 1] != '\n' && head[i + 1] != '\r') ++i;
+    } else if (c == ' ' || c == '\t' || c == '\n' || c == '\r' || c == '\f' || c == '\\') {
+      if (!line.empty() && Text(" ([{").find(line.back()) == Text::npos) line += ' ';
+    } else {
+      if (c == ')' || c == ']' || c == '}') {
+        if (c == ')' && line.ends_with(", ")) line.resize(line.size() - 2);
+        while (!line.empty() && line.back() == ' ') line.pop_back();
+      }
+      if (c == '"' || c == '\'') quote = c;
+      line += c;
+    }
+  }
+  while (!line.empty() && line.back() == ' ') line.pop_back();
+  if (line.size() > kMaxHead) {
+    size_t end = kMaxHead;
+    while (end > 0 && (static_cast<unsigned char>(line[end]) & 0xC0) == 0x80) --end;
+    line.resize(end);
+  }
+  return line;
+}
+
 std::vector<OutlineItem> Workspace::Outline(FileId id) {
   Impl& in = *impl_;
   in.Begin();
@@ -364,13 +402,7 @@ std::vector<OutlineItem> Workspace::Outline(FileId id) {
       if (at.end > at.name_end) {
         Text head = Text(syntax.source + at.name_end, at.end - at.name_end);
         while (!head.empty() && (head.back() == ':' || head.back() == ' ')) head.remove_suffix(1);
-        static constexpr size_t kMaxHead = 200;
-        std::string detail;
-        for (const char c : head.substr(0, kMaxHead)) {
-          const bool is_blank = c == ' ' || c == '\n' || c == '\r' || c == '\t';
-          if (!is_blank || (!detail.empty() && detail.back() != ' ')) detail += is_blank ? ' ' : c;
-        }
-        item.detail = detail;
+        item.detail = OnOneLine(head);
       }
       item_of[stmt] = static_cast<int>(items.size());
       items.push_back(std::move(item));

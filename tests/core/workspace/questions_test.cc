@@ -435,6 +435,15 @@ TEST(Hovers, ShowDeclarationsAndDocumentation) {
 
 // ---- outlines and symbols ----
 
+TEST(Outlines, ShowAHeadOnOneLine) {
+  Program program(
+      {{"a.py", "def f(\n    a,  # the first\n    b=(1,), c='x  # y',\n):\n  pass\nclass C ( D ,\n  E ): pass\n"}});
+  const std::vector<OutlineItem> items = program->Outline(program.File("a.py"));
+  ASSERT_EQ(items.size(), 2u);
+  EXPECT_EQ(items[0].detail, "(a, b=(1,), c='x  # y')");
+  EXPECT_EQ(items[1].detail, "(D , E)");
+}
+
 TEST(Outlines, AreTreesOfWhatAFileDefines) {
   Program program(
       "X = 1\n@deco\nclass A:\n  y = 2\n  def m(self, z):\n    def inner(): pass\n    local = 1\nasync def f(): pass\n"
