@@ -485,3 +485,36 @@ def test_what_it_gives_is_exported() -> None:
     for name in ("Workspace", "Location", "Completion", "Edit", "RenameError"):
         assert name in quillet.__all__
         assert getattr(quillet, name).__module__ == "quillet._workspace"
+
+
+@pytest.mark.parametrize(
+    ("version", "text", "problems"),
+    [
+        ((3, 12), "x = (1,\n\n", [(1, 5, 1, 6, "'(' was never closed")]),
+        (
+            (3, 12),
+            "a = 1\nif a:\n\tx = a a\nb = a a\n",
+            [(3, 8, 3, 9, "invalid syntax"), (4, 7, 4, 8, "invalid syntax")],
+        ),
+        ((3, 12), "class C\n  pass\n", [(1, 8, 2, 1, "expected ':'")]),
+        (
+            (3, 7),
+            "x = (y := 1)\n",
+            [(1, 8, 1, 9, "Assignment expressions are only supported in Python 3.8 and greater")],
+        ),
+        ((2, 7), "print 'a'\n", []),
+        (
+            (2, 7),
+            "print('a', file=1)\n",
+            [(1, 12, 1, 16, "invalid syntax. Maybe you meant '==' or ':=' instead of '='?")],
+        ),
+    ],
+)
+def test_errors_of_syntax_are_problems(
+    tmp_path: Path, version: tuple[int, int], text: str, problems: list[tuple[object, ...]]
+) -> None:
+    workspace = Workspace(tmp_path, version=version)
+    workspace.open(tmp_path / "a.py", text)
+    found = workspace.problems(tmp_path / "a.py")
+    assert {problem.code for problem in found} <= {"syntax"}
+    assert [(*problem[:4], problem.message) for problem in found] == problems
