@@ -84,7 +84,7 @@ def ask(kind: str, target: str, settings: Settings, *, at_least: str = "by name"
     except (OSError, ValueError) as problem:
         if isinstance(problem, BrokenPipeError):
             raise
-        return fail(_said(problem))
+        return fail(said(problem))
     if workspace.was_bounded:
         print("quillet: there may be more: the search met its bound", file=sys.stderr)
     return 0 if found else 1
@@ -96,7 +96,8 @@ def fail(problem: Exception) -> int:
     return 2
 
 
-def _said(problem: OSError | ValueError) -> Exception:
+def said(problem: OSError | ValueError) -> Exception:
+    """A problem in words: a file that cannot be read with its name in front."""
     if isinstance(problem, OSError) and problem.filename is not None:
         name = os.fsdecode(problem.filename) if isinstance(problem.filename, (str, bytes)) else str(problem.filename)
         return ValueError(f"{name}: {problem.strerror}")
@@ -245,7 +246,7 @@ def resolve(name: str, *, roles: Sequence[str], roots: Sequence[str], as_json: b
                 if known is None or _surer(place, known):
                     found[place[:3]] = place
     except (OSError, ValueError) as problem:
-        return fail(_said(problem))
+        return fail(said(problem))
     if not defined:
         print(f"quillet: {printable(name)} is defined nowhere in {printable(workspace.roots[0])}", file=sys.stderr)
     wanted = [_FIND_ROLES[role] for role in roles]
@@ -287,7 +288,7 @@ def rename(target: str, new_name: str, settings: Settings, *, write: bool, only_
     except RenameError as problem:
         return fail(problem)
     except (OSError, ValueError) as problem:
-        return fail(_said(problem))
+        return fail(said(problem))
     with quiet_output() as out:
         if settings.as_json:
             answer = _Answer(out, workspace, True)
