@@ -128,6 +128,7 @@ void BindBatch(nb::module_& tarvex) {
       .def("Analyze", &NativeBatch::Analyze, nb::arg("sources"),
            "Analyses UTF-8 sources, a sequence of bytes; gives (records, statements rejected).");
   BindFileResult(host);
+  BindRecordRows(host);
   nb::class_<FileBatch>(host, "Batch", "Files through the native path, on threads without the interpreter lock.")
       .def(nb::init<const Language&, nb::handle, unsigned, nb::object, nb::object, bool>(), nb::arg("language"),
            nb::arg("inputs"), nb::arg("jobs"), nb::arg("decode"), nb::arg("format").none(), nb::arg("bindings"))

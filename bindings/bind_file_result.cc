@@ -12,23 +12,6 @@ namespace quillet::host {
 
 namespace {
 
-// The numbers that a database gave to the texts of a list: a list of int, one a text. The host's code, which
-// may run whenever a tuple is made, may change the list meanwhile.
-class TextNumbers {
- public:
-  TextNumbers(nb::handle list, const TextList& texts) {
-    if (!PyList_Check(list.ptr()) || nb::len(list) != texts.size())
-      ThrowError(ErrorKind::kValueError, "a list with a number a text is needed");
-    numbers_ = TupleOf(list);
-  }
-  nb::object operator[](size_t i) const {
-    return nb::borrow(PyTuple_GET_ITEM(numbers_.ptr(), static_cast<Py_ssize_t>(i)));
-  }
-
- private:
-  nb::object numbers_;
-};
-
 const char* WordOf(ScopeNames::ScopeKind kind) {
   switch (kind) {
     case ScopeNames::ScopeKind::kModule:
@@ -94,36 +77,6 @@ nb::list FileResult::Rows(size_t begin, size_t end, nb::handle row_class, const 
   return rows;
 }
 
-nb::list FileResult::NumberedRows(size_t begin, size_t end, size_t rows_per_tuple, size_t first_id,
-                                  nb::handle name_numbers, nb::handle scope_numbers, nb::handle detail_numbers) const {
-  constexpr size_t kDatabaseColumns = 9;
-  constexpr size_t kMostRows = 1024;
-  const RecordTable& table = result.table;
-  const TextNumbers name_number(name_numbers, table.name_texts);
-  const TextNumbers scope_number(scope_numbers, table.scope_texts);
-  const TextNumbers detail_number(detail_numbers, table.detail_texts);
-  if (rows_per_tuple == 0 || rows_per_tuple > kMostRows)
-    ThrowError(ErrorKind::kValueError, "a tuple holds from 1 to 1024 rows");
-  end = std::min(end, table.size());
-  nb::list tuples;
-  for (size_t i = begin; i < end && end - i >= rows_per_tuple;) {
-    TupleFiller tuple(&PyTuple_Type, rows_per_tuple * kDatabaseColumns);
-    for (const size_t behind = i + rows_per_tuple; i < behind; ++i) {
-      tuple.Add(first_id + i);
-      tuple.Add(name_number[table.names[i]]);
-      tuple.Add(scope_number[table.scopes[i]]);
-      tuple.Add(table.lines[i]);
-      tuple.Add(table.columns[i]);
-      tuple.Add(static_cast<size_t>(table.kinds[i]));
-      tuple.Add(size_t{table.is_parameter[i]});
-      tuple.Add(static_cast<size_t>(table.opens[i]));
-      tuple.Add(detail_number[table.details[i]]);
-    }
-    tuples.append(tuple.Take());
-  }
-  return tuples;
-}
-
 std::unique_ptr<FileNames> FileResult::Names() const {
   return result.bindings ? std::make_unique<FileNames>(result.bindings) : nullptr;
 }
@@ -146,14 +99,7 @@ void BindFileResult(nb::module_& host) {
       .def("Definitions", &FileResult::Definitions, nb::arg("row_class"),
            "Classes, functions and type aliases: row_class(scope, kind, line, column, first_line, last_line).")
       .def("Rows", &FileResult::Rows, nb::arg("begin"), nb::arg("end"), nb::arg("row_class"), nb::arg("kinds"),
-           "Records from `begin` up to `end` as instances of a class that derives from tuple.")
-      .def_prop_ro("name_texts", [](FileResult& self) { return self.names.All(); })
-      .def_prop_ro("scope_texts", [](FileResult& self) { return self.scopes.All(); })
-      .def_prop_ro("detail_texts", [](FileResult& self) { return self.details.All(); })
-      .def("NumberedRows", &FileResult::NumberedRows, nb::arg("begin"), nb::arg("end"), nb::arg("rows_per_tuple"),
-           nb::arg("first_id"), nb::arg("name_numbers"), nb::arg("scope_numbers"), nb::arg("detail_numbers"),
-           "Records as rows of integers, several in a tuple, with a database's numbers for the texts: id, name, "
-           "scope, line, column, kind, is_parameter, opens, detail.");
+           "Records from `begin` up to `end` as instances of a class that derives from tuple.");
 }
 
 }  // namespace quillet::host

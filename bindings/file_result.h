@@ -27,13 +27,9 @@ struct FileResult {
   nb::list Definitions(nb::handle row_class);
   // Records as instances of a class that derives from tuple, with the host's own objects for kinds.
   nb::list Rows(size_t begin, size_t end, nb::handle row_class, const nb::tuple& kinds);
-  // Records as rows of integers for a database that holds texts by numbers, `rows_per_tuple` in each
-  // tuple: what is left behind the last full one is in nobody's. A row has kDatabaseColumns, which are
-  // id, name, scope, line, column, kind, is_parameter, opens, detail; record i has the id first_id + i.
-  nb::list NumberedRows(size_t begin, size_t end, size_t rows_per_tuple, size_t first_id, nb::handle name_numbers,
-                        nb::handle scope_numbers, nb::handle detail_numbers) const;
 };
 
 void BindFileResult(nb::module_& host);
+void BindRecordRows(nb::module_& host);
 
 }  // namespace quillet::host

@@ -35,12 +35,6 @@ class ShownTexts {
     return shown;
   }
 
-  nb::list All() {
-    nb::list list;
-    for (size_t i = 0; i < texts_.size(); ++i) list.append((*this)[i]);
-    return list;
-  }
-
  private:
   const TextList& texts_;
   std::vector<nb::object> shown_;

@@ -61,22 +61,6 @@ class Definition(NamedTuple):
     last_line: int
 
 
-class Texts(NamedTuple):
-    """The distinct texts of a file's records."""
-
-    names: list[str]
-    scopes: list[str]
-    details: list[str]
-
-
-class TextNumbers(NamedTuple):
-    """A number for each of a file's `Texts`."""
-
-    names: list[int]
-    scopes: list[int]
-    details: list[int]
-
-
 class FileRecords(Sequence[FileRecord]):
     """The records of a file, in the order in which they were found. Made when they are asked for."""
 
@@ -108,25 +92,6 @@ class FileRecords(Sequence[FileRecord]):
     def plain(self) -> list[tuple[int, int, str, str, str, str, bool]]:
         """All records as plain tuples, with the kind as a plain str: for a database."""
         return self._native.Rows(0, len(self), tuple, _host.RECORD_KIND_WORDS)
-
-    def texts(self) -> Texts:
-        """The names, scopes and details of all records, each text once."""
-        return Texts(self._native.name_texts, self._native.scope_texts, self._native.detail_texts)
-
-    def numbered(self, first_id: int, numbers: TextNumbers, rows_per_tuple: int) -> Iterator[list[tuple[int, ...]]]:
-        """All records as rows of integers for a database that holds texts by numbers, in handy lists.
-
-        `numbers` has a number for each of the `texts`. A row is id, name, scope, line, column, kind,
-        is_parameter, opens (1 where the name is a class that begins here, 2 a function), detail. A tuple
-        is `rows_per_tuple` rows, one behind the other; the last records have tuples of their own.
-        """
-        rows, names, scopes, details = self._native.NumberedRows, *numbers
-        many = len(self) - len(self) % rows_per_tuple
-        step = max(_CHUNK // rows_per_tuple, 1) * rows_per_tuple
-        for start in range(0, many, step):
-            yield rows(start, min(start + step, many), rows_per_tuple, first_id, names, scopes, details)
-        if many < len(self):
-            yield rows(many, len(self), 1, first_id, names, scopes, details)
 
 
 class FileAnalysis:

@@ -15,7 +15,6 @@ import pytest
 
 import quillet
 from quillet import FileRecord, RecordKind, analyze, analyze_files
-from quillet._batch import TextNumbers
 from quillet._records import describe
 from quillet.tarvex import _host
 
@@ -71,32 +70,6 @@ def test_records_are_a_sequence() -> None:
         records[len(records)]
     assert records.plain() == [(*record[:4], record.kind.value, *record[5:]) for record in records]
     assert {type(row) for row in records.plain()} == {tuple}
-
-
-@pytest.mark.parametrize("rows_per_tuple", [1, 3, 64])
-def test_records_are_numbered_for_a_database(rows_per_tuple: int) -> None:
-    [result] = analyze_files([("shop.py", SHOP * 9)], version=(3, 12))
-    records = result.records
-    texts = records.texts()
-    for column in texts:
-        assert len(set(column)) == len(column)
-    numbers = TextNumbers(*([100 * at + i for i in range(len(column))] for at, column in enumerate(texts)))
-    flat = [number for part in records.numbered(1000, numbers, rows_per_tuple) for row in part for number in row]
-    rows = list(zip(*[iter(flat)] * 9, strict=True))
-    assert [row[0] for row in rows] == list(range(1000, 1000 + len(records)))
-    words = _host.RECORD_KIND_WORDS
-    assert [
-        (line, column, texts.scopes[scope - 100], texts.names[name], words[kind], texts.details[detail - 200], flag)
-        for _, name, scope, line, column, kind, flag, _, detail in rows
-    ] == records.plain()
-    opens = {(row.line, row.column): {"class": 1, "def": 2}[row.kind] for row in result.definitions}
-    assert {(row[3], row[4]): row[7] for row in rows if row[7]} == opens
-
-
-def test_numbers_are_needed_for_all_texts() -> None:
-    [result] = analyze_files([("shop.py", SHOP)])
-    with pytest.raises(ValueError, match="a number a text"):
-        list(result.records.numbered(0, TextNumbers([], [], []), 1))
 
 
 def test_kinds_are_those_of_single_sources() -> None:

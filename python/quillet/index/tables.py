@@ -1,31 +1,36 @@
 """Writes the records of files as tables of an SQLite database, for questions in SQL.
 
-A database is written anew each time, beside its place, and then put there. The trap: the number of a record
-holds its file's, so that a file's records lie together and go by one range, without an index on the file.
+A database is written anew each time, beside its place, and then put there: empty tables by SQLite, the records and
+their index as pages by the core, which takes a fraction of the time that statements would, and everything else by
+SQLite again. The trap: the number of a record holds its file's, so that a file's records lie together and go by
+one range, without an index on the file.
 """
 
 from __future__ import annotations
 
-import gc
 import os
 import sqlite3
 from collections.abc import Iterator
-from contextlib import contextmanager, suppress
-from typing import NamedTuple
+from contextlib import closing, contextmanager, suppress
+from typing import Any, NamedTuple
 
-from quillet._batch import FileAnalysis, FileRecords, TextNumbers, analyze_files
+from quillet._batch import jobs_of
+from quillet._languages import decode_source, native_language_of
 from quillet.index.source import content_hash
 from quillet.index.store import KINDS, IndexProblem, explained
 from quillet.index.writing import check_place, engine_mark
+from quillet.tarvex import _host
 
 APPLICATION_ID = 0x51554C54  # "QULT"
 SCHEMA = 1
 # A record's number is its file's number, shifted, and its place in the file.
 FILE_SHIFT = 24
 MAX_RECORDS = 1 << FILE_SHIFT
-# Records that one statement writes: SQLite takes 999 variables everywhere.
-_ROWS_AT_ONCE = 64
-_RECORD_COLUMNS = 9
+# The bytes in front of a database's first page that are looked at, and where they hold the number of its pages.
+_HEAD_SIZE = 100
+_PAGE_COUNT_AT = 28
+# How many texts become objects at a time.
+_CHUNK = 4096
 
 _TABLES = f"""
 CREATE TABLE meta (key TEXT PRIMARY KEY, value) WITHOUT ROWID;
@@ -70,12 +75,12 @@ CREATE VIEW facts AS
     JOIN kinds k ON k.id = r.kind
     JOIN details d ON d.id = r.detail;
 """
+RECORD_INDEX = "CREATE INDEX records_by_name ON records (name, scope);"
 # Made last, when all rows can be sorted at once.
-INDICES = """
+TEXT_INDICES = """
 CREATE UNIQUE INDEX names_by_name ON names (name);
 CREATE INDEX names_by_tail ON names (tail);
 CREATE UNIQUE INDEX details_by_detail ON details (detail);
-CREATE INDEX records_by_name ON records (name, scope);
 """
 
 
@@ -117,109 +122,108 @@ def write_sqlite(source: Source, target: str) -> TablesOutcome:
     """Analyses files and writes their records into a new database. Raises `IndexProblem`."""
     with replacing(target) as unfinished:
         try:
-            connection = sqlite3.connect(unfinished, isolation_level=None)
-            try:
-                return _Tables(connection, source).write()
-            finally:
-                connection.close()
+            return _Tables(unfinished, source).write()
         except sqlite3.Error as error:
             raise IndexProblem(f"{target}: {error}; check the space on the disk") from error
 
 
-def prepare(connection: sqlite3.Connection) -> None:
+def open_unshared(path: str) -> sqlite3.Connection:
+    """A database that nobody else sees, and that is thrown away where it is not finished."""
+    connection = sqlite3.connect(path, isolation_level=None)
+    for pragma in ("journal_mode=OFF", "synchronous=OFF", "cache_size=-65536"):
+        connection.execute(f"PRAGMA {pragma}")
+    return connection
+
+
+def make_tables(connection: sqlite3.Connection) -> None:
     """Makes the tables in an empty database."""
-    # Nobody else sees the file, and one that is not finished is thrown away.
-    connection.execute("PRAGMA journal_mode=OFF")
-    connection.execute("PRAGMA synchronous=OFF")
-    connection.execute("PRAGMA cache_size=-65536")
-    connection.executescript(f"{_TABLES} PRAGMA application_id={APPLICATION_ID}; PRAGMA user_version={SCHEMA};")
+    connection.executescript(
+        f"PRAGMA auto_vacuum=NONE; {_TABLES} PRAGMA application_id={APPLICATION_ID}; PRAGMA user_version={SCHEMA};"
+    )
 
 
 class _Tables:
-    def __init__(self, connection: sqlite3.Connection, source: Source) -> None:
-        self._connection = connection
+    def __init__(self, path: str, source: Source) -> None:
+        self._path = path
         self._source = source
-        self._problems: list[tuple[str, str]] = []
-        self._records = 0
         self._made_by = engine_mark()
+        self._records = 0
+        # Rows of two tables.
+        self._files: list[tuple[Any, ...]] = []
+        self._errors: list[tuple[int, int, int, str]] = []
 
     def write(self) -> TablesOutcome:
-        connection = self._connection
-        prepare(connection)
-        connection.execute("BEGIN")
-        connection.executemany("INSERT INTO kinds VALUES (?, ?)", enumerate(KINDS))
-        connection.execute("INSERT INTO meta VALUES ('python', ?)", ("{}.{}".format(*self._source.version),))
-        self._names = _Texts(connection, "INSERT INTO names VALUES (?, ?, ?)", with_tail=True)
-        self._details = _Texts(connection, "INSERT INTO details VALUES (?, ?)", with_tail=False)
+        with closing(open_unshared(self._path)) as connection:
+            make_tables(connection)
+            connection.execute(RECORD_INDEX)
+            roots = dict(connection.execute("SELECT name, rootpage FROM sqlite_master"))
+        with open(self._path, "r+b") as file:
+            rows = _host.RecordRows(file.read(_HEAD_SIZE))
+            file.seek(0, os.SEEK_END)
+            for analysed in self._analysed():
+                self._add_file(rows, analysed)
+                file.write(rows.Take())
+            table = rows.FinishTable()
+            while rows.AddToIndex():
+                file.write(rows.Take())
+            index = rows.FinishIndex()
+            file.write(rows.Take())
+            for name, root in (("records", table), ("records_by_name", index)):
+                file.seek((roots[name] - 1) * rows.page_size)
+                file.write(root)
+            file.seek(_PAGE_COUNT_AT)
+            file.write(rows.page_count.to_bytes(4, "big"))
+        with closing(open_unshared(self._path)) as connection:
+            connection.execute("BEGIN")
+            self._insert_others(connection, rows)
+            connection.execute("COMMIT")
+            connection.executescript(TEXT_INDICES)
+        problems = [
+            (path, row[-1]) for path, row in zip(self._source.paths, self._files, strict=True) if row[-1] is not None
+        ]
+        return TablesOutcome(len(self._files), self._records, problems)
+
+    def _analysed(self) -> Iterator[_host.FileResult]:
         source = self._source
-        with _no_collection(), analyze_files(source.paths, version=source.version, jobs=source.jobs) as analyses:
-            for number, (stored, analysis) in enumerate(zip(source.stored, analyses, strict=True), 1):
-                self._write_file(number, stored, analysis)
-        connection.execute("COMMIT")
-        connection.executescript(INDICES)
-        return TablesOutcome(len(source.paths), self._records, self._problems)
+        inputs = [(os.fsencode(path), None, None) for path in source.paths]
+        language = native_language_of(source.version)
+        batch = _host.Batch(language, inputs, jobs_of(source.jobs), decode_source, None, False)
+        try:
+            while (result := batch.Next()) is not None:
+                yield result
+        finally:
+            batch.Cancel()
 
-    def _write_file(self, number: int, stored: bytes, analysis: FileAnalysis) -> None:
-        records = analysis.records
-        errors = sorted([*analysis.errors, *analysis.reports])
-        problem = analysis.problem
-        if problem is None and max(len(records), len(errors)) >= MAX_RECORDS:
+    def _add_file(self, rows: _host.RecordRows, result: _host.FileResult) -> None:
+        number, path = result.index + 1, self._source.paths[result.index]
+        errors = sorted([*result.errors, *result.reports])
+        count, problem = result.record_count, result.problem
+        if problem is None and max(count, len(errors)) >= MAX_RECORDS:
             problem = "the file is too large for the tables"
-        if problem is not None:
-            self._problems.append((analysis.path, problem))
-        status = _status_of(analysis.path)
-        count = len(records) if problem is None else 0
-        row = (number, stored, *status, content_hash(analysis.path), self._made_by, analysis.lines, count, problem)
-        self._connection.execute("INSERT INTO files VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?)", row)
         if problem is None:
+            rows.Add(result, number << FILE_SHIFT)
             self._records += count
-            self._write_records(records, number << FILE_SHIFT)
-            numbered = ((place, *error) for place, error in enumerate(errors, number << FILE_SHIFT))
-            self._connection.executemany("INSERT INTO errors VALUES (?, ?, ?, ?)", numbered)
+            self._errors += ((place, *error) for place, error in enumerate(errors, number << FILE_SHIFT))
+        else:
+            count = 0
+        stored, mark = self._source.stored[result.index], self._made_by
+        row = (number, stored, *_status_of(path), content_hash(path), mark, result.line_count, count, problem)
+        self._files.append(row)
 
-    def _write_records(self, records: FileRecords, first_id: int) -> None:
-        texts = records.texts()
-        numbers = TextNumbers(
-            self._names.numbers_of(texts.names),
-            self._names.numbers_of(texts.scopes),
-            self._details.numbers_of(texts.details),
-        )
-        for tuples in records.numbered(first_id, numbers, _ROWS_AT_ONCE):
-            self._connection.executemany(INSERT_RECORDS[len(tuples[0])], tuples)
-
-
-# The statements for many records and for one, by the number of their variables.
-_ROW = f"({', '.join('?' * _RECORD_COLUMNS)})"
-INSERT_RECORDS = {
-    rows * _RECORD_COLUMNS: f"INSERT INTO records VALUES {', '.join([_ROW] * rows)}" for rows in (1, _ROWS_AT_ONCE)
-}
-
-
-class _Texts:
-    """The numbers of the texts of one table; that of no text is 0."""
-
-    def __init__(self, connection: sqlite3.Connection, insert: str, *, with_tail: bool) -> None:
-        self._connection = connection
-        self._insert = insert
-        self._with_tail = with_tail
-        self._numbers: dict[str, int] = {}
-        self.numbers_of([""])
-
-    def numbers_of(self, texts: list[str]) -> list[int]:
-        """A number for each text; the table gets those that it does not have."""
-        numbers = self._numbers
-        new = [text for text in texts if text not in numbers]
-        if new:
-            numbered = list(enumerate(new, len(numbers)))
-            numbers.update((text, number) for number, text in numbered)
-            rows = [(number, text, _tail_of(text)) for number, text in numbered] if self._with_tail else numbered
-            self._connection.executemany(self._insert, rows)
-        return list(map(numbers.__getitem__, texts))
-
-
-def _tail_of(name: str) -> str:
-    """What stands behind the last dot, by which names are found from their end."""
-    return name.rpartition(".")[2]
+    def _insert_others(self, connection: sqlite3.Connection, rows: _host.RecordRows) -> None:
+        insert = connection.executemany
+        insert("INSERT INTO kinds VALUES (?, ?)", enumerate(KINDS))
+        insert("INSERT INTO meta VALUES ('python', ?)", [("{}.{}".format(*self._source.version),)])
+        insert("INSERT INTO files VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?)", self._files)
+        insert("INSERT INTO errors VALUES (?, ?, ?, ?)", self._errors)
+        for texts, statement in (
+            (rows.Names, "INSERT INTO names VALUES (?, ?, ?)"),
+            (rows.Details, "INSERT INTO details VALUES (?, ?)"),
+        ):
+            begin = 0
+            while found := texts(begin, begin + _CHUNK):
+                insert(statement, found)
+                begin += len(found)
 
 
 def _status_of(path: str) -> tuple[int, int]:
@@ -228,15 +232,3 @@ def _status_of(path: str) -> tuple[int, int]:
     except (OSError, ValueError):
         return 0, 0
     return status.st_size, status.st_mtime_ns
-
-
-@contextmanager
-def _no_collection() -> Iterator[None]:
-    """Keeps the collector of cycles from looking at rows without number, none of which is in a cycle."""
-    enabled = gc.isenabled()
-    gc.disable()
-    try:
-        yield
-    finally:
-        if enabled:
-            gc.enable()
