@@ -40,10 +40,7 @@ Entities Inference::EntitiesOf(const SourceFile& file, uint32_t index) {
     // Nothing in the file binds it.
     const ModuleId own = NamesOfModule(file).stars.empty() ? kNoModule : modules_.OfFile(file.id);
     if (own != kNoModule) add_all(EntitiesInModule(own, plain));
-    if (result.found.empty()) {
-      const ModuleId builtins = modules_.Find("builtins");
-      if (builtins != kNoModule) add_all(EntitiesInModule(builtins, plain));
-    }
+    if (result.found.empty()) add_all(EntitiesOfBuiltin(plain));
     if (result.found.empty()) add(EntityOfVariable(file, variable));
     return result;
   }

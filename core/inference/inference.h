@@ -218,8 +218,11 @@ class Inference {
   Entities EntitiesInModule(ModuleId module, Text name, int depth = 0);
   // The same for one of the files that say what a module holds.
   Entities EntitiesInFile(ModuleId module, FileId file, Text name, int depth = 0);
-  // Whether the language has a name of its own.
+  // What the language has by a name, without an import.
+  Entities EntitiesOfBuiltin(Text name);
   bool IsBuiltin(Text name);
+  // Whether the stub of the builtins has a name for its own use alone.
+  static bool IsOfBuiltinsStub(Text name);
   // What an import binds, followed to where it is defined.
   Entities EntitiesOfImport(const SourceFile& file, uint32_t offset, int depth = 0);
 

@@ -333,14 +333,31 @@ FrameId Inference::FrameFor(const SourceFile& file, uint32_t scope, FrameId fram
 }
 
 bool Inference::IsBuiltin(Text name) {
+  return !EntitiesOfBuiltin(name).found.empty() || !IsNone(NewNameOfBuiltin(name));
+}
+
+bool Inference::IsOfBuiltinsStub(Text name) {
+  return (name.starts_with('_') && !name.starts_with("__")) || name == "function" || name == "ellipsis";
+}
+
+Entities Inference::EntitiesOfBuiltin(Text name) {
   const ModuleId builtins = modules_.Find("builtins");
-  return builtins != kNoModule && (!EntitiesInModule(builtins, name).found.empty() || !IsNone(NewNameOfBuiltin(name)));
+  if (builtins == kNoModule) return {};
+  if (IsOfBuiltinsStub(name)) return {};
+  if (const SourceFile* file = FileOf(FileOfModule(builtins)); file != nullptr && file->is_stub) {
+    const ModuleNames& names = NamesOfModule(*file);
+    const auto at = names.symbols.find(name);
+    const auto is_own = [file](uint32_t i) {
+      const Occurrence& occurrence = file->bindings.occurrences[i];
+      return Binds(occurrence) && occurrence.kind != NameKind::kImport;
+    };
+    if (at != names.symbols.end() && std::ranges::none_of(file->occurrences().Of(at->second), is_own)) return {};
+  }
+  return EntitiesInModule(builtins, name);
 }
 
 Value Inference::BuiltinNamed(Text name) {
-  const ModuleId builtins = modules_.Find("builtins");
-  if (builtins == kNoModule) return kUnknownValue;
-  const Entities entities = EntitiesInModule(builtins, name);
+  const Entities entities = EntitiesOfBuiltin(name);
   Value value;
   for (const Entity& entity : entities.found)
     if (entity.kind != Entity::kModule) value = types_.Union(value, ValueOfEntity(entity));

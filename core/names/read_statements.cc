@@ -71,15 +71,12 @@ void NameReader::Read(const SourceText& source, std::span<const LineRow> rows) {
   comprehensions_.clear();
   out_.occurrences.reserve(source.tokens.size() / 2);
   tokens_ = source.tokens;
+  pieces_.Begin(source);
   for (const LineRow& row : rows) {
     if (row.kind == LineKind::kBlankLine) continue;
-    if (row.first_line != row.last_line) [[unlikely]] {
-      if (const uint32_t lost = LostDefinition(row); lost < row.first_token + row.token_count) {
-        ReadPieces(row, lost);
-        continue;
-      }
-    }
-    ReadRow(row);
+    const std::span<const LineRow> pieces = pieces_.Of(row);
+    for (const LineRow& piece : pieces) ReadRow(piece);
+    if (pieces.empty()) ReadRow(row);
   }
   while (open_.size() > 1) CloseScope();
   EndOfScope(0, static_cast<uint32_t>(source.size()));
@@ -94,56 +91,6 @@ void NameReader::ReadRow(const LineRow& row) {
   if (row.kind == LineKind::kComment) return CommentRow();
   Row();
   last_end_ = OffsetOf(end_[-1]) + end_[-1].length;
-}
-
-// The blanks in front of the first token of a line, or null behind another token.
-const char* NameReader::BlanksOfLine(const Token& token) const {
-  const char* at = token.text;
-  while (at > begin_ && (at[-1] == ' ' || at[-1] == '\t' || at[-1] == '\f')) --at;
-  return at == begin_ || IsLineEnd(at[-1]) ? at : nullptr;
-}
-
-// The token of a row behind its first that begins a line with a definition: no bracket holds one, so
-// one in front of it was left open. The end of the row where there is none.
-uint32_t NameReader::LostDefinition(const LineRow& row) const {
-  const uint32_t end = row.first_token + row.token_count;
-  for (uint32_t i = row.first_token + 1; i < end; ++i) {
-    if (MarkOf(tokens_[i]) != Mark::kDefinition) continue;
-    const bool is_async = tokens_[i].code == word::kDef && tokens_[i - 1].code == word::kAsync;
-    if (is_async && i - 1 > row.first_token && BlanksOfLine(tokens_[i - 1]) != nullptr) return i - 1;
-    if (BlanksOfLine(tokens_[i]) != nullptr) return i;
-  }
-  return end;
-}
-
-// Reads a row that swallowed others: what stands in front of the definition that tells so, and from there
-// on a row for each line that begins outside of brackets or with a definition.
-void NameReader::ReadPieces(const LineRow& row, uint32_t lost) {
-  LineRow piece = row;
-  piece.token_count = lost - row.first_token;
-  ReadRow(piece);
-  piece.continues_physical_line = piece.has_inline_body = false;
-  const uint32_t end = row.first_token + row.token_count;
-  for (uint32_t first = lost; first < end;) {
-    IndentEnd(BlanksOfLine(tokens_[first]), piece.indent);
-    uint32_t last = first;  // the piece's last token
-    size_t depth = 0;
-    for (; last + 1 < end; ++last) {
-      if (IsOpeningBracket(tokens_[last].code)) ++depth;
-      if (IsClosingBracket(tokens_[last].code) && depth > 0) --depth;
-      const Token& next = tokens_[last + 1];
-      const bool may_begin = depth == 0 || next.code == word::kAsync || MarkOf(next) == Mark::kDefinition;
-      if (may_begin && tokens_[last].code != tok::BACKSLASH && BlanksOfLine(next) != nullptr) break;
-    }
-    const uint32_t lead = tokens_[first].code == word::kAsync && first < last ? first + 1 : first;
-    piece.first_token = first;
-    piece.token_count = last + 1 - first;
-    piece.kind = tokens_[lead].code == word::kDef     ? LineKind::kFunctionDef
-                 : tokens_[lead].code == word::kClass ? LineKind::kClassDef
-                                                      : FindMatchOrCaseType(tokens_, first, last + 1);
-    ReadRow(piece);
-    first = last + 1;
-  }
 }
 
 void NameReader::CloseScopes(const LineRow& row) {

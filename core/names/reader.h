@@ -17,6 +17,7 @@
 
 #include "lines/cutter.h"
 #include "lines/fstring_fields.h"
+#include "lines/row_pieces.h"
 #include "names/bindings.h"
 #include "names/symbol_table.h"
 
@@ -135,9 +136,6 @@ class NameReader {
   // ---- rows ----
   void SetMarks();
   void ReadRow(const LineRow& row);
-  void ReadPieces(const LineRow& row, uint32_t lost);
-  uint32_t LostDefinition(const LineRow& row) const;
-  const char* BlanksOfLine(const Token& token) const;
   void Row();
   void CommentRow();
   void CloseScopes(const LineRow& row);
@@ -267,6 +265,7 @@ class NameReader {
 
   const char* begin_ = nullptr;  // of the source
   TokenSpan tokens_;
+  RowPieces pieces_;
   size_t template_budget_ = 0;  // for searches that may fail
   std::vector<OpenScope> open_;
   uint32_t last_end_ = 0;  // of the last statement

@@ -1,7 +1,4 @@
 // Rows and the blocks they stand in.
-//
-// A bracket that was left open has the cutter put the lines behind it into its statement's row, up to one
-// that begins like a statement. Most lines say more by how they are indented: such a row is read in pieces.
 #include <algorithm>
 
 #include "lines/future_imports.h"
@@ -12,28 +9,6 @@
 #include "tokens/token_ends.h"
 
 namespace quillet {
-
-namespace {
-
-constexpr bool BeginsHead(TokenCode code) {
-  switch (code) {
-    case word::kAsync:
-    case word::kClass:
-    case word::kDef:
-    case word::kElif:
-    case word::kElse:
-    case word::kExcept:
-    case word::kFor:
-    case word::kIf:
-    case word::kWhile:
-    case word::kWith:
-      return true;
-    default:
-      return false;
-  }
-}
-
-}  // namespace
 
 SyntaxReader::SyntaxReader(Version version) : impl_(std::make_unique<Impl>(version)) {}
 SyntaxReader::~SyntaxReader() = default;
@@ -95,8 +70,12 @@ void SyntaxReader::Impl::Read(const SourceText& source, std::span<const LineRow>
   decorators_.clear();
   scratch_.clear();
   faults_ = 0;
+  pieces_.Begin(source);
   for (const LineRow& row : rows) {
-    if (row.kind != LineKind::kBlankLine) ReadRow(row);
+    if (row.kind == LineKind::kBlankLine) continue;
+    const std::span<const LineRow> pieces = pieces_.Of(row);
+    for (const LineRow& piece : pieces) ReadRow(piece);
+    if (pieces.empty()) ReadRow(row);
   }
   FlushDecorators();
   while (blocks_.size() > 1) CloseBlock();
@@ -108,82 +87,6 @@ void SyntaxReader::Impl::Read(const SourceText& source, std::span<const LineRow>
 // ---- rows ----
 
 void SyntaxReader::Impl::ReadRow(const LineRow& row) {
-  bool is_open = false;
-  if (row.first_line != row.last_line && MayHoldSeveral(row, is_open)) [[unlikely]]
-    return ReadPieces(row, is_open);
-  ReadPiece(row);
-}
-
-// Whether brackets are left open, or a definition stands behind the first token.
-bool SyntaxReader::Impl::MayHoldSeveral(const LineRow& row, bool& is_open) const {
-  int64_t depth = 0;
-  bool has_definition = false;
-  for (const Token& token : tokens_.subspan(row.first_token, row.token_count)) {
-    if (IsOpeningBracket(token.code)) ++depth;
-    if (IsClosingBracket(token.code) && depth > 0) --depth;
-    if ((token.code == word::kDef || token.code == word::kClass) && &token != &tokens_[row.first_token])
-      has_definition = true;
-  }
-  is_open = depth > 0;
-  return is_open || has_definition;
-}
-
-// The blanks in front of the first token of a line, or null behind another token.
-const char* SyntaxReader::Impl::BlanksOfLine(const Token& token) const {
-  const char* at = token.text;
-  while (at > begin_ && (at[-1] == ' ' || at[-1] == '\t' || at[-1] == '\f')) --at;
-  return at == begin_ || IsLineEnd(at[-1]) ? at : nullptr;
-}
-
-// The end of the piece that begins at the token `first`: in front of a line with a definition, or of one
-// outside of brackets. Where the row leaves brackets open, a line that is indented no deeper ends it too,
-// and one that begins with a statement's word, and the first line behind the colon of a head.
-size_t SyntaxReader::Impl::PieceEnd(const LineRow& row, size_t first, size_t end, bool is_open) const {
-  const bool is_head = BeginsHead(tokens_[first].code);
-  size_t depth = 0;
-  size_t braces = 0;
-  TokenCode last = tok::ENDMARKER;  // that counts
-  for (size_t i = first; i + 1 < end; ++i) {
-    const TokenCode code = tokens_[i].code;
-    if (IsOpeningBracket(code)) ++depth;
-    if (IsClosingBracket(code) && depth > 0) --depth;
-    braces += code == tok::LBRACE;
-    braces -= code == tok::RBRACE && braces > 0;
-    if (!IsSkipCode(code)) last = code;
-    const Token& next = tokens_[i + 1];
-    const char* const blanks = code != tok::BACKSLASH ? BlanksOfLine(next) : nullptr;
-    if (blanks == nullptr) continue;
-    const bool is_async = next.code == word::kAsync && i + 2 < end && tokens_[i + 2].code == word::kDef;
-    if (next.code == word::kDef || next.code == word::kClass || is_async) return i + 1;
-    if (depth == 0) return i + 1;
-    if (!is_open) continue;
-    uint32_t indent;
-    IndentEnd(blanks, indent);
-    if (OnlyBeginsStatement(next.code)) return i + 1;
-    if (indent <= row.indent ? !IsClosingBracket(next.code) : is_head && last == tok::COLON && braces == 0)
-      return i + 1;
-  }
-  return end;
-}
-
-void SyntaxReader::Impl::ReadPieces(const LineRow& row, bool is_open) {
-  const size_t end = size_t{row.first_token} + row.token_count;
-  LineRow piece = row;
-  for (size_t first = row.first_token; first < end;) {
-    if (first != row.first_token) {
-      piece.continues_physical_line = piece.has_inline_body = false;
-      IndentEnd(BlanksOfLine(tokens_[first]), piece.indent);
-      piece.first_token = static_cast<uint32_t>(first);
-    }
-    const size_t piece_end = PieceEnd(piece, first, end, is_open);
-    piece.token_count = static_cast<uint32_t>(piece_end - first);
-    if (first != row.first_token) piece.kind = FindMatchOrCaseType(tokens_, first, piece_end);
-    ReadPiece(piece);
-    first = piece_end;
-  }
-}
-
-void SyntaxReader::Impl::ReadPiece(const LineRow& row) {
   CloseBlocks(row);
   row_ = &row;
   embeds_ = !row.no_embedded;

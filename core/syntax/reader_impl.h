@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "lines/fstring_fields.h"
+#include "lines/row_pieces.h"
 #include "lines/token_search.h"
 #include "syntax/reader.h"
 
@@ -142,11 +143,6 @@ class SyntaxReader::Impl {
   // ---- rows and blocks (reader.cc) ----
   void SetMarks();
   void ReadRow(const LineRow& row);
-  bool MayHoldSeveral(const LineRow& row, bool& is_open) const;
-  size_t PieceEnd(const LineRow& row, size_t first, size_t end, bool is_open) const;
-  void ReadPieces(const LineRow& row, bool is_open);
-  const char* BlanksOfLine(const Token& token) const;
-  void ReadPiece(const LineRow& row);
   void SignatureRow(const LineRow& row);
   void Load(TokenSpan tokens, std::vector<Token>& framed);
   void CloseBlocks(const LineRow& row);
@@ -360,6 +356,7 @@ class SyntaxReader::Impl {
 
   const char* begin_ = nullptr;  // of the source
   TokenSpan tokens_;
+  RowPieces pieces_;
   FileSyntax* out_ = nullptr;
   bool has_print_statement_ = false;
   size_t search_budget_ = 0;  // for searches that may be in vain

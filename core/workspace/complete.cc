@@ -245,7 +245,12 @@ void Workspace::Impl::AddNames(const SourceFile& file, uint32_t offset, Text pre
     if (prefix.starts_with("__") && Fits(name, prefix) && seen.insert(std::string(name)).second)
       found.push_back({std::string(name), "variable", {}, {}, Certainty::kCertain});
   const ModuleId builtins = modules.Find("builtins");
-  if (builtins != kNoModule) AddModuleNames(builtins, prefix, found, false);
+  if (builtins == kNoModule) return;
+  const auto own = static_cast<ptrdiff_t>(found.size());
+  AddModuleNames(builtins, prefix, found, false);
+  found.erase(std::remove_if(found.begin() + own, found.end(),
+                             [](const Completion& name) { return Inference::IsOfBuiltinsStub(name.name); }),
+              found.end());
 }
 
 // Whether a name that is being typed is one that the place itself gives.

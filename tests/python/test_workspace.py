@@ -518,3 +518,23 @@ def test_errors_of_syntax_are_problems(
     found = workspace.problems(tmp_path / "a.py")
     assert {problem.code for problem in found} <= {"syntax"}
     assert [(*problem[:4], problem.message) for problem in found] == problems
+
+
+def test_what_the_stub_of_the_builtins_uses_is_no_builtin(tmp_path: Path) -> None:
+    pytest.importorskip("typeshed_client")
+    workspace = Workspace(tmp_path, version=(3, 12))
+    path = tmp_path / "a.py"
+    workspace.open(path, "sys\nTypeVar\n_T\nfunction\nlen\n__import__\nOSError\nfunct\n")
+    assert [problem.line for problem in workspace.problems(path)] == [1, 2, 3, 4, 8]
+    assert workspace.types(path, 1, 1) == []
+    assert workspace.definitions(path, 5, 1)[0].path.endswith("builtins.pyi")
+    assert "function" not in [item.name for item in workspace.complete(path, 8, 6)]
+
+
+def test_a_statement_behind_an_open_bracket_keeps_its_names(tmp_path: Path) -> None:
+    workspace = Workspace(tmp_path, version=(3, 12))
+    path = tmp_path / "a.py"
+    workspace.open(path, "class A:\n  def get(self, key):\n    return self.things.get(\na = A()\na.get(1)\n")
+    assert [problem.code for problem in workspace.problems(path)] == ["syntax"]
+    assert [place[1:3] for place in workspace.definitions(path, 5, 1)] == [(4, 1)]
+    assert [place[1:3] for place in workspace.definitions(path, 5, 3)] == [(2, 7)]
