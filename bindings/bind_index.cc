@@ -14,9 +14,13 @@
 #include "bindings/bindings.h"
 #include "bindings/buffer_text.h"
 #include "bindings/convert.h"
+#include "bindings/interpreter_lock.h"
+#include "bindings/signals.h"
 #include "foundations/errors.h"
+#include "foundations/stop.h"
 #include "index/answer_lines.h"
 #include "index/counts.h"
+#include "index/current_files.h"
 #include "index/name_index.h"
 #include "index/places.h"
 #include "index/question.h"
@@ -192,10 +196,28 @@ size_t CountOutside(const IndexObject& self, const Places& places) {
   return outside;
 }
 
-nb::list CandidatesIn(const IndexObject& self, const QuestionObject& question, Places& places) {
+CurrentFiles WalkRoots(nb::handle roots, bool gitignore, nb::handle exclude) {
+  std::vector<IndexRoot> walked;
+  for (nb::handle pair : nb::borrow<nb::tuple>(TupleOf(roots))) {
+    const auto texts = nb::borrow<nb::tuple>(TupleOf(pair));
+    if (texts.size() != 2) ThrowError(ErrorKind::kValueError, "a root is a path and what the index has for it");
+    walked.push_back(
+        {std::string(HostText::FromBytes(texts[0]).text()), std::string(HostText::FromBytes(texts[1]).text())});
+  }
+  const std::string patterns(HostText::FromBytes(exclude).text());
+  const Unlocked unlocked;
+  const ThreadStopQuestion signals(HandlesSignals());
+  return {walked, gitignore, patterns};
+}
+
+nb::list CandidatesIn(const IndexObject& self, const QuestionObject& question, const CurrentFiles& current,
+                      Places& places) {
   nb::list files;
-  for (const CandidateFile& file : CandidatesFor(self.index, WordsNeededBy(question.question), places))
-    files.append(FileOf(self, file.number, file.size));
+  for (const CandidateFile& file : CandidatesFor(self.index, WordsNeededBy(question.question), current, places)) {
+    files.append(file.number != CandidateFile::kUnknown
+                     ? FileOf(self, file.number, file.size)
+                     : nb::make_tuple(self.index.size(), BytesOf(file.stored), file.size, 0, 0, 0, 0, 0, nb::none()));
+  }
   return files;
 }
 
@@ -234,6 +256,14 @@ void BindIndex(nb::module_& tarvex) {
           "__init__",
           [](Places* self, nb::handle base, nb::handle roots) { new (self) Places(MakePlaces(base, roots)); },
           nb::arg("base"), nb::arg("roots"));
+  nb::class_<CurrentFiles>(host, "CurrentFiles", "The files of an index as they are now.")
+      .def(
+          "__init__",
+          [](CurrentFiles* self, nb::handle roots, bool gitignore, nb::handle exclude) {
+            new (self) CurrentFiles(WalkRoots(roots, gitignore, exclude));
+          },
+          nb::arg("roots"), nb::arg("gitignore"), nb::arg("exclude"),
+          "Walks. Roots are tuples of a path and what the index has for it, or in front of what is below it.");
   host.def(
       "HashOfSource", [](nb::handle source) { return HashOfBytes(BufferText(source).text()); }, nb::arg("source"));
   nb::dict bits;
@@ -284,8 +314,10 @@ void BindIndex(nb::module_& tarvex) {
       .def("Files", &FilesOf, "Tuples (number, path, size, time, hash, lines, records, errors, problem) by path.")
       .def("FilesIn", &FilesIn, nb::arg("places"), "The files that may be shown.")
       .def("Outside", &CountOutside, nb::arg("places"), "How many files have paths that lead elsewhere.")
-      .def("CandidatesIn", &CandidatesIn, nb::arg("question"), nb::arg("places"),
-           "The files that may answer as they are now, each with its size of now.")
+      .def(
+          "CandidatesIn", &CandidatesIn, nb::arg("question"), nb::arg("current"), nb::arg("places"),
+          "The files that may answer as they are now, each with its size of now; the number of one that the index does "
+          "not know is that of its files.")
       .def(
           "WordsOf",
           [](const IndexObject& self, size_t number) {

@@ -1,12 +1,10 @@
-// Paths are compared as texts; the disk is asked once a folder, and once a file whether it changed.
+// Paths are compared as texts; the disk is asked once a folder, and once a link.
 #include "index/places.h"
 
 #include <algorithm>
 #include <filesystem>
 
-#include "analysis/source_bytes.h"
 #include "foundations/file_status.h"
-#include "index/words.h"
 
 namespace quillet {
 
@@ -45,12 +43,6 @@ std::string Normal(Text path) {
   return {text.begin(), text.end()};
 }
 
-bool HasItsContent(const std::string& path, const FileStatus& status, const IndexedFile& file) {
-  if (status.size != file.size || !status.is_file) return false;
-  std::string bytes;
-  return ReadSourceFile(path, bytes).empty() && HashOfBytes(bytes) == file.hash;
-}
-
 }  // namespace
 
 Places::Places(std::string base, std::vector<std::string> roots) : base_(std::move(base)), roots_(std::move(roots)) {}
@@ -87,25 +79,6 @@ bool Places::IsReallyBelow(const std::string& path) {
   return !real.empty() && std::any_of(real_.begin(), real_.end(), [&](const std::string& folder) {
     return !folder.empty() && IsBelow(real, folder);
   });
-}
-
-std::vector<CandidateFile> CandidatesFor(const NameIndex& index, const WordNeeds& needs, Places& places) {
-  const std::vector<uint32_t> wanted = index.FilesFor(needs);
-  auto next_wanted = wanted.begin();
-  std::vector<CandidateFile> found;
-  for (uint32_t number = 0; number < index.size(); ++number) {
-    const bool is_wanted = next_wanted != wanted.end() && *next_wanted == number;
-    if (is_wanted) ++next_wanted;
-    const std::optional<std::string> path = places.PathOf(index[number].path);
-    if (!path) continue;
-    const std::optional<FileStatus> status = StatusOf(*path);
-    if (!status) continue;  // gone since
-    // What has its size and time is not looked at; whatever is read must lie in its place.
-    const bool has_its_time = status->size == index[number].size && status->time == index[number].time;
-    if ((!is_wanted && has_its_time) || !places.Holds(*path)) continue;
-    if (is_wanted || !HasItsContent(*path, *status, index[number])) found.push_back({number, status->size});
-  }
-  return found;
 }
 
 }  // namespace quillet

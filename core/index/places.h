@@ -1,8 +1,7 @@
-// Which files of an index may be looked at, and which of them may answer a question now.
+// Which files of an index may be looked at.
 //
 // An index may have come from anybody, so what it says of paths is only believed of its own folder and of those
-// that the caller names, with links followed to the end. A file that changed since it was indexed may answer
-// whatever the index says of it; one that is gone may not.
+// that the caller names, with links followed to the end.
 #pragma once
 
 #include <optional>
@@ -11,7 +10,6 @@
 #include <vector>
 
 #include "foundations/text.h"
-#include "index/name_index.h"
 
 namespace quillet {
 
@@ -35,14 +33,5 @@ class Places {
   std::vector<std::string> real_;                  // all of them, found at first need
   std::unordered_map<std::string, bool> folders_;  // of files, and whether they lie in one of those
 };
-
-// A file that may answer.
-struct CandidateFile {
-  uint32_t number;  // in the index
-  uint64_t size;    // now
-};
-
-// The files of an index that may answer, in their order.
-std::vector<CandidateFile> CandidatesFor(const NameIndex& index, const WordNeeds& needs, Places& places);
 
 }  // namespace quillet

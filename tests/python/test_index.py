@@ -192,6 +192,74 @@ def test_a_file_that_changed_since_is_read_as_it_is_now(tmp_path: Path) -> None:
     assert json.loads(run("stats", "--json", cwd=tmp_path).stdout)["records"] == 6
 
 
+def places(folder: Path, *arguments: str) -> list[str]:
+    return [line.rpartition(":")[0] for line in run("find", *arguments, cwd=folder).stdout.splitlines()]
+
+
+def test_a_file_that_came_since_is_found(tmp_path: Path) -> None:
+    make_index(tmp_path, b="x = 1\n", d="x = 1\n")
+    for name in ("a", "c", "e", "new/f"):
+        (tmp_path / f"{name}.py").parent.mkdir(exist_ok=True)
+        (tmp_path / f"{name}.py").write_text("y = 1\nx = 2\n")
+    (tmp_path / "script").write_text("#!/usr/bin/env python3\nx = 3\n")
+    found = ["a.py:2:1", "b.py:1:1", "c.py:2:1", "d.py:1:1", "e.py:2:1", "new/f.py:2:1", "script:2:1"]
+    assert places(tmp_path, "x") == found
+    assert places(tmp_path, "x", "--path", "new/*") == ["new/f.py:2:1"]
+    assert places(tmp_path, "x", "--exclude", "new") == [place for place in found if "new" not in place]
+    (tmp_path / "d.py").rename(tmp_path / "moved.py")
+    assert "moved.py:1:1" in places(tmp_path, "x")
+    assert "d.py:1:1" not in places(tmp_path, "x")
+    # The next run agrees.
+    before = places(tmp_path, "x")
+    assert run("index", "-q", cwd=tmp_path).returncode == 0
+    assert places(tmp_path, "x") == before
+
+
+def test_what_is_ignored_by_now_is_not_found(tmp_path: Path) -> None:
+    (tmp_path / ".git").mkdir()
+    for folder in ("kept", "built", "made"):
+        (tmp_path / folder).mkdir()
+        (tmp_path / folder / "a.py").write_text("x = 1\n")
+    assert run("index", ".", "-q", "--exclude", "made", cwd=tmp_path).returncode == 0
+    assert places(tmp_path, "x") == ["built/a.py:1:1", "kept/a.py:1:1"]
+    (tmp_path / ".gitignore").write_text("built\n")
+    (tmp_path / "made" / "b.py").write_text("x = 1\n")
+    assert places(tmp_path, "x") == ["kept/a.py:1:1"]
+    assert run("index", "--no-gitignore", "-q", cwd=tmp_path).returncode == 0
+    assert places(tmp_path, "x") == ["built/a.py:1:1", "kept/a.py:1:1"]
+
+
+def test_only_what_was_indexed_is_looked_at_for_new_files(tmp_path: Path) -> None:
+    for name in ("src/a.py", "lib/a.py", "lib/one.py", "ignored.py"):
+        (tmp_path / name).parent.mkdir(exist_ok=True)
+        (tmp_path / name).write_text("x = 1\n")
+    (tmp_path / ".git").mkdir()
+    (tmp_path / ".gitignore").write_text("ignored.py\n")
+    assert run("index", "src", "lib/one.py", "ignored.py", "-q", cwd=tmp_path).returncode == 0
+    (tmp_path / "src" / "b.py").write_text("x = 1\n")
+    (tmp_path / "lib" / "b.py").write_text("x = 1\n")
+    assert places(tmp_path, "x") == ["ignored.py:1:1", "lib/one.py:1:1", "src/a.py:1:1", "src/b.py:1:1"]
+    (tmp_path / "lib" / "one.py").unlink()
+    assert places(tmp_path / "lib", "x") == [
+        f"{tmp_path}/{name}" for name in ("ignored.py:1:1", "src/a.py:1:1", "src/b.py:1:1")
+    ]
+
+
+def test_new_files_outside_are_found_where_their_folder_is_named(tmp_path: Path) -> None:
+    inside, outside = tmp_path / "in", tmp_path / "out"
+    inside.mkdir()
+    outside.mkdir()
+    (inside / "a.py").write_text("x = 1\n")
+    (outside / "a.py").write_text("x = 1\n")
+    assert run("index", ".", "../out", "-q", cwd=inside).returncode == 0
+    (outside / "b.py").write_text("x = 1\n")
+    (tmp_path / "c.py").write_text("x = 1\n")
+    (inside / "link.py").symlink_to(tmp_path / "c.py")
+    assert places(inside, "x") == ["a.py:1:1"]
+    for root in ("../out", ".."):
+        assert places(inside, "x", "--root", root) == [f"{outside}/a.py:1:1", f"{outside}/b.py:1:1", "a.py:1:1"]
+
+
 def test_asking_leaves_everything_as_it_is(tmp_path: Path) -> None:
     make_index(tmp_path, shop=SHOP)
     index_path(tmp_path).chmod(0o444)

@@ -11,6 +11,8 @@ import stat
 from collections.abc import Iterable, Iterator, Sequence
 from typing import NamedTuple
 
+from quillet.index.paths import pattern_lines
+
 _PIECE = 1 << 20
 # How a device is opened to be looked at, as far as the system has such flags.
 _QUIETLY = getattr(os, "O_NONBLOCK", 0) | getattr(os, "O_NOCTTY", 0) | getattr(os, "O_CLOEXEC", 0)
@@ -53,7 +55,7 @@ def walk(
     from quillet.tarvex import _host
 
     arguments = [os.fsencode(path) for path in paths]
-    for file in _host.FindFiles(arguments, gitignore, _lines_of(exclude)):
+    for file in _host.FindFiles(arguments, gitignore, pattern_lines(exclude)):
         if file[3] == 0 and file[1] is None and file[0] != b"-":
             file = Walked(*file)._replace(problem=device_problem(paths[file[2]]))
         yield file
@@ -67,7 +69,7 @@ class Exclusion:
     def __init__(self, patterns: Iterable[str]) -> None:
         from quillet.tarvex import _host
 
-        self._rules = _host.IgnoreRules(_lines_of(patterns))
+        self._rules = _host.IgnoreRules(pattern_lines(patterns))
         self._folders: dict[bytes, bool] = {}
 
     def excludes(self, path: bytes) -> bool:
@@ -78,12 +80,6 @@ class Exclusion:
             ends = (match.start() for match in re.finditer(rb"/", path))
             known = self._folders[folder] = any(self._rules.Verdict(path[:end], True) for end in ends)
         return known or self._rules.Verdict(path, False) is True
-
-
-def _lines_of(patterns: Iterable[str]) -> bytes:
-    """Patterns as the text of a .gitignore file; one is never a comment."""
-    lines = [f"\\{pattern}" if pattern.startswith("#") else pattern for pattern in patterns]
-    return b"\n".join(map(os.fsencode, lines))
 
 
 def read_file(path: str) -> bytes:

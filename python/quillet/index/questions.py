@@ -1,9 +1,9 @@
 """Asks for names: where is one set, read, called, imported, and what does a function return.
 
-Answers are found by analysing files as they are now. An index only says which files may hold one; a file
-that changed since it was made is analysed whatever it says. So an answer is never of yesterday, and never
-of a file that the index should not know of: what lies outside its folder is left out unless the caller
-names the folder.
+Answers are found by analysing files as they are now. An index only says which files may hold one; a file that came
+or changed since it was made is analysed whatever it says, and one that is gone or ignored by now is not. So an answer
+is never of yesterday, and never of a file that the index should not know of: what lies outside its folder is left out
+unless the caller names the folder.
 
 Little is loaded here (no typing, no collections), since a question that one types has to be answered before
 one notices.
@@ -213,9 +213,11 @@ class Index(Sources):
         stored = read_index(path)
         super().__init__(os.path.dirname(self.path), stored.settings.python)
         self._native = stored.native
-        named = tuple(os.fsencode(os.path.abspath(root)) for root in roots)
-        self._places = _host.Places(os.fsencode(self.base), named)
+        self._settings = stored.settings
+        self._named = [os.path.abspath(root) for root in roots]
+        self._places = _host.Places(os.fsencode(self.base), tuple(map(os.fsencode, self._named)))
         self._exclude = exclude
+        self._walked: _host.CurrentFiles | None = None
 
     def __enter__(self) -> Index:
         return self
@@ -235,13 +237,27 @@ class Index(Sources):
         return self._native.Outside(self._places)
 
     def candidates(self, question: _host.Question, /) -> Sequence[tuple[Any, ...]]:
-        found: Sequence[tuple[Any, ...]] = self._native.CandidatesIn(question, self._places)
+        found: Sequence[tuple[Any, ...]] = self._native.CandidatesIn(question, self._current(), self._places)
         if self._exclude:
             from quillet.cli.files import Exclusion
 
             exclusion = Exclusion(self._exclude)
             found = [row for row in found if not exclusion.excludes(row[_PATH].lstrip(b"/"))]
         return found
+
+    def _current(self) -> _host.CurrentFiles:
+        """The files of the roots that may be shown, as they are at the first question."""
+        if self._walked is None:
+            from quillet.index.paths import is_below, pattern_lines, prefix_of, stored_path, trusted_roots
+
+            inside, outside = trusted_roots(self._settings.roots, self.base)
+            roots = [*inside, *(path for path in outside if any(is_below(path, root) for root in self._named))]
+            stored = [
+                prefix_of(path, self.base) if os.path.isdir(path) else stored_path(path, self.base) for path in roots
+            ]
+            pairs = list(zip(map(os.fsencode, roots), stored, strict=True))
+            self._walked = _host.CurrentFiles(pairs, self._settings.gitignore, pattern_lines(self._settings.exclude))
+        return self._walked
 
     def words_alike(self, word: str, /) -> list[str]:
         return self._native.WordsAlike(word)

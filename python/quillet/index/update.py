@@ -18,7 +18,7 @@ from typing import Any, NamedTuple
 from quillet._languages import available_cores, decode_source, native_language_of
 from quillet.cli.files import problem_of, walk
 from quillet.index.git import keep_out_of_git
-from quillet.index.paths import full_path, is_below, stored_path
+from quillet.index.paths import full_path, is_below, prefix_of, stored_path, trusted_roots
 from quillet.index.store import IndexProblem, StaleIndex, Stored, read_index, settings_text
 from quillet.index.store import Settings as StoredSettings
 from quillet.index.writing import check_place, engine_mark, write_index, write_lock
@@ -89,21 +89,8 @@ def watched_files(index: str, settings: Settings) -> Watched:
     """What a run with these settings looks at."""
     base = os.path.dirname(os.path.abspath(index))
     remembered = read_index(index).settings
-    paths = settings.paths or _trusted_roots(remembered.roots, base)[0]
+    paths = settings.paths or trusted_roots(remembered.roots, base)[0]
     return Watched(paths, remembered.gitignore, remembered.exclude)
-
-
-def _trusted_roots(stored: tuple[str, ...], base: str) -> tuple[tuple[str, ...], tuple[str, ...]]:
-    """The roots that an index names, apart into those of its own folder and others, which may be anybody's."""
-    paths = [full_path(os.fsencode(root), base) for root in stored]
-    inside = tuple(path for path in paths if is_below(os.path.realpath(path), os.path.realpath(base)))
-    return inside, tuple(path for path in paths if path not in inside)
-
-
-def _prefix_of(folder: str, base: str) -> bytes:
-    """What stands in front of the paths below a folder, as the index keeps them."""
-    stored = stored_path(folder, base)
-    return b"" if stored == b"." else stored.rstrip(b"/") + b"/"
 
 
 class _Run:
@@ -117,7 +104,7 @@ class _Run:
 
         if remembered is None and not settings.paths:
             raise IndexProblem("nothing was indexed yet; name what to index: quillet index PATH...")
-        inside, outside = _trusted_roots(remembered.roots, self._base) if remembered else ((), ())
+        inside, outside = trusted_roots(remembered.roots, self._base) if remembered else ((), ())
         for root in outside if not settings.paths else ():
             reports.note(f"{root}: lies outside the index's folder; name it to bring it up to date")
         self._paths = settings.paths or inside
@@ -198,7 +185,7 @@ class _Run:
 
     def _candidates(self) -> Iterator[_Candidate]:
         """The files that are there."""
-        prefixes = [_prefix_of(path, self._base) for path in self._paths]
+        prefixes = [prefix_of(path, self._base) for path in self._paths]
         seen: set[bytes] = set()
         now = time.time_ns()
         walked = walk(self._paths, gitignore=bool(self._gitignore), exclude=self._exclude)
