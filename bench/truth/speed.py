@@ -161,10 +161,11 @@ class Questions(NamedTuple):
     keystroke: Place
 
 
-def Choose(folder: Path, symbol: str | None, seed: int) -> Questions:
-    """The questions of a project. Without `symbol` (FILE:NAME), the function that most is asked of."""
+def Choose(folder: Path, symbol: str | None, seed: int, within: str = "") -> Questions:
+    """The questions of a project, or of a folder `within` it: of copies side by side all are asked of one, as in all of
+    them no name is defined once. Without `symbol` (FILE:NAME), the function that most is asked of."""
     pick = random.Random(seed)
-    files = SourceFiles(folder)
+    files = SourceFiles(folder / within)
     names = {path: list(Names(path)) for path in files}
     defined: Counter[str] = Counter()
     used: Counter[str] = Counter()
@@ -268,8 +269,9 @@ def _Spread(seconds: list[float]) -> str:
     return f"{statistics.median(ordered) * 1000:.1f} / {high * 1000:.1f} ms"
 
 
-def Copies(project: Path, count: int, into: Path) -> None:
-    """Puts renamed copies of a project's package side by side: `sympy` becomes `sympy1`, `sympy2` and so on."""
+def Copies(project: Path, count: int, into: Path) -> str:
+    """Puts renamed copies of a project's package side by side: `sympy` becomes `sympy1`, `sympy2` and so on. Gives the
+    name of the first."""
     package = max((path.parent for path in project.glob("*/__init__.py")), key=lambda path: len(SourceFiles(path)))
     word = re.compile(rf"\b{re.escape(package.name)}\b")
     for number in range(1, count + 1):
@@ -278,12 +280,13 @@ def Copies(project: Path, count: int, into: Path) -> None:
         for path in SourceFiles(into / name):
             text = path.read_bytes().decode("utf-8", "surrogateescape")
             path.write_bytes(word.sub(name, text).encode("utf-8", "surrogateescape"))
+    return f"{package.name}1"
 
 
 def AddTo(commands: argparse._SubParsersAction[argparse.ArgumentParser]) -> None:
     parser = commands.add_parser("speed", help="what answers cost", description=__doc__)
     parser.add_argument("--project", type=Path, required=True, metavar="FOLDER", help=f"a project: {HOW_TO_GET}")
-    parser.add_argument("--symbol", metavar="FILE:NAME", help="whose references are asked; of copies the file in one")
+    parser.add_argument("--symbol", metavar="FILE:NAME", help="whose references are asked; of copies that of the first")
     parser.add_argument("--copies", type=int, default=0, help="ask in so many renamed copies of the project's package")
     parser.add_argument("--all-cores", action="store_true")
     parser.add_argument("--without", action="store_true", help="measure the servers alone")
@@ -294,12 +297,12 @@ def AddTo(commands: argparse._SubParsersAction[argparse.ArgumentParser]) -> None
 
 def Run(options: argparse.Namespace) -> int:
     with tempfile.TemporaryDirectory() as name:
-        folder = options.project.resolve()
+        folder, within = options.project.resolve(), ""
         if options.copies:
-            Copies(folder, options.copies, Path(name))
+            within = Copies(folder, options.copies, Path(name))
             folder = Path(name).resolve()
         lines = sum(len(Cut(ReadText(path))) for path in SourceFiles(folder))
-        questions = Choose(folder, options.symbol, options.seed)
+        questions = Choose(folder, options.symbol, options.seed, within)
         symbol = Path(questions.symbol.path).relative_to(folder)
         print(f"{options.project.name}, {lines:,} lines; the symbol is at {symbol}:{questions.symbol.line}", flush=True)
         one_core = not options.all_cores
