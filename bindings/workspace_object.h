@@ -33,11 +33,18 @@ class WorkspaceObject {
     const Asking asking(*this);
     const ThreadStopQuestion signals(HandlesSignals());
     const ThreadStopQuestion stop([this] { CheckStop(); });
-    try {
-      return ask(*workspace_);
-    } catch (...) {
-      workspace_->Recover();
-      throw;
+    for (int tries = 1;; ++tries) {
+      try {
+        if (tries > 1) workspace_->Refresh();
+        return ask(*workspace_);
+      } catch (const SourceChanged&) {
+        // Asked again of the files as they are; where one changes all the time it is given up.
+        workspace_->Recover();
+        if (tries == kMostTries) throw;
+      } catch (...) {
+        workspace_->Recover();
+        throw;
+      }
     }
   }
 
@@ -55,6 +62,8 @@ class WorkspaceObject {
     Asking& operator=(const Asking&) = delete;
     WorkspaceObject& of;
   };
+
+  static constexpr int kMostTries = 4;
 
   void CheckNotAsking() const;
   void CheckStop() const;

@@ -223,7 +223,7 @@ Value Inference::Bound(Value value, TypeId receiver, bool on_class, ClassId owne
         bound = types_.Union(bound, Bound({types_.ArgOf(id, 0), 0}, itself(), false, owner));
         continue;
       }
-      const bool may_be_descriptor = classes_[t.a].file != classes_[property].file;
+      const bool may_be_descriptor = property == kNoId || classes_[t.a].file != classes_[property].file;
       if (may_be_descriptor && FindMember(t.a, "__get__")) {
         bound = types_.Union(
             bound, CallMethod(Just(id), "__get__", {on_class ? NoneValue() : Just(receiver), Just(itself())}));

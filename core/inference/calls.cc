@@ -714,8 +714,7 @@ Value Inference::ResultOfSpecialCall(TypeId callee, std::vector<Argument>& argum
     for (const TypeId id : types_.CopyOf(at(1).set)) {
       const Text literal = LiteralOf(types_[id]);
       if (literal.size() > 2 && (literal.front() == '\'' || literal.front() == '"'))
-        value = types_.Union(
-            value, AttributeOf(at(0), Text(*owned_names_[NumberOfName(literal.substr(1, literal.size() - 2))])));
+        value = types_.Union(value, AttributeOf(at(0), Kept(literal.substr(1, literal.size() - 2))));
     }
     if (arguments.size() > 2) value = types_.Union(value, at(2));
     return value.IsKnown() ? answer(value) : Value{};

@@ -238,7 +238,7 @@ void Inference::FindMembers(ClassId cls) {
     for (const uint32_t i : file->occurrences().Of(symbol)) {
       const Occurrence& occurrence = bindings.occurrences[i];
       if (occurrence.kind == NameKind::kNone) continue;
-      info.symbols.emplace(bindings.TextOf(occurrence), symbol);  // as spelled: attributes are not mangled
+      info.symbols.emplace(Kept(bindings.TextOf(occurrence)), symbol);  // as spelled: attributes are not mangled
       break;
     }
   }
@@ -256,7 +256,7 @@ void Inference::FindMembers(ClassId cls) {
       const Text hint = stmt.hint == kNoExpr ? Text() : syntax.TextOf(syntax[stmt.hint]);
       if (hint.starts_with("ClassVar") || hint.starts_with("typing.ClassVar")) continue;
       info.fields.push_back(
-          {syntax.NameOf(exprs[0]), syntax[exprs[0]].begin, stmt.hint, exprs.size() > 1 ? exprs[1] : kNoExpr});
+          {Kept(syntax.NameOf(exprs[0])), syntax[exprs[0]].begin, stmt.hint, exprs.size() > 1 ? exprs[1] : kNoExpr});
       continue;
     }
     if (stmt.kind != StmtKind::kDef) continue;
@@ -275,7 +275,7 @@ void Inference::FindMembers(ClassId cls) {
       const Occurrence& attribute = bindings.occurrences[next];
       if (!attribute.is_attribute || bindings.ReceiverOf(next) != i) continue;
       if (attribute.role != NameRole::kWrite && attribute.role != NameRole::kDefinition) continue;
-      const Text name = bindings.TextOf(attribute);
+      const Text name = Kept(bindings.TextOf(attribute));
       info.self_attributes[name].push_back(attribute.begin);
       if ((functions_[function].flags & (kIsClassMethod | kIsStatic)) != 0) info.class_written.insert(name);
     }
@@ -325,7 +325,8 @@ ClassId Inference::MadeClass(const SourceFile& file, ExprId call, Text kind) {
   };
   const auto arguments = syntax.ChildrenOf(call).subspan(1);
   uint32_t begin = 0;
-  if (!arguments.empty() && syntax[arguments[0]].kind == ExprKind::kString) info.name = inner(arguments[0], begin);
+  if (!arguments.empty() && syntax[arguments[0]].kind == ExprKind::kString)
+    info.name = Kept(inner(arguments[0], begin));
   const auto add_words = [&](ExprId string) {
     uint32_t start = 0;
     const Text text = inner(string, start);
@@ -338,7 +339,8 @@ ClassId Inference::MadeClass(const SourceFile& file, ExprId call, Text kind) {
              text[i] != '\\')
         ++i;
       if (i > first)
-        info.fields.push_back({text.substr(first, i - first), start + static_cast<uint32_t>(first), kNoExpr, kNoExpr});
+        info.fields.push_back(
+            {Kept(text.substr(first, i - first)), start + static_cast<uint32_t>(first), kNoExpr, kNoExpr});
     }
   };
   const bool has_hints = kind == "NamedTuple" || kind == "TypedDict";
@@ -351,17 +353,17 @@ ClassId Inference::MadeClass(const SourceFile& file, ExprId call, Text kind) {
       const auto items = syntax.ChildrenOf(fields);
       for (size_t i = 0; i + 1 < items.size(); i += 2) {
         if (items[i] == kNoExpr || syntax[items[i]].kind != ExprKind::kString) continue;
-        const Text name = inner(items[i], begin);
+        const Text name = Kept(inner(items[i], begin));
         info.fields.push_back({name, begin, has_hints ? items[i + 1] : kNoExpr, has_hints ? kNoExpr : items[i + 1]});
       }
     } else if (syntax[fields].kind == ExprKind::kList || syntax[fields].kind == ExprKind::kTuple) {
       for (const ExprId item : syntax.ChildrenOf(fields)) {
         if (syntax[item].kind == ExprKind::kString) {
-          const Text name = inner(item, begin);
+          const Text name = Kept(inner(item, begin));
           info.fields.push_back({name, begin, kNoExpr, kNoExpr});
         } else if (syntax[item].kind == ExprKind::kTuple && syntax[item].children_count >= 2 &&
                    syntax[syntax.ChildOf(item, 0)].kind == ExprKind::kString) {
-          const Text name = inner(syntax.ChildOf(item, 0), begin);
+          const Text name = Kept(inner(syntax.ChildOf(item, 0), begin));
           const ExprId second = syntax.ChildOf(item, 1);
           info.fields.push_back({name, begin, has_hints ? second : kNoExpr, has_hints ? kNoExpr : second});
         }

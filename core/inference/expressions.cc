@@ -459,7 +459,7 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
       }
       ClassInfo& info = InfoOf(t.a);
       if (info.is_typed_dict && !IsNone(literal_key)) {
-        const Value field = AttributeOfType(id, Text(*owned_names_[NumberOfName(unquoted(literal_key))]));
+        const Value field = AttributeOfType(id, Kept(unquoted(literal_key)));
         if (field.IsKnown()) {
           value = types_.Union(value, field);
           continue;

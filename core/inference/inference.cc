@@ -14,7 +14,6 @@ void Inference::Clear() {
   functions_.clear();
   frames_.assign(1, Frame());
   names_.clear();
-  owned_names_.clear();
   numbers_of_names_.clear();
   literals_.clear();
   numbers_of_literals_.clear();
@@ -30,17 +29,33 @@ void Inference::Clear() {
   module_names_.clear();
   guesses_.clear();
   imports_of_foreign_.clear();
+  kept_.clear();
+  texts_ = TextArena();
   depth_ = 0;
   guess_depth_ = 0;
   shallowest_cycle_ = INT32_MAX;
 }
 
+size_t Inference::ByteSize() const {
+  static constexpr size_t kBytesOfANode = 56;  // of a map of small values, with its memory's head
+  const size_t nodes = values_.size() + bindings_.size() + results_.size() + hints_.size() + guesses_.size() +
+                       classes_by_place_.size() + functions_by_place_.size() + 3 * frames_by_hash_.size();
+  static constexpr size_t kBytesOfAClass = 4096;  // with its members
+  return nodes * kBytesOfANode + frames_.size() * 4 * sizeof(Frame) + functions_.size() * sizeof(FunctionInfo) +
+         classes_.size() * kBytesOfAClass + types_.ByteSize() + texts_.byte_size();
+}
+
+Text Inference::Kept(Text text) {
+  if (text.empty()) return Text("");
+  if (const auto known = kept_.find(text); known != kept_.end()) return *known;
+  return *kept_.insert(texts_.Copy(text)).first;
+}
+
 uint32_t Inference::NumberOfName(Text name) {
   const auto known = numbers_of_names_.find(name);
   if (known != numbers_of_names_.end()) return known->second;
-  owned_names_.push_back(std::make_unique<std::string>(name));
   const auto number = static_cast<uint32_t>(names_.size());
-  names_.push_back(*owned_names_.back());
+  names_.push_back(Kept(name));
   numbers_of_names_.emplace(names_.back(), number);
   return number;
 }
@@ -68,7 +83,7 @@ ClassId Inference::ClassOfStmt(FileId file, StmtId stmt) {
     info.file = file;
     info.stmt = stmt;
     info.scope = source->ScopeOfStmt(stmt);
-    info.name = source->syntax.NameOf(source->syntax.stmt(stmt));
+    info.name = Kept(source->syntax.NameOf(source->syntax.stmt(stmt)));
   }
   return at->second;
 }

@@ -6,6 +6,9 @@
 // what it was called with matters, its statements are evaluated again in a frame, which says what its parameters
 // are. Work is bounded: by steps a question, by depth, by frames. Beyond a bound the answer is open.
 //
+// What is remembered holds numbers and texts of its own, no view of a source: files may be given back (Files::Trim)
+// between questions, as long as none is being answered.
+//
 // The parts: flow.cc (which assignments reach a place), narrowing.cc (what a condition says), variables.cc (what a
 // name was given), classes.cc (bases, order, members), attributes.cc (what stands behind a dot), functions.cc
 // (parameters and results), calls.cc, annotations.cc, expressions.cc, entities.cc (what a name stands for).
@@ -22,6 +25,7 @@
 #include <unordered_set>
 #include <vector>
 
+#include "foundations/arena.h"
 #include "foundations/text.h"
 #include "inference/types.h"
 #include "program/files.h"
@@ -177,6 +181,8 @@ class Inference {
   // Begins a question: steps are counted anew.
   void Begin() { steps_ = kMaxSteps; }
   bool IsExhausted() const { return steps_ == 0; }
+  // Of what is remembered, roughly.
+  size_t ByteSize() const;
   void set_callers(CallerSource* callers) { callers_ = callers; }
 
   // ---- values ----
@@ -268,7 +274,7 @@ class Inference {
   ExprId HintOfParameter(const SourceFile& file, const FunctionInfo& info, size_t index);
 
  private:
-  static constexpr uint32_t kMaxSteps = 120'000;
+  static constexpr uint32_t kMaxSteps = 10'000;
   static constexpr int kMaxDepth = 150;
   static constexpr size_t kMaxFrames = 20'000;
   static constexpr int kMaxFrameDepth = 10;
@@ -317,6 +323,8 @@ class Inference {
   Value WithoutLiterals(Value value);
   Value CallMethod(Value receiver, Text name, std::initializer_list<Value> arguments, bool* has_method = nullptr);
   uint32_t LiteralNumber(Text text);
+  // A copy of a source's text, for what is remembered.
+  Text Kept(Text text);
   // What a display that a value came from, or the keywords of a call, have for each key: name, value.
   std::vector<std::pair<Text, Value>> EntriesOf(TypeId dict);
   Value LiteralValue(Text cls, Text text);
@@ -413,7 +421,6 @@ class Inference {
   std::vector<Text> names_;
   std::deque<std::string> literals_;
   std::unordered_map<Text, uint32_t> numbers_of_names_;
-  std::vector<std::unique_ptr<std::string>> owned_names_;
   std::unordered_map<std::string, uint32_t> numbers_of_literals_;
   std::unordered_map<uint64_t, ClassId> classes_by_place_;
   std::unordered_map<uint64_t, FunctionId> functions_by_place_;
@@ -427,6 +434,8 @@ class Inference {
   std::unordered_map<FileId, ModuleNames> module_names_;
   std::unordered_map<uint64_t, Value> guesses_;
   std::unordered_map<uint32_t, Binding> imports_of_foreign_;  // by the number of the name
+  TextArena texts_;
+  std::unordered_set<Text> kept_;  // of texts_
   uint32_t steps_ = kMaxSteps;
   int depth_ = 0;
   int shallowest_cycle_ = INT32_MAX;  // the depth of what is being found that was met again

@@ -86,6 +86,12 @@ class TypeTable {
   Value Union(Value a, Value b);
 
   size_t size() const { return types_.size(); }
+  // Roughly.
+  size_t ByteSize() const {
+    static constexpr size_t kBytesOfANode = 48;
+    return types_.size() * (sizeof(Type) + kBytesOfANode) + sets_.size() * (sizeof(Set) + kBytesOfANode) +
+           (args_.size() + members_.size()) * sizeof(uint32_t) + unions_.size() * kBytesOfANode;
+  }
   void Clear();
 
  private:

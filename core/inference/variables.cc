@@ -137,7 +137,7 @@ const Inference::ModuleNames& Inference::NamesOfModule(const SourceFile& file) {
   for (uint32_t symbol = bindings.scopes[0].first_symbol; symbol != kNoIndex; symbol = bindings.symbols[symbol].next) {
     const auto indices = file.occurrences().Of(symbol);
     if (std::ranges::any_of(indices, [&](uint32_t i) { return Binds(bindings.occurrences[i]); }))
-      names.symbols.emplace(bindings.texts[bindings.symbols[symbol].name], symbol);
+      names.symbols.emplace(Kept(bindings.texts[bindings.symbols[symbol].name]), symbol);
   }
   const FileSyntax& syntax = file.syntax;
   const std::function<void(ExprId)> add_all = [&](ExprId list) {
@@ -162,7 +162,7 @@ const Inference::ModuleNames& Inference::NamesOfModule(const SourceFile& file) {
       if (syntax[item].kind != ExprKind::kString) continue;
       Text text = syntax.TextOf(syntax[item]);
       while (!text.empty() && text.front() != '\'' && text.front() != '"') text.remove_prefix(1);
-      if (text.size() >= 2) names.all.push_back(text.substr(1, text.size() - 2));
+      if (text.size() >= 2) names.all.push_back(Kept(text.substr(1, text.size() - 2)));
     }
   };
   for (StmtId id = 1; id < syntax.stmts.size(); ++id) {

@@ -42,6 +42,16 @@ void DecodeSource(std::string& bytes) {
   bytes = std::move(utf8);
 }
 
+// Where the lines of a source begin, as SourceText has it.
+void FindLines(Text source, std::vector<uint32_t>& lines) {
+  static constexpr Text kMark = "\xEF\xBB\xBF";
+  lines.push_back(source.starts_with(kMark) ? static_cast<uint32_t>(kMark.size()) : 0);
+  for (size_t at = source.find_first_of("\n\r"); at != Text::npos; at = source.find_first_of("\n\r", at + 1)) {
+    if (source[at] == '\r' && source.substr(at + 1).starts_with('\n')) ++at;
+    lines.push_back(static_cast<uint32_t>(at + 1));
+  }
+}
+
 // Reads what a stamp was taken of, decoded; false where that cannot be.
 bool ReadDecoded(const std::string& path, const FileStamp& stamp, std::string& bytes) {
   if (!stamp.is_file() || stamp.size > Files::kMaxSourceSize || !ReadSourceFile(path, bytes).empty()) return false;
@@ -125,15 +135,37 @@ class Files::Impl {
     return memory;
   }
 
+  // One file's lines are kept: places are mostly asked in the order of files.
+  Position PlaceOf(FileId file, uint32_t offset) {
+    Entry& entry = entries_[file];
+    if (entry.file != nullptr) return entry.file->PlaceOf(offset);
+    if (lines_of_ != file) {
+      std::string memory;
+      const Text source = SourceOf(file, memory);
+      if (entry.is_given_back && !IsSame(entry, source)) ThrowChanged(entry);
+      lines_.clear();
+      FindLines(source, lines_);
+      lines_of_ = file;
+    }
+    const auto next = std::ranges::upper_bound(lines_, offset);
+    if (next == lines_.begin()) return {1, 1};
+    return {static_cast<int32_t>(next - lines_.begin()), static_cast<int32_t>(offset - *(next - 1)) + 1};
+  }
+
   bool Refresh() {
     bool has_changed = false;
+    lines_of_ = kNoFile;
     for (Entry& entry : entries_) {
       if (entry.buffer || !entry.stamp) continue;
       const FileStamp stamp = StampOf(entry.path);
       if (stamp == *entry.stamp) continue;
+      const bool is_known = entry.file != nullptr || entry.is_given_back;
       entry.stamp = stamp;
       // One that was only written anew is the same.
-      if (entry.file != nullptr && ReadDecoded(entry.path, stamp, memory_) && memory_ == entry.file->text()) continue;
+      if (is_known && ReadDecoded(entry.path, stamp, memory_) && IsSame(entry, memory_)) {
+        entry.is_unreadable = false;
+        continue;
+      }
       Drop(entry);
       has_changed = true;
     }
@@ -142,6 +174,7 @@ class Files::Impl {
 
   void Open(FileId file, std::string text) {
     Entry& entry = entries_[file];
+    lines_of_ = kNoFile;
     text.resize(std::min(text.size(), SourceText::kMaxSize));
     if (!entry.buffer) buffers_.push_back(file);
     entry.buffer = std::move(text);
@@ -159,6 +192,7 @@ class Files::Impl {
     const size_t to = std::clamp<size_t>(end, from, buffer.size());
     buffer.replace(from, to - from, text);
     buffer.resize(std::min(buffer.size(), SourceText::kMaxSize));
+    lines_of_ = kNoFile;
     Drop(entry);
   }
 
@@ -166,10 +200,11 @@ class Files::Impl {
     Entry& entry = entries_[file];
     if (!entry.buffer) return;
     std::erase(buffers_, file);
+    lines_of_ = kNoFile;
     entry.buffer.reset();
     entry.stamp.reset();
     if (entry.file == nullptr) {
-      entry.is_unreadable = false;
+      Drop(entry);
     } else if (!ReadDecoded(entry.path, StampOfEntry(entry), memory_) || memory_ != entry.file->text()) {
       Drop(entry);
     }
@@ -184,9 +219,14 @@ class Files::Impl {
     std::sort(held.begin(), held.end(), [](const Entry* a, const Entry* b) { return a->asked < b->asked; });
     for (Entry* entry : held) {
       if (held_ <= bytes) break;
-      Drop(*entry);
+      GiveBack(*entry);
     }
   }
+
+  void GiveBack(FileId file) {
+    if (IsHeld(file) && !IsOpen(file)) GiveBack(entries_[file]);
+  }
+  bool IsHeld(FileId file) const { return entries_[file].file != nullptr; }
 
  private:
   struct Entry {
@@ -195,6 +235,8 @@ class Files::Impl {
     size_t byte_size = 0;  // of it
     uint64_t asked = 0;    // when it was asked for last
     bool is_unreadable = false;
+    bool is_given_back = false;      // it was held, and may be asked for again
+    uint64_t digest = 0;             // of what was
     std::optional<FileStamp> stamp;  // of what was read, or looked for
     std::optional<std::string> buffer;
   };
@@ -208,6 +250,26 @@ class Files::Impl {
     entry.file.reset();
     held_ -= std::exchange(entry.byte_size, 0);
     entry.is_unreadable = false;
+    entry.is_given_back = false;
+  }
+
+  void GiveBack(Entry& entry) {
+    const uint64_t digest = DigestOf(entry.file->text());
+    Drop(entry);
+    entry.digest = digest;
+    entry.is_given_back = true;
+  }
+
+  [[noreturn]] static void ThrowChanged(Entry& entry) {
+    entry.stamp = FileStamp{.kind = FileStamp::Kind::kUnsettled};  // so that Refresh looks at it
+    throw SourceChanged();
+  }
+
+  static uint64_t DigestOf(Text text) { return std::hash<Text>()(text); }
+
+  // Whether a source is what was held of it.
+  static bool IsSame(const Entry& entry, Text text) {
+    return entry.file != nullptr ? text == entry.file->text() : DigestOf(text) == entry.digest;
   }
 
   void Read(FileId number, Entry& entry) {
@@ -216,8 +278,14 @@ class Files::Impl {
       text = *entry.buffer;
     } else {
       // Before it is read: what is written in between is noticed later.
-      entry.stamp = StampOf(entry.path);
-      entry.is_unreadable = !ReadDecoded(entry.path, *entry.stamp, memory_);
+      const FileStamp stamp = StampOf(entry.path);
+      entry.is_unreadable = !ReadDecoded(entry.path, stamp, memory_);
+      if (entry.is_given_back && (entry.is_unreadable || !IsSame(entry, memory_))) {
+        entry.is_unreadable = false;
+        ThrowChanged(entry);
+      }
+      entry.is_given_back = false;
+      entry.stamp = stamp;
       if (entry.is_unreadable) return;
       text = memory_;
     }
@@ -247,6 +315,8 @@ class Files::Impl {
   std::optional<SourceReader> reader_;
   std::optional<SourceReader> stub_reader_;
   std::string memory_;
+  FileId lines_of_ = kNoFile;
+  std::vector<uint32_t> lines_;  // where they begin
   size_t held_ = 0;
   uint64_t asked_ = 0;
 };
@@ -260,6 +330,8 @@ bool Files::Exists(FileId file) { return impl_->Exists(file); }
 const SourceFile* Files::Get(FileId file) { return impl_->Get(file); }
 Text Files::SourceOf(FileId file, std::string& memory) const { return impl_->SourceOf(file, memory); }
 
+Position Files::PlaceOf(FileId file, uint32_t offset) { return impl_->PlaceOf(file, offset); }
+
 bool Files::Holds(FileId file, Text word) {
   std::string memory;
   return HoldsWord(SourceOf(file, memory), word);
@@ -272,6 +344,8 @@ void Files::Close(FileId file) { impl_->Close(file); }
 bool Files::IsOpen(FileId file) const { return impl_->IsOpen(file); }
 const std::vector<FileId>& Files::Buffers() const { return impl_->Buffers(); }
 void Files::Trim(size_t bytes) { impl_->Trim(bytes); }
+void Files::GiveBack(FileId file) { impl_->GiveBack(file); }
+bool Files::IsHeld(FileId file) const { return impl_->IsHeld(file); }
 size_t Files::ByteSize() const { return impl_->ByteSize(); }
 
 }  // namespace quillet

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <exception>
 #include <memory>
 #include <string>
 #include <unordered_map>
@@ -17,6 +18,12 @@ namespace quillet {
 using SourceDecoder = bool (*)(Text bytes, std::string& utf8);
 // For all workspaces; without one such sources are read as Latin-1. To be called before other threads read.
 void SetSourceDecoder(SourceDecoder decoder);
+
+// A file that was given back has changed, and Refresh has not seen it yet: what was found in it holds no more.
+class SourceChanged : public std::exception {
+ public:
+  const char* what() const noexcept override { return "a source changed while a question was answered"; }
+};
 
 class Files {
  public:
@@ -44,6 +51,9 @@ class Files {
   // read. Any number of threads may ask while nothing else is called.
   Text SourceOf(FileId file, std::string& memory) const;
 
+  // The line and the column of a place, from 1, in bytes: without an analysis. The place is held to no extent.
+  Position PlaceOf(FileId file, uint32_t offset);
+
   // Looks whether files that were read have changed since (or ceased, or begun to exist); true where any did.
   bool Refresh();
 
@@ -56,9 +66,12 @@ class Files {
   // Those that a buffer holds, in no order.
   const std::vector<FileId>& Buffers() const;
 
-  // Drops what was read of files that no buffer holds while more than `bytes` are held, and first what was asked for
-  // longest ago.
+  // Gives back what was read of files that no buffer holds while more than `bytes` are held, and first what was asked
+  // for longest ago. Get reads them again, and throws SourceChanged where one is not the same by then.
   void Trim(size_t bytes);
+  // Does so with one file.
+  void GiveBack(FileId file);
+  bool IsHeld(FileId file) const;
   size_t ByteSize() const;
 
   Version version() const { return version_; }

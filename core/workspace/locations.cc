@@ -432,7 +432,8 @@ std::vector<Location> Workspace::Subtypes(FileId id, uint32_t offset) {
   for (const Entity& method : methods.found) {
     const Text name = in.inference.NameOfNumber(method.b);
     for (const FileId candidate : in.project.WithWords({name})) {
-      const SourceFile* source = in.Get(candidate);
+      const Impl::Visit visit(in, candidate);
+      const SourceFile* source = visit.file;
       if (source == nullptr) continue;
       for (StmtId stmt = 1; stmt < source->syntax.stmts.size(); ++stmt) {
         if (source->syntax.stmt(stmt).kind != StmtKind::kClass) continue;
@@ -459,7 +460,8 @@ std::vector<Location> Workspace::Subtypes(FileId id, uint32_t offset) {
   for (const ClassId cls : wanted) {
     const Text name = in.inference.InfoOf(cls).name;
     for (const FileId candidate : in.project.WithWords({name})) {
-      const SourceFile* source = in.Get(candidate);
+      const Impl::Visit visit(in, candidate);
+      const SourceFile* source = visit.file;
       if (source == nullptr) continue;
       for (StmtId stmt = 1; stmt < source->syntax.stmts.size(); ++stmt) {
         if (source->syntax.stmt(stmt).kind != StmtKind::kClass) continue;

@@ -297,7 +297,8 @@ std::vector<Call> Workspace::Callers(FileId id, uint32_t offset) {
   const uint32_t index = file == nullptr ? kNoIndex : in.OccurrenceAt(*file, offset);
   if (index == kNoIndex) return found;
   for (const Impl::Hit& hit : in.Uses(*file, index, true)) {
-    const SourceFile* source = in.Get(hit.file);
+    const Impl::Visit visit(in, hit.file);
+    const SourceFile* source = visit.file;
     const bool decorates = hit.occurrence != kNoIndex && hit.location.role == "read" &&
                            (source->bindings.occurrences[hit.occurrence].flags & kNameDecorator) != 0;
     if (hit.location.role != "call" && !decorates) continue;

@@ -51,21 +51,32 @@ void Workspace::Impl::Forget() {
 void Workspace::Impl::Begin() {
   // What is asked in one breath is asked of the same files.
   static constexpr auto kBreath = std::chrono::milliseconds(30);
-  static constexpr size_t kMaxHeld = size_t{192} << 20;
   const auto now = std::chrono::steady_clock::now();
   if (now - last_refresh_ > kBreath) {
     last_refresh_ = now;
     const bool has_changed = files.Refresh();
     const bool has_come_or_gone = project.Refresh() | modules.Refresh();
     if (has_changed || has_come_or_gone) Forget();
-    if (files.ByteSize() > kMaxHeld) {
-      files.Trim(kMaxHeld / 2);
-      inference.Clear();
-      calls_by_name_.clear();
-    }
+  }
+  GiveBack();
+  if (inference.ByteSize() > kMaxRemembered) {
+    inference.Clear();
+    calls_by_name_.clear();
   }
   inference.Begin();
   is_bounded = false;
+}
+
+void Workspace::Impl::GiveBack() {
+  if (files.ByteSize() > settings.most_held) files.Trim(settings.most_held / 4 * 3);
+}
+
+Workspace::Impl::Visit::Visit(Impl& at, FileId visited)
+    : in_(at), id_(visited), was_held_(at.files.IsHeld(visited)), file(at.Get(visited)) {}
+
+Workspace::Impl::Visit::~Visit() {
+  if (!was_held_ && in_.files.ByteSize() > in_.settings.most_visited) in_.files.GiveBack(id_);
+  in_.GiveBack();
 }
 
 bool Workspace::Impl::IsProject(FileId file) {
@@ -133,10 +144,7 @@ Workspace::~Workspace() = default;
 FileId Workspace::FileOf(Text path) { return impl_->files.NumberOf(path); }
 const std::string& Workspace::PathOf(FileId file) const { return impl_->files.PathOf(file); }
 
-Position Workspace::PlaceOf(FileId file, uint32_t offset) {
-  const SourceFile* source = impl_->Get(file);
-  return source == nullptr ? Position{1, 1} : source->PlaceOf(offset);
-}
+Position Workspace::PlaceOf(FileId file, uint32_t offset) { return impl_->files.PlaceOf(file, offset); }
 
 uint32_t Workspace::OffsetOf(FileId file, int line, int column) {
   const SourceFile* source = impl_->Get(file);

@@ -1,7 +1,8 @@
 // Workspace: the questions that people ask about a program, answered from its files as they are.
 //
 // A place is a file and an offset in bytes. Every answer says how sure it is. Nothing throws for any place of any
-// file; what nothing is known of gives nothing. One thread at a time.
+// file; what nothing is known of gives nothing. A file that changes while a question is answered may end it by
+// SourceChanged (program/files.h): it is to be asked again behind Refresh. One thread at a time.
 #pragma once
 
 #include <cstdint>
@@ -116,6 +117,9 @@ class Workspace {
     std::vector<std::string> libraries;  // the environment's
     std::string typeshed;
     Version version;
+    // Bytes of files that may be held, and up to which those are that a question only goes over.
+    size_t most_held = size_t{160} << 20;
+    size_t most_visited = size_t{64} << 20;
     // What finds errors of syntax; without it there are none.
     std::shared_ptr<const FileAnalyzer::Options> analyzer;
   };

@@ -89,8 +89,9 @@ void Workspace::Impl::AddOtherSides(Entities& entities) {
 std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, uint32_t index, bool everywhere) {
   std::vector<Hit> hits;
   const Occurrence occurrence = file.bindings.occurrences[index];
+  const FileId own = file.id;
   Entities wanted = inference.EntitiesOf(file, index);
-  const Text name = file.bindings.TextOf(occurrence);
+  const std::string name(file.bindings.TextOf(occurrence));
   // The name behind `as` is one of this file.
   const uint32_t own_variable = file.bindings.VariableOf(occurrence);
   if (own_variable != kNoIndex) {
@@ -151,7 +152,8 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
   std::vector<Hit> unknown;
   std::set<std::pair<FileId, uint32_t>> definers;
   for (const FileId id : candidates) {
-    const SourceFile* source = Get(id);
+    const Visit visit(*this, id);
+    const SourceFile* source = visit.file;
     if (source == nullptr) continue;
     const Bindings& bindings = source->bindings;
     uint32_t number = kNoIndex;
@@ -203,7 +205,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
           continue;
         }
       }
-      const bool is_foreign = id != file.id && !IsProject(id);
+      const bool is_foreign = id != own && !IsProject(id);
       if (meets &&
           (!is_foreign || other.kind != NameKind::kNone || (other.is_attribute && other.role == NameRole::kWrite)))
         hits.push_back({AtOccurrence(*source, i, certainty), id, i});
@@ -279,16 +281,16 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
     return rename;
   }
   const Occurrence occurrence = file->bindings.occurrences[index];
-  const Text old_name = file->bindings.TextOf(occurrence);
+  const std::string old_name(file->bindings.TextOf(occurrence));
   Entities wanted = in.inference.EntitiesOf(*file, index);
   in.AddOtherSides(wanted);
   if (wanted.found.empty()) {
-    rename.problem = "nothing is known of what '" + std::string(old_name) + "' stands for here";
+    rename.problem = "nothing is known of what '" + old_name + "' stands for here";
     return rename;
   }
   bool is_bound = false;
   if (old_name.starts_with("__") && old_name.ends_with("__")) {
-    rename.problem = "'" + std::string(old_name) + "' is a name that the language uses";
+    rename.problem = "'" + old_name + "' is a name that the language uses";
     return rename;
   }
   for (const Entity& entity : wanted.found) {
@@ -298,33 +300,33 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
       for (const BaseClass& base : order) {
         const ClassInfo& info = in.inference.MembersOf(base.cls);
         if (in.IsProject(info.file) || !info.symbols.contains(old_name)) continue;
-        rename.problem = "'" + std::string(old_name) + "' overrides what '" + in.inference.QualifiedName(base.cls) +
+        rename.problem = "'" + old_name + "' overrides what '" + in.inference.QualifiedName(base.cls) +
                          "' defines outside of the project";
         return rename;
       }
     }
     if (entity.kind == Entity::kModule) {
-      rename.problem = "'" + std::string(old_name) + "' is a module: rename its file";
+      rename.problem = "'" + old_name + "' is a module: rename its file";
       return rename;
     }
     for (const Binding& binding : in.inference.BindingsOf(entity)) {
       is_bound = true;
       if (!in.IsProject(binding.file)) {
-        rename.problem =
-            "'" + std::string(old_name) + "' is defined outside of the project, in " + in.files.PathOf(binding.file);
+        rename.problem = "'" + old_name + "' is defined outside of the project, in " + in.files.PathOf(binding.file);
         return rename;
       }
     }
   }
   if (!is_bound) {
-    rename.problem = "nothing is known of what '" + std::string(old_name) + "' stands for here";
+    rename.problem = "nothing is known of what '" + old_name + "' stands for here";
     return rename;
   }
   std::vector<Impl::Hit> hits = in.Uses(*file, index, true);
   for (const Impl::Hit& hit : hits) {
     if (only_certain && hit.location.certainty != Certainty::kCertain) continue;
     if (!in.IsProject(hit.file) || hit.location.role == "module") continue;
-    const SourceFile* source = in.Get(hit.file);
+    const Impl::Visit visit(in, hit.file);
+    const SourceFile* source = visit.file;
     const Text there(source->text().data() + hit.location.begin, hit.location.end - hit.location.begin);
     if (there != old_name) continue;
     // A name that the scope has already would be taken for this one.

@@ -25,6 +25,24 @@ class Workspace::Impl final : public CallerSource {
   void Begin();
   void Forget();
   const SourceFile* Get(FileId file) { return files.Get(file); }
+  // One of many files that a question goes over. While it lasts nothing is given back; behind it this one is, where
+  // much is held and it was not before, and whatever was not asked for lately, where very much is: so no other file may
+  // be in use then.
+  class Visit {
+   public:
+    Visit(Impl& in, FileId file);
+    ~Visit();
+    Visit(const Visit&) = delete;
+    Visit& operator=(const Visit&) = delete;
+
+   private:
+    Impl& in_;
+    const FileId id_;
+    const bool was_held_;
+
+   public:
+    const SourceFile* const file;  // nullptr where it cannot be read
+  };
   // Whether a file lies below a root of the project.
   bool IsProject(FileId file);
 
@@ -115,6 +133,11 @@ class Workspace::Impl final : public CallerSource {
   std::unique_ptr<FileAnalyzer> analyzer;  // made when it is first needed
 
  private:
+  // Gives files back where more is held than may be.
+  void GiveBack();
+
+  static constexpr size_t kMaxRemembered = size_t{64} << 20;
+
   std::chrono::steady_clock::time_point last_refresh_{};
   std::unordered_map<std::string, std::vector<ExprPlace>> calls_by_name_;
   std::unordered_map<std::string, bool> common_;

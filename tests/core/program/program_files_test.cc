@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 
 #include <string>
+#include <vector>
 
 #include "program/files.h"
 #include "tests/core/support/temporary_folder.h"
@@ -99,6 +100,78 @@ TEST(Files, GiveWayToBuffers) {
   EXPECT_EQ(files.Get(b), nullptr);
   files.Change(a, 0, 0, "# ");
   EXPECT_EQ(files.Get(a)->text(), "# x = 1\n");
+}
+
+TEST(Files, AreTheSameBehindBeingGivenBack) {
+  const TemporaryFolder folder = {{"a.py", "x = 1\n"}, {"b.py", "y = 1\n"}};
+  Files files(Version::Of(3, 12));
+  const FileId a = files.NumberOf(folder / "a.py");
+  const FileId b = files.NumberOf(folder / "b.py");
+  files.Get(a);
+  files.Get(b);
+  const size_t both = files.ByteSize();
+  files.GiveBack(b);
+  EXPECT_FALSE(files.IsHeld(b));
+  EXPECT_TRUE(files.IsHeld(a));
+  EXPECT_LT(files.ByteSize(), both);
+  EXPECT_FALSE(files.Refresh());
+  EXPECT_EQ(files.Get(b)->text(), "y = 1\n");
+  EXPECT_EQ(files.ByteSize(), both);
+
+  files.Get(a);
+  files.Trim(both - 1);
+  EXPECT_FALSE(files.IsHeld(b)) << "asked for before the other";
+  EXPECT_TRUE(files.IsHeld(a));
+  folder.Remove("b.py");
+  folder.Write("b.py", "y = 1\n");
+  EXPECT_FALSE(files.Refresh()) << "only written anew";
+  folder.Write("b.py", "y = 2 + 3\n");
+  EXPECT_TRUE(files.Refresh());
+  EXPECT_EQ(files.Get(b)->text(), "y = 2 + 3\n");
+
+  files.Open(a, "z = 1\n");
+  files.Get(a);
+  files.GiveBack(a);
+  files.Trim(0);
+  EXPECT_TRUE(files.IsHeld(a)) << "a buffer";
+}
+
+TEST(Files, SayThatTheyChangedWhereOthersWouldBeMeant) {
+  const TemporaryFolder folder = {{"a.py", "x = 1\n"}, {"b.py", "y = 1\n"}};
+  Files files(Version::Of(3, 12));
+  const FileId a = files.NumberOf(folder / "a.py");
+  const FileId b = files.NumberOf(folder / "b.py");
+  files.Get(a);
+  files.Get(b);
+  files.Trim(0);
+  folder.Write("a.py", "y = 1\n");  // as long as it was
+  folder.Remove("b.py");
+  EXPECT_THROW(files.Get(a), SourceChanged);
+  EXPECT_THROW(files.PlaceOf(a, 0), SourceChanged);
+  EXPECT_THROW(files.Get(b), SourceChanged);
+  EXPECT_TRUE(files.Refresh());
+  EXPECT_EQ(files.Get(a)->text(), "y = 1\n");
+  EXPECT_EQ(files.Get(b), nullptr);
+  EXPECT_FALSE(files.Refresh());
+}
+
+TEST(Files, KnowPlacesWithoutBeingHeld) {
+  const TemporaryFolder folder;
+  for (const Text source :
+       {Text("x = 1\ny = 2\r\n\r\rz = 3\n\n"), Text("\xEF\xBB\xBFx\n  y\n"), Text(""), Text("\n")}) {
+    folder.Write("a.py", std::string(source));
+    Files files(Version::Of(3, 12));
+    const FileId a = files.NumberOf(folder / "a.py");
+    std::vector<Position> places;
+    for (uint32_t at = 0; at <= source.size(); ++at) places.push_back(files.PlaceOf(a, at));
+    EXPECT_FALSE(files.IsHeld(a));
+    const SourceFile* file = files.Get(a);
+    for (uint32_t at = 0; at <= source.size(); ++at) {
+      const Position place = file->PlaceOf(at);
+      EXPECT_EQ(places[at].line, place.line) << at;
+      EXPECT_EQ(places[at].col, place.col) << at;
+    }
+  }
 }
 
 TEST(Files, AreReadByTheirKindAndVersion) {

@@ -583,6 +583,19 @@ TEST(Buffers, NeedNoFile) {
 
 // ---- any place of any file ----
 
+TEST(Questions, AreAnsweredWithoutALibrary) {
+  const testing::TemporaryFolder folder = {
+      {"a.py", "class A:\n  x = None\n  def f(self): self.y = A(); return self.y.x or 'a'\nA().y.f().z\n"}};
+  Workspace::Settings settings;
+  settings.roots = {folder.path()};
+  settings.version = Version::Of(3, 12);
+  Workspace workspace(std::move(settings));
+  const FileId file = workspace.FileOf(folder / "a.py");
+  EXPECT_EQ(workspace.Types(file, workspace.OffsetOf(file, 4, 5)), Words{"a.A"});
+  EXPECT_EQ(workspace.Definitions(file, workspace.OffsetOf(file, 4, 7)).size(), 1u);
+  EXPECT_EQ(workspace.Types(file, workspace.OffsetOf(file, 4, 11)), Words{});
+}
+
 TEST(Questions, AreAnsweredAtEveryPlace) {
   const std::string_view text =
       "from a import *\nimport a.a as b\nclass A(A, B[int]):\n  x: 'A' = f(\n  def m(self, *a, **k): return self.\n"
