@@ -39,6 +39,7 @@ void BindRecordWords(nb::module_& tarvex);
 void BindNames(nb::module_& tarvex);
 void BindIndex(nb::module_& tarvex);
 void BindBatch(nb::module_& tarvex);
+void BindCorpus(nb::module_& tarvex);
 void BindSite(nb::module_& tarvex);
 void BindSyntax(nb::module_& tarvex);
 void BindWorkspace(nb::module_& tarvex);

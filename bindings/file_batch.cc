@@ -9,7 +9,6 @@
 #include "bindings/interpreter_lock.h"
 #include "bindings/signals.h"
 #include "bindings/site_object.h"
-#include "foundations/utf8.h"
 #include "names/batch_binder.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
@@ -44,28 +43,11 @@ std::vector<BatchInput> InputsOf(nb::handle sequence) {
   return inputs;
 }
 
-// An exception as one line.
-std::string LineOf(nb::python_error& error) {
-  constexpr size_t kLongest = 200;
-  std::string line;
-  try {
-    line = nb::str(error.type().attr("__name__")).c_str();
-    if (const std::string message = nb::str(error.value()).c_str(); !message.empty()) line += ": " + message;
-  } catch (const std::exception&) {  // it cannot even be described
-    if (line.empty()) line = "an exception";
-  }
-  line.resize(std::min(line.size(), line.find_first_of("\r\n")));
-  if (line.size() <= kLongest) return line;
-  size_t size = kLongest;
-  while (!IsUtf8LeadByte(line[size])) --size;
-  return line.substr(0, size) + "\xE2\x80\xA6";
-}
-
 }  // namespace
 
 FileBatch::FileBatch(const Language& language, nb::handle inputs, unsigned jobs, nb::object decode, nb::object format,
                      bool bindings)
-    : decode_(std::move(decode)),
+    : decoder_(std::move(decode)),
       format_(std::move(format)),
       batch_(
           std::make_unique<BatchAnalyzer>(OptionsOf(language, std::min(jobs, kMostJobs), bindings), InputsOf(inputs))) {
@@ -106,7 +88,7 @@ bool FileBatch::Next(BatchResult& result) {
     if (wait == BatchAnalyzer::Wait::kResult && result.problem.empty()) return true;
     const Locked lock;
     if (wait == BatchAnalyzer::Wait::kResult) problems_.emplace_back(result.index, result.problem);
-    RaiseFailure();
+    decoder_.RaiseFailure();
     if (wait != BatchAnalyzer::Wait::kTimeout) return wait == BatchAnalyzer::Wait::kResult;
     HandleSignals();
   }
@@ -124,26 +106,11 @@ BatchAnalyzer::Options FileBatch::OptionsOf(const Language& language, unsigned j
   BatchAnalyzer::Options options;
   options.analyzer = language.options();
   options.jobs = jobs;
-  options.decode = [this](Text bytes, std::string& utf8) { return Decode(bytes, utf8); };
+  options.decode = [this](Text bytes, std::string& utf8) { return decoder_.Decode(bytes, utf8); };
   const Version version = options.analyzer.version;
   if (bindings) options.make_binder = [version] { return MakeFileBinder(version); };
   options.make_writer = WriterMaker(version);
   return options;
-}
-
-bool FileBatch::Decode(Text bytes, std::string& utf8) {
-  const Locked lock;
-  try {
-    const nb::object answer = TupleOf(decode_(BytesOf(bytes)));
-    if (nb::len(answer) != 2) ThrowError(ErrorKind::kTypeError, "a decoder gives a source and a reason");
-    const nb::handle source = PyTuple_GET_ITEM(answer.ptr(), 0);
-    const nb::handle reason = PyTuple_GET_ITEM(answer.ptr(), 1);
-    utf8 = reason.is_none() ? HostText::FromBytes(source).text() : HostText::FromStr(reason).text();
-    return reason.is_none();
-  } catch (nb::python_error& error) {
-    utf8 = Failed(error);
-    return false;
-  }
 }
 
 std::function<std::unique_ptr<FileWriter>()> FileBatch::WriterMaker(Version version) {
@@ -177,24 +144,10 @@ std::function<std::unique_ptr<FileWriter>()> FileBatch::WriterMaker(Version vers
     try {
       return static_cast<uint32_t>(std::clamp(Int32Of(width_of(code_point)), 0, 2));
     } catch (nb::python_error& error) {
-      ThrowError(ErrorKind::kRuntimeError, Failed(error));
+      ThrowError(ErrorKind::kRuntimeError, decoder_.Failed(error));
     }
   };
   return [options] { return MakeTextLinesWriter(options); };
-}
-
-std::string FileBatch::Failed(nb::python_error& error) {
-  std::string line = LineOf(error);
-  // What does not derive from Exception is meant to end the run.
-  if (!failure_ && !error.matches(PyExc_Exception)) failure_.emplace(std::move(error));
-  return line;
-}
-
-void FileBatch::RaiseFailure() {
-  if (!failure_) return;
-  nb::python_error failure = std::move(*failure_);
-  failure_.reset();
-  throw std::move(failure);
 }
 
 }  // namespace quillet::host

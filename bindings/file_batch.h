@@ -4,15 +4,14 @@
 // them may hold it.
 #pragma once
 
-#include <exception>
 #include <memory>
-#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "analysis/batch.h"
 #include "bindings/bindings.h"
+#include "bindings/decoder.h"
 #include "bindings/language_object.h"
 
 namespace quillet::host {
@@ -43,16 +42,11 @@ class FileBatch {
  private:
   BatchAnalyzer::Options OptionsOf(const Language& language, unsigned jobs, bool bindings);
   std::function<std::unique_ptr<FileWriter>()> WriterMaker(Version version);
-  bool Decode(Text bytes, std::string& utf8);
-  // What an exception of the host's says of the file that it was raised for.
-  std::string Failed(nb::python_error& error);
-  void RaiseFailure();
 
-  nb::object decode_;
+  Decoder decoder_;
   nb::object format_;
-  // Both change with the interpreter lock held.
+  // Changes with the interpreter lock held.
   std::vector<std::pair<size_t, std::string>> problems_;
-  std::optional<nb::python_error> failure_;
   std::unique_ptr<BatchAnalyzer> batch_;
 };
 

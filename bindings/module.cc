@@ -74,6 +74,7 @@ NB_MODULE(tarvex_in_main, tarvex) {
   BindNames(tarvex);
   BindIndex(tarvex);
   BindBatch(tarvex);
+  BindCorpus(tarvex);
   BindSite(tarvex);
   BindSyntax(tarvex);
   BindWorkspace(tarvex);

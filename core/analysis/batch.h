@@ -6,8 +6,6 @@
 // bytes, so that memory does not grow with the list. No file fails the batch: one that cannot be read
 // is a result that says why. Where no thread can be had, the reader's does the work. A process that forks
 // has two batches from then on: both hand out what is left.
-// What the core prints or reports while a file is analysed (a walk that met its limit, an internal
-// failure) is collected with that file's result and printed by nobody.
 #pragma once
 
 #include <atomic>
@@ -21,79 +19,18 @@
 #include <thread>
 #include <vector>
 
-#include "analysis/file_analyzer.h"
-#include "analysis/placed_records.h"
-#include "analysis/record_table.h"
-#include "analysis/scope_names.h"
+#include "analysis/file_worker.h"
 #include "foundations/stop.h"
 
 namespace quillet {
 
-struct Bindings;
-
-// A file to analyse.
-struct BatchInput {
-  std::string path;
-  std::optional<std::string> bytes;  // the source itself, where it is at hand
-  std::string problem;               // why it cannot be read, where that is known
-};
-
-// What became of a file.
-struct BatchResult {
-  struct Message {
-    uint32_t line;    // from 1
-    uint32_t column;  // from 1, in UTF-8 bytes
-    std::string text;
-  };
-
-  size_t index = 0;     // of its input
-  std::string problem;  // why it could not be analysed; empty where it was
-  size_t byte_count = 0;
-  size_t line_count = 0;       // physical lines
-  size_t statement_count = 0;  // logical lines that are neither blank nor a comment
-  std::vector<Message> errors;
-  std::vector<Message> reports;  // of the analysis about itself
-  RecordTable table;             // empty where a writer took its place
-  std::string output;
-  std::shared_ptr<const Bindings> bindings;  // of its names, where a binder was asked for
-  size_t bindings_size = 0;                  // in bytes
-
-  // What the result occupies, nearly.
-  size_t ByteSize() const;
-};
-
-// Turns a file that was analysed into text; each thread has one.
-class FileWriter {
- public:
-  virtual ~FileWriter() = default;
-  virtual void Write(const BatchInput& input, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
-                     std::string& out) = 0;
-  // Of the rows that it wants to see analysed; without one, all.
-  virtual RowFilter* row_filter() { return nullptr; }
-};
-
-// Binds the names of a file that was analysed; each thread has one.
-class FileBinder {
- public:
-  virtual ~FileBinder() = default;
-  virtual void Bind(const FileAnalyzer& file, BatchResult& result) = 0;
-};
-
 class BatchAnalyzer {
  public:
-  struct Options {
-    FileAnalyzer::Options analyzer;
+  struct Options : FileWorker::Options {
     unsigned jobs = 0;  // 0 stands for one a core
     // Results that may wait for the reader, and the bytes that they may hold.
     size_t most_waiting = 64;
     size_t most_waiting_bytes = size_t{256} << 20;
-    // Makes a thread's writer; without it, results carry tables.
-    std::function<std::unique_ptr<FileWriter>()> make_writer;
-    // Makes a thread's binder; without it, results have no bindings.
-    std::function<std::unique_ptr<FileBinder>()> make_binder;
-    // Decodes a source that names an encoding of its own to UTF-8: false, and the reason in `utf8`,
-    // where that cannot be done. Called by any thread. Without it such a source is a problem.
-    std::function<bool(Text bytes, std::string& utf8)> decode;
   };
 
   BatchAnalyzer(Options options, std::vector<BatchInput> inputs);
@@ -123,8 +60,6 @@ class BatchAnalyzer {
   void DismissThreads();
 
  private:
-  class Worker;
-
   // The threads, and the results that wait for the reader.
   class Ring {
    public:
@@ -145,8 +80,6 @@ class BatchAnalyzer {
     void StartThreads();
     void Work();
     StopQuestion IsWanted() const;
-    // Analyses a file, by a worker that is built at first need.
-    BatchResult Analyze(std::unique_ptr<Worker>& worker, size_t index);
     // The next result, worked out by the calling thread.
     Wait NextByReader(BatchResult& result);
     // The next index for a thread; nothing at the end.
@@ -174,7 +107,7 @@ class BatchAnalyzer {
     std::mutex join_mutex_;
     std::vector<std::thread> threads_;
     std::mutex reader_worker_mutex_;
-    std::unique_ptr<Worker> reader_worker_;
+    std::unique_ptr<FileWorker> reader_worker_;
   };
 
   // The ring of this process. A fork copies a ring without its threads, and with locks that they may hold

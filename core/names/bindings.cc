@@ -2,6 +2,9 @@
 #include "names/bindings.h"
 
 #include <algorithm>
+#include <utility>
+
+#include "foundations/shown_text.h"
 
 namespace quillet {
 
@@ -68,6 +71,19 @@ void Bindings::Clear() {
   texts.offsets.assign(1, 0);
   texts.bytes.clear();
   line_starts.clear();
+}
+
+std::vector<std::string> QualifiedNames(const Bindings& bindings) {
+  std::vector<std::string> names;
+  for (const NameScope& scope : bindings.scopes) {
+    std::string name = scope.parent == kNoIndex ? std::string() : names[scope.parent];
+    if (scope.kind == NameScopeKind::kClass || scope.kind == NameScopeKind::kFunction) {
+      if (!name.empty()) name += '.';
+      AppendShown(bindings.texts[scope.name], name);
+    }
+    names.push_back(std::move(name));
+  }
+  return names;
 }
 
 OccurrencesOfSymbols::OccurrencesOfSymbols(const Bindings& bindings) : begins_(bindings.symbols.size() + 1) {

@@ -13,6 +13,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <span>
+#include <string>
 #include <vector>
 
 #include "analysis/record_table.h"
@@ -164,6 +165,10 @@ struct Bindings {
   size_t ByteSize() const;
   void Clear();
 };
+
+// The dotted name of each scope, as its classes and functions make it, such as "Shop.total"; of what is nested in one
+// without a name, that one's. UTF-8 whatever the source is.
+std::vector<std::string> QualifiedNames(const Bindings& bindings);
 
 // The occurrences of each symbol, in order: of one that owns its variable all of them, wherever they
 // stand; of any other those that stand in its scope. Made in one pass, for who asks more than once.

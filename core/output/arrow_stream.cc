@@ -1,5 +1,4 @@
-// Every structure is owned by its private_data: releasing one frees what it holds and releases its
-// children, unless a reader moved them away, as the interface allows.
+// Results are gathered into tables of columns until one makes a batch.
 #include "output/arrow_stream.h"
 
 #include <algorithm>
@@ -14,6 +13,7 @@
 
 #include "foundations/shown_text.h"
 #include "names/bindings.h"
+#include "output/arrow_export.h"
 
 namespace quillet {
 
@@ -24,111 +24,27 @@ constexpr size_t kBatchRows = size_t{1} << 16;
 
 // ---- the schema ----
 
-struct Column {
-  const char* name;
-  const char* format;
-  bool has_dictionary;  // of large_utf8
-  bool may_be_null = false;
-};
+constexpr const char* kTexts = "U";  // of all dictionaries
 
-constexpr Column kRecordColumns[] = {
-    {"path", "i", true},  {"line", "I", false}, {"column", "I", false}, {"scope", "U", false},
-    {"name", "U", false}, {"kind", "c", true},  {"detail", "U", false}, {"is_parameter", "b", false},
-};
+std::span<const Column> RecordSchema() {
+  static const auto& columns = *new std::vector<Column>{
+      {"path", "i", kTexts}, {"line", "I", {}},     {"column", "I", {}}, {"scope", "U", {}},
+      {"name", "U", {}},     {"kind", "c", kTexts}, {"detail", "U", {}}, {"is_parameter", "b", {}},
+  };
+  return columns;
+}
 
-constexpr Column kOccurrenceColumns[] = {
-    {"path", "i", true},
-    {"index", "I", false},
-    {"line", "I", false},
-    {"column", "I", false},
-    {"end_column", "I", false},
-    {"text", "U", false},
-    {"role", "c", true},
-    {"kind", "c", true, true},
-#define QUILLET_NAME_FLAG(identifier, number, word) {word, "b", false},
+std::span<const Column> OccurrenceSchema() {
+  static const auto& columns = *new std::vector<Column>{
+      {"path", "i", kTexts},       {"index", "I", {}},          {"line", "I", {}},
+      {"column", "I", {}},         {"end_column", "I", {}},     {"text", "U", {}},
+      {"role", "c", kTexts},       {"kind", "c", kTexts, true},
+#define QUILLET_NAME_FLAG(identifier, number, word) {word, "b", {}},
 #include "names/words.def"
-    {"receiver", "I", false, true},
-    {"is_attribute", "b", false},
-    {"scope", "I", false},
-    {"scope_name", "U", false},
-    {"symbol", "I", false, true},
-    {"symbol_name", "U", false, true},
-};
-
-struct OwnedSchema {
-  std::vector<ArrowSchema> children;
-  std::vector<ArrowSchema*> child_pointers;
-  std::unique_ptr<ArrowSchema> dictionary;
-};
-
-void ReleaseSchema(ArrowSchema* schema) {
-  const std::unique_ptr<OwnedSchema> owned(static_cast<OwnedSchema*>(schema->private_data));
-  for (ArrowSchema& child : owned->children) {
-    if (child.release != nullptr) child.release(&child);
-  }
-  if (owned->dictionary && owned->dictionary->release != nullptr) owned->dictionary->release(owned->dictionary.get());
-  schema->release = nullptr;
-}
-
-// `owned` becomes the schema's.
-void FillSchema(const char* name, const char* format, std::unique_ptr<OwnedSchema> owned, ArrowSchema* schema) {
-  for (ArrowSchema& child : owned->children) owned->child_pointers.push_back(&child);
-  *schema = {};
-  schema->format = format;
-  schema->name = name;
-  schema->n_children = static_cast<int64_t>(owned->children.size());
-  schema->children = owned->child_pointers.data();
-  schema->dictionary = owned->dictionary.get();
-  schema->release = ReleaseSchema;
-  schema->private_data = owned.release();
-}
-
-void FillTableSchema(std::span<const Column> columns, ArrowSchema* schema) {
-  constexpr int64_t kNullable = 2;
-  auto table = std::make_unique<OwnedSchema>();
-  table->children.resize(columns.size());
-  for (size_t i = 0; i < columns.size(); ++i) {
-    auto column = std::make_unique<OwnedSchema>();
-    if (columns[i].has_dictionary) {
-      column->dictionary = std::make_unique<ArrowSchema>();
-      FillSchema("", "U", std::make_unique<OwnedSchema>(), column->dictionary.get());
-    }
-    FillSchema(columns[i].name, columns[i].format, std::move(column), &table->children[i]);
-    if (columns[i].may_be_null) table->children[i].flags = kNullable;
-  }
-  FillSchema("", "+s", std::move(table), schema);
-}
-
-// ---- arrays ----
-
-struct OwnedArray {
-  std::vector<const void*> buffers;
-  std::vector<ArrowArray> children;
-  std::vector<ArrowArray*> child_pointers;
-  std::unique_ptr<ArrowArray> dictionary;
-  std::shared_ptr<const void> keep;  // what the buffers are in
-};
-
-void ReleaseArray(ArrowArray* array) {
-  const std::unique_ptr<OwnedArray> owned(static_cast<OwnedArray*>(array->private_data));
-  for (ArrowArray& child : owned->children) {
-    if (child.release != nullptr) child.release(&child);
-  }
-  if (owned->dictionary && owned->dictionary->release != nullptr) owned->dictionary->release(owned->dictionary.get());
-  array->release = nullptr;
-}
-
-void FillArray(size_t length, std::unique_ptr<OwnedArray> owned, ArrowArray* array) {
-  for (ArrowArray& child : owned->children) owned->child_pointers.push_back(&child);
-  *array = {};
-  array->length = static_cast<int64_t>(length);
-  array->n_buffers = static_cast<int64_t>(owned->buffers.size());
-  array->buffers = owned->buffers.data();
-  array->n_children = static_cast<int64_t>(owned->children.size());
-  array->children = owned->child_pointers.data();
-  array->dictionary = owned->dictionary.get();
-  array->release = ReleaseArray;
-  array->private_data = owned.release();
+      {"receiver", "I", {}, true}, {"is_attribute", "b", {}},   {"scope", "I", {}},
+      {"scope_name", "U", {}},     {"symbol", "I", {}, true},   {"symbol_name", "U", {}, true},
+  };
+  return columns;
 }
 
 // The dictionaries of a stream: all of its batches have the same ones, each text once.
@@ -159,43 +75,10 @@ struct Dictionaries {
   }
 };
 
-// Truth values, a bit each.
-class Bits {
- public:
-  void Add(bool value) {
-    if (size_ % 8 == 0) bytes_.push_back(0);
-    if (value) bytes_.back() = static_cast<uint8_t>(bytes_.back() | 1u << size_ % 8);
-    ++size_;
-    false_count_ += !value;
-  }
-  const void* data() const { return bytes_.data(); }
-  size_t false_count() const { return false_count_; }
-
- private:
-  std::vector<uint8_t> bytes_;
-  size_t size_ = 0;
-  size_t false_count_ = 0;
-};
-
-// The buffers of one column.
-struct ColumnBuffers {
-  std::vector<const void*> values;
-  const TextList* dictionary = nullptr;
-  const Bits* validity = nullptr;  // without it, no row is null
-
-  static ColumnBuffers Of(const TextList& texts, const Bits* validity = nullptr) {
-    return {{texts.offsets.data(), texts.bytes.data()}, nullptr, validity};
-  }
-};
-
 // The rows of several files as columns.
-class ColumnTable {
+class ResultTable : public ColumnTable {
  public:
-  virtual ~ColumnTable() = default;
-  virtual size_t size() const = 0;
   virtual void Add(const BatchResult& result) = 0;
-  // In the order of the schema. They stand as long as nothing is added.
-  virtual std::vector<ColumnBuffers> Buffers() const = 0;
 };
 
 template <class To, class From>
@@ -203,9 +86,9 @@ void Append(To& to, const From& from) {
   to.insert(to.end(), from.begin(), from.end());
 }
 
-class RecordColumns : public ColumnTable {
+class RecordColumns : public ResultTable {
  public:
-  static constexpr std::span<const Column> kSchema = kRecordColumns;
+  static std::span<const Column> Schema() { return RecordSchema(); }
 
   explicit RecordColumns(std::shared_ptr<const Dictionaries> dictionaries) : dictionaries_(std::move(dictionaries)) {}
 
@@ -227,12 +110,12 @@ class RecordColumns : public ColumnTable {
 
   std::vector<ColumnBuffers> Buffers() const override {
     return {
-        {{paths_.data()}, &dictionaries_->paths},
+        {{paths_.data()}, ColumnBuffers::DictionaryOf(dictionaries_->paths)},
         {{lines_.data()}},
         {{columns_.data()}},
         ColumnBuffers::Of(scopes_),
         ColumnBuffers::Of(names_),
-        {{kinds_.data()}, &dictionaries_->record_kinds},
+        {{kinds_.data()}, ColumnBuffers::DictionaryOf(dictionaries_->record_kinds)},
         ColumnBuffers::Of(details_),
         {{are_parameters_.data()}},
     };
@@ -250,9 +133,9 @@ class RecordColumns : public ColumnTable {
   Bits are_parameters_;
 };
 
-class OccurrenceColumns : public ColumnTable {
+class OccurrenceColumns : public ResultTable {
  public:
-  static constexpr std::span<const Column> kSchema = kOccurrenceColumns;
+  static std::span<const Column> Schema() { return OccurrenceSchema(); }
 
   explicit OccurrenceColumns(std::shared_ptr<const Dictionaries> dictionaries)
       : dictionaries_(std::move(dictionaries)), flags_(NameFlagWords().size()) {}
@@ -270,42 +153,28 @@ class OccurrenceColumns : public ColumnTable {
 
   std::vector<ColumnBuffers> Buffers() const override {
     std::vector<ColumnBuffers> buffers = {
-        {{paths_.data()}, &dictionaries_->paths},
+        {{paths_.data()}, ColumnBuffers::DictionaryOf(dictionaries_->paths)},
         {{indices_.data()}},
         {{lines_.data()}},
         {{columns_.data()}},
         {{end_columns_.data()}},
         ColumnBuffers::Of(texts_),
-        {{roles_.data()}, &dictionaries_->roles},
-        {{kinds_.data()}, &dictionaries_->name_kinds, &have_kinds_},
+        {{roles_.data()}, ColumnBuffers::DictionaryOf(dictionaries_->roles)},
+        {{kinds_.data()}, ColumnBuffers::DictionaryOf(dictionaries_->name_kinds), &have_kinds_},
     };
     for (const Bits& flag : flags_) buffers.push_back({{flag.data()}});
     Append(buffers, std::vector<ColumnBuffers>{
-                        {{receivers_.data()}, nullptr, &have_receivers_},
+                        {{receivers_.data()}, {}, &have_receivers_},
                         {{are_attributes_.data()}},
                         {{scopes_.data()}},
                         ColumnBuffers::Of(scope_names_),
-                        {{symbols_.data()}, nullptr, &have_symbols_},
+                        {{symbols_.data()}, {}, &have_symbols_},
                         ColumnBuffers::Of(symbol_names_, &have_symbols_),
                     });
     return buffers;
   }
 
  private:
-  // Of classes and functions, such as "Shop.total"; of what is nested in one without a name, that one's.
-  static std::vector<std::string> QualifiedNames(const Bindings& bindings) {
-    std::vector<std::string> names;
-    for (const NameScope& scope : bindings.scopes) {
-      std::string name = scope.parent == kNoIndex ? std::string() : names[scope.parent];
-      if (scope.kind == NameScopeKind::kClass || scope.kind == NameScopeKind::kFunction) {
-        if (!name.empty()) name += '.';
-        AppendShown(bindings.texts[scope.name], name);
-      }
-      names.push_back(std::move(name));
-    }
-    return names;
-  }
-
   void AddOne(const Bindings& bindings, uint32_t i, const std::vector<std::string>& scope_names) {
     const Occurrence& occurrence = bindings.occurrences[i];
     const Position place = bindings.PositionOf(occurrence.begin);
@@ -361,36 +230,12 @@ class OccurrenceColumns : public ColumnTable {
   std::string shown_;
 };
 
-void FillTableArray(const std::shared_ptr<const ColumnTable>& table, ArrowArray* array) {
-  const std::vector<ColumnBuffers> columns = table->Buffers();
-  auto owned = std::make_unique<OwnedArray>();
-  owned->buffers = {nullptr};  // no row is null
-  owned->children.resize(columns.size());
-  for (size_t i = 0; i < columns.size(); ++i) {
-    auto column = std::make_unique<OwnedArray>();
-    column->buffers = {columns[i].validity != nullptr ? columns[i].validity->data() : nullptr};
-    Append(column->buffers, columns[i].values);
-    column->keep = table;
-    if (columns[i].dictionary != nullptr) {
-      auto strings = std::make_unique<OwnedArray>();
-      strings->buffers = {nullptr, columns[i].dictionary->offsets.data(), columns[i].dictionary->bytes.data()};
-      strings->keep = table;
-      column->dictionary = std::make_unique<ArrowArray>();
-      FillArray(columns[i].dictionary->size(), std::move(strings), column->dictionary.get());
-    }
-    FillArray(table->size(), std::move(column), &owned->children[i]);
-    if (columns[i].validity != nullptr)
-      owned->children[i].null_count = static_cast<int64_t>(columns[i].validity->false_count());
-  }
-  FillArray(table->size(), std::move(owned), array);
-}
-
 // ---- the stream ----
 
 struct Stream {
   std::unique_ptr<RecordSource> source;
   std::span<const Column> schema;
-  std::function<std::shared_ptr<ColumnTable>()> make_table;
+  std::function<std::shared_ptr<ResultTable>()> make_table;
   std::string error;
 };
 
@@ -421,7 +266,7 @@ int GetSchema(ArrowArrayStream* stream, ArrowSchema* out) {
 
 int GetNext(ArrowArrayStream* stream, ArrowArray* out) {
   return Guarded(stream, [out](Stream& self) {
-    const std::shared_ptr<ColumnTable> table = self.make_table();
+    const std::shared_ptr<ResultTable> table = self.make_table();
     BatchResult result;
     while (table->size() < kBatchRows && self.source->Next(result)) {
       table->Add(result);
@@ -445,7 +290,7 @@ void ReleaseStream(ArrowArrayStream* stream) {
 template <class Table>
 void Export(std::unique_ptr<RecordSource> source, ArrowArrayStream* stream) {
   auto state = std::make_unique<Stream>();
-  state->schema = Table::kSchema;
+  state->schema = Table::Schema();
   const auto dictionaries = std::make_shared<const Dictionaries>(source->inputs());
   state->make_table = [dictionaries] { return std::make_shared<Table>(dictionaries); };
   state->source = std::move(source);

@@ -804,6 +804,26 @@ class _host:  # a module at run time
     @staticmethod
     def bind_names(version_triple: _Version, source: bytes) -> _host.FileNames: ...
 
+    class SourceRows:
+        def __init__(
+            self,
+            languages: list[_host.Language],
+            form: str,
+            path: str,
+            content: str,
+            keep: list[str],
+            decode: Callable[[bytes], tuple[bytes | None, str | None]],
+        ) -> None: ...
+        def Begin(self, schema: object, array: object) -> None: ...
+        def Next(self) -> tuple[object, object] | None: ...
+        def Finish(self) -> tuple[object, object] | None: ...
+        @staticmethod
+        def Columns(form: str) -> list[tuple[str, str, bool]]: ...
+
+    class StreamBatches:
+        def __init__(self, capsule: object) -> None: ...
+        def Next(self) -> tuple[object, object] | None: ...
+
     class Batch:
         def __init__(
             self,

@@ -1,0 +1,76 @@
+// Tables of columns as structures of the Arrow C data interface. The buffers are those of the table, which lives
+// until the reader has released them all.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "analysis/record_table.h"
+#include "output/arrow_data.h"
+
+namespace quillet {
+
+struct Column {
+  std::string name;
+  std::string format;      // as the interface spells types; of indices where there is a dictionary
+  std::string dictionary;  // the format of its texts; empty where values stand for themselves
+  bool may_be_null = false;
+};
+
+// Truth values, a bit each.
+class Bits {
+ public:
+  void Add(bool value) {
+    if (size_ % 8 == 0) bytes_.push_back(0);
+    if (value) bytes_.back() = static_cast<uint8_t>(bytes_.back() | 1u << size_ % 8);
+    ++size_;
+    false_count_ += !value;
+  }
+  void Truncate(size_t size);
+  const void* data() const { return bytes_.data(); }
+  size_t size() const { return size_; }
+  size_t false_count() const { return false_count_; }
+  bool operator[](size_t i) const { return (bytes_[i / 8] >> i % 8 & 1) != 0; }
+
+ private:
+  std::vector<uint8_t> bytes_;
+  size_t size_ = 0;
+  size_t false_count_ = 0;
+};
+
+// The buffers of one column.
+struct ColumnBuffers {
+  // Texts one behind the other.
+  struct Texts {
+    size_t size = 0;
+    const void* offsets = nullptr;
+    const void* bytes = nullptr;
+  };
+
+  std::vector<const void*> values;
+  Texts dictionary = {};
+  const Bits* validity = nullptr;  // without it, no row is null
+
+  static ColumnBuffers Of(const TextList& texts, const Bits* validity = nullptr) {
+    return {{texts.offsets.data(), texts.bytes.data()}, {}, validity};
+  }
+  static Texts DictionaryOf(const TextList& texts) { return {texts.size(), texts.offsets.data(), texts.bytes.data()}; }
+};
+
+class ColumnTable {
+ public:
+  virtual ~ColumnTable() = default;
+  virtual size_t size() const = 0;
+  // In the order of the schema. They stand as long as nothing is added.
+  virtual std::vector<ColumnBuffers> Buffers() const = 0;
+};
+
+// Both are the caller's to release.
+void FillTableSchema(std::span<const Column> columns, ArrowSchema* schema);
+void FillTableArray(const std::shared_ptr<const ColumnTable>& table, ArrowArray* array);
+
+}  // namespace quillet
