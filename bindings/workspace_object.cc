@@ -82,6 +82,14 @@ void WorkspaceObject::Proceed() {
   stops_at_ = Clock::time_point::max();
 }
 
+void WorkspaceObject::SetColumnUnit(nb::handle name) {
+  const HostText word = HostText::FromBytes(name);
+  const ColumnUnit unit = word.text() == "utf-16"   ? ColumnUnit::kUtf16
+                          : word.text() == "utf-32" ? ColumnUnit::kUtf32
+                                                    : ColumnUnit::kUtf8;
+  Asked([&](Workspace& workspace) { workspace.set_column_unit(unit); });
+}
+
 void WorkspaceObject::CheckStop() const {
   if (const Clock::time_point at = stops_at_; at == Clock::time_point::max() || Clock::now() < at) return;
   const Locked lock;

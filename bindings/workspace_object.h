@@ -53,6 +53,9 @@ class WorkspaceObject {
   void Stop(double patience);
   void Proceed();
 
+  // "utf-8", "utf-16" or "utf-32": what columns count from now on.
+  void SetColumnUnit(nb::handle name);
+
  private:
   // Which thread has its turn.
   struct Asking {
@@ -79,6 +82,7 @@ class WorkspaceObject {
 
 // Its class, and what finds the libraries of an environment.
 void BindQuestions(nb::module_& host);
+void BindShapes(nb::class_<WorkspaceObject>& workspace);
 void BindEnvironment(nb::module_& host);
 
 }  // namespace quillet::host

@@ -53,11 +53,11 @@ nb::list TypesAt(WorkspaceObject& self, nb::handle path, int line, int column) {
   return rows;
 }
 
-nb::object HoverOver(WorkspaceObject& self, nb::handle path, int line, int column) {
-  const AskedPlace place(path, line, column);
+template <class Ask>
+nb::object AskHover(WorkspaceObject& self, const AskedPlace& place, Ask&& ask) {
   auto [hover, range] = self.Asked([&](Workspace& workspace) {
     const FileId file = place.File(workspace);
-    Hover found = workspace.HoverAt(file, place.Offset(workspace));
+    Hover found = ask(workspace, file, place.Offset(workspace));
     Placer placer(workspace);
     const PlacedRange placed = placer.Range(file, found.begin, found.end);
     return std::pair(std::move(found), placed);
@@ -67,6 +67,18 @@ nb::object HoverOver(WorkspaceObject& self, nb::handle path, int line, int colum
   for (const std::string& type : hover.types) types.append(Checked(ShownText(type)));
   return nb::make_tuple(ShownText(hover.text), ShownText(hover.documentation), nb::tuple(types),
                         Word(WordOf(hover.certainty)), range.begin.line, range.begin.col, range.end.col);
+}
+
+nb::object HoverOver(WorkspaceObject& self, nb::handle path, int line, int column) {
+  return AskHover(self, AskedPlace(path, line, column),
+                  [](Workspace& workspace, FileId file, uint32_t offset) { return workspace.HoverAt(file, offset); });
+}
+
+nb::object DescriptionOf(WorkspaceObject& self, nb::handle path, int line, int column, nb::handle name) {
+  const HostText text = HostText::FromBytes(name);
+  return AskHover(self, AskedPlace(path, line, column), [&](Workspace& workspace, FileId file, uint32_t offset) {
+    return workspace.DescribeCompletion(file, offset, text.text());
+  });
 }
 
 nb::list SignaturesAt(WorkspaceObject& self, nb::handle path, int line, int column) {
@@ -204,7 +216,7 @@ nb::list OutlineOf(WorkspaceObject& self, nb::handle path) {
     if (row.item.parent >= 0) parent = nb::int_(row.item.parent);
     rows.append(nb::make_tuple(parent, ShownText(row.item.name), Word(row.item.kind), ShownText(row.item.detail),
                                row.name.begin.line, row.name.begin.col, row.name.end.col, row.whole.begin.line,
-                               row.whole.end.line));
+                               row.whole.end.line, row.whole.begin.col, row.whole.end.col));
   }
   return rows;
 }
@@ -279,6 +291,8 @@ void BindQuestions(nb::module_& host) {
   def_at("Definitions", &LocationsAt<&Workspace::Definitions>,
          "Rows (path, line, column, end column, role, kind, certainty).");
   def_at("TypeDefinitions", &LocationsAt<&Workspace::TypeDefinitions>, "Likewise.");
+  def_at("Declarations", &LocationsAt<&Workspace::Declarations>, "Likewise.");
+  def_at("Implementations", &LocationsAt<&Workspace::Implementations>, "Likewise.");
   def_at("Supertypes", &LocationsAt<&Workspace::Supertypes>, "Likewise.");
   def_at("Subtypes", &LocationsAt<&Workspace::Subtypes>, "Likewise.");
   def_at("Types", &TypesAt, "Types as text.");
@@ -287,6 +301,8 @@ void BindQuestions(nb::module_& host) {
   def_at("Complete", &CompletionsAt, "Rows (name, kind, detail, documentation, certainty).");
   def_at("Callers", &CallsAt<&Workspace::Callers>, "Rows (location, name, locations).");
   def_at("Callees", &CallsAt<&Workspace::Callees>, "Likewise.");
+  workspace.def("DescribeCompletion", &DescriptionOf, nb::arg("path"), nb::arg("line"), nb::arg("column"),
+                nb::arg("name"));
   workspace.def("References", &ReferencesAt, nb::arg("path"), nb::arg("line"), nb::arg("column"), nb::arg("everywhere"))
       .def("Rename", &RenameAt, nb::arg("path"), nb::arg("line"), nb::arg("column"), nb::arg("name"),
            nb::arg("only_certain"), "(rows (path, line, column, end column, text), None), or (None, why not).")
@@ -300,12 +316,14 @@ void BindQuestions(nb::module_& host) {
       .def("Close", &CloseBuffer, nb::arg("path"))
       .def("CanRead", &CanReadFile, nb::arg("path"))
       .def("Stop", &WorkspaceObject::Stop, nb::arg("patience"))
+      .def("SetColumnUnit", &WorkspaceObject::SetColumnUnit, nb::arg("name"))
       .def("Proceed", &WorkspaceObject::Proceed)
       .def("Refresh", [](WorkspaceObject& self) { self.Asked([](Workspace& at) { at.Refresh(); }); })
       .def_prop_ro("was_bounded",
                    [](WorkspaceObject& self) { return self.Asked([](Workspace& at) { return at.was_bounded(); }); })
       .def_prop_ro("byte_count",
                    [](WorkspaceObject& self) { return self.Asked([](Workspace& at) { return at.ByteSize(); }); });
+  BindShapes(workspace);
 }
 
 }  // namespace quillet::host

@@ -34,6 +34,21 @@ size_t FindImport(Text head) {
   return Text::npos;
 }
 
+// The attribute whose name begins at `begin`, behind a dot that ends at `before`.
+ExprId AttributeBehindDot(const FileSyntax& syntax, uint32_t begin, uint32_t before) {
+  ExprId attribute = syntax.NamedAt(begin);
+  if (attribute != kNoExpr && syntax[attribute].kind == ExprKind::kAttribute) return attribute;
+  attribute = syntax.ExpressionAt(before - 1);
+  while (attribute != kNoExpr && (syntax[attribute].kind != ExprKind::kAttribute || syntax[attribute].end < before))
+    attribute = syntax[attribute].parent;
+  if (attribute != kNoExpr) return attribute;
+  for (ExprId expr = 1; expr < syntax.exprs.size(); ++expr)
+    if (syntax[expr].kind == ExprKind::kAttribute && syntax[expr].begin < begin &&
+        (syntax[expr].name_begin == begin || syntax[expr].end == before))
+      attribute = expr;
+  return attribute;
+}
+
 constexpr std::array kKeywords{"False", "None",     "True",  "and",    "as",   "assert", "async",  "await",    "break",
                                "class", "continue", "def",   "del",    "elif", "else",   "except", "finally",  "for",
                                "from",  "global",   "if",    "import", "in",   "is",     "lambda", "nonlocal", "not",
@@ -415,18 +430,7 @@ std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
     }
   } else if (before > 0 && text[before - 1] == '.') {
     // An attribute: its receiver ends where the dot stands.
-    ExprId attribute = syntax.NamedAt(begin);
-    if (attribute == kNoExpr || syntax[attribute].kind != ExprKind::kAttribute) {
-      attribute = syntax.ExpressionAt(before - 1);
-      while (attribute != kNoExpr && (syntax[attribute].kind != ExprKind::kAttribute || syntax[attribute].end < before))
-        attribute = syntax[attribute].parent;
-    }
-    if (attribute == kNoExpr) {
-      for (ExprId expr = 1; expr < syntax.exprs.size(); ++expr)
-        if (syntax[expr].kind == ExprKind::kAttribute && syntax[expr].begin < begin &&
-            (syntax[expr].name_begin == begin || syntax[expr].end == before))
-          attribute = expr;
-    }
+    const ExprId attribute = AttributeBehindDot(syntax, begin, before);
     if (attribute == kNoExpr) return found;
     const Value receiver = in.inference.ValueOf(id, syntax.ChildOf(attribute, 0));
     in.AddMembers(receiver, prefix, found);
@@ -490,6 +494,57 @@ std::vector<Completion> Workspace::Complete(FileId id, uint32_t offset) {
     return std::pair(a.certainty, rank(a)) < std::pair(b.certainty, rank(b));
   });
   return found;
+}
+
+Hover Workspace::DescribeCompletion(FileId id, uint32_t offset, Text name) {
+  Impl& in = *impl_;
+  in.Begin();
+  Hover hover;
+  const SourceFile* file = in.Get(id);
+  if (file == nullptr) return hover;
+  const FileSyntax& syntax = file->syntax;
+  const Text text = file->text();
+  uint32_t begin = std::min(offset, static_cast<uint32_t>(text.size()));
+  while (begin > 0 && IsNameByte(text[begin - 1])) --begin;
+  uint32_t before = begin;
+  while (before > 0 && (text[before - 1] == ' ' || text[before - 1] == '\t')) --before;
+  hover.begin = begin;
+  hover.end = offset;
+  Value value = kUnknownValue;
+  const auto take = [&](const Entities& entities) {
+    value = {kNoTypes, entities.doubt};
+    for (const Entity& entity : entities.found)
+      value = in.inference.types().Union(value, in.inference.ValueOfEntity(entity));
+  };
+  const StmtId stmt = syntax.StatementAt(before > 0 ? before - 1 : 0);
+  const ExprId attribute = before > 0 && text[before - 1] == '.' ? AttributeBehindDot(syntax, begin, before) : kNoExpr;
+  if (attribute != kNoExpr) {
+    value = in.inference.AttributeOf(in.inference.ValueOf(id, syntax.ChildOf(attribute, 0)), name);
+  } else if (stmt != kModuleStmt && syntax.stmt(stmt).kind == StmtKind::kFromImport &&
+             !syntax.ExprsOf(syntax.stmt(stmt)).empty()) {
+    const ExprId path = syntax.ExprsOf(syntax.stmt(stmt))[0];
+    const ModuleId module = in.modules.FindFrom(id, syntax[path].op, syntax.DottedNameOf(path));
+    if (module != kNoModule) take(in.inference.EntitiesInModule(module, name));
+  } else {
+    const Bindings& bindings = file->bindings;
+    uint32_t variable = kNoIndex;
+    const uint32_t own = file->ScopeAt(begin);
+    for (uint32_t scope = own; scope != kNoIndex && variable == kNoIndex; scope = bindings.scopes[scope].parent) {
+      if (scope != own && bindings.scopes[scope].kind == NameScopeKind::kClass) continue;
+      for (uint32_t symbol = bindings.scopes[scope].first_symbol; symbol != kNoIndex && variable == kNoIndex;
+           symbol = bindings.symbols[symbol].next)
+        if (bindings.texts[bindings.symbols[symbol].name] == name && Bindings::IsBound(bindings.symbols[symbol]))
+          variable = bindings.symbols[symbol].variable;
+    }
+    const ModuleId builtins = in.modules.Find("builtins");
+    if (variable != kNoIndex) {
+      take({{in.inference.EntityOfVariable(*file, variable)}, 0});
+    } else if (builtins != kNoModule) {
+      take(in.inference.EntitiesInModule(builtins, name));
+    }
+  }
+  if (value.IsKnown()) in.Describe(value, name, hover);
+  return hover;
 }
 
 }  // namespace quillet

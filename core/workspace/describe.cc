@@ -304,6 +304,40 @@ std::vector<std::string> Workspace::Types(FileId id, uint32_t offset) {
   return expr == kNoExpr ? std::vector<std::string>() : in.TextsOf(in.inference.ValueOf(id, expr));
 }
 
+void Workspace::Impl::Describe(Value value, Text name, Hover& hover) {
+  hover.types = TextsOf(value);
+  hover.certainty = CertaintyOf(value.doubt);
+  for (const TypeId type : inference.types().CopyOf(value.set)) {
+    const Type t = inference.types()[type];
+    if (hover.documentation.empty()) hover.documentation = DocumentationOf(type);
+    std::string line;
+    if (t.kind == TypeKind::kFunction) {
+      line = TextOfFunction(t.a, t.args_count > 0, true, true);
+    } else if (t.kind == TypeKind::kClass) {
+      const ClassInfo& info = inference.InfoOf(t.a);
+      line = "class " + std::string(info.name);
+      if (const auto constructor = inference.FindMember(t.a, "__init__");
+          constructor && constructor->owner != inference.ClassNamed("builtins", "object")) {
+        const Value init = inference.AttributeOf(inference.Just(inference.InstanceOf(t.a)), "__init__");
+        for (const TypeId function : inference.types().CopyOf(init.set)) {
+          if (inference.types()[function].kind != TypeKind::kFunction) continue;
+          const std::string signature = TextOfFunction(inference.types()[function].a, true, false, true);
+          const size_t open = signature.find('('), arrow = signature.rfind(" -> ");
+          line += signature.substr(open, arrow == std::string::npos ? std::string::npos : arrow - open);
+          break;
+        }
+      }
+    } else if (t.kind == TypeKind::kModule) {
+      line = TextOfType(type, true);
+    }
+    if (line.empty()) continue;
+    if (!hover.text.empty()) hover.text += '\n';
+    hover.text += line;
+  }
+  if (hover.text.empty() && value.IsKnown()) hover.text = std::string(name) + ": " + TextOfSet(value.set, true);
+  if (hover.text.empty()) hover.text = name;
+}
+
 Hover Workspace::HoverAt(FileId id, uint32_t offset) {
   Impl& in = *impl_;
   in.Begin();
@@ -326,39 +360,7 @@ Hover Workspace::HoverAt(FileId id, uint32_t offset) {
   const Occurrence& occurrence = file->bindings.occurrences[index];
   hover.begin = occurrence.begin;
   hover.end = file->bindings.EndOf(occurrence);
-  const std::string name(file->bindings.TextOf(occurrence));
-  const Value value = in.ValueAt(*file, index);
-  hover.types = in.TextsOf(value);
-  hover.certainty = CertaintyOf(value.doubt);
-  for (const TypeId type : in.inference.types().CopyOf(value.set)) {
-    const Type t = in.inference.types()[type];
-    if (hover.documentation.empty()) hover.documentation = in.DocumentationOf(type);
-    std::string line;
-    if (t.kind == TypeKind::kFunction) {
-      line = in.TextOfFunction(t.a, t.args_count > 0, true, true);
-    } else if (t.kind == TypeKind::kClass) {
-      const ClassInfo& info = in.inference.InfoOf(t.a);
-      line = "class " + std::string(info.name);
-      if (const auto constructor = in.inference.FindMember(t.a, "__init__");
-          constructor && constructor->owner != in.inference.ClassNamed("builtins", "object")) {
-        const Value init = in.inference.AttributeOf(in.inference.Just(in.inference.InstanceOf(t.a)), "__init__");
-        for (const TypeId function : in.inference.types().CopyOf(init.set)) {
-          if (in.inference.types()[function].kind != TypeKind::kFunction) continue;
-          const std::string signature = in.TextOfFunction(in.inference.types()[function].a, true, false, true);
-          const size_t open = signature.find('('), arrow = signature.rfind(" -> ");
-          line += signature.substr(open, arrow == std::string::npos ? std::string::npos : arrow - open);
-          break;
-        }
-      }
-    } else if (t.kind == TypeKind::kModule) {
-      line = in.TextOfType(type, true);
-    }
-    if (line.empty()) continue;
-    if (!hover.text.empty()) hover.text += '\n';
-    hover.text += line;
-  }
-  if (hover.text.empty() && value.IsKnown()) hover.text = name + ": " + in.TextOfSet(value.set, true);
-  if (hover.text.empty()) hover.text = name;
+  in.Describe(in.ValueAt(*file, index), file->bindings.TextOf(occurrence), hover);
   return hover;
 }
 

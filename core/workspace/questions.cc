@@ -46,6 +46,7 @@ void Workspace::Impl::Forget() {
   inference.Clear();
   calls_by_name_.clear();
   common_.clear();
+  ForgetPlaces();
 }
 
 void Workspace::Impl::Begin() {
@@ -64,6 +65,7 @@ void Workspace::Impl::Begin() {
     calls_by_name_.clear();
   }
   inference.Begin();
+  ForgetPlaces();
   is_bounded = false;
 }
 
@@ -144,13 +146,6 @@ Workspace::~Workspace() = default;
 FileId Workspace::FileOf(Text path) { return impl_->files.NumberOf(path); }
 const std::string& Workspace::PathOf(FileId file) const { return impl_->files.PathOf(file); }
 
-Position Workspace::PlaceOf(FileId file, uint32_t offset) { return impl_->files.PlaceOf(file, offset); }
-
-uint32_t Workspace::OffsetOf(FileId file, int line, int column) {
-  const SourceFile* source = impl_->Get(file);
-  return source == nullptr ? 0 : source->OffsetOf(line, column);
-}
-
 std::string Workspace::LineOf(FileId file, uint32_t offset) {
   const SourceFile* source = impl_->Get(file);
   if (source == nullptr) return {};
@@ -160,6 +155,11 @@ std::string Workspace::LineOf(FileId file, uint32_t offset) {
   while (begin > 0 && text[begin - 1] != '\n' && text[begin - 1] != '\r') --begin;
   while (end < text.size() && text[end] != '\n' && text[end] != '\r') ++end;
   return std::string(text.substr(begin, end - begin));
+}
+
+Text Workspace::SourceOf(FileId file) {
+  const SourceFile* source = impl_->Get(file);
+  return source == nullptr ? Text("") : source->text();
 }
 
 bool Workspace::CanRead(FileId file) { return impl_->Get(file) != nullptr; }
@@ -172,6 +172,7 @@ void Workspace::Open(FileId file, std::string text) {
 void Workspace::Change(FileId file, uint32_t begin, uint32_t end, Text text) {
   impl_->files.Change(file, begin, end, text);
   impl_->inference.Clear();
+  impl_->ForgetPlaces();
 }
 
 void Workspace::Close(FileId file) {

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "analysis/file_analyzer.h"
+#include "foundations/columns.h"
 #include "program/files.h"
 #include "program/modules.h"
 
@@ -104,6 +105,56 @@ struct Problem {
   std::string message;
 };
 
+// Lines that an editor may show as one, from 1, the last one included.
+struct Fold {
+  int first_line = 1;
+  int last_line = 1;
+  Text kind;  // "comment", "imports", "region"; empty for any other
+};
+
+struct Span {
+  uint32_t begin = 0;
+  uint32_t end = 0;
+};
+
+// What a name is, as an editor colours it.
+enum class TokenKind : uint8_t {
+  kNamespace,
+  kClass,
+  kEnum,
+  kTypeParameter,
+  kFunction,
+  kMethod,
+  kProperty,
+  kVariable,
+  kParameter,
+  kEnumMember,
+  kDecorator,
+};
+enum TokenModifier : uint8_t {
+  kTokenDeclaration = 1,
+  kTokenReadonly = 2,
+  kTokenStatic = 4,
+  kTokenAsync = 8,
+  kTokenModification = 16,
+  kTokenDocumentation = 32,
+  kTokenDefaultLibrary = 64,
+};
+struct ColouredName {
+  uint32_t begin = 0;
+  uint32_t end = 0;
+  TokenKind kind = TokenKind::kVariable;
+  uint8_t modifiers = 0;  // bits of TokenModifier
+};
+
+// What an editor may show within a line: a type behind what has it, or the parameter in front of an argument.
+struct InlineHint {
+  uint32_t offset = 0;
+  std::string text;  // `: int`, ` -> int`, `tax=`
+  bool is_type = true;
+  Certainty certainty = Certainty::kCertain;
+};
+
 struct Rename {
   std::vector<TextEdit> edits;  // in order of files and offsets
   std::string problem;          // why it cannot be done; empty where it can
@@ -130,8 +181,11 @@ class Workspace {
 
   FileId FileOf(Text path);
   const std::string& PathOf(FileId file) const;
-  // Line and column from 1, the column in bytes; and back, held to the file. 0 and (1, 1) for a file that cannot be
-  // read.
+  // What columns count, bytes without it. For who counts otherwise a byte order mark at the beginning of a buffer
+  // stands in its first line, as it does in an editor's text that begins with one.
+  void set_column_unit(ColumnUnit unit);
+  // Line and column from 1; and back, held to the file. 0 and (1, 1) for a file that cannot be read. Cheap for
+  // places of a file in their order.
   Position PlaceOf(FileId file, uint32_t offset);
   uint32_t OffsetOf(FileId file, int line, int column);
   // The bytes of a line, for showing an answer.
@@ -149,12 +203,19 @@ class Workspace {
   std::vector<Location> Definitions(FileId file, uint32_t offset);
   // Where the types of what is there are defined.
   std::vector<Location> TypeDefinitions(FileId file, uint32_t offset);
+  // Where what is there is declared: in stubs, where there are some, and otherwise where it is defined.
+  std::vector<Location> Declarations(FileId file, uint32_t offset);
+  // The classes below a class in all degrees, and the methods that override a method; of anything else, or where there
+  // are none, the definitions.
+  std::vector<Location> Implementations(FileId file, uint32_t offset);
   // In order of files and offsets; the definitions are among them.
   std::vector<Location> References(FileId file, uint32_t offset, bool everywhere = true);
   std::vector<std::string> Types(FileId file, uint32_t offset);
   Hover HoverAt(FileId file, uint32_t offset);
   std::vector<Signature> Signatures(FileId file, uint32_t offset);
   std::vector<Completion> Complete(FileId file, uint32_t offset);
+  // What one of the names is that may be written at a place; without text where that is not known.
+  Hover DescribeCompletion(FileId file, uint32_t offset, Text name);
   Rename RenameTo(FileId file, uint32_t offset, Text name, bool only_certain = true);
   std::vector<SymbolInfo> Symbols(Text query, size_t most = 200);
   std::vector<OutlineItem> Outline(FileId file);
@@ -163,6 +224,18 @@ class Workspace {
   std::vector<Location> Supertypes(FileId file, uint32_t offset);
   std::vector<Location> Subtypes(FileId file, uint32_t offset);
   std::vector<Problem> Problems(FileId file);
+  // Blocks, brackets and strings of several lines, comments, imports and `# region`s, each beginning on a line of its
+  // own, in order.
+  std::vector<Fold> Folds(FileId file);
+  // What holds a place: the name or expression, those around it, statements, blocks, the file; the smallest first.
+  std::vector<Span> Selections(FileId file, uint32_t offset);
+  // The names of the file, in order, or those that begin between two offsets.
+  std::vector<ColouredName> Colours(FileId file, uint32_t begin = 0, uint32_t end = UINT32_MAX);
+  // Of the statements that begin there: types of variables and results that are not written and not plain to see, and
+  // parameters that arguments without a name are given to.
+  std::vector<InlineHint> Hints(FileId file, uint32_t begin = 0, uint32_t end = UINT32_MAX);
+  // The source, as columns count it; empty for a file that cannot be read.
+  Text SourceOf(FileId file);
   // A dotted name, such as `Shop.total` or `shop.Shop.total`: what is defined by it in the project.
   std::vector<Location> Named(Text dotted);
 
@@ -170,8 +243,9 @@ class Workspace {
   bool was_bounded() const;
   size_t ByteSize() const;
 
- private:
   class Impl;
+
+ private:
   std::unique_ptr<Impl> impl_;
 };
 

@@ -25,6 +25,8 @@ class Workspace::Impl final : public CallerSource {
   void Begin();
   void Forget();
   const SourceFile* Get(FileId file) { return files.Get(file); }
+  // The bytes of a line from 1, without its end; (0, 0) for one in front of the file, its end for one behind.
+  std::pair<uint32_t, uint32_t> LineAt(const SourceFile& file, int line);
   // One of many files that a question goes over. While it lasts nothing is given back; behind it this one is, where
   // much is held and it was not before, and whatever was not asked for lately, where very much is: so no other file may
   // be in use then.
@@ -43,6 +45,12 @@ class Workspace::Impl final : public CallerSource {
    public:
     const SourceFile* const file;  // nullptr where it cannot be read
   };
+  Text SourceForPlaces(FileId file);
+  void ForgetPlaces() {
+    placed = {};
+    placed_source_of = kNoFile;
+    placed_source.clear();
+  }
   // Whether a file lies below a root of the project.
   bool IsProject(FileId file);
 
@@ -83,6 +91,8 @@ class Workspace::Impl final : public CallerSource {
   std::vector<std::string> TextsOf(Value value, bool is_short = false);
   std::string TextOfFunction(FunctionId function, bool is_bound, bool has_name, bool is_short, int depth = 0);
   std::string TextOfParameter(const FunctionInfo& info, size_t index, bool is_short);
+  // The text, the documentation and the types of what a name stands for.
+  void Describe(Value value, Text name, Hover& hover);
   std::string DocumentationOf(FileId file, StmtId stmt);
   std::string DocumentationOf(TypeId type);
   std::string DocumentationOf(const Entity& entity);
@@ -103,6 +113,9 @@ class Workspace::Impl final : public CallerSource {
   NewName NewNameAt(const SourceFile& file, uint32_t begin);
   bool IsInBrackets(const SourceFile& file, uint32_t offset);
   std::string KindOfSymbol(const SourceFile& file, uint32_t symbol, bool in_class);
+
+  // ---- hints.cc ----
+  void AddParameterHints(const SourceFile& file, ExprId call, std::vector<InlineHint>& hints);
 
   // ---- calls ----
   struct Callee {
@@ -130,6 +143,16 @@ class Workspace::Impl final : public CallerSource {
   ProjectFiles project;
   Inference inference;
   bool is_bounded = false;
+  ColumnUnit column_unit = ColumnUnit::kUtf8;
+  // The place that was looked up last: those behind it on its line are counted from there. Holds while no text changes.
+  struct Placed {
+    FileId file = kNoFile;
+    uint32_t offset = 0;
+    Position place{1, 1};
+  };
+  Placed placed;
+  FileId placed_source_of = kNoFile;  // of one that is not held
+  std::string placed_source;
   std::unique_ptr<FileAnalyzer> analyzer;  // made when it is first needed
 
  private:

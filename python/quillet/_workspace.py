@@ -2,7 +2,8 @@
 
 A workspace reads the files that a question needs, and again those that changed. Nothing is imported or run: where
 the libraries of an environment lie is found by its folders, and what the standard library is by the stubs of the
-package typeshed-client. Lines and columns count from 1, columns in UTF-8 bytes, as those of `bind`.
+package typeshed-client. Lines and columns count from 1, columns in UTF-8 bytes, as those of `bind`, unless a workspace
+is asked to count otherwise.
 """
 
 from __future__ import annotations
@@ -17,8 +18,10 @@ from quillet._source import to_utf8
 from quillet.tarvex import _host
 
 StrPath = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
+Columns = Literal["utf-8", "utf-16", "utf-32"]
 Certainty = Literal["certain", "likely", "by name"]
 
+_COLUMNS: tuple[Columns, ...] = ("utf-8", "utf-16", "utf-32")
 _CERTAINTIES: tuple[Certainty, ...] = ("certain", "likely", "by name")
 
 
@@ -124,7 +127,7 @@ class WorkspaceSymbol(NamedTuple):
 class OutlineItem(NamedTuple):
     """A class, function, method, variable or attribute of a file, with what is in it.
 
-    `line`, `column` and `end_column` are those of the name, `first_line` and `last_line` those of the whole.
+    `line`, `column` and `end_column` are those of the name, the others those of the whole.
     """
 
     name: str
@@ -135,6 +138,8 @@ class OutlineItem(NamedTuple):
     end_column: int
     first_line: int
     last_line: int
+    first_column: int
+    last_column: int
     children: tuple[OutlineItem, ...]
 
 
@@ -153,6 +158,26 @@ class Stopped(Exception):
     """A question was ended by `Workspace.stop`."""
 
 
+class Fold(NamedTuple):
+    """Lines that an editor may show as one, the last one included. `kind` is "comment", "imports", "region" or ""."""
+
+    first_line: int
+    last_line: int
+    kind: str
+
+
+class Hint(NamedTuple):
+    """What an editor may show within a line: `kind` is "type", behind what has it, or "parameter", in front of an
+    argument.
+    """
+
+    line: int
+    column: int
+    text: str
+    kind: str
+    certainty: Certainty
+
+
 class RenameError(ValueError):
     """A name cannot be changed; the message says why not."""
 
@@ -167,6 +192,8 @@ class Workspace:
     running interpreter is taken. `version` is the Python that the sources are written for, without it the
     environment's.
 
+    `columns` says what columns count: bytes of UTF-8, units of UTF-16, or code points ("utf-32").
+
     Any thread may ask; they are answered one after the other. Raises `OSError` for a root that is not there,
     `ValueError` for an environment that is none and for a version that is unknown.
     """
@@ -177,6 +204,7 @@ class Workspace:
         exclude: Iterable[str] = (),
         environment: StrPath | None = None,
         version: tuple[int, ...] | None = None,
+        columns: Columns = "utf-8",
     ) -> None:
         folders = [os.path.abspath(os.fsencode(root)) for root in roots or (".",)]
         for folder in folders:
@@ -199,6 +227,10 @@ class Workspace:
             _utf8("\n".join(exclude)),
             native_language_of(found_version),
         )
+        if columns not in _COLUMNS:
+            raise ValueError(f"columns must be one of {', '.join(map(repr, _COLUMNS))}, not {columns!r}")
+        if columns != "utf-8":
+            self._native.SetColumnUnit(columns.encode())
 
     @property
     def roots(self) -> tuple[str, ...]:
@@ -223,6 +255,14 @@ class Workspace:
     def type_definitions(self, path: StrPath, line: int, column: int) -> list[Location]:
         """Where the types of what is at a place are defined."""
         return _locations(self._native.TypeDefinitions(self._readable(path), line, column))
+
+    def declarations(self, path: StrPath, line: int, column: int) -> list[Location]:
+        """Where what is at a place is declared: by a stub, where there is one, and otherwise where it is defined."""
+        return _locations(self._native.Declarations(self._readable(path), line, column))
+
+    def implementations(self, path: StrPath, line: int, column: int) -> list[Location]:
+        """All classes below the one that is named at a place, or what overrides its method; otherwise definitions."""
+        return _locations(self._native.Implementations(self._readable(path), line, column))
 
     def references(
         self,
@@ -261,6 +301,11 @@ class Workspace:
     def complete(self, path: StrPath, line: int, column: int) -> list[Completion]:
         """What may be written at a place, the best first."""
         return [Completion._make(row) for row in self._native.Complete(self._readable(path), line, column)]
+
+    def describe_completion(self, path: StrPath, line: int, column: int, name: str) -> Hover | None:
+        """What one of the names is that may be written at a place, as `hover` says it; None where it is not known."""
+        row = self._native.DescribeCompletion(self._readable(path), line, column, _utf8(name))
+        return None if row is None else Hover._make(row)
 
     def rename(self, path: StrPath, line: int, column: int, new_name: str, *, only_certain: bool = True) -> list[Edit]:
         """The edits in all files that give what is named at a place another name, in the order of files and lines.
@@ -315,6 +360,30 @@ class Workspace:
     def problems(self, path: StrPath) -> list[Problem]:
         """What is wrong in a file: its syntax errors, imports that lead nowhere, and names that are nothing."""
         return [Problem._make(row) for row in self._native.Problems(self._readable(path))]
+
+    def folds(self, path: StrPath) -> list[Fold]:
+        """What of a file may be shown as one line, at most one for each line that it begins on."""
+        return [Fold._make(row) for row in self._native.Folds(self._readable(path))]
+
+    def selections(self, path: StrPath, line: int, column: int) -> list[tuple[int, int, int, int]]:
+        """What holds a place, as line, column, end line and end column: the smallest first, the file last."""
+        return self._native.Selections(self._readable(path), line, column)
+
+    def tokens(self, path: StrPath, first_line: int = 0, last_line: int = 0) -> list[int]:
+        """What the names of a file are, or of some of its lines: five numbers each, the lines and columns since the
+        name in front, its length, its kind (namespace, class, enum, type parameter, function, method, property,
+        variable, parameter, member of an enum, decorator) and the bits of its modifiers (declaration, read-only,
+        static, asynchronous, modification, documentation, of the standard library).
+        """
+        return self._native.Colours(self._readable(path), first_line, last_line)
+
+    def hints(self, path: StrPath, first_line: int = 0, last_line: int = 0) -> list[Hint]:
+        """Types that are not written, and parameters of arguments, of a file or of some of its lines."""
+        return [Hint._make(row) for row in self._native.Hints(self._readable(path), first_line, last_line)]
+
+    def source(self, path: StrPath) -> bytes:
+        """The text of a file or buffer, in UTF-8."""
+        return self._native.SourceOf(self._readable(path))
 
     # ---- buffers ----
 

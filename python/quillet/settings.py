@@ -12,7 +12,7 @@ import sys
 from collections.abc import Callable, Iterable, Mapping
 from typing import Any, NamedTuple
 
-from quillet._workspace import Certainty, Workspace
+from quillet._workspace import Certainty, Columns, Workspace
 
 PROJECT_FILE = "pyproject.toml"
 TABLE = "tool.quillet"
@@ -40,9 +40,15 @@ class Settings(NamedTuple):
     certainty: Certainty = "by name"
     file: str | None = None
 
-    def workspace(self) -> Workspace:
+    def workspace(self, *, columns: Columns = "utf-8") -> Workspace:
         """A workspace of that. Raises as `Workspace` does."""
-        return Workspace(*self.roots, exclude=self.exclude, environment=self.environment, version=self.version)
+        return Workspace(
+            *self.roots,
+            exclude=self.exclude,
+            environment=self.environment,
+            version=self.version,
+            columns=columns,
+        )
 
     def admits(self, certainty: str) -> bool:
         """Whether an answer is sure enough to be shown."""

@@ -1,4 +1,4 @@
-"""The commands that serve other programs: `mcp`.
+"""The commands that serve other programs: `serve` and `mcp`.
 
 As in the rest of the command line, what a command needs is imported when it runs.
 """
@@ -44,4 +44,21 @@ def mcp(roots: tuple[str, ...], environment: str | None, version: tuple[int, int
     sys.exit(run(Settings(roots=roots, environment=environment, version=version), log))
 
 
-COMMANDS = (mcp,)
+@click.command()
+@_log_option
+@click.option("--stdio", is_flag=True, hidden=True, expose_value=False)
+def serve(log: str | None) -> None:
+    """Serves an editor: the Language Server Protocol over standard input and output.
+
+    What is needed for it is installed by "pip install quillet[serve]".
+
+    \b
+        quillet serve
+        quillet serve --log quillet.log
+    """
+    from quillet.cli.serve import run
+
+    sys.exit(run(log))
+
+
+COMMANDS = (serve, mcp)

@@ -1,0 +1,80 @@
+"""The texts that an editor holds, and how it calls files."""
+
+from __future__ import annotations
+
+import os
+import re
+from collections.abc import Iterator
+from functools import lru_cache
+from urllib.parse import quote, unquote_to_bytes, urlsplit
+
+_DRIVE = re.compile(r"/[A-Za-z]:")
+
+
+@lru_cache(maxsize=4096)
+def path_of(uri: str) -> str:
+    """The path that a URI stands for; one of its own for what is no file, such as a text without a name."""
+    parts = urlsplit(uri)
+    if parts.scheme != "file":
+        name = "".join(letter if letter.isalnum() else "_" for letter in uri)
+        return os.path.join(os.path.abspath(os.sep), "unnamed", f"{name}.py")
+    path = os.fsdecode(unquote_to_bytes(parts.path))
+    if os.name == "nt":
+        if _DRIVE.match(path):
+            path = path[1:]
+        elif parts.netloc:
+            path = f"//{parts.netloc}{path}"
+    return os.path.abspath(path)
+
+
+@lru_cache(maxsize=4096)
+def uri_of(path: str) -> str:
+    """The URI of a file."""
+    if os.name == "nt":
+        path = "/" + path.replace("\\", "/")
+    return "file://" + quote(os.fsencode(path))
+
+
+class Document:
+    """A text that the editor holds. The workspaces have its content; this says which one it is."""
+
+    __slots__ = ("is_python", "is_read", "path", "uri", "version")
+
+    def __init__(self, uri: str, path: str, version: int, is_python: bool) -> None:
+        self.uri = uri
+        self.path = path
+        self.version = version
+        self.is_python = is_python
+        self.is_read = True  # not too large for that
+
+
+class Documents:
+    """What is open, by URI."""
+
+    def __init__(self) -> None:
+        self._by_uri: dict[str, Document] = {}
+        self._by_path: dict[str, Document] = {}
+
+    def __iter__(self) -> Iterator[Document]:
+        return iter(self._by_uri.values())
+
+    def get(self, uri: str) -> Document | None:
+        return self._by_uri.get(uri)
+
+    def at(self, path: str) -> Document | None:
+        return self._by_path.get(path)
+
+    def add(self, document: Document) -> None:
+        self._by_uri[document.uri] = document
+        self._by_path[document.path] = document
+
+    def remove(self, uri: str) -> Document | None:
+        document = self._by_uri.pop(uri, None)
+        if document is not None:
+            self._by_path.pop(document.path, None)
+        return document
+
+    def uri_of(self, path: str) -> str:
+        """The URI of a file, as the editor writes it where it has it open."""
+        document = self._by_path.get(path)
+        return uri_of(path) if document is None else document.uri

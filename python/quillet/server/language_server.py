@@ -1,0 +1,130 @@
+"""What the answers of one client are made of: its documents, its projects, and what it understands."""
+
+from __future__ import annotations
+
+import logging
+from collections.abc import Callable
+from typing import Any, NamedTuple
+
+from lsprotocol import types
+from pygls.lsp.server import LanguageServer
+
+from quillet._workspace import Stopped, Workspace
+from quillet.server.documents import Document, Documents, path_of
+from quillet.server.positions import place_of
+from quillet.server.projects import Projects
+from quillet.server.protocol import Protocol
+from quillet.server.work import Work
+from quillet.settings import Settings
+
+log = logging.getLogger(__name__)
+
+# Above so many characters a document is not read.
+MOST_TEXT = 1 << 25
+
+
+class Place(NamedTuple):
+    """Where a question is asked."""
+
+    workspace: Workspace
+    settings: Settings
+    path: str
+    line: int
+    column: int
+
+    @property
+    def at(self) -> tuple[str, int, int]:
+        return self.path, self.line, self.column
+
+
+class Server(LanguageServer):
+    """The server of one client."""
+
+    protocol: Protocol
+
+    def __init__(self, version: str) -> None:
+        super().__init__("quillet", version, protocol_cls=Protocol, max_workers=1)
+        self.documents = Documents()
+        self.projects = Projects(self.complain, self._open_all)
+        self.work = Work(self._stop)
+        # Where names were offered last, of which more may be asked: the document, its version, the position.
+        self.completed: tuple[str, int | None, types.Position] | None = None
+        self.completion_number = 0
+        # What the client understands, as the answers need it.
+        self.has_markdown = True
+        self.has_hierarchy = False
+        self.has_versions = False
+        self.pulls_diagnostics = False
+        self.refreshes_diagnostics = False
+        self.has_watchers = False
+        self.has_configuration = False
+        self.has_progress = False
+
+    # ---- what answers need ----
+
+    def place(self, params: Any) -> Place:
+        """Where a request with a document and a position asks."""
+        path = path_of(params.text_document.uri)
+        project = self.projects.of(path)
+        return Place(project.workspace, project.settings, path, *place_of(params.position))
+
+    def file(self, uri: str) -> tuple[Workspace, Settings, str]:
+        """What a request about a whole document asks."""
+        path = path_of(uri)
+        project = self.projects.of(path)
+        return project.workspace, project.settings, path
+
+    def version_of(self, uri: str) -> int | None:
+        """That of a document that is open."""
+        document = self.documents.get(uri)
+        return None if document is None else document.version
+
+    def markup(self, text: str) -> Any:
+        """A text for people, in the form that the client shows."""
+        return {"kind": "markdown" if self.has_markdown else "plaintext", "value": text}
+
+    def when_idle(self, key: str, action: Callable[[], None], delay: float = 0) -> None:
+        """Does something once there is nothing else to do; what comes in between ends it, and it begins anew."""
+
+        def act() -> None:
+            try:
+                action()
+            except Stopped:
+                self.when_idle(key, action, delay)
+            except Exception:
+                log.exception("%s failed", key)
+
+        self.work.later(key, act, delay)
+
+    def complain(self, text: str) -> None:
+        """Tells the user what is wrong."""
+        log.warning("%s", text)
+        self.protocol.tell("window/showMessage", {"type": types.MessageType.Error.value, "message": f"quillet: {text}"})
+
+    # ---- texts ----
+
+    def open_document(self, document: Document, text: str) -> None:
+        """An editor's text counts from now on."""
+        if len(text) > MOST_TEXT:
+            log.warning("%s is too large to be read", document.uri)
+            document.is_read, text = False, ""
+        self.documents.add(document)
+        self.projects.of(document.path)  # which may be a new one
+        for workspace in self.projects.workspaces:
+            workspace.open(document.path, text)
+
+    def _open_all(self, workspace: Workspace) -> None:
+        """A new workspace gets what is open, as the others have it."""
+        for document in self.documents:
+            for other in self.projects.workspaces:
+                workspace.open(document.path, other.source(document.path))
+                break
+
+    def _stop(self, patience: float) -> None:
+        for workspace in self.projects.workspaces:
+            workspace.stop(patience=patience)
+
+    def proceed(self) -> None:
+        """Questions may be asked again."""
+        for workspace in self.projects.workspaces:
+            workspace.proceed()

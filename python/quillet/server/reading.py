@@ -1,0 +1,160 @@
+"""What a text says to its reader: hovers, signatures, colours, folds, selections and hints within the lines."""
+
+from __future__ import annotations
+
+from typing import Any
+
+from lsprotocol import types
+
+from quillet.server.features import feature
+from quillet.server.language_server import Server
+from quillet.server.positions import place_of, range_of
+
+# In the order of the numbers that workspaces give.
+TOKEN_TYPES = [
+    "namespace",
+    "class",
+    "enum",
+    "typeParameter",
+    "function",
+    "method",
+    "property",
+    "variable",
+    "parameter",
+    "enumMember",
+    "decorator",
+]
+TOKEN_MODIFIERS = ["declaration", "readonly", "static", "async", "modification", "documentation", "defaultLibrary"]
+
+
+@feature(types.TEXT_DOCUMENT_HOVER)
+def hover(ls: Server, params: types.HoverParams) -> Any:
+    place = ls.place(params)
+    found = place.workspace.hover(*place.at)
+    if found is None or not place.settings.admits(found.certainty):
+        return None
+    parts = [f"```python\n{found.text}\n```" if ls.has_markdown else found.text] if found.text else []
+    shown = [text for text in found.types if text not in found.text]
+    if shown and not found.text.startswith(("def ", "class ", "async def ", "module ")):
+        types_text = " | ".join(shown)
+        parts.append(f"`{types_text}`" if ls.has_markdown else types_text)
+    if found.documentation:
+        parts.append(_documentation(ls, found.documentation))
+    if found.certainty != "certain":
+        parts.append(f"*{found.certainty}*" if ls.has_markdown else f"({found.certainty})")
+    value = ("\n\n---\n\n" if ls.has_markdown else "\n\n").join(parts)
+    return {
+        "contents": ls.markup(value),
+        "range": range_of(found.line, found.column, found.line, found.end_column),
+    }
+
+
+def _documentation(ls: Server, text: str) -> str:
+    """A docstring, which is plain text, so that Markdown shows it as it is written."""
+    if not ls.has_markdown:
+        return text
+    lines = []
+    is_code = False
+    for line in text.splitlines():
+        stripped = line.strip()
+        if stripped.startswith("```"):
+            is_code = not is_code
+        elif not is_code and stripped and not line.startswith("    "):
+            for mark in ("\\", "*", "_", "<", "#"):
+                line = line.replace(mark, "\\" + mark)
+            line += "  "
+        lines.append(line)
+    return "\n".join(lines)
+
+
+def documentation(ls: Server, text: str) -> Any:
+    """A docstring for the client."""
+    return ls.markup(_documentation(ls, text))
+
+
+@feature(
+    types.TEXT_DOCUMENT_SIGNATURE_HELP,
+    types.SignatureHelpOptions(trigger_characters=["(", ","], retrigger_characters=[")"]),
+)
+def signature_help(ls: Server, params: types.SignatureHelpParams) -> Any:
+    place = ls.place(params)
+    found = [each for each in place.workspace.signatures(*place.at) if place.settings.admits(each.certainty)]
+    if not found:
+        return None
+    signatures = []
+    for each in found:
+        signature: dict[str, Any] = {
+            "label": each.label,
+            "parameters": [{"label": parameter.label} for parameter in each.parameters],
+        }
+        if each.documentation:
+            signature["documentation"] = documentation(ls, each.documentation)
+        if each.active is not None:
+            signature["activeParameter"] = each.active
+        signatures.append(signature)
+    first = next((index for index, each in enumerate(found) if each.active is not None), 0)
+    answer: dict[str, Any] = {"signatures": signatures, "activeSignature": first}
+    if found[first].active is not None:
+        answer["activeParameter"] = found[first].active
+    return answer
+
+
+# ---- the shape of a text ----
+
+
+@feature(types.TEXT_DOCUMENT_FOLDING_RANGE)
+def folding_range(ls: Server, params: types.FoldingRangeParams) -> Any:
+    workspace, _, path = ls.file(params.text_document.uri)
+    return [
+        {"startLine": first - 1, "endLine": last - 1, **({"kind": kind} if kind else {})}
+        for first, last, kind in workspace.folds(path)
+    ]
+
+
+@feature(types.TEXT_DOCUMENT_SELECTION_RANGE)
+def selection_range(ls: Server, params: types.SelectionRangeParams) -> Any:
+    workspace, _, path = ls.file(params.text_document.uri)
+    answer = []
+    for position in params.positions:
+        selection: dict[str, Any] | None = None
+        for span in reversed(workspace.selections(path, *place_of(position))):
+            selection = {"range": range_of(*span), **({"parent": selection} if selection else {})}
+        line, column = place_of(position)
+        answer.append(selection or {"range": range_of(line, column, line, column)})
+    return answer
+
+
+_LEGEND = types.SemanticTokensLegend(token_types=TOKEN_TYPES, token_modifiers=TOKEN_MODIFIERS)
+
+
+@feature(types.TEXT_DOCUMENT_SEMANTIC_TOKENS_FULL, _LEGEND)
+def semantic_tokens(ls: Server, params: types.SemanticTokensParams) -> Any:
+    workspace, _, path = ls.file(params.text_document.uri)
+    return {"data": workspace.tokens(path)}
+
+
+@feature(types.TEXT_DOCUMENT_SEMANTIC_TOKENS_RANGE, _LEGEND)
+def semantic_tokens_range(ls: Server, params: types.SemanticTokensRangeParams) -> Any:
+    workspace, _, path = ls.file(params.text_document.uri)
+    first, last = place_of(params.range.start)[0], place_of(params.range.end)[0]
+    return {"data": workspace.tokens(path, first, last)}
+
+
+@feature(types.TEXT_DOCUMENT_INLAY_HINT)
+def inlay_hint(ls: Server, params: types.InlayHintParams) -> Any:
+    workspace, settings, path = ls.file(params.text_document.uri)
+    first, last = place_of(params.range.start)[0], place_of(params.range.end)[0]
+    answer = []
+    for hint in workspace.hints(path, first, last):
+        if not settings.admits(hint.certainty):
+            continue
+        is_type = hint.kind == "type"
+        answer.append(
+            {
+                "position": {"line": hint.line - 1, "character": hint.column - 1},
+                "label": hint.text,
+                "kind": (types.InlayHintKind.Type if is_type else types.InlayHintKind.Parameter).value,
+                "paddingRight": not is_type,
+            }
+        )
+    return answer
