@@ -92,7 +92,8 @@ TEST(Colours, AreThereForBrokenText) {
 TEST(Hints, SayWhatIsNotWrittenAndNotPlain) {
   Program program(
       "class K:\n  def __init__(self, size, _x=0): pass\n  def m(self, count, *rest): return 1.5\n"
-      "k = K(3)\nn = 1\nr = k.m(2, 4)\nalias = K\ndef f(a, /, big):\n  return k\nf(1, 2)\nf(1, big=2)\nt: int = k.m(n)\n");
+      "k = K(3)\nn = 1\nr = k.m(2, 4)\nalias = K\ndef f(a, /, big):\n  return k\nf(1, 2)\nf(1, big=2)\nt: int = "
+      "k.m(n)\n");
   Words words;
   for (const InlineHint& hint : program->Hints(program.File("a.py")))
     words.push_back(program.Say(program.File("a.py"), hint.offset) + " " + hint.text);
