@@ -1,5 +1,6 @@
 // Types, signatures and documentation as text.
 #include <algorithm>
+#include <cctype>
 
 #include "workspace/workspace_impl.h"
 
@@ -105,6 +106,24 @@ std::vector<std::string> Workspace::Impl::TextsOf(Value value, bool is_short) {
   return texts;
 }
 
+namespace {
+
+// What a signature says of a parameter or a result: that builtins are builtins goes without saying there.
+std::string WithoutBuiltins(std::string text) {
+  static constexpr Text kPrefix = "builtins.";
+  for (size_t at = 0; (at = text.find(kPrefix, at)) != std::string::npos;) {
+    const bool is_whole = at == 0 || (text[at - 1] != '.' && text[at - 1] != '_' &&
+                                      !std::isalnum(static_cast<unsigned char>(text[at - 1])));
+    if (is_whole)
+      text.erase(at, kPrefix.size());
+    else
+      at += kPrefix.size();
+  }
+  return text;
+}
+
+}  // namespace
+
 std::string Workspace::Impl::TextOfParameter(const FunctionInfo& info, size_t index, bool is_short) {
   const SourceFile* file = Get(info.file);
   const FileSyntax& syntax = file->syntax;
@@ -116,12 +135,13 @@ std::string Workspace::Impl::TextOfParameter(const FunctionInfo& info, size_t in
   if (kind == ParameterKind::kStar) text = "*";
   if (kind == ParameterKind::kDoubleStar) text = "**";
   text += syntax.NameOf(parameter);
-  const ExprId hint = syntax.ChildOf(parameter, 0), otherwise = syntax.ChildOf(parameter, 1);
+  const ExprId hint = inference.HintOfParameter(*file, info, index), otherwise = syntax.ChildOf(parameter, 1);
   static constexpr size_t kMaxText = 60;
   if (hint != kNoExpr) {
     const Text as_written = syntax.TextOf(syntax[hint]);
     text += ": ";
-    text += is_short ? std::string(as_written) : TextOfSet(inference.ValueOfHint(info.file, hint).set, false, 2);
+    text += is_short ? std::string(as_written)
+                     : WithoutBuiltins(TextOfSet(inference.ValueOfHint(info.file, hint).set, false, 2));
   }
   if (otherwise != kNoExpr) {
     const Text value = syntax.TextOf(syntax[otherwise]);
@@ -153,7 +173,7 @@ std::string Workspace::Impl::TextOfFunction(FunctionId function, bool is_bound, 
     result = file->syntax.TextOf(file->syntax[hint]);
   } else {
     const Value value = hint != kNoExpr ? inference.ValueOfHint(info.file, hint) : inference.ResultOfFunction(function);
-    if (value.IsKnown()) result = TextOfSet(value.set, is_short, depth + 1);
+    if (value.IsKnown()) result = WithoutBuiltins(TextOfSet(value.set, is_short, depth + 1));
   }
   if (!result.empty()) text += " -> " + result;
   return text;

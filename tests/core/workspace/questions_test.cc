@@ -433,6 +433,15 @@ TEST(Hovers, ShowDeclarationsAndDocumentation) {
   EXPECT_EQ(at(3).text, "");
 }
 
+TEST(Types, OfFunctionsAreTheirSignatures) {
+  Program program(
+      "class B: pass\ndef $f(x: int, b: B) -> list[str]: ...\ndef $g(self, x, *y):\n  # type: (int, *str) -> B\n  "
+      "pass\n"
+      "$h = lambda x=1: x\n");
+  EXPECT_EQ(program.AllTypes(),
+            (Words{"def (x: int, b: a.B) -> list[str]", "def (self, x: int, *y: str) -> a.B", "def (x=1) -> int"}));
+}
+
 // ---- outlines and symbols ----
 
 TEST(Outlines, ShowAHeadOnOneLine) {
@@ -559,15 +568,15 @@ TEST(Problems, AreNoneBehindStarsOfAnythingAndWhatIsNeverRun) {
 
 TEST(Buffers, StandForTheirFiles) {
   Program program({{"a.py", "from b import $f\n"}, {"b.py", "def f(): return 1\n"}});
-  EXPECT_EQ(program.Types(0), "def () -> builtins.int");
+  EXPECT_EQ(program.Types(0), "def () -> int");
   program.Open("b.py", "\ndef f(): return 'a'\n");
-  EXPECT_EQ(program.Types(0), "def () -> builtins.str");
+  EXPECT_EQ(program.Types(0), "def () -> str");
   EXPECT_EQ(program.Definitions(0), Words{"b.py:2:5"});
   program->Change(program.File("b.py"), 5, 6, "g");
   EXPECT_EQ(program.Definitions(0), Words{"a.py:1:15"});  // no more than what binds the name
   EXPECT_EQ(ProblemsOf(program), Words{"a.py:1:15 unresolved-import: nothing is named 'f' there"});
   program->Close(program.File("b.py"));
-  EXPECT_EQ(program.Types(0), "def () -> builtins.int");
+  EXPECT_EQ(program.Types(0), "def () -> int");
   EXPECT_EQ(ProblemsOf(program), Words{});
 }
 
