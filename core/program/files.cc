@@ -22,7 +22,6 @@ namespace {
 
 std::atomic<SourceDecoder> decoder_of_all{nullptr};
 
-// Stubs are written in the newest language, whatever the version that they describe.
 constexpr Version kStubVersion = Version::Of(3, 14);
 
 void AppendLatin1(Text bytes, std::string& out) {
@@ -112,6 +111,7 @@ class Files::Impl {
 
   const std::string& PathOf(FileId file) const { return entries_[file].path; }
   bool IsOpen(FileId file) const { return entries_[file].buffer.has_value(); }
+  bool IsStub(FileId file) const { return entries_[file].path.ends_with(".pyi"); }
   const std::vector<FileId>& Buffers() const { return buffers_; }
   size_t ByteSize() const { return held_; }
 
@@ -292,7 +292,7 @@ class Files::Impl {
     auto file = std::make_unique<SourceFile>();
     file->id = number;
     file->path = entry.path;
-    file->is_stub = entry.path.ends_with(".pyi");
+    file->is_stub = IsStub(number);
     ReaderFor(file->is_stub).Read(text, *file);
     entry.byte_size = file->ByteSize();
     held_ += entry.byte_size;
@@ -342,6 +342,12 @@ void Files::Open(FileId file, std::string text) { impl_->Open(file, std::move(te
 void Files::Change(FileId file, uint32_t begin, uint32_t end, Text text) { impl_->Change(file, begin, end, text); }
 void Files::Close(FileId file) { impl_->Close(file); }
 bool Files::IsOpen(FileId file) const { return impl_->IsOpen(file); }
+bool Files::IsStub(FileId file) const { return impl_->IsStub(file); }
+Version Files::VersionOf(FileId file) const { return IsStub(file) ? kStubVersion : version_; }
+
+void Files::ReadSource(FileId file, const FileStamp& stamp, std::string& memory) const {
+  if (!ReadDecoded(PathOf(file), stamp, memory)) memory.clear();
+}
 const std::vector<FileId>& Files::Buffers() const { return impl_->Buffers(); }
 void Files::Trim(size_t bytes) { impl_->Trim(bytes); }
 void Files::GiveBack(FileId file) { impl_->GiveBack(file); }

@@ -11,6 +11,7 @@
 
 #include "foundations/text.h"
 #include "program/source_file.h"
+#include "project/file_system.h"
 
 namespace quillet {
 
@@ -51,6 +52,10 @@ class Files {
   // read. Any number of threads may ask while nothing else is called.
   Text SourceOf(FileId file, std::string& memory) const;
 
+  // The same of a file as it is on disk, whatever is held of it, by a stamp of it that was taken before: into `memory`,
+  // which is empty where it cannot be read.
+  void ReadSource(FileId file, const FileStamp& stamp, std::string& memory) const;
+
   // The line and the column of a place, from 1, in bytes: without an analysis. The place is held to no extent.
   Position PlaceOf(FileId file, uint32_t offset);
 
@@ -63,6 +68,7 @@ class Files {
   void Change(FileId file, uint32_t begin, uint32_t end, Text text);
   void Close(FileId file);
   bool IsOpen(FileId file) const;
+  bool IsStub(FileId file) const;
   // Those that a buffer holds, in no order.
   const std::vector<FileId>& Buffers() const;
 
@@ -75,6 +81,8 @@ class Files {
   size_t ByteSize() const;
 
   Version version() const { return version_; }
+  // What a file is read as: stubs are written in the newest language, whatever the version that they describe.
+  Version VersionOf(FileId file) const;
 
  private:
   class Impl;

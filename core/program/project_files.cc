@@ -5,16 +5,12 @@
 
 #include <algorithm>
 #include <array>
-#include <atomic>
-#include <exception>
-#include <optional>
-#include <thread>
 #include <unordered_map>
 #include <unordered_set>
 #include <utility>
 
-#include "analysis/source_bytes.h"
 #include "foundations/stop.h"
+#include "program/two_threads.h"
 #include "project/file_system.h"
 #include "project/ignore_rules.h"
 #include "project/word_filters.h"
@@ -214,43 +210,6 @@ class ProjectWalk {
   std::vector<std::pair<std::string, std::string>> links_;
 };
 
-// Calls `fn(i, worker)` for each number below `count`, by this thread with one worker and by another one with the
-// other. What one of them throws ends it, and is thrown.
-template <class Worker, class Function>
-void ForEachByThreads(size_t count, std::array<Worker, 2>& workers, Function&& fn) {
-  std::atomic<size_t> next{0};
-  const auto work = [&](Worker& worker) {
-    try {
-      for (size_t i = next++; i < count; i = next++) fn(i, worker);
-    } catch (...) {
-      next = count;
-      throw;
-    }
-  };
-  std::exception_ptr failure;
-  std::optional<std::thread> helper;
-  if (count >= kFilesWorthAThread) {
-    try {
-      helper.emplace([&] {
-        try {
-          work(workers[1]);
-        } catch (...) {
-          failure = std::current_exception();
-        }
-      });
-    } catch (const std::exception&) {  // one thread does the same work
-    }
-  }
-  try {
-    work(workers[0]);
-  } catch (...) {
-    if (helper) helper->join();
-    throw;
-  }
-  if (helper) helper->join();
-  if (failure) std::rethrow_exception(failure);
-}
-
 }  // namespace
 
 class ProjectFiles::Impl {
@@ -383,7 +342,7 @@ class ProjectFiles::Impl {
   void UpdateFilters() {
     if (are_filters_fresh_) return;
     std::array<FilterMaker, 2> makers;
-    ForEachByThreads(all_.size(), makers, [&](size_t i, FilterMaker& maker) {
+    ForEachByThreads(all_.size(), kFilesWorthAThread, makers, [&](size_t i, FilterMaker& maker) {
       if (files_.IsOpen(all_[i])) return;
       const FileStamp stamp = StampOf(files_.PathOf(all_[i]));
       if (stamp != stamps_[i]) MakeFilter(i, stamp, maker);
@@ -397,24 +356,13 @@ class ProjectFiles::Impl {
   }
 
   void MakeFilter(size_t i, const FileStamp& stamp, FilterMaker& maker) const {
-    ReadSource(i, stamp, maker.source);
+    files_.ReadSource(all_[i], stamp, maker.source);
     maker.keys.Read(maker.source);
     const size_t begin = maker.bits.size();
     AppendFilter(maker.keys.keys(), maker.bits);
     const Filter filter = {static_cast<uint32_t>(begin), static_cast<uint32_t>(maker.bits.size() - begin),
                            maker.keys.may_define_any()};
     maker.made.push_back({i, SettledStamp(stamp), filter});
-  }
-
-  // From the file itself: what is held of it may be older than its stamp.
-  void ReadSource(size_t i, const FileStamp& stamp, std::string& source) const {
-    if (!stamp.is_file() || stamp.size > Files::kMaxSourceSize ||
-        !ReadSourceFile(files_.PathOf(all_[i]), source).empty()) {
-      source.clear();
-    } else if (NeedsHostDecoding(source)) {
-      std::string memory;
-      source = files_.SourceOf(all_[i], memory);
-    }
   }
 
   // One that fits in the place of the old one takes it.
@@ -495,7 +443,7 @@ class ProjectFiles::Impl {
   void Search(const std::vector<Text>& words, std::vector<uint32_t>& files) const {
     std::vector<char> holds(files.size());
     std::array<std::string, 2> memories;
-    ForEachByThreads(files.size(), memories, [&](size_t i, std::string& memory) {
+    ForEachByThreads(files.size(), kFilesWorthAThread, memories, [&](size_t i, std::string& memory) {
       const Text source = files_.SourceOf(all_[files[i]], memory);
       CountSteps(static_cast<int64_t>(source.size() / kBytesOfAStep));
       holds[i] = std::ranges::all_of(words, [&](Text word) { return HoldsWord(source, word); });

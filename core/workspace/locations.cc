@@ -197,25 +197,27 @@ std::vector<Location> Workspace::Impl::LocationsOf(const Entities& entities, boo
 std::vector<Location> Workspace::Impl::MembersNamed(Text name) {
   static constexpr size_t kMaxFiles = 400;
   std::vector<Location> found;
-  size_t count = 0;
-  for (const FileId id : project.Defining(name)) {
-    if (++count > kMaxFiles) {
-      is_bounded = true;
-      break;
-    }
-    const SourceFile* file = Get(id);
-    if (file == nullptr) continue;
-    for (uint32_t i = 0; i < file->bindings.occurrences.size(); ++i) {
-      const Occurrence& occurrence = file->bindings.occurrences[i];
-      if (file->bindings.TextOf(occurrence) != name) continue;
-      const bool is_member = occurrence.kind != NameKind::kNone && occurrence.kind != NameKind::kImport &&
-                             file->bindings.scopes[file->bindings.ScopeOf(occurrence)].kind == NameScopeKind::kClass;
-      const uint32_t receiver = file->bindings.ReceiverOf(i);
-      const bool is_self = occurrence.is_attribute &&
-                           (occurrence.role == NameRole::kWrite || occurrence.role == NameRole::kDefinition) &&
-                           receiver != kNoIndex &&
-                           file->bindings.TextOf(file->bindings.occurrences[receiver]) == "self";
-      if (is_member || is_self) found.push_back(At({id, occurrence.begin}, Certainty::kByName));
+  std::vector<FileId> candidates = project.Defining(name);
+  if (candidates.size() > kMaxFiles) {
+    is_bounded = true;
+    candidates.resize(kMaxFiles);
+  }
+  defined.Read(candidates);
+  const uint32_t number = defined.Find(name);
+  if (number == kNoIndex) return found;
+  for (const FileId file : candidates) {
+    for (const DefinedNames::Definition& definition : defined.Of(file)) {
+      if (definition.name != number || !(definition.in_class || definition.of_self)) continue;
+      Location location;
+      location.file = file;
+      location.begin = definition.begin;
+      location.end = definition.begin + static_cast<uint32_t>(name.size());
+      location.role = NameRoleWords()[static_cast<size_t>(definition.role)];
+      // A write of an attribute is where it is defined.
+      const NameKind kind = definition.of_self ? NameKind::kVariable : definition.kind;
+      location.kind = NameKindWords()[static_cast<size_t>(kind) - 1];
+      location.certainty = Certainty::kByName;
+      found.push_back(location);
     }
   }
   return found;

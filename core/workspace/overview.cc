@@ -1,21 +1,11 @@
 // Outlines, symbols of the project, calls and problems.
 #include <algorithm>
+#include <span>
+#include <tuple>
 
 #include "workspace/workspace_impl.h"
 
 namespace quillet {
-
-std::string Workspace::Impl::NameOfScope(const SourceFile& file, uint32_t scope) {
-  std::string name;
-  for (; scope != kNoIndex && scope != 0; scope = file.bindings.scopes[scope].parent) {
-    const NameScope& around = file.bindings.scopes[scope];
-    if ((around.kind != NameScopeKind::kClass && around.kind != NameScopeKind::kFunction) || around.name == kNoIndex)
-      continue;
-    name = name.empty() ? std::string(file.bindings.texts[around.name])
-                        : std::string(file.bindings.texts[around.name]) + "." + name;
-  }
-  return name;
-}
 
 std::string Workspace::Impl::QualifiedName(const Binding& binding) {
   const SourceFile* file = Get(binding.file);
@@ -24,7 +14,7 @@ std::string Workspace::Impl::QualifiedName(const Binding& binding) {
   if (file == nullptr) return name;
   const uint32_t index = file->OccurrenceBeginningAt(binding.offset);
   if (index == kNoIndex) return name;
-  const std::string around = NameOfScope(*file, file->bindings.ScopeOf(file->bindings.occurrences[index]));
+  const std::string around = DottedNameOf(file->bindings, file->bindings.ScopeOf(file->bindings.occurrences[index]));
   if (!around.empty()) name += "." + around;
   return name + "." + std::string(file->bindings.TextOf(file->bindings.occurrences[index]));
 }
@@ -74,7 +64,7 @@ std::vector<Workspace::Impl::Callee> Workspace::Impl::CalleesOf(Value callee) {
     if (source == nullptr) return;
     if (info.lambda != kNoExpr) {
       const Binding binding{info.file, source->syntax[info.lambda].begin};
-      const std::string around = NameOfScope(*source, source->ScopeAt(binding.offset));
+      const std::string around = DottedNameOf(source->bindings, source->ScopeAt(binding.offset));
       const ModuleId module = modules.OfFile(info.file);
       std::string name = module == kNoModule ? std::string() : modules[module].name;
       if (!around.empty()) name += "." + around;
@@ -432,12 +422,18 @@ std::vector<OutlineItem> Workspace::Outline(FileId id) {
   return items;
 }
 
+static bool IsSymbol(NameKind kind) {
+  return kind == NameKind::kClass || kind == NameKind::kFunction || kind == NameKind::kVariable;
+}
+
 std::vector<SymbolInfo> Workspace::Symbols(Text query, size_t most) {
   Impl& in = *impl_;
   in.Begin();
   struct Ranked {
     int rank;
-    SymbolInfo symbol;
+    size_t size;    // of the name
+    uint32_t file;  // its place among all
+    const DefinedNames::Definition* definition;
   };
   std::vector<Ranked> found;
   const auto lower = [](char c) { return static_cast<char>(std::tolower(static_cast<unsigned char>(c))); };
@@ -453,46 +449,46 @@ std::vector<SymbolInfo> Workspace::Symbols(Text query, size_t most) {
       if (at < query.size() && lower(c) == lower(query[at])) ++at;
     return at == query.size() ? 4 : -1;
   };
-  for (const FileId id : in.project.All()) {
-    const SourceFile* file = in.Get(id);
-    if (file == nullptr) continue;
-    for (const Occurrence& occurrence : file->bindings.occurrences) {
-      if (occurrence.kind != NameKind::kClass && occurrence.kind != NameKind::kFunction &&
-          occurrence.kind != NameKind::kVariable)
-        continue;
-      if (!occurrence.has_symbol) continue;
-      const uint32_t scope = file->bindings.ScopeOf(occurrence);
-      const NameScopeKind kind = file->bindings.scopes[scope].kind;
-      const bool is_variable = occurrence.kind == NameKind::kVariable;
-      if (is_variable && kind != NameScopeKind::kModule && kind != NameScopeKind::kClass) continue;
-      const Text name = file->bindings.TextOf(occurrence);
-      const int rank = match(name);
+  const std::vector<FileId>& files = in.project.All();
+  in.defined.Read(files);
+  // A name is compared once, wherever it is defined.
+  static constexpr int kNotAsked = -2;
+  std::vector<int8_t> ranks(in.defined.text_count(), kNotAsked);
+  for (uint32_t i = 0; i < files.size(); ++i) {
+    for (const DefinedNames::Definition& definition : in.defined.Of(files[i])) {
+      if (!definition.is_symbol || !IsSymbol(definition.kind)) continue;
+      int8_t& rank = ranks[definition.name];
+      if (rank == kNotAsked) rank = static_cast<int8_t>(match(in.defined.TextOf(definition.name)));
       if (rank < 0) continue;
-      if (is_variable && file->occurrences().Of(file->bindings.VariableOf(occurrence)).front() !=
-                             static_cast<uint32_t>(&occurrence - file->bindings.occurrences.data()))
-        continue;
-      SymbolInfo symbol;
-      symbol.name = name;
-      symbol.kind = occurrence.kind == NameKind::kClass      ? "class"
-                    : occurrence.kind == NameKind::kFunction ? (kind == NameScopeKind::kClass ? "method" : "function")
-                                                             : "variable";
-      const ModuleId module = in.modules.OfFile(id);
-      symbol.container = module == kNoModule ? std::string() : in.modules[module].name;
-      const std::string around = in.NameOfScope(*file, scope);
-      if (!around.empty()) symbol.container += "." + around;
-      symbol.file = id;
-      symbol.begin = occurrence.begin;
-      symbol.end = file->bindings.EndOf(occurrence);
-      found.push_back({rank * 2 + (is_variable ? 1 : 0), std::move(symbol)});
+      const int is_variable = definition.kind == NameKind::kVariable ? 1 : 0;
+      found.push_back({rank * 2 + is_variable, in.defined.TextOf(definition.name).size(), i, &definition});
     }
   }
-  std::ranges::stable_sort(found, [](const Ranked& a, const Ranked& b) {
-    return std::pair(a.rank, a.symbol.name.size()) < std::pair(b.rank, b.symbol.name.size());
-  });
+  // Those that are alike in the order of files.
+  const auto order = [](const Ranked& a, const Ranked& b) {
+    return std::tuple(a.rank, a.size, a.file, a.definition->begin) <
+           std::tuple(b.rank, b.size, b.file, b.definition->begin);
+  };
+  const size_t count = std::min(most, found.size());
+  std::ranges::partial_sort(found, found.begin() + static_cast<ptrdiff_t>(count), order);
   std::vector<SymbolInfo> symbols;
-  for (Ranked& ranked : found) {
-    if (symbols.size() >= most) break;
-    symbols.push_back(std::move(ranked.symbol));
+  for (const Ranked& ranked : std::span(found).first(count)) {
+    const DefinedNames::Definition& definition = *ranked.definition;
+    SymbolInfo symbol;
+    symbol.name = in.defined.TextOf(definition.name);
+    symbol.kind = definition.kind == NameKind::kClass      ? "class"
+                  : definition.kind == NameKind::kFunction ? (definition.in_class ? "method" : "function")
+                                                           : "variable";
+    symbol.file = files[ranked.file];
+    const ModuleId module = in.modules.OfFile(symbol.file);
+    symbol.container = module == kNoModule ? std::string() : in.modules[module].name;
+    if (definition.scope != kNoIndex) {
+      symbol.container += '.';
+      symbol.container += in.defined.TextOf(definition.scope);
+    }
+    symbol.begin = definition.begin;
+    symbol.end = definition.begin + static_cast<uint32_t>(symbol.name.size());
+    symbols.push_back(std::move(symbol));
   }
   return symbols;
 }
@@ -505,7 +501,8 @@ std::vector<Location> Workspace::Named(Text dotted) {
   const Text last = dot == Text::npos ? dotted : dotted.substr(dot + 1);
   const Text rest = dot == Text::npos ? Text() : dotted.substr(0, dot);
   for (const FileId id : in.project.WithWords({last})) {
-    const SourceFile* file = in.Get(id);
+    const Impl::Visit visit(in, id);
+    const SourceFile* file = visit.file;
     if (file == nullptr) continue;
     for (uint32_t i = 0; i < file->bindings.occurrences.size(); ++i) {
       const Occurrence& occurrence = file->bindings.occurrences[i];
@@ -519,7 +516,7 @@ std::vector<Location> Workspace::Named(Text dotted) {
       if (scope == kNoIndex) continue;
       const ModuleId module = in.modules.OfFile(id);
       std::string full = module == kNoModule ? std::string() : in.modules[module].name;
-      const std::string around = in.NameOfScope(*file, scope);
+      const std::string around = DottedNameOf(file->bindings, scope);
       if (!around.empty()) full += "." + around;
       const bool fits =
           rest.empty() ? around.empty() || !is_self : full == rest || full.ends_with("." + std::string(rest));

@@ -36,6 +36,7 @@ Workspace::Impl::Impl(Settings given)
       files(settings.version),
       modules(files, ModuleSettings(settings)),
       project(files, settings.roots, settings.exclude),
+      defined(files),
       inference(files, modules) {
   inference.set_callers(this);
 }
@@ -43,6 +44,7 @@ Workspace::Impl::Impl(Settings given)
 void Workspace::Impl::Forget() {
   modules.Forget();
   project.Forget();
+  defined.Forget();
   inference.Clear();
   calls_by_name_.clear();
   common_.clear();
@@ -55,6 +57,7 @@ void Workspace::Impl::Begin() {
   const auto now = std::chrono::steady_clock::now();
   if (now - last_refresh_ > kBreath) {
     last_refresh_ = now;
+    defined.Forget();
     const bool has_changed = files.Refresh();
     const bool has_come_or_gone = project.Refresh() | modules.Refresh();
     if (has_changed || has_come_or_gone) Forget();

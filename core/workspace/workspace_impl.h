@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "inference/inference.h"
+#include "program/defined_names.h"
 #include "program/project_files.h"
 #include "workspace/questions.h"
 
@@ -127,7 +128,6 @@ class Workspace::Impl final : public CallerSource {
   std::vector<Callee> CalleesOf(const SourceFile& file, ExprId call);
   std::vector<Location> MembersBelow(const SourceFile& file, ExprId attribute);
   std::string QualifiedName(const Binding& binding);
-  std::string NameOfScope(const SourceFile& file, uint32_t scope);
   // Code that runs at one time: of a function, of a lambda, or of the module, where both are none.
   struct Body {
     StmtId def = kModuleStmt;
@@ -141,6 +141,7 @@ class Workspace::Impl final : public CallerSource {
   Files files;
   Modules modules;
   ProjectFiles project;
+  DefinedNames defined;
   Inference inference;
   bool is_bounded = false;
   ColumnUnit column_unit = ColumnUnit::kUtf8;

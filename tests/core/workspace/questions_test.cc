@@ -580,6 +580,24 @@ TEST(Buffers, StandForTheirFiles) {
   EXPECT_EQ(ProblemsOf(program), Words{});
 }
 
+TEST(Buffers, ChangeWhatIsFoundByName) {
+  Program program({{"main.py", "def f(thing):\n  thing.$speed\n"}, {"a.py", "class A:\n  def speed(self): pass\n"}});
+  EXPECT_EQ(program.Definitions(), Words{"a.py:2:7 likely"});
+  program.Open("a.py", "class A:\n  def slow(self): pass\n");
+  EXPECT_EQ(program.Definitions(), Words{});
+  const FileId a = program.File("a.py");
+  program->Change(a, 15, 19, "speed = 1 #");
+  program->Change(a, 11, 14, "   ");
+  EXPECT_EQ(program.Definitions(), Words{"a.py:2:7 likely"});
+  EXPECT_EQ(program->Symbols("speed").size(), 1u);
+  program->Change(a, 15, 16, "S");
+  EXPECT_EQ(program.Definitions(), Words{});
+  EXPECT_EQ(program->Symbols("Speed").at(0).name, "Speed");
+  program->Close(a);
+  EXPECT_EQ(program.Definitions(), Words{"a.py:2:7 likely"});
+  EXPECT_EQ(program->Symbols("speed").at(0).kind, "method");
+}
+
 TEST(Buffers, NeedNoFile) {
   Program program({{"a.py", "from fresh import $f\n"}});
   EXPECT_EQ(program.Definitions(0), Words{"a.py:1:19"});

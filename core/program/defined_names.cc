@@ -1,0 +1,228 @@
+// Two threads bind files with binders of their own, and number texts among themselves; behind them what they found is
+// put together.
+#include "program/defined_names.h"
+
+#include <array>
+#include <optional>
+#include <string>
+#include <unordered_map>
+#include <utility>
+#include <vector>
+
+#include "foundations/stop.h"
+#include "names/binder.h"
+#include "names/text_table.h"
+#include "program/two_threads.h"
+#include "project/file_system.h"
+
+namespace quillet {
+
+namespace {
+
+// Fewer files than this are bound before another thread has begun.
+constexpr size_t kFilesWorthABinder = 16;
+constexpr size_t kBytesOfAStepOfBinding = 16;
+
+using Definition = DefinedNames::Definition;
+
+// Binds one file after another, and takes what is defined from each.
+class DefinitionsMaker {
+ public:
+  struct Made {
+    size_t index;
+    FileStamp stamp;
+    size_t begin, count;  // among the definitions
+  };
+
+  void Begin() {
+    made.clear();
+    definitions.clear();
+    texts.Begin(kExpectedTexts);
+  }
+
+  void Make(size_t index, const FileStamp& stamp, bool is_stub, Version version, Text source) {
+    std::optional<NameBinder>& binder = is_stub ? stub_binder_ : binder_;
+    if (!binder) binder.emplace(version);
+    const size_t begin = definitions.size();
+    Take(binder->Bind(source));
+    made.push_back({index, stamp, begin, definitions.size() - begin});
+  }
+
+  std::vector<Made> made;
+  std::vector<Definition> definitions;
+  TextTable texts;
+  std::string memory;
+
+ private:
+  static constexpr size_t kExpectedTexts = 1024;
+  static constexpr uint32_t kNotAsked = kNoIndex - 1;
+
+  void Take(const Bindings& bindings) {
+    scopes_.assign(bindings.scopes.size(), kNotAsked);
+    texts_.assign(bindings.texts.size(), kNoIndex);
+    seen_.assign(bindings.symbols.size(), 0);
+    for (uint32_t i = 0; i < bindings.occurrences.size(); ++i) {
+      const Occurrence& occurrence = bindings.occurrences[i];
+      if (occurrence.kind == NameKind::kNone ? !IsOfSelf(bindings, i) : !IsDefinition(bindings, occurrence)) continue;
+      Definition definition{};
+      definition.begin = occurrence.begin;
+      definition.role = occurrence.role;
+      definition.kind = occurrence.kind;
+      definition.of_self = occurrence.kind == NameKind::kNone;
+      const uint32_t scope = bindings.ScopeOf(occurrence);
+      definition.in_class = bindings.scopes[scope].kind == NameScopeKind::kClass;
+      definition.name = NumberOf(bindings, occurrence.text);
+      definition.scope = NumberOfScope(bindings, scope);
+      definition.is_symbol = occurrence.has_symbol && !definition.of_self;
+      if (definition.is_symbol && occurrence.kind == NameKind::kVariable) {
+        char& is_seen = seen_[bindings.VariableOf(occurrence)];
+        definition.is_symbol = is_seen == 0;
+        is_seen = 1;
+      }
+      definitions.push_back(definition);
+    }
+  }
+
+  static bool IsDefinition(const Bindings& bindings, const Occurrence& occurrence) {
+    if (occurrence.kind == NameKind::kClass || occurrence.kind == NameKind::kFunction) return true;
+    const NameScopeKind around = bindings.scopes[bindings.ScopeOf(occurrence)].kind;
+    if (around == NameScopeKind::kClass) return occurrence.kind != NameKind::kImport;
+    return occurrence.kind == NameKind::kVariable && around == NameScopeKind::kModule;
+  }
+
+  static bool IsOfSelf(const Bindings& bindings, uint32_t i) {
+    const Occurrence& occurrence = bindings.occurrences[i];
+    if (!occurrence.is_attribute || (occurrence.role != NameRole::kWrite && occurrence.role != NameRole::kDefinition))
+      return false;
+    const uint32_t receiver = bindings.ReceiverOf(i);
+    return receiver != kNoIndex && bindings.TextOf(bindings.occurrences[receiver]) == "self";
+  }
+
+  uint32_t NumberOf(const Bindings& bindings, uint32_t text) {
+    uint32_t& number = texts_[text];
+    if (number == kNoIndex) number = texts.NumberOfCopy(bindings.texts[text]);
+    return number;
+  }
+
+  uint32_t NumberOfScope(const Bindings& bindings, uint32_t scope) {
+    uint32_t& number = scopes_[scope];
+    if (number == kNotAsked) {
+      const std::string name = DottedNameOf(bindings, scope);
+      number = name.empty() ? kNoIndex : texts.NumberOfCopy(name);
+    }
+    return number;
+  }
+
+  std::optional<NameBinder> binder_;
+  std::optional<NameBinder> stub_binder_;
+  // Of the file: numbers of texts and of scopes, and whether a variable was bound before.
+  std::vector<uint32_t> texts_;
+  std::vector<uint32_t> scopes_;
+  std::vector<char> seen_;
+};
+
+}  // namespace
+
+std::string DottedNameOf(const Bindings& bindings, uint32_t scope) {
+  std::string name;
+  for (; scope != kNoIndex && scope != 0; scope = bindings.scopes[scope].parent) {
+    const NameScope& around = bindings.scopes[scope];
+    if ((around.kind != NameScopeKind::kClass && around.kind != NameScopeKind::kFunction) || around.name == kNoIndex)
+      continue;
+    const Text own = bindings.texts[around.name];
+    name = name.empty() ? std::string(own) : std::string(own) + "." + name;
+  }
+  return name;
+}
+
+class DefinedNames::Impl {
+ public:
+  explicit Impl(const Files& files) : files_(files) { texts_.Begin(1024); }
+
+  void Read(std::span<const FileId> files) {
+    std::vector<FileId> unsure;
+    for (const FileId file : files) {
+      if (file >= tables_.size()) tables_.resize(file + 1);
+      if (tables_[file].round != round_ || files_.IsOpen(file)) unsure.push_back(file);
+    }
+    if (unsure.empty()) return;
+    std::array<DefinitionsMaker, 2> makers;
+    for (DefinitionsMaker& maker : makers) maker.Begin();
+    ForEachByThreads(unsure.size(), kFilesWorthABinder, makers, [&](size_t i, DefinitionsMaker& maker) {
+      const FileId file = unsure[i];
+      const bool is_open = files_.IsOpen(file);
+      Text source;
+      FileStamp stamp;
+      if (is_open) {
+        source = files_.SourceOf(file, maker.memory);
+        stamp = {FileStamp::Kind::kOther, source.size(), 0, std::hash<Text>()(source)};
+      } else {
+        stamp = StampOf(files_.PathOf(file));
+      }
+      if (stamp == tables_[file].stamp) return;
+      if (!is_open) {
+        files_.ReadSource(file, stamp, maker.memory);
+        source = maker.memory;
+      }
+      CountSteps(static_cast<int64_t>(source.size() / kBytesOfAStepOfBinding));
+      maker.Make(i, SettledStamp(stamp), files_.IsStub(file), files_.VersionOf(file), source);
+    });
+    for (const DefinitionsMaker& maker : makers) Add(unsure, maker);
+    for (const FileId file : unsure) tables_[file].round = round_;
+  }
+
+  std::span<const Definition> Of(FileId file) const {
+    return file < tables_.size() ? std::span<const Definition>(tables_[file].definitions)
+                                 : std::span<const Definition>();
+  }
+  uint32_t text_count() const { return static_cast<uint32_t>(texts_.size()); }
+  Text TextOf(uint32_t number) const { return texts_.TextOf(number); }
+  uint32_t Find(Text name) const { return texts_.Find(name); }
+  void Forget() { ++round_; }
+
+  size_t ByteSize() const {
+    size_t size = tables_.capacity() * sizeof(Table) + texts_.size() * (sizeof(TextTable::Entry) + 32);
+    for (const Table& table : tables_) size += table.definitions.capacity() * sizeof(Definition);
+    return size;
+  }
+
+ private:
+  struct Table {
+    FileStamp stamp;     // of a buffer what its text is known by
+    uint64_t round = 0;  // when it was compared with the file
+    std::vector<Definition> definitions;
+  };
+
+  void Add(const std::vector<FileId>& files, const DefinitionsMaker& maker) {
+    std::vector<uint32_t> numbers(maker.texts.size());
+    for (uint32_t i = 0; i < numbers.size(); ++i) numbers[i] = texts_.NumberOfCopy(maker.texts.TextOf(i));
+    for (const DefinitionsMaker::Made& made : maker.made) {
+      Table& table = tables_[files[made.index]];
+      table.stamp = made.stamp;
+      const auto from = maker.definitions.begin() + static_cast<ptrdiff_t>(made.begin);
+      table.definitions = std::vector<Definition>(from, from + static_cast<ptrdiff_t>(made.count));
+      for (Definition& definition : table.definitions) {
+        definition.name = numbers[definition.name];
+        if (definition.scope != kNoIndex) definition.scope = numbers[definition.scope];
+      }
+    }
+  }
+
+  const Files& files_;
+  std::vector<Table> tables_;  // by the numbers of files
+  TextTable texts_;
+  uint64_t round_ = 1;
+};
+
+DefinedNames::DefinedNames(const Files& files) : impl_(std::make_unique<Impl>(files)) {}
+DefinedNames::~DefinedNames() = default;
+
+void DefinedNames::Read(std::span<const FileId> files) { impl_->Read(files); }
+std::span<const Definition> DefinedNames::Of(FileId file) const { return impl_->Of(file); }
+uint32_t DefinedNames::text_count() const { return impl_->text_count(); }
+Text DefinedNames::TextOf(uint32_t number) const { return impl_->TextOf(number); }
+uint32_t DefinedNames::Find(Text name) const { return impl_->Find(name); }
+void DefinedNames::Forget() { impl_->Forget(); }
+size_t DefinedNames::ByteSize() const { return impl_->ByteSize(); }
+
+}  // namespace quillet

@@ -1,0 +1,131 @@
+// What files define, by name, and when it is read again.
+#include "program/defined_names.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "tests/core/support/temporary_folder.h"
+
+namespace quillet {
+namespace {
+
+using testing::TemporaryFolder;
+using Words = std::vector<std::string>;
+
+// `scope.name` with a mark for what it is.
+Words Of(DefinedNames& names, FileId file) {
+  names.Read({{file}});
+  Words words;
+  for (const DefinedNames::Definition& definition : names.Of(file)) {
+    std::string word;
+    if (definition.scope != kNoIndex) word = std::string(names.TextOf(definition.scope)) + ".";
+    word += names.TextOf(definition.name);
+    if (definition.kind != NameKind::kNone)
+      word += " " + std::string(NameKindWords()[static_cast<size_t>(definition.kind) - 1]);
+    if (definition.is_symbol) word += " symbol";
+    if (definition.in_class) word += " member";
+    if (definition.of_self) word += " of self";
+    words.push_back(word);
+  }
+  return words;
+}
+
+TEST(DefinedNames, AreThoseOfModulesClassesAndSelf) {
+  const TemporaryFolder folder = {{"a.py",
+                                   "import os\n"
+                                   "x = 1\n"
+                                   "x = 2\n"
+                                   "def f(given):\n"
+                                   "    local = y\n"
+                                   "    def inner(): pass\n"
+                                   "class A:\n"
+                                   "    z, z2 = 1, 2\n"
+                                   "    def m(self, other):\n"
+                                   "        self.p = other.q = 3\n"
+                                   "        self.p += 1\n"
+                                   "        self.r: int\n"
+                                   "y = 1\n"}};
+  Files files(Version::Of(3, 12));
+  DefinedNames names(files);
+  const FileId a = files.NumberOf(folder / "a.py");
+  EXPECT_EQ(Of(names, a),
+            (Words{"x variable symbol", "x variable", "f function symbol", "f.inner function symbol", "A class symbol",
+                   "A.z variable symbol member", "A.z2 variable symbol member", "A.m function symbol member",
+                   "A.m.p of self", "A.m.p of self", "A.m.r of self", "y variable symbol"}));
+  EXPECT_FALSE(files.IsHeld(a));
+  EXPECT_NE(names.Find("z2"), kNoIndex);
+  EXPECT_EQ(names.Find("local"), kNoIndex);
+  EXPECT_EQ(names.Find(""), kNoIndex);
+  EXPECT_EQ(Of(names, files.NumberOf(folder / "nothing.py")), Words{});
+}
+
+TEST(DefinedNames, AreReadAgainWhereFilesChanged) {
+  const TemporaryFolder folder = {{"a.py", "x = 1\n"}, {"b.py", "b = 1\n"}};
+  Files files(Version::Of(3, 12));
+  DefinedNames names(files);
+  const FileId a = files.NumberOf(folder / "a.py");
+  const FileId b = files.NumberOf(folder / "b.py");
+  EXPECT_EQ(Of(names, a), Words{"x variable symbol"});
+  EXPECT_EQ(Of(names, b), Words{"b variable symbol"});
+  folder.Write("a.py", "y, z = 1\n");
+  EXPECT_EQ(Of(names, a), Words{"x variable symbol"}) << "until it is told to look";
+  names.Forget();
+  EXPECT_EQ(Of(names, a), (Words{"y variable symbol", "z variable symbol"}));
+  folder.Write("a.py", "v, w = 1\n");  // as long, and in the same moment
+  names.Forget();
+  EXPECT_EQ(Of(names, a), (Words{"v variable symbol", "w variable symbol"}));
+  folder.Remove("a.py");
+  names.Forget();
+  EXPECT_EQ(Of(names, a), Words{});
+  EXPECT_EQ(Of(names, b), Words{"b variable symbol"});
+}
+
+TEST(DefinedNames, AreThoseOfBuffers) {
+  const TemporaryFolder folder = {{"a.py", "x = 1\n"}};
+  Files files(Version::Of(3, 12));
+  DefinedNames names(files);
+  const FileId a = files.NumberOf(folder / "a.py");
+  const FileId new_one = files.NumberOf(folder / "new.py");
+  EXPECT_EQ(Of(names, a), Words{"x variable symbol"});
+  files.Open(a, "class B: pass\n");
+  files.Open(new_one, "def f(): pass\n");
+  names.Forget();
+  EXPECT_EQ(Of(names, a), Words{"B class symbol"});
+  EXPECT_EQ(Of(names, new_one), Words{"f function symbol"});
+  files.Change(a, 6, 7, "C");
+  EXPECT_EQ(Of(names, a), Words{"C class symbol"}) << "without being told to look";
+  files.Close(a);
+  files.Close(new_one);
+  names.Forget();
+  EXPECT_EQ(Of(names, a), Words{"x variable symbol"});
+  EXPECT_EQ(Of(names, new_one), Words{});
+}
+
+TEST(DefinedNames, AreTheSameFromTwoThreads) {
+  const TemporaryFolder folder;
+  Files files(Version::Of(3, 12));
+  std::vector<FileId> all;
+  for (int i = 0; i < 100; ++i) {
+    const std::string number = std::to_string(i);
+    folder.Write("m" + number + ".py", "def shared(): pass\nclass C" + number + ":\n  def own" + number + "(): pass\n");
+    folder.Write("m" + number + ".pyi", "def stub" + number + "(): ...\n");
+    all.push_back(files.NumberOf(folder / ("m" + number + ".py")));
+    all.push_back(files.NumberOf(folder / ("m" + number + ".pyi")));
+  }
+  DefinedNames names(files);
+  names.Read(all);
+  const size_t size = names.text_count();
+  for (size_t i = 0; i < 100; ++i) {
+    const std::string number = std::to_string(i);
+    EXPECT_EQ(Of(names, all[2 * i]), (Words{"shared function symbol", "C" + number + " class symbol",
+                                            "C" + number + ".own" + number + " function symbol member"}));
+    EXPECT_EQ(Of(names, all[2 * i + 1]), Words{"stub" + number + " function symbol"});
+  }
+  EXPECT_EQ(names.text_count(), size);
+  EXPECT_EQ(names.Of(all[0])[0].name, names.Of(all[2])[0].name);
+}
+
+}  // namespace
+}  // namespace quillet
