@@ -115,7 +115,11 @@ nb::handle ParseErrorClass() { return g_parse_error; }
 
 nb::object ExceptionFor(const SyntaxError& error) {
   nb::object details = nb::make_tuple(StrOf(error.filename), error.lineno, error.offset, StrOf(error.text));
-  return nb::handle(PyExc_SyntaxError)(StrOf(error.message()), details);
+  using Kind = SyntaxError::Kind;
+  PyObject* const type = error.error_class == Kind::kIndentation ? PyExc_IndentationError
+                         : error.error_class == Kind::kTab       ? PyExc_TabError
+                                                                 : PyExc_SyntaxError;
+  return nb::handle(type)(StrOf(error.message()), details);
 }
 
 nb::object ExceptionFor(const ParseError& error) {

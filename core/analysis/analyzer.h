@@ -67,6 +67,15 @@ class CPGenAnalyzerImpl {
   // Whether returned errors say what the parser waited for (error_words.h) instead of "invalid syntax" alone.
   void set_explains_errors(bool explains) { explains_errors_ = explains; }
 
+  // Of one that reads completely: about the source that the lines are of, see CloserLook.
+  void set_holds_debug_name(bool holds);
+
+  // Whether the grammar rejected the statement that was read completely last.
+  bool was_rejected() const { return was_rejected_; }
+  // Of such a statement, by a position or the index of a token.
+  SyntaxError ErrorAt(const std::string& message, const LogicalLine& logical, Context context) const;
+  const CompleteParser& complete_parser() const { return *complete_parser_; }
+
   CPGenParserImpl& logical_parser() const { return *logical_parser_; }
   CNodeWalker& node_walker() const { return *node_walker_; }
   CTypeHintWalker& type_hint_walker() const { return *type_hint_walker_; }
@@ -82,7 +91,6 @@ class CPGenAnalyzerImpl {
   // A failure in an embedded expression, as one of the line that holds it.
   SyntaxError ErrorInEmbedded(const std::string& message, const LogicalLine& logical, const LogicalLine& exp,
                               Context context) const;
-  SyntaxError ErrorAt(const std::string& message, const LogicalLine& logical, Context context) const;
 
   std::unique_ptr<CPGenParserImpl> logical_parser_;
   std::unique_ptr<CNodeWalker> node_walker_;
@@ -94,6 +102,7 @@ class CPGenAnalyzerImpl {
   // Errors that leave it its records: of a hint, the first one, and of what the compiler does not take.
   std::optional<SyntaxError> hint_error_;
   std::optional<SyntaxError> compile_error_;
+  bool was_rejected_ = false;
   const Version version_;
   bool spells_error_texts_ = true;
   bool explains_errors_ = false;

@@ -1,12 +1,30 @@
 // One table lookup a token; what is unusual is looked at in its place.
 #include "analysis/closer_look.h"
 
+#include <algorithm>
+#include <cstring>
+
 #include "lines/token_search.h"
+#include "parser/string_escapes.h"
 #include "tokens/token_ends.h"
 
 namespace quillet {
 
 namespace {
+
+bool HoldsDebugName(TokenSpan toks) {
+  for (const Token& token : toks)
+    if (token.code == tok::NAME && token.view() == "__debug__") return true;
+  return false;
+}
+
+// `*args, name`, where a parameter or an argument may begin.
+bool IsStarredWithNameBehind(TokenSpan toks, size_t star) {
+  if (star == 0 || star + 3 >= toks.size()) return false;
+  const TokenCode before = toks[star - 1].code;
+  return (before == tok::LPAR || before == tok::COMMA || before == word::kLambda) &&
+         toks[star + 2].code == tok::COMMA && toks[star + 3].code != tok::DOUBLESTAR;
+}
 
 bool IsDefinitionHead(const LogicalLine& line) {
   const size_t first = NextSignificant(line.toks, 0, line.toks.size());
@@ -49,6 +67,9 @@ CloserLook::CloserLook(Version version)
   unusual_[word::kAwait] = unusual_[word::kAsync] = unusual_[word::kNonlocal] = python3_;
   unusual_[word::kReturn] = true;
   unusual_[tok::SLASH] = python3_ && minor_ < 8;
+  // The walk of the tables' trees sees all other targets.
+  unusual_[tok::VBAREQUAL] = true;
+  unusual_[tok::STAR] = unusual_[word::kNone] = !python3_;
   if (!python3_) unusual_[tok::NOTEQUAL] = false;
 }
 
@@ -82,7 +103,7 @@ bool CloserLook::NeedsCompleteParser(const LogicalLine& line) const {
 }
 
 bool CloserLook::IsDoubtful(const LogicalLine& line, const LinePlace& place) const {
-  if (is_old_) return true;
+  if (is_old_ || (holds_debug_name_ && HoldsDebugName(line.toks))) return true;
   if (line.kind == LineKind::kFromImport) {
     TokenCode last = tok::ENDMARKER;
     for (const Token& token : line.toks) {
@@ -96,7 +117,9 @@ bool CloserLook::IsDoubtful(const LogicalLine& line, const LinePlace& place) con
     if (!unusual_[token.code]) [[likely]]
       continue;
     // Nearly all strings and many numbers.
-    if (token.code == tok::STRING && IsQuote(*token.text)) continue;
+    if (token.code == tok::STRING && IsQuote(*token.text) &&
+        std::memchr(token.text, '\\', static_cast<size_t>(token.length)) == nullptr)
+      continue;
     if (IsDoubtfulToken(line, i, place)) return true;
   }
   return false;
@@ -110,20 +133,26 @@ bool CloserLook::IsDoubtfulToken(const LogicalLine& line, size_t i, const LinePl
     case word::kReturn:
       return !place.in_def || place.in_async_def;
     case word::kAwait:
-      return !place.in_async_def;
+      // A comprehension in another could not wait before 3.11.
+      return !place.in_async_def || minor_ < 11;
     case word::kAsync:
-      if (place.in_async_def) return false;
+      if (place.in_async_def) return minor_ < 11;
       return next != nullptr && (next->code == word::kFor || next->code == word::kWith);
     case word::kNonlocal:
       return place.depth == 0;
     case tok::NOTEQUAL:
       return *token.text == '<';
     case tok::RARROW:
-      return (*token.text == '-') != IsDefinitionHead(line);
+      return *token.text != '-' || !IsDefinitionHead(line);
     case tok::NUMBER:
       return python3_ ? IsUnusualNumber(token, next, minor_ >= 6) : IsUnusualNumber(token, next, false);
     case tok::STRING:
-      return IsUnusualString(token, python3_, minor_ >= 6);
+      return IsUnusualString(token, python3_, minor_ >= 6) || !WrongEscape(token.view(), python3_).empty();
+    case tok::STAR:
+      return IsStarredWithNameBehind(line.toks, i);
+    case word::kNone:
+      return line.kind == LineKind::kImport || line.kind == LineKind::kFromImport || line.kind == LineKind::kExcept ||
+             (i > 0 && line.toks[i - 1].code == tok::DOT);
     default:
       return true;
   }

@@ -16,6 +16,9 @@ class CloserLook {
  public:
   explicit CloserLook(Version version);
 
+  // Whether the source that statements are of holds a name that none may bind.
+  void set_holds_debug_name(bool holds) { holds_debug_name_ = holds; }
+
   // Whether only the complete parser can read such a statement as the version has it.
   bool NeedsCompleteParser(const LogicalLine& line) const;
   // Whether a statement that the tables took is to be read again.
@@ -27,6 +30,7 @@ class CloserLook {
   const bool python3_;
   const int minor_;
   bool is_old_;  // of versions that lack so much that each statement is looked at
+  bool holds_debug_name_ = false;
   std::array<bool, 256> unusual_{};
 };
 

@@ -3,6 +3,8 @@
 // The tables come first: what they take, and nothing makes doubtful, is all that most statements cost. The
 // parser that knows every rule reads what they reject, what they are no match for, and what a walk fails
 // over; of what is doubtful it only gives its verdict. Whatever is wrong with a hint stays with the hint.
+#include <algorithm>
+
 #include "analysis/analyzer.h"
 #include "analysis/closer_look.h"
 #include "foundations/console.h"
@@ -27,10 +29,16 @@ StatementPlace PlaceOfStatement(const LinePlace& place) {
   return statement;
 }
 
-bool HoldsInFields(TokenSpan toks, char c) {
-  for (const Token& token : toks)
-    if (token.view().find(c) != Text::npos) return true;
-  return false;
+bool HoldsBackslash(TokenSpan toks) {
+  return std::any_of(toks.begin(), toks.end(),
+                     [](const Token& token) { return token.view().find('\\') != Text::npos; });
+}
+
+// Beside those in strings.
+bool HoldsHash(TokenSpan toks) {
+  return std::any_of(toks.begin(), toks.end(), [](const Token& token) {
+    return token.code != tok::STRING && token.view().find('#') != Text::npos;
+  });
 }
 
 }  // namespace
@@ -42,9 +50,11 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeCompletely(LogicalLine& log
   typing_ = &typing;
   hint_error_.reset();
   compile_error_.reset();
+  was_rejected_ = true;
   try {
     logical.ClearDerivedInfo();
     InspectCompletely(logical, place);
+    was_rejected_ = false;
     return compile_error_ ? std::move(compile_error_) : std::move(hint_error_);
   } catch (const ParseError& error) {
     logical.ClearDerivedInfo();
@@ -64,6 +74,8 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeCompletely(LogicalLine& log
     return std::nullopt;
   }
 }
+
+void CPGenAnalyzerImpl::set_holds_debug_name(bool holds) { closer_look_->set_holds_debug_name(holds); }
 
 SyntaxError CPGenAnalyzerImpl::ErrorAt(const std::string& message, const LogicalLine& logical, Context context) const {
   // What is missing at the end of a line is missing where the line ends.
@@ -183,9 +195,9 @@ void CPGenAnalyzerImpl::InspectField(LogicalLine& logical, LogicalLine& exp, con
     return parsed;
   };
   const bool is_flat = !version_.AtLeast(3, 12);
-  if (is_flat && HoldsInFields(exp.toks, '\\'))
+  if (is_flat && HoldsBackslash(exp.toks))
     throw ParseError("f-string expression part cannot include a backslash", -1, kNoText, Context::Index(0));
-  if (is_flat && HoldsInFields(exp.toks, '#'))
+  if (is_flat && HoldsHash(exp.toks))
     throw ParseError("f-string expression part cannot include '#'", -1, kNoText, Context::Index(0));
   CNode* tree = nullptr;
   bool is_of_tables = true;

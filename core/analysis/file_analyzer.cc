@@ -2,9 +2,11 @@
 #include "analysis/file_analyzer.h"
 
 #include <algorithm>
+#include <cstring>
 #include <utility>
 
 #include "lines/future_imports.h"
+#include "parser/complete_parser.h"
 #include "tokens/byte_scan.h"
 
 namespace quillet {
@@ -31,6 +33,8 @@ size_t MostTokensIn(Text text) {
   }
   return count;
 }
+
+bool Holds(Text text, Text part) { return memmem(text.data(), text.size(), part.data(), part.size()) != nullptr; }
 
 template <class T>
 size_t SizeOf(const std::vector<T>& items) {
@@ -74,6 +78,7 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   CPGenAnalyzerImpl& analyzer = AnalyzerForSource();
   analyzer.set_spells_error_texts(options_.keeps_whole_errors);
   analyzer.set_explains_errors(true);
+  if (options_.reads_completely) analyzer.set_holds_debug_name(Holds(found_.source->text(), "__debug__"));
   const NodePool& pool = analyzer.logical_parser().factory().pool();
   const NodePool& other_pool = analyzer.type_hint_walker().hint_parser().factory().pool();
   const auto node_count = [&] { return pool.node_count() + other_pool.node_count(); };
@@ -82,12 +87,19 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   CountMemory();
   wanted_.assign(filter != nullptr ? found_.rows.size() : 0, false);
   const bool is_filtered = filter != nullptr && filter->Choose(*found_.source, found_.rows, wanted_);
+  const bool has_rules = options_.reads_completely && !is_filtered;
+  if (has_rules) block_rules_.Reset(*found_.source, options_.version);
   LogicalLine line;
   for (size_t i = 0; i < found_.rows.size(); ++i) {
     const LineRow& row = found_.rows[i];
     CheckMemory(std::max(MostMemoryOf(row), sizeof(CNode) * (node_count() - nodes_before)));
     AnalyzeRow(analyzer, row, !is_filtered || wanted_[i], line);
+    if (has_rules) ApplyBlockRules(analyzer, i);
     CountMemory();
+  }
+  if (has_rules) {
+    block_rules_.End();
+    AddFindings(analyzer);
   }
   CheckMemory(0);
 }
@@ -134,8 +146,7 @@ void FileAnalyzer::AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, b
     if (const auto error = options_.reads_completely
                                ? analyzer.AnalyzeCompletely(line, place, typing_)
                                : analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def)) {
-      result.error = static_cast<int32_t>(found_.errors.size());
-      AddError(*error);
+      result.error = AddError(*error);
     }
   }
   result.record_end = static_cast<uint32_t>(found_.store.rows.size());
@@ -143,11 +154,48 @@ void FileAnalyzer::AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, b
   found_.results.push_back(result);
 }
 
-void FileAnalyzer::AddError(const SyntaxError& error) {
+void FileAnalyzer::ApplyBlockRules(CPGenAnalyzerImpl& analyzer, size_t index) {
+  const LineRow& row = found_.rows[index];
+  BlockRules::Reading reading;
+  reading.was_rejected = row.token_count != 0 && analyzer.was_rejected();
+  if (row.kind == LineKind::kCase && !reading.was_rejected) {
+    reading.irrefutable = analyzer.complete_parser().irrefutable();
+    if (!reading.irrefutable.empty()) reading.irrefutable_at = analyzer.complete_parser().irrefutable_at();
+  }
+  block_rules_.Next(index, row, reading);
+  if (!block_rules_.findings().empty()) [[unlikely]]
+    AddFindings(analyzer);
+}
+
+void FileAnalyzer::AddFindings(CPGenAnalyzerImpl& analyzer) {
+  for (const BlockRules::Finding& finding : block_rules_.findings()) {
+    int32_t& index = found_.results[finding.row].error;
+    if (index >= 0 && !finding.comes_first) continue;
+    LogicalLine line;
+    SetFromRow(line, found_.source, found_.rows[finding.row]);
+    SyntaxError error = analyzer.ErrorAt(finding.message, line, finding.place);
+    error.error_class = finding.kind;
+    const int32_t added = AddError(error);
+    if (index < 0) {
+      index = added;
+      continue;
+    }
+    // In the place of what was found before.
+    found_.errors[static_cast<size_t>(index)] = found_.errors.back();
+    found_.errors.pop_back();
+    if (!options_.keeps_whole_errors) continue;
+    std::swap(found_.whole_errors[static_cast<size_t>(index)], found_.whole_errors.back());
+    found_.whole_errors.pop_back();
+  }
+  block_rules_.findings().clear();
+}
+
+int32_t FileAnalyzer::AddError(const SyntaxError& error) {
   const std::string& text = *found_.error_texts.insert(error.message()).first;
   const auto from_1 = [](int64_t number) { return static_cast<int32_t>(std::max<int64_t>(number, 1)); };
   found_.errors.push_back({&text, {from_1(error.lineno), from_1(error.offset)}});
   if (options_.keeps_whole_errors) found_.whole_errors.push_back(error);
+  return static_cast<int32_t>(found_.errors.size()) - 1;
 }
 
 size_t FileAnalyzer::MostMemoryOf(const LineRow& row) const {

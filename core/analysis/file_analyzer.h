@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "analysis/analyzer.h"
+#include "analysis/block_rules.h"
 #include "lines/cutter.h"
 #include "lines/scopes.h"
 
@@ -104,7 +105,11 @@ class FileAnalyzer {
   void Reset(Text bytes);
   void Cut();
   void AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line);
-  void AddError(const SyntaxError& error);
+  // Returns its index.
+  int32_t AddError(const SyntaxError& error);
+  // What the row has to say to those around it.
+  void ApplyBlockRules(CPGenAnalyzerImpl& analyzer, size_t index);
+  void AddFindings(CPGenAnalyzerImpl& analyzer);
   // What the analysis of a row may take beside its results, at most.
   size_t MostMemoryOf(const LineRow& row) const;
   // Counts what the results hold by now.
@@ -117,6 +122,7 @@ class FileAnalyzer {
   Found found_;
   std::vector<bool> wanted_;  // of the rows, where there is a filter
   ScopeTracker scopes_;
+  BlockRules block_rules_;
   TypingNames typing_;
   size_t memory_limit_ = kLeastMemoryLimit;
   size_t held_ = 0;

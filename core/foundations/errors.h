@@ -92,6 +92,9 @@ class ParseError : public Error {
 // offset in UTF-8 bytes.
 class SyntaxError : public Error {
  public:
+  // Which of the host's classes: that itself, or one of those that derive from it.
+  enum class Kind : uint8_t { kSyntax, kIndentation, kTab };
+
   SyntaxError(std::string message, std::string file, int64_t line_from_1, int64_t offset_from_1, std::string line_text)
       : Error(ErrorKind::kSyntaxError, std::move(message)),
         filename(std::move(file)),
@@ -103,6 +106,7 @@ class SyntaxError : public Error {
   int64_t lineno;
   int64_t offset;
   std::string text;
+  Kind error_class = Kind::kSyntax;
 };
 
 // Out-of-line throws keep the callers' hot paths small.

@@ -50,6 +50,7 @@ template <class Rule>
 bool CompleteParser::Try(Rule&& rule) {
   const size_t mark = nodes_.size();
   const size_t start = at_;
+  const size_t waits = waits_.size();
   const RestoredValue<bool> trying(is_trying_, true);
   bool is_read = true;
   try {
@@ -59,6 +60,7 @@ bool CompleteParser::Try(Rule&& rule) {
   }
   for (size_t i = mark; i < nodes_.size(); ++i) factory_.pool().Reclaim(nodes_[i]);
   nodes_.resize(mark);
+  waits_.resize(std::min(waits, waits_.size()));
   furthest_ = std::max(furthest_, at_);
   at_ = start;
   return is_read;

@@ -8,8 +8,10 @@
 
 #include "foundations/errors.h"
 #include "lines/fstring_fields.h"
+#include "lines/token_search.h"
 #include "parser/complete_depth.h"
 #include "parser/complete_parser.h"
+#include "parser/string_escapes.h"
 
 namespace quillet {
 
@@ -28,6 +30,8 @@ enum Level : int {
   kTermLevel,
   kNoLevel
 };
+
+constexpr char kAsyncComprehensionOutside[] = "asynchronous comprehension outside of an asynchronous function";
 
 bool IsBytesLiteral(Text text) {
   for (const char c : text) {
@@ -81,7 +85,9 @@ void CompleteParser::TargetList(TargetUse use) {
     one();
   }
   Finish(symbols_.exprlist, mark);
-  if (use != TargetUse::kFor || Code() == word::kIn) {
+  // A comparison in brackets is no target, and none that is told what it is instead.
+  const bool is_other = InvalidTarget(Top(), use) == nullptr && InvalidTarget(Top(), TargetUse::kAssign) != nullptr;
+  if (use != TargetUse::kFor || (Code() == word::kIn && !is_other)) {
     CheckTarget(Top(), use, false);
     if (isa<CStarExpression>(Top()))
       PostponeAtNode(Top(), "starred assignment target must be in a list or tuple", kCompiler);
@@ -195,11 +201,14 @@ void CompleteParser::OldTest() {
 void CompleteParser::Lambda() {
   const size_t mark = Mark();
   PushLeaf();
-  const RestoredValue<StatementPlace> place(place_, {StatementPlace::Scope::kFunction});
   const RestoredValue<const char*> comprehension(comprehension_, nullptr);
+  // Defaults belong to what the function stands in.
   if (Code() != tok::COLON) Parameters(/*is_lambda=*/true, tok::COLON);
   Expect(tok::COLON, nullptr);
+  const RestoredValue<StatementPlace> place(place_, {StatementPlace::Scope::kFunction});
+  const size_t outer_waits = waits_.size();
   Test();
+  JudgeWaits(outer_waits);
   yield_at_ = kNowhere;
   Finish(symbols_.lambdef, mark);
 }
@@ -302,10 +311,7 @@ void CompleteParser::Power() {
 void CompleteParser::AtomExpression() {
   const size_t mark = Mark();
   if (Code() == word::kAwait && IsKeyword(word::kAwait)) {
-    if (place_.scope == StatementPlace::Scope::kFunction)
-      Postpone(at_, "'await' outside async function");
-    else if (!place_.is_in_async())
-      Postpone(at_, "'await' outside function");
+    waits_.push_back({at_, /*is_comprehension=*/false});
     PushLeafOf(tok::AWAIT, TokenAt(at_), index_[at_]);
     ++at_;
   }
@@ -370,6 +376,7 @@ void CompleteParser::Strings() {
   bool is_mixed = false;
   while (Code() == tok::STRING) {
     is_mixed |= IsBytesLiteral(TokenAt(at_).view()) != is_bytes;
+    if (std::string wrong = WrongEscape(TokenAt(at_).view(), python3_); !wrong.empty()) Fail(std::move(wrong));
     PushLeaf();
   }
   if (is_mixed && python3_) Fail("cannot mix bytes and nonbytes literals");
@@ -411,13 +418,23 @@ void CompleteParser::Group() {
       if (code_[start] == tok::STAR) FailAt(start, "iterable unpacking cannot be used in comprehension");
       Comprehension("generator expression", start);
     } else {
-      if (code_[start] == tok::STAR && Code() == tok::RPAR) FailAt(start, "cannot use starred expression here");
+      if (code_[start] == tok::STAR && Code() == tok::RPAR && !IsElement(start - 1, at_))
+        FailAt(start, "cannot use starred expression here");
       Elements(tok::RPAR);
     }
     Finish(symbols_.testlist_comp, inner);
   }
   Expect(tok::RPAR, nullptr);
   Finish(symbols_.atom, mark);
+}
+
+// In front of 3.9 brackets around a starred element changed nothing. Whether those two stand around an element.
+bool CompleteParser::IsElement(size_t open, size_t close) const {
+  if (!Since(5) || Since(9)) return false;
+  const TokenCode behind = code_[close + 1];
+  if (behind == tok::COMMA) return true;
+  const TokenCode before = open > 0 ? code_[open - 1] : tok::ENDMARKER;
+  return IsClosingBracket(behind) && (IsOpeningBracket(before) || before == tok::COMMA);
 }
 
 // The elements behind the first one.
@@ -554,6 +571,7 @@ void CompleteParser::Arguments() {
     const size_t start = at_;
     const size_t argument = Mark();
     ++count;
+    if (!python3_ && has_unpacked_keywords) FailHere();
     if (Code() == tok::STAR || Code() == tok::DOUBLESTAR) {
       const bool is_star = Code() == tok::STAR;
       if (is_star && has_unpacked_keywords)
@@ -574,7 +592,7 @@ void CompleteParser::Arguments() {
       const Text name = TokenAt(at_).view();
       for (size_t i = first_name; i < names_.size(); ++i)
         if (names_[i] == name) Postpone(at_, "keyword argument repeated: " + std::string(name), kCompiler);
-      if (name == "__debug__" && python3_) Postpone(at_, "cannot assign to __debug__", kCompiler);
+      if (name == "__debug__") Postpone(at_, "cannot assign to __debug__", kCompiler);
       names_.push_back(name);
       has_keyword = true;
       PushLeaf();
@@ -691,11 +709,47 @@ void CompleteParser::Comprehension(const char* what, size_t start) {
     Postpone(yield_at_, std::string("'yield' inside ") + what);
   const RestoredValue<const char*> comprehension(comprehension_, what);
   const size_t outer_names = iterated_.size();
+  const RestoredValue<bool> has_async_for(has_async_for_, false);
+  const RestoredValue<size_t> first_iterable_begin(first_iterable_begin_, 0);
+  const RestoredValue<size_t> first_iterable_end(first_iterable_end_, 0);
   ComprehensionTail(/*is_first=*/true);
+  TakeWaits(start);
   const auto is_within = [start](size_t at) { return at >= start; };
   CheckAssignedWithin(
       static_cast<size_t>(std::find_if(assigned_.begin(), assigned_.end(), is_within) - assigned_.begin()));
   iterated_.resize(outer_names);
+}
+
+// What waits in the comprehension that was read, from `start` on, makes it asynchronous; what is in its first
+// iterable belongs to what is around it.
+void CompleteParser::TakeWaits(size_t start) {
+  bool is_async = has_async_for_;
+  std::erase_if(waits_, [&](const Wait& wait) {
+    if (wait.at < start || (wait.at >= first_iterable_begin_ && wait.at < first_iterable_end_)) return false;
+    if (wait.is_comprehension) {
+      if (!Since(11)) Postpone(wait.at, kAsyncComprehensionOutside, kCompiler);
+    } else if (!Since(7) && !place_.is_in_async()) {
+      return false;
+    }
+    is_async = true;
+    return true;
+  });
+  const bool is_generator = comprehension_[0] == 'g';
+  // The bracket in front of it is its place.
+  if (is_async && !(is_generator && Since(7))) waits_.push_back({start - 1, /*is_comprehension=*/true});
+}
+
+// What waits in no comprehension, behind the first so many, waits in the function around it.
+void CompleteParser::JudgeWaits(size_t first) {
+  for (size_t i = first; i < waits_.size() && !place_.is_in_async(); ++i) {
+    if (waits_[i].is_comprehension)
+      Postpone(waits_[i].at, kAsyncComprehensionOutside, kCompiler);
+    else if (place_.scope == StatementPlace::Scope::kFunction)
+      Postpone(waits_[i].at, "'await' outside async function");
+    else
+      Postpone(waits_[i].at, "'await' outside function");
+  }
+  waits_.resize(first);
 }
 
 // The names assigned to from the `first` on stand in the comprehension that was read.
@@ -723,9 +777,7 @@ void CompleteParser::ComprehensionTail(bool is_first) {
   if (Code() == word::kAsync) {
     if (!Since(6)) FailHere();
     if (!IsKeyword(word::kAsync)) FailHere();
-    const bool is_generator = comprehension_[0] == 'g';
-    if (!place_.is_in_async() && !(is_generator && Since(8)))
-      Postpone(at_, "asynchronous comprehension outside of an asynchronous function", kCompiler);
+    has_async_for_ = true;
     PushLeafOf(tok::ASYNC, TokenAt(at_), index_[at_]);
     ++at_;
   }
@@ -739,6 +791,7 @@ void CompleteParser::ComprehensionTail(bool is_first) {
     const RestoredValue<bool> in_iterable(in_iterable_, true);
     // The first iterable is none of the comprehension's own.
     const RestoredValue<const char*> comprehension(comprehension_, is_first ? nullptr : comprehension_);
+    const size_t begin = at_;
     if (is_list) {
       const size_t iterable = Mark();
       OldTest();
@@ -750,6 +803,10 @@ void CompleteParser::ComprehensionTail(bool is_first) {
       Finish(symbols_.testlist_star_expr, iterable);
     } else {
       Binary(kOrLevel);
+    }
+    if (is_first) {
+      first_iterable_begin_ = begin;
+      first_iterable_end_ = at_;
     }
   }
   ComprehensionRest();

@@ -14,7 +14,7 @@ void CompleteParser::AddParameterName(size_t at) {
   for (const Text earlier : names_) {
     if (earlier == name) Postpone(at, "duplicate argument '" + std::string(name) + "' in function definition");
   }
-  if (python3_ && name == "__debug__") Postpone(at, "cannot assign to __debug__", kCompiler);
+  if (name == "__debug__") Postpone(at, "cannot assign to __debug__", kCompiler);
   if (!python3_ && name == "None") FailAt(at, "cannot assign to None");
   names_.push_back(name);
 }
@@ -117,6 +117,7 @@ void CompleteParser::Parameters(bool is_lambda, TokenCode end) {
       if (Code() != end && IsParameterStart()) Fail("parameters cannot follow var-keyword parameter");
       break;
     } else {
+      if (!python3_ && has_star) FailHere();
       Parameter(is_lambda, /*is_starred=*/false);
       needs_name = false;
       if (Code() == tok::EQUAL) {

@@ -192,7 +192,10 @@ void CompleteParser::SetTokens(TokenSpan toks) {
   comprehension_ = nullptr;
   yield_at_ = kNowhere;
   assigned_.clear();
+  waits_.clear();
+  has_async_for_ = false;
   iterated_.clear();
+  irrefutable_words_.clear();
   postponed_.reset();
   judge_ = kNobody;
 }
@@ -410,6 +413,7 @@ CNode* CompleteParser::Run(TokenSpan toks, StatementPlace place, Rule&& rule) {
   try {
     rule();
     ExpectEnd();
+    JudgeWaits(0);
   } catch (const ParseError&) {
     // A bracket that is never closed explains what was met on a line below it, or at the end.
     const size_t furthest = std::max(furthest_, at_);

@@ -61,6 +61,11 @@ class CompleteParser {
   // `return` outside of a function: an error of a statement that is understood all the same.
   const std::optional<ParseError>& postponed() const { return postponed_; }
 
+  // What the case that was read last makes of those behind it, and at which token: empty where it has a guard, or
+  // does not match everything.
+  const std::string& irrefutable() const { return irrefutable_words_; }
+  int32_t irrefutable_at() const { return index_[irrefutable_]; }
+
   // Whether the last statement holds a template string.
   bool met_template() const { return met_template_; }
 
@@ -80,6 +85,11 @@ class CompleteParser {
   enum class TargetUse : uint8_t { kAssign, kAnnotate, kAugment, kFor, kWith, kDelete };
   // Who rejects what the grammar takes, in the order in which they are asked.
   enum Judge : uint8_t { kSymbolTable, kCompiler, kNobody };
+  // An `await`, or a comprehension that holds one or is `async` itself.
+  struct Wait {
+    size_t at;
+    bool is_comprehension;
+  };
   class Deeper;
   class InBracket;
   static constexpr size_t kNowhere = SIZE_MAX;
@@ -175,9 +185,11 @@ class CompleteParser {
   void Return();
   void RaiseStatement();
   void Import();
-  void ImportTarget();
+  void ImportTarget(size_t statement);
   void FromImport();
   void DottedName();
+  // `place` is where the language's compiler reports it.
+  void CheckBound(size_t at, size_t place);
   void PrintStatement();
   void ExecStatement();
 
@@ -212,6 +224,7 @@ class CompleteParser {
   void Strings();
   void Templates();
   void Group();
+  bool IsElement(size_t open, size_t close) const;
   void Elements(TokenCode close);
   void ListDisplay();
   void DictOrSet();
@@ -230,13 +243,15 @@ class CompleteParser {
   void ComprehensionRest();
   void Yield();
   void TargetList(TargetUse use);
+  void TakeWaits(size_t start);
+  void JudgeWaits(size_t first);
   void CheckWalrus(size_t name);
   void CheckAssignedWithin(size_t first);
   void AddIterated(const CNode* target);
 
   // ---- targets (complete_targets.cc) ----
   void CheckTarget(const CNode* node, TargetUse use, bool may_mean_equal);
-  void CheckTargetNames(const CNode* node);
+  void CheckTargetNames(const CNode* node, TargetUse use);
   const CNode* InvalidTarget(const CNode* node, TargetUse use) const;
   const char* NameOfExpression(const CNode* node) const;
   bool IsBracketed(const CNode* node) const;
@@ -258,6 +273,7 @@ class CompleteParser {
   void SequencePattern(TokenCode close);
   void MappingPattern();
   void CheckCapture(size_t at);
+  std::string UnreachableBehind(size_t at) const;
 
   CNodeFactory& factory_;
   Symbols symbols_;
@@ -286,6 +302,12 @@ class CompleteParser {
   std::vector<size_t> assigned_;         // where names are assigned to within expressions
   std::vector<Text> iterated_;           // the names that the comprehensions around bind
   size_t yield_at_ = kNowhere;           // the last yield that was read
+  std::vector<Wait> waits_;              // that no comprehension took yet
+  bool has_async_for_ = false;           // the comprehension around
+  size_t first_iterable_begin_ = 0;      // of the comprehension around
+  size_t first_iterable_end_ = 0;
+  size_t irrefutable_ = kNowhere;  // the name in the pattern that was read last that matches everything
+  std::string irrefutable_words_;
   std::optional<ParseError> postponed_;
   Judge judge_ = kNobody;
 };

@@ -33,6 +33,7 @@ void CompleteParser::Case() {
   RequireAt(at_, 10, "Pattern matching is");
   PushLeaf();
   Patterns();
+  if (irrefutable_ != kNowhere && Code() != word::kIf) irrefutable_words_ = UnreachableBehind(irrefutable_);
   if (Code() == word::kIf) {
     const size_t guard = Mark();
     PushLeaf();
@@ -62,6 +63,7 @@ void CompleteParser::Patterns() {
     if (Code() == tok::COLON || Code() == word::kIf) break;
     MaybeStarPattern();
   }
+  irrefutable_ = kNowhere;
   FinishBare<CSequencePatternNode>(mark);
 }
 
@@ -98,11 +100,11 @@ void CompleteParser::OrPattern() {
   const size_t mark = Mark();
   const size_t first_name = names_.size();
   size_t alternatives = 1;
-  size_t names_of_first = 0;
   const size_t start = at_;
   ClosedPattern();
   while (Code() == tok::VBAR) {
-    if (alternatives == 1) names_of_first = names_.size() - first_name;
+    // Only the last one may take whatever comes.
+    if (irrefutable_ != kNowhere) Postpone(irrefutable_, UnreachableBehind(irrefutable_), kCompiler);
     const std::vector<Text> before(names_.begin() + static_cast<ptrdiff_t>(first_name), names_.end());
     names_.resize(first_name);
     PushLeaf();
@@ -116,8 +118,12 @@ void CompleteParser::OrPattern() {
     for (const Text name : now) same = same && holds(before, name);
     if (!same) Postpone(start, "alternative patterns bind different names", kCompiler);
   }
-  (void)names_of_first;
   if (alternatives > 1) FinishBare<CPatternNode>(mark);
+}
+
+std::string CompleteParser::UnreachableBehind(size_t at) const {
+  if (code_[at] == word::kUnderscore) return "wildcard makes remaining patterns unreachable";
+  return "name capture '" + std::string(TokenAt(at).view()) + "' makes remaining patterns unreachable";
 }
 
 void CompleteParser::CheckCapture(size_t at) {
@@ -132,6 +138,7 @@ void CompleteParser::CheckCapture(size_t at) {
 void CompleteParser::ClosedPattern() {
   const Deeper deeper(*this);
   const size_t mark = Mark();
+  irrefutable_ = kNowhere;
   switch (Code()) {
     case tok::NUMBER:
     case tok::MINUS:
@@ -157,6 +164,7 @@ void CompleteParser::ClosedPattern() {
   if (!IsName(Code())) FailHere();
   if (CodeAt(1) != tok::DOT && CodeAt(1) != tok::LPAR) {
     CheckCapture(at_);
+    irrefutable_ = at_;
     return PushLeaf();
   }
   // A dotted value, or a class.
@@ -171,6 +179,7 @@ void CompleteParser::ClosedPattern() {
   if (Code() != tok::LPAR) return;
   PushLeaf();
   ClassArguments();
+  irrefutable_ = kNowhere;
   FinishBare<CClassPatternNode>(mark);
 }
 
@@ -239,6 +248,7 @@ void CompleteParser::SequencePattern(TokenCode close) {
     PushLeaf();
   }
   if (close == tok::RPAR && has_star && !has_comma) FailHere();
+  if (close != tok::RPAR || has_comma) irrefutable_ = kNowhere;
   Expect(close, nullptr);
   FinishBare<CSequencePatternNode>(mark);
 }
@@ -269,6 +279,7 @@ void CompleteParser::MappingPattern() {
     PushLeaf();
   }
   Expect(tok::RBRACE, nullptr);
+  irrefutable_ = kNowhere;
   FinishBare<CSequencePatternNode>(mark);
 }
 

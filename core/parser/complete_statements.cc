@@ -184,6 +184,7 @@ void CompleteParser::Except() {
 void CompleteParser::ExceptTypes() {
   const size_t types = Mark();
   const size_t start = at_;
+  const size_t clause = start - 1;
   Test();
   if (Code() == tok::COMMA && !python3_) {
     PushLeaf();
@@ -214,7 +215,7 @@ void CompleteParser::ExceptTypes() {
     return;
   }
   if (IsName(Code()) && (CodeAt(1) == tok::COLON || CodeAt(1) == tok::ENDMARKER)) {
-    if (TokenAt(name).view() == "__debug__") Postpone(name, "cannot assign to __debug__", kCompiler);
+    CheckBound(name, clause);
     return PushLeaf();
   }
   if (!BeginsExpression(Code())) FailHere();
@@ -351,8 +352,7 @@ void CompleteParser::Definition() {
   PushLeaf();
   if (!IsName(Code())) FailHere();
   const size_t name = at_;
-  if (TokenAt(name).view() == "__debug__") Postpone(name, "cannot assign to __debug__", kCompiler);
-  if (!python3_ && Code() == word::kNone) Fail("cannot assign to None");
+  CheckBound(name, name - 1);
   PushLeaf();
   const size_t parameters = Mark();
   const size_t parameter_count = Code() == tok::LSQB ? TypeParameters() : 0;
@@ -395,7 +395,7 @@ void CompleteParser::Class() {
   const size_t mark = Mark();
   PushLeaf();
   if (!IsName(Code())) FailHere();
-  if (TokenAt(at_).view() == "__debug__") Postpone(at_, "cannot assign to __debug__", kCompiler);
+  CheckBound(at_, at_ - 1);
   PushLeaf();
   const size_t parameters = Mark();
   const size_t parameter_count = Code() == tok::LSQB ? TypeParameters() : 0;
@@ -564,7 +564,7 @@ void CompleteParser::ExpressionStatement() {
       FailAtNode(target,
                  std::string("'") + NameOfExpression(target) + "' is an illegal expression for augmented assignment");
     }
-    CheckTargetNames(target);
+    CheckTargetNames(target, TargetUse::kAugment);
     return Finish(symbols_.expr_stmt, mark);
   }
   if (Code() != tok::EQUAL) {
@@ -624,7 +624,7 @@ void CompleteParser::Annotation(size_t mark, size_t start) {
   }
   if (InvalidTarget(target, TargetUse::kAnnotate) != nullptr) FailAt(start, "illegal target for annotation");
   if (!Since(6)) RequireAt(colon, 6, "Variable annotation syntax is");
-  CheckTargetNames(target);
+  CheckTargetNames(target, TargetUse::kAnnotate);
   if (Code() == tok::EQUAL) {
     PushLeaf();
     if (Code() == word::kYield) {
@@ -732,6 +732,7 @@ void CompleteParser::DottedName() {
 
 void CompleteParser::Import() {
   const size_t mark = Mark();
+  const size_t statement = at_;
   PushLeaf();
   if (AtEnd() && python3_) Fail("Expected one or more names after 'import'");
   const size_t names = Mark();
@@ -741,9 +742,9 @@ void CompleteParser::Import() {
     DottedName();
     if (Code() == word::kAs) {
       PushLeaf();
-      ImportTarget();
-    } else if (at_ == start + 1 && TokenAt(start).view() == "__debug__") {
-      Postpone(start, "cannot assign to __debug__", kCompiler);
+      ImportTarget(statement);
+    } else if (at_ == start + 1) {
+      CheckBound(start, statement);
     }
     Finish(symbols_.dotted_as_name, one);
     if (Code() != tok::COMMA) break;
@@ -754,11 +755,11 @@ void CompleteParser::Import() {
 }
 
 // The name behind `as`.
-void CompleteParser::ImportTarget() {
+void CompleteParser::ImportTarget(size_t statement) {
   const size_t name = at_;
   const TokenCode next = CodeAt(1);
   if (IsName(Code()) && (next == tok::COMMA || next == tok::RPAR || next == tok::ENDMARKER)) {
-    if (TokenAt(name).view() == "__debug__") Postpone(name, "cannot assign to __debug__", kCompiler);
+    CheckBound(name, statement);
     return PushLeaf();
   }
   if (!BeginsExpression(Code())) FailHere();
@@ -770,6 +771,7 @@ void CompleteParser::ImportTarget() {
 
 void CompleteParser::FromImport() {
   const size_t mark = Mark();
+  const size_t statement = at_;
   PushLeaf();
   bool has_dots = false;
   while (Code() == tok::DOT || Code() == tok::ELLIPSIS) {
@@ -796,9 +798,9 @@ void CompleteParser::FromImport() {
     PushName();
     if (Code() == word::kAs) {
       PushLeaf();
-      ImportTarget();
-    } else if (TokenAt(start).view() == "__debug__") {
-      Postpone(start, "cannot assign to __debug__", kCompiler);
+      ImportTarget(statement);
+    } else {
+      CheckBound(start, statement);
     }
     Finish(symbols_.import_as_name, one);
     if (Code() != tok::COMMA) break;
@@ -809,6 +811,13 @@ void CompleteParser::FromImport() {
   Finish(symbols_.import_as_names, names);
   if (is_bracketed) Expect(tok::RPAR, nullptr);
   Finish(symbols_.import_from, mark);
+}
+
+// A name that no statement may bind.
+void CompleteParser::CheckBound(size_t at, size_t place) {
+  const Text name = TokenAt(at).view();
+  if (name == "__debug__" || (!python3_ && code_[at] == word::kNone))
+    Postpone(place, "cannot assign to " + std::string(name), kCompiler);
 }
 
 // ---- of 2 alone ----

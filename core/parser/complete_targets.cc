@@ -139,7 +139,7 @@ const CNode* CompleteParser::InvalidTarget(const CNode* node, TargetUse use) con
 void CompleteParser::CheckTarget(const CNode* node, TargetUse use, bool may_mean_equal) {
   const CNode* invalid = InvalidTarget(node, use);
   if (invalid == nullptr) {
-    CheckTargetNames(node);
+    CheckTargetNames(node, use);
     return;
   }
   const std::string verb = use == TargetUse::kDelete ? "cannot delete " : "cannot assign to ";
@@ -150,31 +150,38 @@ void CompleteParser::CheckTarget(const CNode* node, TargetUse use, bool may_mean
 }
 
 // `__debug__`, and more than one star in a list.
-void CompleteParser::CheckTargetNames(const CNode* node) {
+void CompleteParser::CheckTargetNames(const CNode* node, TargetUse use) {
   node = CompleteInnermost(node);
-  if (const auto* star = dyn_cast<CStarExpression>(node)) return CheckTargetNames(star->children[1]);
+  if (const auto* star = dyn_cast<CStarExpression>(node)) return CheckTargetNames(star->children[1], use);
   if (const auto* chain = dyn_cast<CAtomExpr>(node)) {
     const CNode* trailer = chain->LastChild();
-    if (python3_ && trailer->ChildIs(0, tok::DOT) && trailer->GetChildText(1) == "__debug__")
-      PostponeAtNode(chain, "cannot assign to __debug__", kCompiler);
+    if (!trailer->ChildIs(0, tok::DOT) || use == TargetUse::kDelete) return;
+    const Text name = trailer->GetChildText(1);
+    if (name == "__debug__" || (!python3_ && name == "None"))
+      PostponeAtNode(chain, "cannot assign to " + std::string(name), kCompiler);
     return;
   }
   if (node->IsLeaf()) {
-    if (node->fText() == "__debug__") PostponeAtNode(node, "cannot assign to __debug__", kCompiler);
+    if (node->fText() != "__debug__") return;
+    if (use != TargetUse::kDelete)
+      PostponeAtNode(node, "cannot assign to __debug__", kCompiler);
+    else if (Since(10))
+      PostponeAtNode(node, "cannot delete __debug__", kCompiler);
     return;
   }
+  if (!IsTupleNode(node) && !IsListNode(node)) return;
   const CNode* list = node;
   if (isa<CAtom>(node)) {
     if (node->child_count != 3) return;
     list = node->children[1];
   }
-  if (!isa<CTestListStarExpr>(list)) return CheckTargetNames(list);
+  if (!isa<CTestListStarExpr>(list)) return CheckTargetNames(list, use);
   int stars = 0;
   for (const CNode* child : list->fChildren()) {
     if (child->code == tok::COMMA) continue;
     if (isa<CStarExpression>(child) && ++stars == 2)
       PostponeAtNode(node, "multiple starred expressions in assignment", kCompiler);
-    CheckTargetNames(child);
+    CheckTargetNames(child, use);
   }
 }
 

@@ -62,6 +62,8 @@ void CNodeWalker::DoubtArguments(const UsedArgList& arg_list) {
       continue;
     }
     if (arg.prefix == "*" && has_keyword) met_doubtful_ = true;
+    // And two of them come last of all.
+    if (!fPy3 && i > 0 && arg_list[i - 1].prefix == "**") met_doubtful_ = true;
     has_star |= arg.prefix == "*";
     has_keyword |= arg.name != nullptr || arg.prefix == "**";
     if (arg.name == nullptr) continue;

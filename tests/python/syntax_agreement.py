@@ -72,6 +72,9 @@ OTHER_KINDS = {
 #: What quillet says of hints, which Python does not read.
 OF_HINTS = re.compile(r"invalid syntax in (stringified type hint|commented type hint|signature comment)")
 
+CODING = re.compile(r"\A.*(\n.*)?coding[:=]")
+UTF8 = re.compile(r"\A.*(\n.*)?coding[:=] *utf-?8", re.IGNORECASE)
+
 TOKEN = re.compile(
     r"\w+|(?:[rbuf]{0,2})'[^'\n]*'|(?:[rbuf]{0,2})\"[^\"\n]*\"|\*\*=?|//=?|>>=?|<<=?|->|:=|[-+*/%&|^@<>=!]=|\.\.\.|[^\s\w]"
 )
@@ -151,7 +154,7 @@ def wrapped(statement: Statement, text: str, version: tuple[int, int]) -> str:
     first = statement.first
     front, behind = "", ""
     if first in ("elif", "else"):
-        front = f"{blank}if 1: pass\n"
+        front = f"{blank}if x: pass\n"
     elif first in ("except", "finally"):
         front = f"{blank}try: pass\n"
     elif first == "try":
@@ -295,8 +298,11 @@ def library_sources(library: Library, each_nth: int) -> list[str]:
     sources = []
     for path in library.files(each_nth):
         try:
-            text = path.read_bytes().decode("ascii")
+            text = path.read_bytes().decode("utf-8")
         except UnicodeDecodeError:
+            continue
+        # What another encoding makes of it is for whoever decodes it.
+        if not text.isascii() and CODING.search(text) and not UTF8.search(text):
             continue
         sources.append(text)
     return sources

@@ -13,13 +13,32 @@ from quillet import analyze, analyze_files
 NEWEST = (3, 14)
 
 
+def around(source: str) -> tuple[str, str]:
+    """What has to stand in front of a statement or a head, and behind it, for a file without an error of its own."""
+    front = ""
+    if source.startswith("case "):
+        front = "match 0:\n "
+    elif source.startswith("except"):
+        front = "try: pass\n"
+    code = source.split("#")[0].rstrip()
+    behind = "\ndef g(): pass\n" if source.startswith("@") else "\n"
+    if code.endswith(":"):
+        behind = "\n  case 0: pass\n" if source.startswith("match ") else "\n  pass\n"
+    return front, behind
+
+
 def read(source: str, version: tuple[int, int] = NEWEST, *, exact: bool = False) -> list[str]:
-    """The records of all lines, each as a line of text, and errors as place and message."""
+    """The records of all lines of a source, each as a line of text, and errors as place and message."""
+    front, behind = around(source)
+    lines_in_front = front.count("\n")
+    last_line = lines_in_front + source.count("\n") + 1
     found = []
-    for line in analyze(source, version=version, exact=exact).lines:
+    for line in analyze(front + source + behind, version=version, exact=exact).lines:
+        if not lines_in_front < line.first_line <= last_line:
+            continue
         if line.error is not None:
             row, column = line.error_position or (0, 0)
-            found.append(f"{row}:{column} {line.error.msg}")
+            found.append(f"{row - lines_in_front}:{column} {line.error.msg}")
         for record in line.records:
             mark = "parameter " if record.is_parameter else ""
             found.append(f"{record.name} {mark}{record.kind.value} {record.detail}".rstrip())
@@ -225,7 +244,72 @@ def test_what_only_the_compiler_rejects_keeps_its_records() -> None:
 def test_an_exact_reading_is_that_of_the_tables() -> None:
     for source in ("return a", "f() = 1", "def f(a=1, b): pass", "x = 1  # type: ignore[misc]"):
         assert analyze(source, exact=True).errors == []
-    [result] = analyze_files([("a.py", b"case a, b:\n")], version=(3, 13), exact=True)
-    assert result.errors == [(1, 7, "invalid syntax")]
-    [result] = analyze_files([("a.py", b"case a, b:\n")], version=(3, 13))
+    source = b"match x:\n  case a, b: pass\n"
+    [result] = analyze_files([("a.py", source)], version=(3, 13), exact=True)
+    assert result.errors == [(2, 9, "invalid syntax")]
+    [result] = analyze_files([("a.py", source)], version=(3, 13))
     assert result.errors == []
+
+
+# ---- by version ----
+
+VERSIONS = ((2, 7), (3, 6), (3, 7), (3, 8), (3, 10), (3, 11), (3, 13))
+#: Which of the versions reject a statement: an "E" for each that does.
+BY_VERSION = [
+    ("x.None = 1", "EEEEEEE"),
+    ("from a import None", "EEEEEEE"),
+    ("del x.None", ".EEEEEE"),
+    ("del __debug__", "....EEE"),
+    ("f(__debug__=1)", "EEEEEEE"),
+    ("import __debug__", "EEEEEEE"),
+    ("def f(*args, kw): pass", "E......"),
+    ("f(**kw, a=1)", "E......"),
+    ("o, @= m", "EEEEEEE"),
+    ("0 |= r", "EEEEEEE"),
+    ("f((*a), b)", "E...EEE"),
+    ("x = (*a)", "EEEEEEE"),
+    ("def f(): return (await x for x in y)", "EE....."),
+    ("def f(): return (x for x in await y)", "EEEEEEE"),
+    ("def f(): return [await x for x in y]", "EEEEEEE"),
+    ("(x async for x in y)", "EE....."),
+    ("async def f(): return [[x async for x in y] for z in w]", "EEEEE.."),
+    ("def f(): return ([await y for y in z] for x in w)", "EEEEE.."),
+    ("def f(): return [[await y for y in z] for x in w]", "EEEEEEE"),
+    ("async def f(): return lambda x=await y: x", "E......"),
+    ("x = 'C:\\Users'", ".EEEEEE"),
+    ("x = r'C:\\Users'", "......."),
+    ("x = u'\\x4'", "EEEEEEE"),
+    ("x = '\\N{DIGIT ONE}\\\\x'", "......."),
+    ("x = f'{\"#\"}'", "E......"),
+    ("x = f'{a # b}'", "EEEEEEE"),
+    ("for [a in b] in c: pass", "EEEEEEE"),
+    ("[x for [a in b]", "EEEEEEE"),
+]
+
+
+@pytest.mark.parametrize(("source", "expected"), BY_VERSION, ids=[row[0] for row in BY_VERSION])
+def test_each_version_takes_what_it_takes(source: str, expected: str) -> None:
+    found = "".join("E" if analyze(source + "\n", version=version).errors else "." for version in VERSIONS)
+    assert found == expected
+
+
+ESCAPES = [
+    ('x = "\\x4"', "'unicodeescape' codec can't decode bytes in position 0-2: truncated \\xXX escape"),
+    ('x = "C:\\Users"', "'unicodeescape' codec can't decode bytes in position 2-3: truncated \\UXXXXXXXX escape"),
+    ('x = "é\\u12"', "'unicodeescape' codec can't decode bytes in position 10-13: truncated \\uXXXX escape"),
+    ('x = "\\N{}"', "'unicodeescape' codec can't decode bytes in position 0-2: malformed \\N character escape"),
+    ('x = "\\U00110000"', "'unicodeescape' codec can't decode bytes in position 0-9: illegal Unicode character"),
+]
+
+
+@pytest.mark.parametrize(("source", "words"), ESCAPES)
+def test_an_escape_that_means_nothing_is_an_error(source: str, words: str) -> None:
+    assert read(source, (3, 13))[0] == f"1:5 (unicode error) {words}"
+    with pytest.raises(SyntaxError) as raised:
+        compile(source, "s", "exec")
+    assert raised.value.msg == f"(unicode error) {words}"
+
+
+def test_an_escape_of_bytes_is_none_of_text() -> None:
+    assert read('x = b"a\\x4"', (3, 13))[0] == "1:5 (value error) invalid \\x escape at position 1"
+    assert read('x = b"\\u12"', (3, 13))[0] == "x set"

@@ -185,6 +185,9 @@ def test_broken_statements_give_errors_in_their_place_and_nothing_else(
             # What is missing at the end is missing where the line ends, which is behind its blanks.
             rest = analysis.source_line(last[0])[last[1] - 1 :]
             last = (last[0], last[1] + len(rest) - len(rest.lstrip(b" \t")))
+            if not exact:
+                # Of the indentation, or of what is in front of it on its line.
+                first, last = (first[0], 1), max(last, (first[0], len(analysis.source_line(first[0])) + 1))
             assert first <= line.error_position <= last, text
         behind = analysis.lines[-1]
         assert behind.logical.fToks == alone.logical.fToks, text

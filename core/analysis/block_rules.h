@@ -1,0 +1,101 @@
+// What the statements of a file may not say to each other: indentation, blocks that are missing, clauses without
+// what they are clauses of, and statements in a place where they mean nothing.
+//
+// Rows are fed in order, each behind its own reading. A stack holds the open blocks, by their indentation; each
+// knows what heads it and which clauses may come next in it. A statement that its own reading rejected says little
+// about what was meant: nothing is concluded from it, so that one fault is told once.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "foundations/errors.h"
+#include "lines/cutter.h"
+
+namespace quillet {
+
+class BlockRules {
+ public:
+  struct Finding {
+    size_t row;
+    SyntaxError::Kind kind;
+    std::string message;
+    Context place;     // a token of the row, or a position that counts lines from its first one
+    bool comes_first;  // also where the row's own reading found something
+  };
+  // What the reading of a row tells.
+  struct Reading {
+    bool was_rejected = false;  // by the grammar
+    // Of a case without a guard that matches everything: what that makes of the cases behind it, and at which token.
+    std::string irrefutable;
+    int32_t irrefutable_at = 0;
+  };
+
+  // For another source; keeps its memory.
+  void Reset(const SourceText& source, Version version);
+  // What is wrong is in findings(), for rows up to this one.
+  void Next(size_t index, const LineRow& row, const Reading& reading);
+  void End();
+
+  std::vector<Finding>& findings() { return findings_; }
+
+ private:
+  static constexpr size_t kNoRow = SIZE_MAX;
+  // As far as what stands inside depends on it.
+  enum class Head : uint8_t { kFile, kPlain, kLoop, kDefinition, kExceptStar, kFinally, kMatch, kUnknown };
+  // Which clauses may come next: those of the statement that stands last in a block.
+  enum class Clauses : uint8_t { kNone, kElse, kElif, kTry, kExcept, kTryElse, kDecorated, kUnknown };
+
+  struct Block {
+    uint32_t column;
+    uint32_t narrow_column;  // with tabs one wide
+    Head head;
+    Clauses clauses = Clauses::kNone;
+    // Of the try whose clauses may come.
+    bool has_except = false;
+    bool has_except_star = false;
+    size_t bare_except = kNoRow;
+    // Of a match: the case that leaves nothing to those behind it.
+    size_t irrefutable_row = kNoRow;
+    int32_t irrefutable_at = 0;
+    std::string irrefutable{};
+  };
+
+  void Indent(size_t index, const LineRow& row);
+  void Dedent(size_t index, const LineRow& row, uint32_t column, uint32_t narrow_column);
+  void Push(size_t index, uint32_t column, uint32_t narrow_column, Head head, Clauses clauses);
+  void ContinueLine(size_t index, const LineRow& row);
+  void Clause(size_t index, const LineRow& row, const Reading& reading);
+  void Except(size_t index, const LineRow& row, Block& block);
+  void Case(size_t index, const Reading& reading, Block& block);
+  void Jump(size_t index, const LineRow& row, size_t token);
+  void FutureImport(size_t index, const LineRow& row);
+  void Add(size_t row, Context place, std::string message, bool comes_first = true,
+           SyntaxError::Kind kind = SyntaxError::Kind::kSyntax);
+  Context FirstToken(const LineRow& row) const;
+  // "'if' statement on line 3", for the head that waits for its block.
+  std::string NameOfHead() const;
+  Head HeadOf(const LineRow& row) const;
+  TokenSpan TokensOf(const LineRow& row) const;
+  // The width of the indentation with tabs one wide.
+  uint32_t NarrowColumn(const LineRow& row) const;
+
+  const SourceText* source_ = nullptr;
+  Version version_;
+  std::vector<Block> blocks_;
+  std::vector<Head> inline_;  // heads whose bodies are on the line under way
+  // The head that waits for its block.
+  size_t head_index_ = kNoRow;
+  LineRow head_{};
+  // The statement before.
+  size_t last_index_ = kNoRow;
+  LineRow last_{};
+  bool last_was_rejected_ = false;
+  size_t told_row_ = kNoRow;  // the last one of which something was told
+  bool may_import_future_ = true;
+  bool has_except_star_ = false;  // somewhere
+  std::vector<Finding> findings_;
+};
+
+}  // namespace quillet
