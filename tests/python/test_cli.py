@@ -402,6 +402,7 @@ def test_a_pipe_is_read_up_to_a_limit(tmp_path: Path) -> None:
         ["index", ""],
         ["index", ".", "-o", ""],
         ["find", "x", "--index", ""],
+        ["find", "x", "--root", ""],
         ["defs", ""],
         ["outline", ""],
         ["stats", "--index", ""],

@@ -481,6 +481,7 @@ def test_a_plain_question_is_read_as_click_reads_it(arguments: list[str]) -> Non
         ["a", "--scope", "--json"],
         ["a", "--scope=Shop"],
         ["a", "--match", "regex"],
+        ["a", "--root", ""],
         ["--", "a"],
         ["a", "-lx"],
         ["-"],

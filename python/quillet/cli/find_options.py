@@ -37,6 +37,10 @@ class Option:
         return bool(self.metavar or self.choices)
 
     @property
+    def is_path(self) -> bool:
+        return self.metavar in ("FILE", "DIR")
+
+    @property
     def missing(self) -> object:
         """The value of the parameter where the option is not given."""
         return () if self.repeated else None if self.takes_value else False
@@ -115,7 +119,7 @@ def plain_parameters(arguments: Sequence[str]) -> dict[str, Any] | None:
             value = next(rest, "-")
             if (
                 value.startswith("-")
-                or (not value and option is INDEX_OPTION)
+                or (not value and option.is_path)
                 or (option.choices and value not in option.choices)
             ):
                 return None

@@ -26,7 +26,7 @@ def _options(options: Sequence[Option]) -> Callable[[Callable[..., None]], Calla
             elif option.takes_value:
                 settings |= {
                     "metavar": option.metavar,
-                    "type": PathArgument() if option.metavar in ("FILE", "DIR") else str,
+                    "type": PathArgument() if option.is_path else str,
                 }
                 if option.repeated:
                     settings["multiple"] = True
