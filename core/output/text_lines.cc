@@ -140,6 +140,7 @@ class TextLinesWriter : public FileWriter {
              std::string& out) override {
     path_.clear();
     AppendPrintable(input.path, path_);
+    shown_line_ = kNoLine;
     placed.Begin(file, scopes);
     for (size_t row = 0; row < file.rows().size(); ++row) {
       file.CheckMemory(out.size());
@@ -188,7 +189,7 @@ class TextLinesWriter : public FileWriter {
     place_.assign(path_).append(":").append(std::to_string(line.first_line + 1)).append(":");
     AppendColoured(kPlaceColour, place_, out);
     out += ' ';
-    AppendSourceLine(PhysicalLine(file.source(), line.first_line), out);
+    out += ShownLine(file.source(), line.first_line);
     if (line.last_line > line.first_line) out.append(" ").append(kEllipsis);
     out += '\n';
     for (const PlacedRecord& record : records) {
@@ -223,6 +224,16 @@ class TextLinesWriter : public FileWriter {
     return text.substr(0, text.find_last_not_of("\r\n") + 1);
   }
 
+  // A physical line as it is shown: any number of statements may stand in one.
+  const std::string& ShownLine(const SourceText& source, size_t line) {
+    if (shown_line_ != line) {
+      shown_line_ = line;
+      shown_.clear();
+      AppendSourceLine(PhysicalLine(source, line), shown_);
+    }
+    return shown_;
+  }
+
   size_t WidthOf(uint32_t c) {
     if (c < 0x80 || !options_.width_of) return 1;
     const auto [found, added] = widths_.try_emplace(c, 0);
@@ -235,6 +246,9 @@ class TextLinesWriter : public FileWriter {
   std::string path_;
   std::string place_;
   std::string text_;
+  static constexpr size_t kNoLine = SIZE_MAX;
+  size_t shown_line_ = kNoLine;
+  std::string shown_;
 };
 
 }  // namespace
