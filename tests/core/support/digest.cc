@@ -4,21 +4,32 @@
 //
 // Each file is taken as it is and with some of its lines spoilt, always the same ones in the same way, as
 // 2.7, 3.8 and 3.12: tokens and rows, trees with their contexts and texts, records and errors, what is
-// printed and reported, and the lines of each format. Two builds that print the same numbers tell nobody
-// apart by this corpus. scripts/mutate.py asks it about changes that no test noticed.
+// printed and reported, the lines of each format, names and what they are bound to, statements and expressions,
+// the words of an index, answers to questions, and the page of a site. Two builds that print the same numbers
+// tell nobody apart by this corpus. scripts/mutate.py asks it about changes that no test noticed.
 #include <algorithm>
 #include <cstdint>
 #include <cstdio>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "analysis/record_table.h"
+#include "index/answer_lines.h"
+#include "index/question.h"
+#include "index/words.h"
+#include "names/binder.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
+#include "site/pages.h"
+#include "site/site_index.h"
 #include "tests/core/support/analyzer_helper.h"
+#include "tests/core/support/names_helper.h"
+#include "tests/core/support/syntax_text.h"
 #include "tests/core/support/tree_text.h"
 
 namespace quillet {
@@ -43,7 +54,7 @@ class Digest {
 };
 
 struct Digests {
-  Digest tokens, trees, records, output;
+  Digest tokens, trees, records, output, names, syntax, index, site;
 };
 
 Digests digests;
@@ -127,6 +138,10 @@ class Analysis {
     }
     AddRecords();
     AddOutput();
+    AddNames(bytes);
+    AddSyntax(*source, rows);
+    AddIndex();
+    AddSite();
   }
 
  private:
@@ -179,9 +194,76 @@ class Analysis {
     }
   }
 
+  void AddNames(const std::string& bytes) {
+    const Bindings& bindings = binder_.Bind(bytes);
+    digests.names.Add(testing::NamesOf(bindings));
+    for (const Occurrence& occurrence : bindings.occurrences) digests.names.Add(occurrence.begin);
+    for (uint32_t i = 0; i < bindings.scopes.size(); ++i) {
+      const NameScope& scope = bindings.scopes[i];
+      digests.names.Add(testing::ScopeWord(bindings, i));
+      digests.names.Add(testing::SymbolsOf(bindings, i));
+      for (const int64_t number : {int64_t{scope.parent}, int64_t{scope.begin}, int64_t{scope.end},
+                                   int64_t{scope.is_listed}, int64_t{scope.is_async}, int64_t{scope.has_star_import},
+                                   int64_t{scope.is_generator}, int64_t{scope.sees_class}})
+        digests.names.Add(number);
+    }
+    for (const NameSymbol& symbol : bindings.symbols) {
+      digests.names.Add(symbol.variable);
+      digests.names.Add(symbol.uses);
+    }
+  }
+
+  void AddSyntax(const SourceText& source, const std::vector<LineRow>& rows) {
+    FileSyntax file;
+    syntax_.Read(source, rows, file);
+    std::string text;
+    testing::AppendBlockText(file, kModuleStmt, 0, text);
+    digests.syntax.Add(text);
+    for (const Expr& expr : file.exprs) {
+      digests.syntax.Add(expr.begin);
+      digests.syntax.Add(expr.end);
+    }
+  }
+
+  // What a writer makes of the file.
+  std::string Written(FileWriter& writer) {
+    ScopeNames scopes;
+    scopes.Build(file_);
+    PlacedRecords placed;
+    std::string out;
+    writer.Write({"a.py", {}, {}}, file_, scopes, placed, out);
+    return out;
+  }
+
+  void AddIndex() {
+    digests.index.Add(Written(*MakeWordsWriter(version_)));
+    AnswerLinesOptions options;
+    options.form = AnswerLinesOptions::Form::kJson;
+    Question question;
+    for (const auto& [match, name] : {std::pair(Question::Match::kEverything, ""),
+                                      {Question::Match::kExact, "a"},
+                                      {Question::Match::kSuffix, ".b"},
+                                      {Question::Match::kGlob, "*e?"}}) {
+      question.match = match;
+      question.name = name;
+      digests.index.Add(Written(*MakeQuestionWriter(question, version_, MakeAnswerLines(options))));
+      options.form = AnswerLinesOptions::Form::kLong;
+    }
+  }
+
+  void AddSite() {
+    const std::string survey = Written(*MakeSiteSurveyWriter(version_));
+    digests.site.Add(survey);
+    const auto index = std::make_shared<SiteIndex>(std::vector<std::string>{"a.py"}, std::vector<std::string>{});
+    index->Add(0, survey);
+    digests.site.Add(Written(*MakeSitePageWriter(index, version_)));
+  }
+
   Version version_;
   FileAnalyzer file_;
   CPGenAnalyzerImpl parser_;
+  NameBinder binder_{version_};
+  SyntaxReader syntax_{version_};
 };
 
 std::vector<std::filesystem::path> FilesOf(int argc, char** argv) {
@@ -218,10 +300,16 @@ int main(int argc, char** argv) {
       for (Analysis& analysis : analyses) analysis.Add(text);
     }
   }
-  std::printf("%zu files  tokens %016llx  trees %016llx  records %016llx  output %016llx\n", count,
-              static_cast<unsigned long long>(digests.tokens.value()),
-              static_cast<unsigned long long>(digests.trees.value()),
-              static_cast<unsigned long long>(digests.records.value()),
-              static_cast<unsigned long long>(digests.output.value()));
+  std::printf("%zu files", count);
+  for (const auto& [name, digest] : {std::pair("tokens", &digests.tokens),
+                                     {"trees", &digests.trees},
+                                     {"records", &digests.records},
+                                     {"output", &digests.output},
+                                     {"names", &digests.names},
+                                     {"syntax", &digests.syntax},
+                                     {"index", &digests.index},
+                                     {"site", &digests.site}})
+    std::printf("  %s %016llx", name, static_cast<unsigned long long>(digest->value()));
+  std::printf("\n");
   return 0;
 }
