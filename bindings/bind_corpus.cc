@@ -33,7 +33,7 @@ template <>
 constexpr const char* kCapsuleName<ArrowArrayStream> = "arrow_array_stream";
 
 template <class Structure>
-void Release(Structure& structure) {
+void ReleaseStructure(Structure& structure) {
   if (structure.release != nullptr) structure.release(&structure);
 }
 
@@ -42,7 +42,7 @@ template <class Structure>
 struct Owned {
   Structure it{};
   Owned() = default;
-  ~Owned() { Release(it); }
+  ~Owned() { ReleaseStructure(it); }
   Owned(const Owned&) = delete;
   Owned& operator=(const Owned&) = delete;
 };
@@ -53,12 +53,12 @@ nb::object CapsuleOf(Structure&& structure) {
   structure.release = nullptr;
   const auto release = [](PyObject* capsule) {
     auto* it = static_cast<Structure*>(PyCapsule_GetPointer(capsule, kCapsuleName<Structure>));
-    Release(*it);
+    ReleaseStructure(*it);
     delete it;
   };
   nb::object capsule = nb::steal(PyCapsule_New(held.get(), kCapsuleName<Structure>, release));
   if (!capsule.is_valid()) {
-    Release(*held);
+    ReleaseStructure(*held);
     throw nb::python_error();
   }
   static_cast<void>(held.release());
@@ -78,7 +78,7 @@ Structure& StructureIn(nb::handle capsule) {
   return structure;
 }
 
-nb::object Export(const std::shared_ptr<const RowTable>& table) {
+nb::object ExportTable(const std::shared_ptr<const RowTable>& table) {
   if (table == nullptr) return nb::none();
   Owned<ArrowSchema> schema;
   Owned<ArrowArray> array;
@@ -91,7 +91,7 @@ class SourceRowsObject {
  public:
   // `decode` is that of a batch.
   SourceRowsObject(const std::vector<Language*>& languages, const std::string& form, std::string path,
-                   std::string content, std::vector<std::string> keep, nb::object decode)
+                   std::string content, std::vector<std::string> keep, nb::object decode, std::string problem)
       : decoder_(std::move(decode)) {
     SourceRows::Options options;
     options.form = FormOf(form);
@@ -100,6 +100,7 @@ class SourceRowsObject {
     options.path_column = std::move(path);
     options.content_column = std::move(content);
     options.kept_columns = std::move(keep);
+    options.problem_column = std::move(problem);
     options.decode = [this](Text bytes, std::string& utf8) { return decoder_.Decode(bytes, utf8); };
     rows_ = std::make_unique<SourceRows>(std::move(options));
   }
@@ -120,7 +121,12 @@ class SourceRowsObject {
       table = rows_->Next();
     }
     decoder_.RaiseFailure();
-    return Export(table);
+    return ExportTable(table);
+  }
+
+  nb::object TakeFiles() {
+    const InUse in_use(*this);
+    return ExportTable(rows_->TakeFiles());
   }
 
   // Of a form, without those that are carried along.
@@ -133,7 +139,7 @@ class SourceRowsObject {
 
   nb::object Finish() {
     const InUse in_use(*this);
-    return Export(rows_->Finish());
+    return ExportTable(rows_->Finish());
   }
 
  private:
@@ -204,13 +210,15 @@ void BindCorpus(nb::module_& tarvex) {
   nb::module_ host = SiblingModule(tarvex, "host");
   nb::class_<SourceRowsObject>(host, "SourceRows", "Record batches of sources to record batches of what they say.")
       .def(nb::init<const std::vector<Language*>&, const std::string&, std::string, std::string,
-                    std::vector<std::string>, nb::object>(),
+                    std::vector<std::string>, nb::object, std::string>(),
            nb::arg("languages"), nb::arg("form"), nb::arg("path"), nb::arg("content"), nb::arg("keep"),
-           nb::arg("decode"))
+           nb::arg("decode"), nb::arg("problem") = "")
       .def("Begin", &SourceRowsObject::Begin, nb::arg("schema"), nb::arg("array"),
            "Takes an input batch over, as capsules.")
       .def("Next", &SourceRowsObject::Next,
            "The next full batch, as capsules of its schema and its array; None where the input batch is at its end.")
+      .def("TakeFiles", &SourceRowsObject::TakeFiles,
+           "With a column of problems: a row for each source so far, as the form \"files\" has them, or None.")
       .def_static("Columns", &SourceRowsObject::Columns, nb::arg("form"),
                   "The columns of a form behind those that are carried along, as (name, format, may be null).")
       .def("Finish", &SourceRowsObject::Finish, "The rows that are left, in the same form, or None.");

@@ -90,6 +90,11 @@ void SourceRows::Begin(std::unique_ptr<InputBatch> batch) {
   carried.emplace_back("path", columns.back(), true);
   auto content = std::make_unique<InputColumn>(batch->ColumnOf(options_.content_column));
   static_cast<void>(CarriedColumn(options_.content_column, *content, true));
+  std::unique_ptr<InputColumn> problem;
+  if (!options_.problem_column.empty()) {
+    problem = std::make_unique<InputColumn>(batch->ColumnOf(options_.problem_column));
+    static_cast<void>(CarriedColumn(options_.problem_column, *problem, true));
+  }
   for (size_t i = 0; i < carried_.size(); ++i) {
     if (!carried_[i].has_schema_of(carried[i])) {
       ThrowError(ErrorKind::kTypeError,
@@ -102,6 +107,7 @@ void SourceRows::Begin(std::unique_ptr<InputBatch> batch) {
   }
   columns_ = std::move(columns);
   content_ = std::move(content);
+  problem_ = std::move(problem);
   batch_ = std::move(batch);
   row_ = 0;
 }
@@ -114,6 +120,7 @@ std::shared_ptr<const RowTable> SourceRows::Next() {
   }
   if (full_.empty()) {
     content_.reset();
+    problem_.reset();
     columns_.clear();
     batch_.reset();
     return nullptr;
@@ -153,7 +160,9 @@ void SourceRows::AnalyzeRow() {
   Reading* reading = &readings_.front();
   BatchResult result;
   try {
-    if (content_->IsNull(row_)) {
+    if (problem_ != nullptr && !problem_->IsNull(row_)) {
+      AppendShown(problem_->At(row_), input.problem);
+    } else if (content_->IsNull(row_)) {
       input.problem = "there is no source";
     } else {
       input.bytes = content_->At(row_);
@@ -164,6 +173,11 @@ void SourceRows::AnalyzeRow() {
     AddMessages(result);
     if (options_.form == RowForm::kFiles) Room().AddFile(result, reading->python);
     if (table_ != nullptr) table_->Carry({&columns_, row_});
+    if (problem_ != nullptr) {
+      if (files_ == nullptr) files_ = MakeRowTable(RowForm::kFiles, carried_);
+      files_->AddFile(result, reading->python);
+      files_->Carry({&columns_, row_});
+    }
   } catch (...) {
     GoBackTo(mark);
     throw;

@@ -10,6 +10,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "analysis/file_worker.h"
@@ -27,6 +28,8 @@ class SourceRows {
     std::string path_column;
     std::string content_column;
     std::vector<std::string> kept_columns;
+    // Texts that say why a source could not be had, null where it is there. With such a column TakeFiles gives rows.
+    std::string problem_column;
     std::function<bool(Text bytes, std::string& utf8)> decode;  // as FileWorker::Options has it
   };
 
@@ -42,6 +45,8 @@ class SourceRows {
   std::shared_ptr<const RowTable> Next();
   // What is left over at the end of all batches; null where that is nothing.
   std::shared_ptr<const RowTable> Finish();
+  // A row for each source since the last call, of the form kFiles; null where that is none.
+  std::shared_ptr<const RowTable> TakeFiles() { return std::exchange(files_, nullptr); }
 
  private:
   class Writer;
@@ -70,10 +75,12 @@ class SourceRows {
   std::unique_ptr<InputBatch> batch_;
   std::vector<InputColumn> columns_;  // that are carried, the path the last of them
   std::unique_ptr<InputColumn> content_;
+  std::unique_ptr<InputColumn> problem_;  // where it is asked for
   size_t row_ = 0;
   std::vector<CarriedColumn> carried_;  // empty ones, to begin tables with
   std::deque<std::shared_ptr<RowTable>> full_;
   std::shared_ptr<RowTable> table_;
+  std::shared_ptr<RowTable> files_;
 };
 
 }  // namespace quillet

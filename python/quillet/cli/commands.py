@@ -11,6 +11,7 @@ import click
 
 from quillet import __version__
 from quillet.cli import index_commands, question_commands, server_commands
+from quillet.cli.corpus import corpus
 from quillet.cli.options import PathArgument, exclude_option, python_option
 
 _stdin_filename = click.option(
@@ -96,5 +97,5 @@ def tree(target: str, version: tuple[int, int] | None, stdin_filename: str) -> N
     sys.exit(run(target, version=version, stdin_filename=stdin_filename))
 
 
-for _command in (*index_commands.COMMANDS, *question_commands.COMMANDS, *server_commands.COMMANDS):
+for _command in (*index_commands.COMMANDS, *question_commands.COMMANDS, *server_commands.COMMANDS, corpus):
     group.add_command(_command)

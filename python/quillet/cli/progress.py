@@ -52,6 +52,10 @@ class Progress:
         if self._stream is not None and time.monotonic() >= self._next_draw:
             self._draw()
 
+    def relabel(self, label: str) -> None:
+        """Says from the next drawing on what is being done in other words."""
+        self._label = label
+
     def _draw(self) -> None:
         if self._stream is None:
             return
