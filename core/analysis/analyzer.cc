@@ -131,6 +131,32 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeSingleLogical(LogicalLine& 
   }
 }
 
+bool CPGenAnalyzerImpl::HasNoKeywordsOfItsOwn() const {
+  const KeywordSet& keywords = logical_parser_->factory().keywords();
+  return logical_parser_->grammar().other_keywords.empty() && keywords.others.empty() && !keywords.host_lookup;
+}
+
+bool CPGenAnalyzerImpl::WalkWithoutDoubt(LogicalLine& logical, bool in_async_def) {
+  if (closer_look_ != nullptr && closer_look_->NeedsCompleteParser(logical)) return false;
+  try {
+    CNode* const node = logical_parser_->ParseToNode(logical, in_async_def);
+    if (node == nullptr) return false;
+    struct GiveBack {
+      CNode* node;
+      ~GiveBack() { node->pool->Reclaim(node); }
+    } give_back{node};
+    node_walker_->Walk(node, &logical);
+    type_hint_walker_->Walk(node, &logical, /*first_in_def=*/false);
+  } catch (const Error&) {
+    return false;
+  }
+  return closer_look_ == nullptr || (!node_walker_->met_doubtful() && !type_hint_walker_->hint_error());
+}
+
+bool CPGenAnalyzerImpl::IsDoubtful(const LogicalLine& logical, const LinePlace& place) const {
+  return closer_look_ != nullptr && closer_look_->IsDoubtful(logical, place);
+}
+
 bool CPGenAnalyzerImpl::InspectSingleLogical(LogicalLine& logical, bool in_async_def, bool in_embedded_expression,
                                              bool first_in_def) {
   CNode* node = nullptr;

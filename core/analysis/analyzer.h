@@ -60,6 +60,17 @@ class CPGenAnalyzerImpl {
   // One of them.
   void InspectEmbedded(LogicalLine& logical, LogicalLine& exp, bool in_async_def, bool first_in_def);
 
+  // ---- for statements that are told from others of their shape (statement_shapes.h) ----
+  // Whether the words that the grammar and the keywords know are those of the language alone.
+  bool HasNoKeywordsOfItsOwn() const;
+  // Walks a line without embedded expressions, which nobody asked for and of which nothing is reported. False
+  // where its analysis would fail, or would not end with the walks.
+  bool WalkWithoutDoubt(LogicalLine& logical, bool in_async_def);
+  // Whether the analysis of a line would not end with the walks, for what its own tokens are.
+  bool IsDoubtful(const LogicalLine& logical, const LinePlace& place) const;
+  // What was told is as if it had been read.
+  void CountAsRead() { was_rejected_ = false; }
+
   // Whether returned errors carry the text of their line, which costs more than the analysis of a short
   // one: true unless nobody is going to show it.
   void set_spells_error_texts(bool spells) { spells_error_texts_ = spells; }

@@ -49,7 +49,7 @@ void DropIfHuge(std::vector<T>& items) {
 
 }  // namespace
 
-FileAnalyzer::FileAnalyzer(const Options& options) : options_(options), analyzer_(options) {
+FileAnalyzer::FileAnalyzer(const Options& options) : options_(options), analyzer_(options, options.frequent_shape) {
   found_.source = SourceText::Copy(Text(""));
 }
 
@@ -59,14 +59,14 @@ FileAnalyzer::Found FileAnalyzer::TakeFound() {
   return std::exchange(found_, std::move(fresh));
 }
 
-CPGenAnalyzerImpl& FileAnalyzer::AnalyzerForSource() {
+FileAnalyzer::Analyzer& FileAnalyzer::AnalyzerForSource() {
   if (options_.print_function_grammar_file.empty() || !ImportsPrintFunction(*found_.source, found_.rows))
     return analyzer_;
   if (print_function_analyzer_ == nullptr) {
     CPGenAnalyzerImpl::Options options = options_;
     options.grammar_file = options_.print_function_grammar_file;
     std::erase(options.keywords, "print");
-    print_function_analyzer_ = std::make_unique<CPGenAnalyzerImpl>(options);
+    print_function_analyzer_ = std::make_unique<Analyzer>(options, options_.frequent_shape);
   }
   return *print_function_analyzer_;
 }
@@ -75,7 +75,8 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   Reset(bytes);
   Cut();
   if (options_.reads_completely) typing_.Read(*found_.source, found_.rows);
-  CPGenAnalyzerImpl& analyzer = AnalyzerForSource();
+  Analyzer& analyzer_and_shapes = AnalyzerForSource();
+  CPGenAnalyzerImpl& analyzer = analyzer_and_shapes.analyzer;
   analyzer.set_spells_error_texts(options_.keeps_whole_errors);
   analyzer.set_explains_errors(true);
   if (options_.reads_completely) analyzer.set_holds_debug_name(Holds(found_.source->text(), "__debug__"));
@@ -93,7 +94,7 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   for (size_t i = 0; i < found_.rows.size(); ++i) {
     const LineRow& row = found_.rows[i];
     CheckMemory(std::max(MostMemoryOf(row), sizeof(CNode) * (node_count() - nodes_before)));
-    AnalyzeRow(analyzer, row, !is_filtered || wanted_[i], line);
+    AnalyzeRow(analyzer_and_shapes, row, !is_filtered || wanted_[i], line);
     if (has_rules) ApplyBlockRules(analyzer, i);
     CountMemory();
   }
@@ -131,7 +132,7 @@ void FileAnalyzer::Cut() {
   }
 }
 
-void FileAnalyzer::AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line) {
+void FileAnalyzer::AnalyzeRow(Analyzer& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line) {
   LineResult result;
   const LinePlace place = scopes_.Next(row);
   result.in_async_def = place.in_async_def;
@@ -143,15 +144,19 @@ void FileAnalyzer::AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, b
     SetFromRow(line, found_.source, row);
     line.parsed = false;
     line.WriteTo(&found_.store);
-    if (const auto error = options_.reads_completely
-                               ? analyzer.AnalyzeCompletely(line, place, typing_)
-                               : analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def)) {
+    if (const auto error = AnalyzeLine(analyzer, line, place)) {
       result.error = AddError(*error);
     }
   }
   result.record_end = static_cast<uint32_t>(found_.store.rows.size());
   result.arg_record_end = static_cast<uint32_t>(found_.store.arg_rows.size());
   found_.results.push_back(result);
+}
+
+std::optional<SyntaxError> FileAnalyzer::AnalyzeLine(Analyzer& analyzer, LogicalLine& line, const LinePlace& place) {
+  if (analyzer.shapes.Tell(line, place, typing_)) return std::nullopt;
+  if (options_.reads_completely) return analyzer.analyzer.AnalyzeCompletely(line, place, typing_);
+  return analyzer.analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def);
 }
 
 void FileAnalyzer::ApplyBlockRules(CPGenAnalyzerImpl& analyzer, size_t index) {

@@ -8,6 +8,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <span>
 #include <string>
 #include <unordered_set>
@@ -15,6 +16,7 @@
 
 #include "analysis/analyzer.h"
 #include "analysis/block_rules.h"
+#include "analysis/statement_shapes.h"
 #include "lines/cutter.h"
 #include "lines/scopes.h"
 
@@ -62,6 +64,9 @@ class FileAnalyzer {
     size_t least_memory_limit = kLeastMemoryLimit;
     // Whether errors are kept whole as well, with the texts of their lines.
     bool keeps_whole_errors = false;
+    // How often the shape of a statement is met until others are told from it, which is faster and says the same;
+    // 0: each is analysed.
+    uint8_t frequent_shape = StatementShapes::kFrequent;
   };
 
   explicit FileAnalyzer(const Options& options);
@@ -100,11 +105,21 @@ class FileAnalyzer {
   size_t LineCount() const;
 
  private:
-  // The analyzer that reads the source as it asks to be read.
-  CPGenAnalyzerImpl& AnalyzerForSource();
+  // An analyzer, and the shapes of the statements that it met.
+  struct Analyzer {
+    Analyzer(const CPGenAnalyzerImpl::Options& options, uint8_t frequent_shape)
+        : analyzer(options), shapes(analyzer, frequent_shape) {}
+
+    CPGenAnalyzerImpl analyzer;
+    StatementShapes shapes;
+  };
+
+  // The one that reads the source as it asks to be read.
+  Analyzer& AnalyzerForSource();
   void Reset(Text bytes);
   void Cut();
-  void AnalyzeRow(CPGenAnalyzerImpl& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line);
+  void AnalyzeRow(Analyzer& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line);
+  std::optional<SyntaxError> AnalyzeLine(Analyzer& analyzer, LogicalLine& line, const LinePlace& place);
   // Returns its index.
   int32_t AddError(const SyntaxError& error);
   // What the row has to say to those around it.
@@ -117,8 +132,8 @@ class FileAnalyzer {
   [[noreturn]] void ThrowTooLarge() const;
 
   Options options_;
-  CPGenAnalyzerImpl analyzer_;
-  std::unique_ptr<CPGenAnalyzerImpl> print_function_analyzer_;  // built at first need
+  Analyzer analyzer_;
+  std::unique_ptr<Analyzer> print_function_analyzer_;  // built at first need
   Found found_;
   std::vector<bool> wanted_;  // of the rows, where there is a filter
   ScopeTracker scopes_;

@@ -30,23 +30,6 @@ constexpr std::array<bool, 128> kHarmless = [] {
   return table;
 }();
 
-bool IsHarmlessString(Text text) {
-  const char* at = text.data();
-  const char* const end = at + text.size();
-  while (at < end) {
-    const auto byte = static_cast<unsigned char>(*at);
-    if (byte < 0x80) {
-      if (!kHarmless[byte]) return false;
-      ++at;
-      continue;
-    }
-    const DecodedChar decoded = DecodeUtf8(at, end);
-    if (decoded.length == 0 || (CharClassOf(decoded.code_point) & kCharAlnum) == 0) return false;
-    at += decoded.length;
-  }
-  return true;
-}
-
 bool AllStringLiterals(std::span<CNode* const> nodes) {
   for (const CNode* node : nodes) {
     if (!isa<CStringLiteral>(node)) return false;
@@ -109,12 +92,29 @@ Text CNodeToTextConverter::TextForTrailer(CTrailer* trailer) {
   return run.view == nullptr && !run.composed ? Text("") : TextOf(run);
 }
 
+bool CNodeToTextConverter::ShowsContentsOf(Text text) {
+  const char* at = text.data();
+  const char* const end = at + text.size();
+  while (at < end) {
+    const auto byte = static_cast<unsigned char>(*at);
+    if (byte < 0x80) {
+      if (!kHarmless[byte]) return false;
+      ++at;
+      continue;
+    }
+    const DecodedChar decoded = DecodeUtf8(at, end);
+    if (decoded.length == 0 || (CharClassOf(decoded.code_point) & kCharAlnum) == 0) return false;
+    at += decoded.length;
+  }
+  return true;
+}
+
 Text CNodeToTextConverter::TextForStringLiteral(const CStringLiteral* node) const {
   // Without contents only the one distinction is shown: a bytes literal reads as a plain one. That
   // is meant.
   if (!include_string_contents_) return node->IsUnicode() ? "u''" : "''";
   // Only what would be escaped is encoded differently, and no harmless character is.
-  if (IsHarmlessString(node->fText())) return node->fText();
+  if (ShowsContentsOf(node->fText())) return node->fText();
   return node->IsBytes() ? "b''" : node->IsUnicode() ? "u''" : "''";
 }
 

@@ -46,6 +46,8 @@ class CNodeToTextConverter {
   Text TextForTrailer(CTrailer* trailer);
   // Never none.
   Text TextForStringLiteral(const CStringLiteral* node) const;
+  // Whether a string is shown as it stands wherever contents of strings are shown.
+  static bool ShowsContentsOf(Text string);
 
   // Whether a power is shown with its exponent, as a reader of all of a source wants it; hosts of the walkers
   // know it without.

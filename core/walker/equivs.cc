@@ -13,8 +13,6 @@
 namespace quillet {
 namespace {
 
-// In bytes, without the trailer; a longer operator expression is not worth its place on the line.
-constexpr size_t kMaxOperatorText = 120;
 // Parentheses nested deeper are those of a tree that a host tied to itself.
 constexpr int kMaxParentheses = 10'000'000;
 
@@ -111,13 +109,17 @@ Text CNodeWalker::TypeEquivForNode(CNode* node, Text extra_trailer) {
     return WithTrailer(fToText.TextForNode(node, {.dotted_name_only = true}), extra_trailer);
   }
   const Text text = fToText.TextForNode(node, {.add_parens_if_operator = has_trailer});
-  if (IsNone(text) || text.size() > kMaxOperatorText) return kNoText;
-  return equiv_buffer_.assign(kExpressionEquivPrefix).append(text).append(extra_trailer);
+  return EquivForOperatorText(text, extra_trailer);
 }
 
 // A power, as any other operator expression.
 Text CNodeWalker::EquivForPower(CPower* power, Text extra_trailer) {
   const Text text = fToText.TextForNode(power, {.add_parens_if_operator = !IsNone(extra_trailer)});
+  return EquivForOperatorText(text, extra_trailer);
+}
+
+Text CNodeWalker::EquivForOperatorText(Text text, Text extra_trailer) {
+  met_operator_text_ = true;
   if (IsNone(text) || text.size() > kMaxOperatorText) return kNoText;
   return equiv_buffer_.assign(kExpressionEquivPrefix).append(text).append(extra_trailer);
 }

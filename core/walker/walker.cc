@@ -32,6 +32,7 @@ void CNodeWalker::Walk(CNode* node, LogicalLine* logical) {
   if (node == nullptr) return;
   operations_ = 1;
   met_doubtful_ = false;
+  met_operator_text_ = false;
   fLogical = logical;
   // Names left over from operations by name are the walker's own.
   direct_ = own_texts_used_ ? nullptr : logical;

@@ -42,6 +42,8 @@ class CNodeWalker {
   // RuntimeError.
   static constexpr size_t kMaxComposedSize = size_t{64} << 20;
   static constexpr size_t kComposedPerSourceByte = 8;
+  // In bytes; a longer operator expression is not worth its place on the line.
+  static constexpr size_t kMaxOperatorText = 120;
 
   explicit CNodeWalker(Version version);
 
@@ -58,6 +60,8 @@ class CNodeWalker {
   // argument out of order, a star, an assignment in an expression.
   bool met_doubtful() const { return met_doubtful_; }
   void set_met_doubtful(bool met) { met_doubtful_ = met; }
+  // Whether the last walk held the text of an operator expression against the limit.
+  bool met_operator_text() const { return met_operator_text_; }
 
   // ---- the line, as a host hands it in ----
   // For operations by name between walks, or to send what follows in a walk to another line. Nobody
@@ -269,6 +273,7 @@ class CNodeWalker {
   // ---- equivalents ----
   Text EquivForAtom(CAtom* atom, Text extra_trailer);
   Text EquivForPower(CPower* power, Text extra_trailer);
+  Text EquivForOperatorText(Text text, Text extra_trailer);
   Text LiteralInfo(Text cls_name, Text literal);
   Text StringInstanceName(const CStringLiteral* node) const;
   Text WithTrailer(Text text, Text extra_trailer);
@@ -285,6 +290,7 @@ class CNodeWalker {
 
   bool is_complete_ = false;
   bool met_doubtful_ = false;
+  bool met_operator_text_ = false;
   LogicalLine* direct_ = nullptr;  // fLogical during a walk, unless the host set that: takes texts uncopied
   int32_t operations_ = 0;         // walks and operations by name that are under way
   uintptr_t source_begin_ = 0;     // address of the line's source, during a walk
