@@ -7,6 +7,7 @@
 #include "bindings/convert.h"
 #include "bindings/errors.h"
 #include "bindings/file_result.h"
+#include "bindings/result_bytes.h"
 
 namespace quillet::host {
 
@@ -96,6 +97,17 @@ void BindFileResult(nb::module_& host) {
       .def_prop_ro("reports", [](const FileResult& self) { return self.Messages(self.result.reports); })
       .def_prop_ro("names", &FileResult::Names)
       .def_prop_ro("record_count", [](const FileResult& self) { return self.result.table.size(); })
+      .def(
+          "ToBytes", [](const FileResult& self) { return BytesOf(BytesOfResult(self.result)); },
+          "All of it as bytes, for FromBytes of the same build.")
+      .def_static(
+          "FromBytes",
+          [](nb::handle bytes) {
+            auto made = std::make_unique<FileResult>();
+            ReadResult(HostText::FromBytes(bytes).text(), made->result);
+            return made;
+          },
+          nb::arg("bytes"))
       .def("Definitions", &FileResult::Definitions, nb::arg("row_class"),
            "Classes, functions and type aliases: row_class(scope, kind, line, column, first_line, last_line).")
       .def("Rows", &FileResult::Rows, nb::arg("begin"), nb::arg("end"), nb::arg("row_class"), nb::arg("kinds"),

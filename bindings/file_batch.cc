@@ -37,7 +37,13 @@ std::vector<BatchInput> InputsOf(nb::handle sequence) {
     const auto is_there = [&parts](Py_ssize_t i) { return PyTuple_GET_ITEM(parts.ptr(), i) != Py_None; };
     BatchInput& input = inputs.emplace_back();
     input.path = text(0).text();
-    if (is_there(1)) input.bytes = text(1).text();
+    if (const nb::handle source = PyTuple_GET_ITEM(parts.ptr(), 1); PyByteArray_Check(source.ptr())) {
+      // Text that the host has encoded.
+      input.bytes = std::string(PyByteArray_AS_STRING(source.ptr()), static_cast<size_t>(nb::len(source)));
+      input.is_decoded = true;
+    } else if (is_there(1)) {
+      input.bytes = text(1).text();
+    }
     if (is_there(2)) input.problem = text(2).text();
   }
   return inputs;

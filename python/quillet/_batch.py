@@ -8,9 +8,10 @@ that name an encoding other than UTF-8 are decoded by `_source`, under the lock.
 from __future__ import annotations
 
 import os
-from collections.abc import Generator, Iterable, Iterator, Sequence
+from _thread import RLock
+from collections.abc import Callable, Generator, Iterable, Iterator, Sequence, Sized
 from types import TracebackType
-from typing import NamedTuple, Union, cast, overload
+from typing import NamedTuple, NoReturn, Union, cast, overload
 
 from quillet._languages import available_cores, decode_source, native_language_of
 from quillet._names import FileBindings
@@ -18,11 +19,15 @@ from quillet._records import KINDS, RecordKind
 from quillet.tarvex import _host
 
 StrPath = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
+PathOrSource = StrPath | tuple[StrPath, str | bytes | bytearray | memoryview]
 
 # What the core knows as kinds, in its order.
-# A file to analyse: its name, its source where that is at hand, and why it cannot be read where that is
-# known.
-BatchInput = tuple[bytes, bytes | None, bytes | None]
+# A file to analyse: its name, its source where that is at hand (as a bytearray where it was text), and why it cannot
+# be read where that is known.
+BatchInput = tuple[bytes, bytes | bytearray | None, bytes | None]
+# How many inputs of a generator are read ahead at first and at most, and the bytes of source at most.
+_FIRST_AHEAD, _MOST_AHEAD = 8, 64
+_MOST_BYTES_AHEAD = 32 << 20
 # How many records become objects at a time where all are iterated over.
 _CHUNK = 4096
 
@@ -88,6 +93,9 @@ class FileRecords(Sequence[FileRecord]):
     def __iter__(self) -> Iterator[FileRecord]:
         for start in range(0, len(self), _CHUNK):
             yield from self._native.Rows(start, start + _CHUNK, FileRecord, KINDS)
+
+    def __reduce__(self) -> tuple[Callable[[bytes], FileRecords], tuple[bytes]]:
+        return _records_of_bytes, (self._native.ToBytes(),)
 
     def plain(self) -> list[tuple[int, int, str, str, str, str, bool]]:
         """All records as plain tuples, with the kind as a plain str: for a database."""
@@ -157,9 +165,20 @@ class FileAnalysis:
             self._bindings = FileBindings(names)
         return self._bindings
 
+    def __reduce__(self) -> tuple[Callable[[str, bytes], FileAnalysis], tuple[str, bytes]]:
+        return _analysis_of_bytes, (self.path, self._native.ToBytes())
+
     def __repr__(self) -> str:
         what = self.problem or f"{self.lines} lines, {len(self.records)} records"
         return f"<FileAnalysis {self.path!r}: {what}>"
+
+
+def _analysis_of_bytes(path: str, data: bytes) -> FileAnalysis:
+    return FileAnalysis(path, _host.FileResult.FromBytes(data))
+
+
+def _records_of_bytes(data: bytes) -> FileRecords:
+    return FileRecords(_host.FileResult.FromBytes(data))
 
 
 class OccurrenceColumns:
@@ -171,60 +190,104 @@ class OccurrenceColumns:
     Each flag is a column of truth values. The others are those of `Occurrence`.
     """
 
-    def __init__(self, native: _host.Batch, has_bindings: bool) -> None:
-        self._native = native
+    def __init__(self, batch: Callable[[], _host.Batch], has_bindings: bool) -> None:
+        self._batch = batch
         self._has_bindings = has_bindings
 
     def __arrow_c_stream__(self, requested_schema: object = None) -> object:
         """A capsule of the stream. The schema is fixed."""
         if not self._has_bindings:
             raise ValueError("analyze_files was not asked for bindings")
-        return self._native.OccurrenceStream()
+        return self._batch().OccurrenceStream()
+
+
+class _Part:
+    """Some of the files, and the threads that analyse them."""
+
+    def __init__(self, names: list[str], native: _host.Batch) -> None:
+        self.names = names
+        self.native = native
+
+    def problems(self) -> list[tuple[str, str]]:
+        return [(self.names[index], reason) for index, reason in self.native.problems]
 
 
 class FileAnalyses(Iterator[FileAnalysis]):
     """The results of `analyze_files`, one a file, in the order of the paths. They are handed out once.
 
     Threads run while results are asked for, and a little ahead. `close`, or the end of a `with` block,
-    stops them; so does dropping the object.
+    stops them; so does dropping the object. It is read by its own process alone.
     """
 
-    def __init__(self, paths: list[str], native: _host.Batch, has_bindings: bool) -> None:
-        self._paths = paths
-        self._native = native
+    def __init__(
+        self,
+        paths: Iterable[PathOrSource],
+        make_batch: Callable[[list[BatchInput]], _host.Batch],
+        has_bindings: bool,
+    ) -> None:
+        self._make_batch = make_batch
         self._has_bindings = has_bindings
+        self._lock = RLock()
+        self._problems: list[tuple[str, str]] = []  # of parts that are over
+        self._failure: Exception | None = None  # that the generator raised
+        self._ahead = _FIRST_AHEAD
+        self._left: Iterator[PathOrSource] | None = None  # what of a generator was not read yet
+        # What is being handed out, and what is worked on meanwhile.
+        self._now: _Part | None = None
+        self._later: _Part | None = None
+        if isinstance(paths, Sized):
+            self._now = self._part_of(iter(paths), None)
+            self._raise_failure()
+        else:
+            self._left = iter(paths)
 
     def __next__(self) -> FileAnalysis:
-        result = self._native.Next()
-        if result is None:
-            raise StopIteration
-        return FileAnalysis(self._paths[result.index], result)
+        while True:
+            part = self._part()
+            if part is None:
+                raise StopIteration
+            result = part.native.Next()
+            if result is not None:
+                return FileAnalysis(part.names[result.index], result)
+            self._go_on_behind(part)
 
     def __arrow_c_stream__(self, requested_schema: object = None) -> object:
         """The records of all files that are left, as columns, for readers of the Arrow C data interface.
 
         The columns are `path` and those of `FileRecord`. The schema is fixed: a reader that asks for another
-        one converts what it gets. Files with a problem have no records; `problems` names them.
+        one converts what it gets. Files with a problem have no records; `problems` names them. The dictionary of
+        paths has all of them, so a generator is read to its end first.
         """
-        return self._native.ArrowStream()
+        return self._whole().ArrowStream()
+
+    def __reduce__(self) -> NoReturn:
+        raise TypeError("the results of analyze_files are pickled one by one")
 
     @property
     def occurrences(self) -> OccurrenceColumns:
         """The names of all files that are left, as columns: `pyarrow.table(results.occurrences)`."""
-        return OccurrenceColumns(self._native, self._has_bindings)
+        return OccurrenceColumns(self._whole, self._has_bindings)
 
     @property
     def problems(self) -> list[tuple[str, str]]:
         """The files so far that could not be analysed, as (path, reason)."""
-        return [(self._paths[index], reason) for index, reason in self._native.problems]
+        with self._lock:
+            now = self._now
+            return self._problems + (now.problems() if now is not None else [])
 
     def start(self) -> None:
         """Sets the threads to work at once. Without it they begin when the first result is asked for."""
-        self._native.Start()
+        part = self._part()
+        if part is not None:
+            part.native.Start()
 
     def close(self) -> None:
         """Stops after the files under way. There are no results after it."""
-        self._native.Cancel()
+        self._left = self._failure = None
+        for part in (self._now, self._later):
+            if part is not None:
+                part.native.Cancel()
+        self._later = None
 
     def __enter__(self) -> FileAnalyses:
         return self
@@ -234,9 +297,89 @@ class FileAnalyses(Iterator[FileAnalysis]):
     ) -> None:
         self.close()
 
+    def _part(self) -> _Part | None:
+        """What is handed out now; the first of a generator is read for it."""
+        with self._lock:
+            if self._now is None and self._left is not None:
+                self._now = self._next_part()
+                if self._now is None:
+                    self._raise_failure()
+                else:
+                    self._now.native.Start()
+                    self._later = self._next_part()
+            return self._now
+
+    def _go_on_behind(self, part: _Part) -> None:
+        """Puts the next part in the place of one that is over; ends where there is none."""
+        with self._lock:
+            if self._now is not part:
+                return  # another thread did
+            if self._later is None:
+                self._raise_failure()
+                raise StopIteration
+            self._problems += part.problems()
+            self._now, self._later = self._later, None
+            self._later = self._next_part()
+
+    def _next_part(self) -> _Part | None:
+        """The next inputs of a generator, at work."""
+        if self._left is None:
+            return None
+        part = self._part_of(self._left, self._ahead)
+        self._ahead = min(2 * self._ahead, _MOST_AHEAD)
+        if not part.names:
+            return None
+        part.native.Start()
+        return part
+
+    def _part_of(self, left: Iterator[PathOrSource], most: int | None) -> _Part:
+        """Inputs with a batch of their own, `most` at most. What the iterator raises is for behind them."""
+        names: list[str] = []
+        inputs: list[BatchInput] = []
+        held = 0
+        try:
+            while most is None or (len(names) < most and held < _MOST_BYTES_AHEAD):
+                name, given = _input_of(next(left))
+                names.append(name)
+                inputs.append(given)
+                held += len(given[1] or b"")
+        except StopIteration:
+            self._left = None
+        except Exception as error:
+            self._left = None
+            self._failure = error
+        return _Part(names, self._make_batch(inputs))
+
+    def _whole(self) -> _host.Batch:
+        """All files that are left as one batch."""
+        with self._lock:
+            if self._now is None:
+                self._now = self._part_of(self._left or iter(()), None)
+                self._raise_failure()
+            elif self._left is not None or self._later is not None:
+                raise ValueError("the columns of a generator's files are read from its beginning")
+            return self._now.native
+
+    def _raise_failure(self) -> None:
+        failure, self._failure = self._failure, None
+        if failure is not None:
+            raise failure
+
+
+def _input_of(item: PathOrSource) -> tuple[str, BatchInput]:
+    path, source = item if isinstance(item, tuple) else (item, None)
+    if isinstance(source, str):
+        source = bytearray(source.encode("utf-8", "surrogatepass"))
+    elif source is not None and not isinstance(source, bytes):
+        try:
+            source = memoryview(source).tobytes()
+        except TypeError:
+            raise TypeError(f"a source must be bytes or str, not {type(source).__name__}") from None
+    return os.fsdecode(path), (os.fsencode(path), source, None)
+
 
 def analyze_files(
-    paths: Iterable[StrPath | tuple[StrPath, bytes]],
+    paths: Iterable[PathOrSource],
     *,
     version: tuple[int, ...] | None = None,
     jobs: int | None = None,
@@ -245,7 +388,9 @@ def analyze_files(
 ) -> FileAnalyses:
     """Analyses files, on `jobs` threads (one a core without it), and yields a result a file in order.
 
-    A path may be given with its source, as a tuple (path, bytes): then nothing is read. `version` is the
+    A path may be given with its source, as a tuple (path, source): then nothing is read. A source is bytes or any other
+    buffer, which is decoded as Python does, or a str, which is taken as it is. A generator is read as results are asked
+    for, a little ahead; results pickle. `version` is the
     Python that the files are written for, as for `analyze`. With `bindings`, each result has the names of its
     file as well, as `bind` gives them. `exact` is that of `analyze`.
 
@@ -261,15 +406,11 @@ def analyze_files(
     """
     language = native_language_of(version, exact=exact)
     count = jobs_of(jobs)
-    names: list[str] = []
-    inputs: list[BatchInput] = []
-    for item in paths:
-        path, source = item if isinstance(item, tuple) else (item, None)
-        if source is not None and not isinstance(source, bytes):
-            raise TypeError(f"a source must be bytes, not {type(source).__name__}")
-        names.append(os.fsdecode(path))
-        inputs.append((os.fsencode(path), source, None))
-    return FileAnalyses(names, _host.Batch(language, inputs, count, decode_source, None, bindings), bindings)
+
+    def make_batch(inputs: list[BatchInput]) -> _host.Batch:
+        return _host.Batch(language, inputs, count, decode_source, None, bindings)
+
+    return FileAnalyses(paths, make_batch, bindings)
 
 
 def write_files(

@@ -3,12 +3,15 @@
 from __future__ import annotations
 
 import os
+import pickle
+import random
 import re
 import signal
 import subprocess
 import sys
 import threading
 from collections import Counter
+from collections.abc import Callable, Iterator
 from pathlib import Path
 
 import pytest
@@ -160,7 +163,7 @@ def test_wrong_arguments_are_refused_at_once() -> None:
     with pytest.raises(TypeError):
         analyze_files([1])  # type: ignore[list-item]
     with pytest.raises(TypeError):
-        analyze_files([("a.py", "text")])  # type: ignore[list-item]
+        analyze_files([("a.py", 3)])  # type: ignore[list-item]
     with pytest.raises(TypeError):
         analyze_files([], jobs="2")  # type: ignore[arg-type]
     with pytest.raises(ValueError, match="jobs"):
@@ -222,6 +225,163 @@ def test_an_interrupt_ends_the_wait_for_a_pipe(tmp_path: Path) -> None:
             except subprocess.TimeoutExpired:
                 continue
         assert b"KeyboardInterrupt" in process.stderr.read()
+
+
+# ---- sources of any kind ----
+
+
+@pytest.mark.parametrize("kind", [bytes, bytearray, memoryview, bytes.decode])
+def test_sources_are_buffers_or_text(kind: Callable[[bytes], object]) -> None:
+    [expected] = analyze_files([("shop.py", SHOP)])
+    [result] = analyze_files([("shop.py", kind(SHOP))])
+    assert list(result.records) == list(expected.records)
+    assert result.size == len(SHOP)
+
+
+def test_text_is_taken_as_it_is_whatever_encoding_it_names() -> None:
+    [result] = analyze_files([("a.py", "# coding: klingon\ns = 'é'\n")])
+    assert result.problem is None
+    assert [record.detail for record in result.records if record.detail] == ["str: 'é'"]
+    [result] = analyze_files([("a.py", bytearray(b"# coding: latin-1\ns = '\xe9'\n"))])
+    assert [record.detail for record in result.records if record.detail] == ["str: 'é'"]
+
+
+def test_a_part_of_a_buffer_is_a_source() -> None:
+    [result] = analyze_files([("a.py", memoryview(b"xx = 1\nyy = 2\n")[7:])])
+    assert [record.name for record in result.records] == ["yy", "yy"]
+
+
+def test_a_generator_is_read_as_results_are_asked_for() -> None:
+    read = []
+
+    def sources() -> Iterator[tuple[str, bytes]]:
+        for number in range(1000):
+            read.append(number)
+            yield f"{number}.py", SHOP
+
+    results = analyze_files(sources(), jobs=2)
+    assert read == []
+    assert next(results).path == "0.py"
+    assert 1 <= len(read) <= 64
+    for wanted in range(1, 500):
+        assert next(results).path == f"{wanted}.py"
+        assert len(read) <= wanted + 2 * 64 + 1
+    assert [result.path for result in results] == [f"{number}.py" for number in range(500, 1000)]
+
+
+def test_what_a_generator_raises_comes_behind_the_files_in_front_of_it() -> None:
+    def sources() -> Iterator[tuple[str, bytes]]:
+        for number in range(100):
+            yield f"{number}.py", b"x = 1\n" if number % 10 else b"# coding: klingon\n"
+        raise LookupError("no more of them")
+
+    results = analyze_files(sources())
+    seen = []
+    with pytest.raises(LookupError, match="no more of them"):
+        seen.extend(result.path for result in results)
+    assert next(results, None) is None
+    assert [path for path, _ in results.problems] == [f"{number}.py" for number in range(0, 100, 10)]
+
+
+def test_wrong_items_of_a_generator_are_told() -> None:
+    with pytest.raises(TypeError, match="a source must be bytes or str, not int"):
+        list(analyze_files(item for item in [("a.py", 3)]))
+
+
+def test_threads_may_share_a_generator() -> None:
+    results = analyze_files(((f"{i}.py", SHOP) for i in range(500)), jobs=2)
+    seen: list[str] = []
+
+    def read() -> None:
+        for result in results:
+            seen.append(result.path)
+
+    threads = [threading.Thread(target=read) for _ in range(4)]
+    for thread in threads:
+        thread.start()
+    for thread in threads:
+        thread.join()
+    assert sorted(seen) == sorted(f"{i}.py" for i in range(500))
+
+
+def test_closing_ends_a_generator() -> None:
+    results = analyze_files((f"{i}.py", SHOP) for i in range(500))
+    next(results)
+    results.close()
+    assert list(results) == []
+
+
+# ---- pickles ----
+
+
+@pytest.mark.parametrize("bindings", [False, True])
+def test_results_pickle(bindings: bool) -> None:
+    sources = [("shop.py", SHOP), ("broken.py", b"def f(:\n"), ("odd.py", b"# coding: klingon\n"), ("empty.py", b"")]
+    for result in analyze_files(sources, bindings=bindings):
+        copy = pickle.loads(pickle.dumps(result))
+        assert repr(copy) == repr(result)
+        for name in ("path", "problem", "size", "lines", "statements", "errors", "reports", "definitions"):
+            assert getattr(copy, name) == getattr(result, name), name
+        assert list(copy.records) == list(result.records)
+        assert list(pickle.loads(pickle.dumps(result.records))) == list(result.records)
+        if bindings and result.problem is None:
+            assert [str(each) for each in copy.bindings.occurrences] == [
+                str(each) for each in result.bindings.occurrences
+            ]
+            assert [scope.name for scope in copy.bindings.scopes] == [scope.name for scope in result.bindings.scopes]
+
+
+def test_results_come_back_from_another_process() -> None:
+    from concurrent.futures import ProcessPoolExecutor
+    from multiprocessing import get_context
+
+    with ProcessPoolExecutor(1, get_context("spawn")) as pool:
+        result = pool.submit(_first_result, "shop.py", SHOP).result()
+    assert [record.name for record in result.records][:2] == ["Shop", "total"]
+
+
+def _first_result(path: str, source: bytes) -> quillet.FileAnalysis:
+    return next(analyze_files([(path, source)]))
+
+
+def test_damaged_bytes_are_refused() -> None:
+    result = next(analyze_files([("shop.py", SHOP)], bindings=True))
+    _, (_, data) = result.__reduce__()
+    chance = random.Random(1)
+    refused = 0
+    for end in range(0, len(data), 7):
+        with pytest.raises(ValueError, match="no bytes of a result"):
+            _host.FileResult.FromBytes(data[:end])
+    for _ in range(2000):
+        damaged = bytearray(data)
+        damaged[chance.randrange(len(data))] ^= 1 << chance.randrange(8)
+        try:
+            native = _host.FileResult.FromBytes(bytes(damaged))
+        except ValueError:
+            refused += 1
+        else:
+            native.Rows(0, native.record_count, tuple, _host.RECORD_KIND_WORDS)
+            native.Definitions(tuple_of_arguments)
+    assert refused > 200
+
+
+def tuple_of_arguments(*arguments: object) -> tuple[object, ...]:
+    return arguments
+
+
+def test_what_hands_results_out_does_not_pickle() -> None:
+    with pytest.raises(TypeError, match="pickled one by one"):
+        pickle.dumps(analyze_files([("shop.py", SHOP)]))
+
+
+def test_columns_of_a_generator() -> None:
+    pyarrow = pytest.importorskip("pyarrow")
+    sources = [(f"{number}.py", SHOP) for number in range(100)]
+    assert pyarrow.table(analyze_files(iter(sources))).equals(pyarrow.table(analyze_files(sources)))
+    results = analyze_files(iter(sources))
+    next(results)
+    with pytest.raises(ValueError, match="read from its beginning"):
+        pyarrow.table(results)
 
 
 # ---- columns ----
