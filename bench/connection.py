@@ -212,20 +212,25 @@ class Usage:
     def __init__(self, group: int) -> None:
         self._group = group
         self._seconds: dict[int, float] = {}
-        self._tick = os.sysconf("SC_CLK_TCK")
         self.peak_kib = 0
 
     def Look(self) -> Usage:
         """Takes the time and the memory of now. A process that has ended keeps the time that was last seen."""
         memory = 0
-        for pid in self._Members():
+        for pid in self.LookAtTime():
             with contextlib.suppress(OSError, ValueError, IndexError):
-                fields = Path(f"/proc/{pid}/stat").read_text().rpartition(")")[2].split()
-                self._seconds[pid] = (int(fields[11]) + int(fields[12])) / self._tick
                 status = Path(f"/proc/{pid}/status").read_text()
                 memory += int(status.split("VmHWM:")[1].split()[0])
         self.peak_kib = max(self.peak_kib, memory)
         return self
+
+    def LookAtTime(self) -> list[int]:
+        """Takes the time alone, to the nanosecond; gives the processes."""
+        members = self._Members()
+        for pid in members:
+            with contextlib.suppress(OSError):
+                self._seconds[pid] = time.clock_gettime(~pid << 3 | 2)  # the clock of that process
+        return members
 
     @property
     def seconds(self) -> float:

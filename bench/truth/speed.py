@@ -2,8 +2,9 @@
 
 Each is started afresh with nothing prepared, is held to one core (`--all-cores`: not), and is asked one question at a
 time. First answers are counted from the start of the process, for the workspace that of Python included. Warm ones are
-asked in files where other names have been asked before; of the workspace the time is that of the call, of a server
-until its answer has come. A keystroke puts a letter into a buffer of about 2,600 lines and asks for its problems and
+asked in files where other names have been asked before, and are counted in milliseconds of the processor, which other
+work on the machine changes little: of the workspace those of the call, of a server those that it had spent when its
+answer came. A keystroke puts a letter into a buffer of about 2,600 lines and asks for its problems and
 its outline; a server that does not let itself be asked for problems is asked for the outline alone, which is marked.
 """
 
@@ -35,7 +36,7 @@ OWN_NAME = "quillet"
 
 
 class Subject(Protocol):
-    """What is measured. Each question gives the seconds that it took, and how many results it had."""
+    """What is measured. Each question gives the seconds of the processor that it took, and how many results it had."""
 
     usage: Usage
 
@@ -116,11 +117,14 @@ class Server:
         self.usage = self._server.usage
         self._gives_problems = True
 
-    @staticmethod
-    def _Timed(question: Callable[[], Sequence[object]]) -> tuple[float, int]:
-        start = time.perf_counter()
+    def _Spent(self) -> float:
+        self.usage.LookAtTime()
+        return self.usage.seconds
+
+    def _Timed(self, question: Callable[[], Sequence[object]]) -> tuple[float, int]:
+        start = self._Spent()
         count = len(question())
-        return time.perf_counter() - start, count
+        return self._Spent() - start, count
 
     def Open(self, path: str) -> None:
         self._server.Open(path)
@@ -135,7 +139,7 @@ class Server:
         return self._Timed(lambda: self._server.Complete(place))
 
     def Keystroke(self, place: Place) -> tuple[float, int]:
-        start = time.perf_counter()
+        start = self._Spent()
         self._server.Type(place.path, place, "q")
         if self._gives_problems:
             try:
@@ -143,7 +147,7 @@ class Server:
             except Refused:
                 self._gives_problems = False
         self._server.Outline(place.path)
-        return time.perf_counter() - start, int(self._gives_problems)
+        return self._Spent() - start, int(self._gives_problems)
 
     def Stop(self) -> None:
         self._server.Stop()
