@@ -27,7 +27,7 @@ from pathlib import Path
 from typing import NamedTuple, Protocol
 
 from bench.truth.engine import ByteColumn
-from bench.truth.lsp import LanguageServer, Refused, Usage
+from bench.truth.lsp import LanguageServer, Refused, ServerError, Usage
 from bench.truth.peers import AddPeers, Start
 from bench.truth.places import Cut, Place, ReadText
 from bench.truth.projects import HOW_TO_GET, OTHER, OWN, PLAIN, Name, Names, SourceFiles
@@ -241,14 +241,15 @@ def Measure(start: Callable[[], Subject], questions: Questions) -> dict[str, str
                 row["the definition's processor"] = row.pop("its processor")
                 row["the definition's memory"] = row.pop("memory")
             else:
-                row.update(_Warm(subject, questions))
+                _AskWarm(subject, questions, row)
+        except ServerError as error:
+            row["failure"] = str(error)
         finally:
             subject.Stop()
     return row
 
 
-def _Warm(subject: Subject, questions: Questions) -> dict[str, str]:
-    row = {}
+def _AskWarm(subject: Subject, questions: Questions, row: dict[str, str]) -> None:
     for path in sorted({place.path for place in questions.before}):
         subject.Open(path)
     for place in questions.before:
@@ -263,7 +264,6 @@ def _Warm(subject: Subject, questions: Questions) -> dict[str, str]:
     strokes = [subject.Keystroke(questions.keystroke) for _ in range(21)][1:]
     both = all(given for _, given in strokes)
     row["keystroke"] = _Spread([seconds for seconds, _ in strokes]) + ("" if both else " (outline only)")
-    return row
 
 
 def _Spread(seconds: list[float]) -> str:
@@ -319,7 +319,7 @@ def Run(options: argparse.Namespace) -> int:
         for subject, start in subjects.items():
             rows[subject] = Measure(start, questions)
             print(f"{subject}: {rows[subject]}", flush=True)
-    heads = list(next(iter(rows.values())))
+    heads = list(dict.fromkeys(head for row in rows.values() for head in row))
     print(f"\n| | {' | '.join(rows)} |\n| --- |{' ---: |' * len(rows)}")
     for head in heads:
         print(f"| {head} | {' | '.join(row.get(head, '') for row in rows.values())} |")

@@ -96,7 +96,7 @@ TypeSetId Inference::ArgsAs(TypeId type, ClassId base, size_t index) {
 void Inference::Solve(TypeSetId hint, TypeSetId value, Solution& solution, int depth) {
   static constexpr int kMaxNesting = 6;
   if (depth > kMaxNesting || hint == kNoTypes || value == kNoTypes) return;
-  const std::vector<TypeId> hints = types_.CopyOf(hint);
+  const TypeList hints = types_.CopyOf(hint);
   std::vector<TypeId> variables;
   std::vector<TypeId> taken;
   for (const TypeId h : hints) {
@@ -773,7 +773,7 @@ Value Inference::ResultOf(Value callee, std::vector<Argument>& arguments, ExprPl
   // Of overloads the first that fits best is called.
   TypeId chosen = UINT32_MAX;
   std::vector<TypeId> overloads;
-  const std::vector<TypeId> callees = types_.CopyOf(callee.set);
+  const TypeList callees = types_.CopyOf(callee.set);
   for (const TypeId id : callees)
     if (types_[id].kind == TypeKind::kFunction && (functions_[types_[id].a].flags & kIsOverload) != 0)
       overloads.push_back(id);

@@ -22,10 +22,10 @@ void Inference::Clear() {
   classes_by_name_.clear();
   frames_by_hash_.clear();
   frame_counts_.clear();
-  values_.clear();
-  bindings_.clear();
-  results_.clear();
-  hints_.clear();
+  values_.Clear();
+  bindings_.Clear();
+  results_.Clear();
+  hints_.Clear();
   module_names_.clear();
   guesses_.clear();
   imports_of_foreign_.clear();
@@ -38,11 +38,12 @@ void Inference::Clear() {
 
 size_t Inference::ByteSize() const {
   static constexpr size_t kBytesOfANode = 56;  // of a map of small values, with its memory's head
-  const size_t nodes = values_.size() + bindings_.size() + results_.size() + hints_.size() + guesses_.size() +
-                       classes_by_place_.size() + functions_by_place_.size() + 3 * frames_by_hash_.size();
+  const size_t nodes =
+      guesses_.size() + classes_by_place_.size() + functions_by_place_.size() + 3 * frames_by_hash_.size();
   static constexpr size_t kBytesOfAClass = 4096;  // with its members
   return nodes * kBytesOfANode + frames_.size() * 4 * sizeof(Frame) + functions_.size() * sizeof(FunctionInfo) +
-         classes_.size() * kBytesOfAClass + types_.ByteSize() + texts_.byte_size();
+         classes_.size() * kBytesOfAClass + types_.ByteSize() + texts_.byte_size() + values_.ByteSize() +
+         bindings_.ByteSize() + results_.ByteSize() + hints_.ByteSize();
 }
 
 Text Inference::Kept(Text text) {

@@ -287,8 +287,11 @@ class Inference {
     std::vector<Value> parameters;
   };
   struct Memo {
-    Value value;
-    int depth = 0;  // while it is being found: how deep; 0 when it is there
+    static constexpr int16_t kNone = -1;
+
+    TypeSetId set = kNoTypes;
+    int16_t depth = kNone;  // while it is being found: how deep; 0 when it is there, kNone when it is not
+    uint8_t doubt = 0;
   };
   struct ModuleNames {
     std::unordered_map<Text, uint32_t> symbols;  // that the module's scope binds
@@ -300,7 +303,7 @@ class Inference {
   // What `find()` gives, remembered in `memos`. What is met again while it is being found is nothing then, and what
   // was found by way of that is not remembered.
   template <class Find>
-  Value Remembered(std::unordered_map<uint64_t, Memo>& memos, uint64_t key, Find&& find);
+  Value Remembered(NumberMap<Memo>& memos, uint64_t key, Find&& find);
 
   // ---- expressions.cc ----
   Value Evaluate(const SourceFile& file, ExprId expr, FrameId frame);
@@ -427,10 +430,10 @@ class Inference {
   std::unordered_map<std::string, ClassId> classes_by_name_;
   std::unordered_map<uint64_t, std::vector<FrameId>> frames_by_hash_;
   std::unordered_map<FunctionId, uint32_t> frame_counts_;
-  std::unordered_map<uint64_t, Memo> values_;    // of expressions, by file, expression and frame
-  std::unordered_map<uint64_t, Memo> bindings_;  // of bound names, by file, offset and frame
-  std::unordered_map<uint64_t, Memo> results_;   // of functions, by function and frame
-  std::unordered_map<uint64_t, Memo> hints_;
+  NumberMap<Memo> values_;    // of expressions, by file, expression and frame
+  NumberMap<Memo> bindings_;  // of bound names, by file, offset and frame
+  NumberMap<Memo> results_;   // of functions, by function and frame
+  NumberMap<Memo> hints_;
   std::unordered_map<FileId, ModuleNames> module_names_;
   std::unordered_map<uint64_t, Value> guesses_;
   std::unordered_map<uint32_t, Binding> imports_of_foreign_;  // by the number of the name

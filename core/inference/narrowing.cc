@@ -175,7 +175,7 @@ class Inference::Narrowing {
     Classes(cls, classes);
     if (classes.empty()) return value;
     std::vector<TypeId> kept;
-    const std::vector<TypeId> types = in_.types_.CopyOf(value.set);
+    const TypeList types = in_.types_.CopyOf(value.set);
     for (const TypeId id : types) {
       const ClassId own = in_.ClassOfType(id);
       bool is_one = false;

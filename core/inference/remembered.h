@@ -18,12 +18,12 @@ inline uint64_t KeyOf(uint64_t file, uint64_t node, uint64_t frame) {
 inline constexpr int64_t kStepsOfValue = 8;
 
 template <class Find>
-Value Inference::Remembered(std::unordered_map<uint64_t, Memo>& memos, uint64_t key, Find&& find) {
+Value Inference::Remembered(NumberMap<Memo>& memos, uint64_t key, Find&& find) {
   if (key != 0) {
-    const auto known = memos.find(key);
-    if (known != memos.end()) {
-      if (known->second.depth == 0) return known->second.value;
-      shallowest_cycle_ = std::min(shallowest_cycle_, known->second.depth);
+    const Memo* known = memos.Find(key);
+    if (known != nullptr && known->depth != Memo::kNone) {
+      if (known->depth == 0) return {known->set, known->doubt};
+      shallowest_cycle_ = std::min(shallowest_cycle_, int{known->depth});
       return {};
     }
   }
@@ -36,16 +36,12 @@ Value Inference::Remembered(std::unordered_map<uint64_t, Memo>& memos, uint64_t 
   const int own_depth = ++depth_;
   const int cycle_outside = shallowest_cycle_;
   shallowest_cycle_ = INT32_MAX;
-  if (key != 0) memos.emplace(key, Memo{{}, own_depth});
+  if (key != 0) memos.Put(key, {kNoTypes, static_cast<int16_t>(own_depth), 0});
   const Value value = find();
   --depth_;
   const bool is_whole = shallowest_cycle_ >= own_depth;
   if (key != 0) {
-    if (is_whole) {
-      memos[key] = {value, 0};
-    } else {
-      memos.erase(key);
-    }
+    memos.Put(key, is_whole ? Memo{value.set, 0, value.doubt} : Memo());
   }
   shallowest_cycle_ = std::min(cycle_outside, is_whole ? INT32_MAX : shallowest_cycle_);
   return value;

@@ -12,6 +12,8 @@ uint64_t Stir(uint64_t hash, uint64_t value) {
   return hash ^ hash >> 32;
 }
 
+uint64_t NextHash(uint64_t hash) { return Stir(hash, 1) | 1; }
+
 }  // namespace
 
 bool TypeTable::Same(TypeId type, TypeKind kind, uint32_t a, uint32_t b, std::span<const TypeSetId> args) const {
@@ -22,35 +24,38 @@ bool TypeTable::Same(TypeId type, TypeKind kind, uint32_t a, uint32_t b, std::sp
 TypeId TypeTable::Add(TypeKind kind, uint32_t a, uint32_t b, std::span<const TypeSetId> args) {
   uint64_t hash = Stir(Stir(Stir(0, static_cast<uint64_t>(kind)), a), b);
   for (const TypeSetId arg : args) hash = Stir(hash, arg);
-  for (auto [at, end] = types_by_hash_.equal_range(hash); at != end; ++at)
-    if (Same(at->second, kind, a, b, args)) return at->second;
+  hash |= 1;
+  for (const TypeId* known; (known = types_by_hash_.Find(hash)) != nullptr; hash = NextHash(hash))
+    if (Same(*known, kind, a, b, args)) return *known;
   const auto id = static_cast<TypeId>(types_.size());
   const std::vector<TypeSetId> copy(args.begin(), args.end());  // `args` may be a view of args_
   types_.push_back({kind, a, b, static_cast<uint32_t>(args_.size()), static_cast<uint32_t>(copy.size())});
   args_.insert(args_.end(), copy.begin(), copy.end());
-  types_by_hash_.emplace(hash, id);
+  types_by_hash_.Put(hash, id);
   return id;
 }
 
 TypeSetId TypeTable::SetOf(std::span<const TypeId> types) {
   if (types.empty()) return kNoTypes;
+  if (types.size() == 1 && types[0] < single_sets_.size() && single_sets_[types[0]] != kNoTypes)
+    return single_sets_[types[0]];
   std::vector<TypeId> sorted(types.begin(), types.end());
   std::ranges::sort(sorted);
   sorted.erase(std::ranges::unique(sorted).begin(), sorted.end());
   uint64_t hash = sorted.size();
   for (const TypeId type : sorted) hash = Stir(hash, type);
-  for (auto [at, end] = sets_by_hash_.equal_range(hash); at != end; ++at)
-    if (std::ranges::equal(TypesOf(at->second), sorted)) return at->second;
+  hash |= 1;
+  for (const TypeSetId* known; (known = sets_by_hash_.Find(hash)) != nullptr; hash = NextHash(hash))
+    if (std::ranges::equal(TypesOf(*known), sorted)) return *known;
   const auto id = static_cast<TypeSetId>(sets_.size());
   sets_.push_back({static_cast<uint32_t>(members_.size()), static_cast<uint32_t>(sorted.size())});
   members_.insert(members_.end(), sorted.begin(), sorted.end());
-  sets_by_hash_.emplace(hash, id);
+  sets_by_hash_.Put(hash, id);
+  if (sorted.size() == 1) {
+    if (sorted[0] >= single_sets_.size()) single_sets_.resize(types_.size(), kNoTypes);
+    single_sets_[sorted[0]] = id;
+  }
   return id;
-}
-
-std::vector<TypeId> TypeTable::CopyOf(TypeSetId set) const {
-  const auto types = TypesOf(set);
-  return {types.begin(), types.end()};
 }
 
 TypeSetId TypeTable::Union(TypeSetId a, TypeSetId b) {
@@ -58,12 +63,13 @@ TypeSetId TypeTable::Union(TypeSetId a, TypeSetId b) {
   if (a == kNoTypes) return b;
   if (a > b) std::swap(a, b);
   const uint64_t key = uint64_t{a} << 32 | b;
-  if (const auto known = unions_.find(key); known != unions_.end()) return known->second;
-  std::vector<TypeId> all = CopyOf(a);
+  if (const TypeSetId* known = unions_.Find(key)) return *known;
+  const auto first = TypesOf(a);
+  std::vector<TypeId> all(first.begin(), first.end());
   const auto more = TypesOf(b);
   all.insert(all.end(), more.begin(), more.end());
   const TypeSetId set = SetOf(all);
-  unions_.emplace(key, set);
+  unions_.Put(key, set);
   return set;
 }
 
@@ -78,9 +84,10 @@ void TypeTable::Clear() {
   types_.clear();
   args_.clear();
   members_.clear();
-  types_by_hash_.clear();
-  sets_by_hash_.clear();
-  unions_.clear();
+  types_by_hash_.Clear();
+  sets_by_hash_.Clear();
+  unions_.Clear();
+  single_sets_.clear();
   sets_.assign(1, {0, 0});
   Add(TypeKind::kNone, 0);
 }

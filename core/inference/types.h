@@ -4,11 +4,13 @@
 // number as well, and asking whether two are the same compares numbers. Nothing is freed before Clear.
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
 #include <initializer_list>
 #include <span>
-#include <unordered_map>
 #include <vector>
+
+#include "foundations/number_map.h"
 
 namespace quillet {
 
@@ -54,6 +56,30 @@ struct Value {
 };
 inline constexpr Value kUnknownValue{kNoTypes, Value::kOpen};
 
+// The types of a set, as a copy; of most sets without memory of its own.
+class TypeList {
+ public:
+  explicit TypeList(std::span<const TypeId> types) : size_(types.size()) {
+    if (size_ > kFew)
+      many_.assign(types.begin(), types.end());
+    else
+      std::ranges::copy(types, few_);
+  }
+  const TypeId* begin() const { return size_ > kFew ? many_.data() : few_; }
+  const TypeId* end() const { return begin() + size_; }
+  size_t size() const { return size_; }
+  bool empty() const { return size_ == 0; }
+  TypeId front() const { return *begin(); }
+  TypeId operator[](size_t i) const { return begin()[i]; }
+
+ private:
+  static constexpr size_t kFew = 12;
+
+  size_t size_;
+  TypeId few_[kFew];
+  std::vector<TypeId> many_;
+};
+
 class TypeTable {
  public:
   // A set of more types than this is open instead.
@@ -80,7 +106,7 @@ class TypeTable {
   std::span<const TypeId> TypesOf(TypeSetId set) const {
     return std::span(members_).subspan(sets_[set].begin, sets_[set].count);
   }
-  std::vector<TypeId> CopyOf(TypeSetId set) const;
+  TypeList CopyOf(TypeSetId set) const { return TypeList(TypesOf(set)); }
   size_t SizeOf(TypeSetId set) const { return sets_[set].count; }
   TypeSetId Union(TypeSetId a, TypeSetId b);
   Value Union(Value a, Value b);
@@ -88,9 +114,9 @@ class TypeTable {
   size_t size() const { return types_.size(); }
   // Roughly.
   size_t ByteSize() const {
-    static constexpr size_t kBytesOfANode = 48;
-    return types_.size() * (sizeof(Type) + kBytesOfANode) + sets_.size() * (sizeof(Set) + kBytesOfANode) +
-           (args_.size() + members_.size()) * sizeof(uint32_t) + unions_.size() * kBytesOfANode;
+    return types_.size() * sizeof(Type) + sets_.size() * sizeof(Set) +
+           (args_.size() + members_.size()) * sizeof(uint32_t) + types_by_hash_.ByteSize() + sets_by_hash_.ByteSize() +
+           unions_.ByteSize();
   }
   void Clear();
 
@@ -104,9 +130,11 @@ class TypeTable {
   std::vector<TypeSetId> args_;
   std::vector<Set> sets_;
   std::vector<TypeId> members_;
-  std::unordered_multimap<uint64_t, TypeId> types_by_hash_;
-  std::unordered_multimap<uint64_t, TypeSetId> sets_by_hash_;
-  std::unordered_map<uint64_t, TypeSetId> unions_;
+  // By hashes; the next of the same hash by one that follows from it.
+  NumberMap<TypeId> types_by_hash_;
+  NumberMap<TypeSetId> sets_by_hash_;
+  NumberMap<TypeSetId> unions_;
+  std::vector<TypeSetId> single_sets_;  // of each type alone; kNoTypes where there is none yet
 };
 
 }  // namespace quillet

@@ -39,7 +39,7 @@ void Workspace::Impl::AddParameterHints(const SourceFile& file, ExprId call, std
   };
   if (std::ranges::none_of(children.subspan(1), is_bare)) return;
   const Value callee = inference.ValueOf(file.id, children[0]);
-  const std::vector<TypeId> types = inference.types().CopyOf(callee.set);
+  const TypeList types = inference.types().CopyOf(callee.set);
   if (types.size() != 1) return;
   Type type = inference.types()[types[0]];
   bool is_bound = type.args_count > 0;
@@ -47,7 +47,7 @@ void Workspace::Impl::AddParameterHints(const SourceFile& file, ExprId call, std
     const auto constructor = inference.FindMember(type.a, "__init__");
     if (!constructor || constructor->owner == inference.ClassNamed("builtins", "object")) return;
     const Value init = inference.AttributeOf(inference.Just(inference.InstanceOf(type.a)), "__init__");
-    const std::vector<TypeId> inits = inference.types().CopyOf(init.set);
+    const TypeList inits = inference.types().CopyOf(init.set);
     if (inits.size() != 1) return;
     type = inference.types()[inits[0]];
     is_bound = true;
@@ -111,7 +111,7 @@ std::vector<InlineHint> Workspace::Hints(FileId id, uint32_t begin, uint32_t end
       const auto exprs = syntax.ExprsOf(at);
       if (exprs.size() != 2 || syntax[exprs[0]].kind != ExprKind::kName || IsPlain(syntax, exprs[1])) continue;
       const Value value = in.inference.ValueOf(id, exprs[1]);
-      const std::vector<TypeId> types = in.inference.types().CopyOf(value.set);
+      const TypeList types = in.inference.types().CopyOf(value.set);
       const bool is_alias = std::ranges::any_of(types, [&](TypeId type) {
         const TypeKind kind = in.inference.types()[type].kind;
         return kind == TypeKind::kClass || kind == TypeKind::kModule || kind == TypeKind::kFunction ||

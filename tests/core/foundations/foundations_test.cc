@@ -3,12 +3,14 @@
 
 #include <string>
 #include <thread>
+#include <unordered_map>
 #include <vector>
 
 #include "foundations/arena.h"
 #include "foundations/char_tables.h"
 #include "foundations/console.h"
 #include "foundations/errors.h"
+#include "foundations/number_map.h"
 #include "foundations/ref.h"
 #include "foundations/utf8.h"
 
@@ -386,6 +388,33 @@ TEST(Ref, TheLastReferenceEndsTheObject) {
     EXPECT_TRUE(c);
   }
   EXPECT_EQ(alive, 0);
+}
+
+TEST(NumberMap, IsAMap) {
+  NumberMap<uint32_t> map;
+  EXPECT_EQ(map.Find(7), nullptr);
+  std::unordered_map<uint64_t, uint32_t> wanted;
+  uint64_t number = 1;
+  for (uint32_t i = 0; i < 20000; ++i) {
+    // Close together, far apart, and alike in their low bits.
+    number = i % 3 == 0 ? number * 6364136223846793005u + 1442695040888963407u : number + (i % 3 == 1 ? 1 : 1u << 20);
+    if (number == 0) continue;
+    map.Put(number, i);
+    wanted[number] = i;
+    if (i % 5 == 0) map.Put(number, wanted[number] = i + 1);
+  }
+  EXPECT_EQ(map.size(), wanted.size());
+  for (const auto& [key, value] : wanted) {
+    ASSERT_NE(map.Find(key), nullptr) << key;
+    EXPECT_EQ(*map.Find(key), value) << key;
+    if (!wanted.contains(key + 2) && key + 2 != 0) {
+      EXPECT_EQ(map.Find(key + 2), nullptr) << key;
+    }
+  }
+  EXPECT_GE(map.ByteSize(), wanted.size() * 16);
+  map.Clear();
+  EXPECT_EQ(map.size(), 0u);
+  EXPECT_EQ(map.Find(number), nullptr);
 }
 
 }  // namespace
