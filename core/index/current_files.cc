@@ -38,8 +38,8 @@ CurrentFiles::CurrentFiles(const std::vector<IndexRoot>& roots, bool gitignore, 
     }
   }
   std::ranges::sort(all_, {}, &CurrentFile::stored);
-  const auto again = std::ranges::unique(all_, {}, &CurrentFile::stored);
-  all_.erase(again.begin(), again.end());
+  const auto is_same = [](const CurrentFile& a, const CurrentFile& b) { return a.stored == b.stored; };
+  all_.erase(std::unique(all_.begin(), all_.end(), is_same), all_.end());
 }
 
 bool CurrentFiles::Covers(Text stored) const {

@@ -12,7 +12,7 @@ namespace {
 
 constexpr char kSeparator = static_cast<char>(std::filesystem::path::preferred_separator);
 
-bool IsSeparator(char c) { return c == '/' || c == kSeparator; }
+bool IsSeparator(char c) { return c == '/' || (kSeparator == '\\' && c == '\\'); }
 
 bool IsBelow(Text path, Text folder) {
   if (path == folder) return true;

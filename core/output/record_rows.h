@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "analysis/record_table.h"
@@ -37,7 +38,9 @@ class RecordRows {
   struct Key {
     uint32_t name, scope;
     uint64_t id;
-    friend auto operator<=>(const Key&, const Key&) = default;
+    friend bool operator<(const Key& a, const Key& b) {
+      return std::tie(a.name, a.scope, a.id) < std::tie(b.name, b.scope, b.id);
+    }
   };
 
   void SetNumbers(const TextList& texts, TextTable& table, std::vector<uint32_t>& numbers);
