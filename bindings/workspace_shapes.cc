@@ -83,7 +83,7 @@ nb::list HintsOf(WorkspaceObject& self, nb::handle path, int first, int last) {
   return rows;
 }
 
-nb::object SourceOf(WorkspaceObject& self, nb::handle path) {
+nb::object TextOfFile(WorkspaceObject& self, nb::handle path) {
   const AskedPlace place(path, 1, 1);
   const std::string bytes =
       self.Asked([&](Workspace& workspace) { return std::string(workspace.SourceOf(place.File(workspace))); });
@@ -99,7 +99,7 @@ void BindShapes(nb::class_<WorkspaceObject>& workspace) {
       .def("Colours", &ColoursOf, nb::arg("path"), nb::arg("first_line"), nb::arg("last_line"))
       .def("Hints", &HintsOf, nb::arg("path"), nb::arg("first_line"), nb::arg("last_line"),
            "Rows (line, column, text, kind, certainty).")
-      .def("SourceOf", &SourceOf, nb::arg("path"));
+      .def("SourceOf", &TextOfFile, nb::arg("path"));
 }
 
 }  // namespace quillet::host

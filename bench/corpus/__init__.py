@@ -1,0 +1,1 @@
+"""Measures a corpus: see __main__.py."""
