@@ -45,10 +45,11 @@ SpecialForm Inference::SpecialFormOf(const Binding& binding, const SourceFile& f
   return SpecialForm::kNone;
 }
 
-Value Inference::ValueOfHint(FileId id, ExprId hint, FrameId frame) {
+Value Inference::ValueOfHint(FileId id, ExprId hint, FrameId) {
   const SourceFile* file = FileOf(id);
   if (file == nullptr || hint == kNoExpr) return kUnknownValue;
-  return Remembered(hints_, KeyOf(id, hint, 0), [&] { return HintOf(*file, hint, frame); });
+  const InFrame in_frame(*this, kNoFrame);
+  return Remembered(hints_, KeyOf(id, hint, 0), [&] { return HintOf(*file, hint, kNoFrame); });
 }
 
 // A value of what an expression is, where that is a type.
@@ -67,7 +68,7 @@ Value Inference::HintOfValue(Value value) {
         hint = types_.Union(hint, Just(id));
         break;
       case TypeKind::kTypeForm:
-        hint.set = types_.Union(hint.set, types_.ArgOf(id, 0));
+        hint = types_.Union(hint, Value{types_.ArgOf(id, 0), 0});
         break;
       case TypeKind::kSpecial:
         switch (static_cast<SpecialForm>(t.a)) {
@@ -126,7 +127,7 @@ Value Inference::HintOf(const SourceFile& file, ExprId hint, FrameId frame) {
       return kUnknownValue;
     case ExprKind::kTuple: {  // of a type comment: `# type: int, str`
       std::vector<TypeSetId> items;
-      for (const ExprId item : syntax.ChildrenOf(hint)) items.push_back(ValueOfHint(file.id, item, frame).set);
+      for (const ExprId item : syntax.ChildrenOf(hint)) items.push_back(ValueOfHint(file.id, item, frame).Packed());
       return Just(types_.Add(TypeKind::kTuple, 0, 0, items));
     }
     case ExprKind::kSignatureHint: {
@@ -167,12 +168,12 @@ Value Inference::HintOfSpecial(SpecialForm form, const SourceFile& file, std::sp
       return InstanceNamed("builtins", "bool");
     case SpecialForm::kTuple: {
       if (items.size() == 2 && syntax[items[1]].kind == ExprKind::kConstant)
-        return InstanceNamed("builtins", "tuple", {ValueOfHint(file.id, items[0], frame).set});
+        return InstanceNamed("builtins", "tuple", {ValueOfHint(file.id, items[0], frame).Packed()});
       std::vector<TypeSetId> sets;
       for (const ExprId item : items) {
         if (syntax[item].kind == ExprKind::kTuple && syntax[item].children_count == 0) continue;  // Tuple[()]
         if (syntax[item].kind == ExprKind::kStarred) return InstanceNamed("builtins", "tuple");
-        sets.push_back(ValueOfHint(file.id, item, frame).set);
+        sets.push_back(ValueOfHint(file.id, item, frame).Packed());
       }
       return Just(types_.Add(TypeKind::kTuple, 0, 0, sets));
     }
@@ -200,10 +201,11 @@ Value Inference::HintOfSpecial(SpecialForm form, const SourceFile& file, std::sp
     }
     case SpecialForm::kCallable: {
       if (items.empty()) return kUnknownValue;
-      std::vector<TypeSetId> args{ValueOfHint(file.id, items.back(), frame).set};
+      std::vector<TypeSetId> args{ValueOfHint(file.id, items.back(), frame).Packed()};
       const bool has_parameters = items.size() == 2 && syntax[items[0]].kind == ExprKind::kList;
       if (has_parameters)
-        for (const ExprId item : syntax.ChildrenOf(items[0])) args.push_back(ValueOfHint(file.id, item, frame).set);
+        for (const ExprId item : syntax.ChildrenOf(items[0]))
+          args.push_back(ValueOfHint(file.id, item, frame).Packed());
       return Just(types_.Add(TypeKind::kCallable, 0, has_parameters ? 1 : 0, args));
     }
     default:
@@ -231,7 +233,7 @@ Value Inference::HintOfSubscript(const SourceFile& file, ExprId hint, FrameId fr
         continue;
       }
       std::vector<TypeSetId> args;
-      for (const ExprId item : items) args.push_back(ValueOfHint(file.id, item, frame).set);
+      for (const ExprId item : items) args.push_back(ValueOfHint(file.id, item, frame).Packed());
       value = types_.Union(value, Just(InstanceOf(cls, args)));
     } else if (t.kind == TypeKind::kTypeForm) {
       // An alias with type variables, in the order of their first mention.
@@ -239,7 +241,7 @@ Value Inference::HintOfSubscript(const SourceFile& file, ExprId hint, FrameId fr
       CollectTypeVars(types_.ArgOf(id, 0), variables);
       Solution solution;
       for (size_t i = 0; i < variables.size() && i < items.size(); ++i)
-        solution.emplace_back(variables[i], ValueOfHint(file.id, items[i], frame).set);
+        solution.emplace_back(variables[i], ValueOfHint(file.id, items[i], frame).Packed());
       value = types_.Union(value, Substitute({types_.ArgOf(id, 0), 0}, solution));
     } else {
       value.doubt |= Value::kOpen;

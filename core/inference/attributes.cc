@@ -173,7 +173,7 @@ Solution Inference::SolutionFor(const Member& member, TypeId receiver) {
     }
     for (size_t i = 0; i < owner.parameters.size(); ++i) {
       const TypeSetId arg = i < member.args.size() ? member.args[i] : kNoTypes;
-      solution.emplace_back(owner.parameters[i], Substitute({arg, 0}, own).set);
+      solution.emplace_back(owner.parameters[i], Substitute({arg, 0}, own).Packed());
     }
   }
   solution.emplace_back(

@@ -89,13 +89,13 @@ TypeSetId Inference::ArgsAs(TypeId type, ClassId base, size_t index) {
   }
   const std::vector<BaseClass> order = InfoOf(cls).order;
   for (const BaseClass& entry : order)
-    if (entry.cls == base && index < entry.args.size()) return Substitute({entry.args[index], 0}, own).set;
+    if (entry.cls == base && index < entry.args.size()) return Substitute({entry.args[index], 0}, own).Packed();
   return kNoTypes;
 }
 
 void Inference::Solve(TypeSetId hint, TypeSetId value, Solution& solution, int depth) {
   static constexpr int kMaxNesting = 6;
-  if (depth > kMaxNesting || hint == kNoTypes || value == kNoTypes) return;
+  if (depth > kMaxNesting || WithoutOpen(hint) == kNoTypes || WithoutOpen(value) == kNoTypes) return;
   const TypeList hints = types_.CopyOf(hint);
   std::vector<TypeId> variables;
   std::vector<TypeId> taken;
@@ -145,7 +145,7 @@ void Inference::Solve(TypeSetId hint, TypeSetId value, Solution& solution, int d
                 std::vector<Argument> none;
                 const Value found = AttributeOfType(v, name);
                 Solution inner;
-                Solve(result.set, ResultOf(found, none).set, inner, depth + 2);
+                Solve(result.set, ResultOf(found, none).Packed(), inner, depth + 2);
                 for (const auto& [variable, solved] : inner)
                   for (size_t i = 0; i < parameters.size(); ++i)
                     if (parameters[i] == variable) Solve(types_.ArgOf(h, i), solved, solution, depth + 1);
@@ -158,8 +158,9 @@ void Inference::Solve(TypeSetId hint, TypeSetId value, Solution& solution, int d
         case TypeKind::kTuple: {
           taken.push_back(v);
           for (size_t i = 0; i < t.args_count; ++i)
-            Solve(types_.ArgOf(h, i), given.kind == TypeKind::kTuple ? types_.ArgOf(v, i) : IterationOf(Just(v)).set,
-                  solution, depth + 1);
+            Solve(types_.ArgOf(h, i),
+                  given.kind == TypeKind::kTuple ? types_.ArgOf(v, i) : IterationOf(Just(v)).Packed(), solution,
+                  depth + 1);
           break;
         }
         case TypeKind::kCallable: {
@@ -180,13 +181,13 @@ void Inference::Solve(TypeSetId hint, TypeSetId value, Solution& solution, int d
               const size_t at = i - 1 + (given.args_count > 0 ? 1 : 0);
               if (at >= parameters.size()) break;
               const ExprId own = HintOfParameter(*file, info, at);
-              if (own != kNoExpr) Solve(types_.ArgOf(h, i), ValueOfHint(info.file, own).set, solution, depth + 1);
+              if (own != kNoExpr) Solve(types_.ArgOf(h, i), ValueOfHint(info.file, own).Packed(), solution, depth + 1);
             }
           }
           if (t.b == 0 && given.kind == TypeKind::kFunction) {
-            Solve(types_.ArgOf(h, 0), ResultIn(given.a, given.b).set, solution, depth + 1);
+            Solve(types_.ArgOf(h, 0), ResultIn(given.a, given.b).Packed(), solution, depth + 1);
           } else {
-            Solve(types_.ArgOf(h, 0), ResultOf(Just(v), arguments).set, solution, depth + 1);
+            Solve(types_.ArgOf(h, 0), ResultOf(Just(v), arguments).Packed(), solution, depth + 1);
           }
           break;
         }
@@ -201,7 +202,8 @@ void Inference::Solve(TypeSetId hint, TypeSetId value, Solution& solution, int d
   for (const TypeId v : types_.CopyOf(value))
     if (std::ranges::find(taken, v) == taken.end()) rest.push_back(v);
   if (rest.empty() && hints.size() > 1) return;
-  const TypeSetId solved = WithoutLiterals({rest.empty() ? value : types_.SetOf(rest), 0}).set;
+  const TypeSetId solved =
+      WithoutLiterals({(rest.empty() ? value : types_.SetOf(rest)) | (value & kOpenSet), 0}).Packed();
   for (const TypeId variable : variables) {
     const auto known = std::ranges::find(solution, variable, &std::pair<TypeId, TypeSetId>::first);
     if (known == solution.end()) {
@@ -225,7 +227,7 @@ Value Inference::Substitute(Value value, const Solution& solution, bool drops_un
       if (known != solution.end()) {
         has_changed = true;
         result.set = types_.Union(result.set, known->second);
-        if (known->second == kNoTypes) result.doubt |= Value::kOpen;
+        if (WithoutOpen(known->second) == kNoTypes) result.doubt |= Value::kOpen;
         continue;
       }
       if (drops_unsolved) {
@@ -240,7 +242,7 @@ Value Inference::Substitute(Value value, const Solution& solution, bool drops_un
         const TypeSetId arg = types_.ArgOf(id, i);
         // The variables of a callable are those of its calls.
         const bool drops = drops_unsolved && t.kind != TypeKind::kCallable;
-        args.push_back(Substitute({arg, 0}, solution, drops, depth + 1).set);
+        args.push_back(Substitute({arg, 0}, solution, drops, depth + 1).Packed());
         has_other = has_other || args.back() != arg;
       }
       if (has_other) {
@@ -261,13 +263,13 @@ Value Inference::Substitute(Value value, const Solution& solution, bool drops_un
     }
     result.set = types_.Union(result.set, types_.SetOf(id));
   }
-  return has_changed ? result : value;
+  return has_changed ? Value{result.set, result.doubt} : value;
 }
 
 // How well a value fits a hint: 0 not at all, 1 perhaps, 2 surely.
 int Inference::Assignable(TypeSetId hint, Value value, int depth) {
   static constexpr int kMaxNesting = 3;
-  if (hint == kNoTypes || !value.IsKnown() || depth > kMaxNesting) return 1;
+  if (WithoutOpen(hint) == kNoTypes || !value.IsKnown() || depth > kMaxNesting) return 1;
   int worst = 2;
   for (const TypeId v : types_.CopyOf(value.set)) {
     int best = 0;
@@ -366,7 +368,7 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
     if (hint == kNoExpr) return;
     const Value stated = ValueOfHint(info.file, hint);
     score = std::min(score, Assignable(stated.set, value));
-    Solve(stated.set, value.set, solution);
+    Solve(stated.set, value.Packed(), solution);
   };
   size_t next = is_bound ? 1 : 0;
   if (is_bound && !parameters.empty() && kind_of(0) == ParameterKind::kStar) next = 0;
@@ -419,10 +421,10 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
         for (Argument& argument : arguments) {
           if (argument.kind == Argument::kStar) is_exact = false;
           if (argument.kind != Argument::kPlain) continue;
-          if (position++ >= i) items.push_back(ValueOfArgument(argument).set);
+          if (position++ >= i) items.push_back(ValueOfArgument(argument).Packed());
         }
         given[i] = is_exact ? Just(types_.Add(TypeKind::kTuple, 0, 0, items))
-                            : InstanceNamed("builtins", "tuple", {given[i].set});
+                            : InstanceNamed("builtins", "tuple", {given[i].Packed()});
       } else if (kind_of(i) == ParameterKind::kDoubleStar && is_given[i]) {
         // What each keyword was given is remembered by its name.
         std::string entries = "#";
@@ -435,11 +437,11 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
           if (is_own) continue;
           entries += argument.name;
           entries += ':';
-          entries += std::to_string(ValueOfArgument(argument).set);
+          entries += std::to_string(ValueOfArgument(argument).Packed());
           entries += ';';
         }
         const ClassId dict = ClassNamed("builtins", "dict");
-        const TypeSetId args[] = {InstanceNamed("builtins", "str").set, given[i].set};
+        const TypeSetId args[] = {InstanceNamed("builtins", "str").set, given[i].Packed()};
         given[i] = Just(types_.Add(TypeKind::kInstance, dict, LiteralNumber(entries), args));
       } else if (!is_given[i] && kind_of(i) == ParameterKind::kPlain && syntax.ChildOf(parameters[i], 1) != kNoExpr) {
         given[i] = ValueOf(info.file, syntax.ChildOf(parameters[i], 1));
@@ -476,7 +478,7 @@ Value Inference::ResultOfFunctionCall(TypeId callee, std::vector<Argument>& argu
         member.args = entry.args;
         for (const auto& pair : SolutionFor(member, self)) {
           const auto known = std::ranges::find(solution, pair.first, &std::pair<TypeId, TypeSetId>::first);
-          if (pair.second == kNoTypes) continue;
+          if (WithoutOpen(pair.second) == kNoTypes) continue;
           if (known == solution.end()) {
             solution.push_back(pair);
           }
@@ -544,8 +546,8 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
             const std::vector<TypeId> variables = info.parameters;
             for (size_t i = 0; i < variables.size(); ++i) {
               const TypeSetId arg = types_.ArgOf(self, i);
-              const TypeSetId solved = Substitute({arg, 0}, own, true).set;
-              if (solved != kNoTypes) {
+              const TypeSetId solved = Substitute({arg, 0}, own, true).Packed();
+              if (WithoutOpen(solved) != kNoTypes) {
                 std::erase_if(own, [&](const auto& pair) { return pair.first == variables[i]; });
                 own.emplace_back(variables[i], solved);
               }
@@ -687,13 +689,13 @@ Value Inference::ResultOfSpecialCall(TypeId callee, std::vector<Argument>& argum
       open.value = kUnknownValue;
       rest.push_back(open);
       const Value result = ResultOf(at(0), rest);
-      return answer(Just(types_.Add(TypeKind::kCallable, 0, 0, {result.set}), result.doubt));
+      return answer(Just(types_.Add(TypeKind::kCallable, 0, 0, {result.Packed()})));
     }
     if (name == "tuple" && arguments.size() == 1) {
       const Value given = at(0);
       if (types_.SizeOf(given.set) == 1 && types_[types_.TypesOf(given.set)[0]].kind == TypeKind::kTuple)
         return answer(given);
-      return answer(InstanceNamed("builtins", "tuple", {IterationOf(given).set}));
+      return answer(InstanceNamed("builtins", "tuple", {IterationOf(given).Packed()}));
     }
     return {};
   }
@@ -739,7 +741,8 @@ Value Inference::ResultOfType(TypeId callee, std::vector<Argument>& arguments, E
         Solve(types_.ArgOf(callee, i + 1), ValueOfArgument(arguments[i]).set, solution);
       }
       const TypeSetId result = types_.ArgOf(callee, 0);
-      return Substitute({result, static_cast<uint8_t>(result == kNoTypes ? Value::kOpen : 0)}, solution, true);
+      return Substitute({result, static_cast<uint8_t>(WithoutOpen(result) == kNoTypes ? Value::kOpen : 0)}, solution,
+                        true);
     }
     case TypeKind::kSpecial: {
       const auto form = static_cast<SpecialForm>(t.a);
@@ -767,7 +770,11 @@ Value Inference::ResultOfType(TypeId callee, std::vector<Argument>& arguments, E
 }
 
 Value Inference::ResultOf(Value callee, std::vector<Argument>& arguments, ExprPlace place) {
-  if (steps_ == 0 || depth_ >= kMaxDepth) return kUnknownValue;
+  static constexpr int kMoreDepth = 20;  // what goes deeper is cut where it is remembered
+  if (steps_ == 0 || depth_ >= max_depth_ + kMoreDepth) {
+    lowest_ = std::min(lowest_, surface_);
+    return kUnknownValue;
+  }
   ++depth_;
   Value value{kNoTypes, callee.doubt};
   // Of overloads the first that fits best is called.
@@ -811,6 +818,7 @@ Value Inference::ResultOf(Value callee, std::vector<Argument>& arguments, ExprPl
     const Value one = ResultOfType(id, arguments, place);
     value.set = types_.Union(value.set, one.set);
     value.doubt |= one.doubt;
+    if (IsInVain(value)) break;
   }
   --depth_;
   return value;

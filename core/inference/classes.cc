@@ -2,6 +2,7 @@
 #include <algorithm>
 
 #include "inference/inference.h"
+#include "inference/remembered.h"
 
 namespace quillet {
 
@@ -16,8 +17,11 @@ ClassInfo& Inference::InfoOf(ClassId cls) {
   }
   ++class_depth_;
   info.is_finding_bases = true;
-  FindBases(cls);
-  FindOrder(cls);
+  {
+    const Afresh afresh(*this, kMaxDepth / 4);
+    FindBases(cls);
+    FindOrder(cls);
+  }
   info.has_bases = true;
   info.is_finding_bases = false;
   --class_depth_;
@@ -177,7 +181,7 @@ void Inference::FindOrder(ClassId cls) {
     std::vector<BaseClass> order;
     for (const BaseClass& entry : other.order) {
       BaseClass substituted{entry.cls, {}};
-      for (const TypeSetId arg : entry.args) substituted.args.push_back(Substitute({arg, 0}, solution).set);
+      for (const TypeSetId arg : entry.args) substituted.args.push_back(Substitute({arg, 0}, solution).Packed());
       order.push_back(std::move(substituted));
     }
     open_from.push_back(other.open_from);

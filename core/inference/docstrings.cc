@@ -66,7 +66,7 @@ Value Inference::ValueOfWords(const SourceFile& file, Text words, int depth) {
     while (!rest.empty()) {
       const size_t comma = std::min(rest.find(','), rest.size());
       if (!Trimmed(rest.substr(0, comma)).empty())
-        items.push_back(ValueOfWords(file, rest.substr(0, comma), depth + 1).set);
+        items.push_back(ValueOfWords(file, rest.substr(0, comma), depth + 1).Packed());
       rest.remove_prefix(std::min(comma + 1, rest.size()));
     }
     return Just(types_.Add(TypeKind::kTuple, 0, 0, items), Value::kGuessed | Value::kOpen);
@@ -80,7 +80,7 @@ Value Inference::ValueOfWords(const SourceFile& file, Text words, int depth) {
     std::vector<TypeId> made;
     for (const TypeId id : types_.CopyOf(container.set)) {
       if (types_[id].kind != TypeKind::kInstance) continue;
-      const std::vector<TypeSetId> args(std::max<size_t>(InfoOf(types_[id].a).parameters.size(), 1), items.set);
+      const std::vector<TypeSetId> args(std::max<size_t>(InfoOf(types_[id].a).parameters.size(), 1), items.Packed());
       made.push_back(InstanceOf(types_[id].a, args));
     }
     container.set = types_.SetOf(made);

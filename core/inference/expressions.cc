@@ -34,6 +34,7 @@ Value Inference::ValueOf(FileId id, ExprId expr, FrameId frame) {
   const SourceFile* file = FileOf(id);
   if (file == nullptr || expr == kNoExpr) return kUnknownValue;
   if (frame != kNoFrame) frame = FrameFor(*file, file->ScopeAt(file->syntax[expr].begin), frame);
+  const InFrame in_frame(*this, frame);
   return Remembered(values_, KeyOf(id, expr, frame), [&] { return Evaluate(*file, expr, frame); });
 }
 
@@ -133,7 +134,7 @@ Value Inference::Evaluate(const SourceFile& file, ExprId expr, FrameId frame) {
       const ClassId generator = ClassNamed("typing", "Generator");
       for (const TypeId id : types_.CopyOf(child(0).set))
         if (types_[id].kind == TypeKind::kInstance && types_[id].a == generator)
-          value = {types_.Union(value.set, types_.ArgOf(id, 2)), 0};
+          value = Value{types_.Union(value.set, types_.ArgOf(id, 2)), 0};
       return value;
     }
     case ExprKind::kNamed:
@@ -193,7 +194,7 @@ Value Inference::EvaluateTuple(const SourceFile& file, ExprId expr, FrameId fram
   for (const ExprId item : file.syntax.ChildrenOf(expr)) {
     const Value value = ValueOf(file.id, item, frame);
     if (file.syntax[item].kind != ExprKind::kStarred) {
-      items.push_back(value.set);
+      items.push_back(value.Packed());
       continue;
     }
     if (types_.SizeOf(value.set) == 1 && types_[types_.TypesOf(value.set)[0]].kind == TypeKind::kTuple) {
@@ -206,13 +207,13 @@ Value Inference::EvaluateTuple(const SourceFile& file, ExprId expr, FrameId fram
       const Value part = ValueOf(file.id, one, frame);
       all = types_.Union(all, file.syntax[one].kind == ExprKind::kStarred ? IterationOf(part) : part);
     }
-    return InstanceNamed("builtins", "tuple", {WithoutLiterals(all).set});
+    return InstanceNamed("builtins", "tuple", {WithoutLiterals(all).Packed()});
   }
   static constexpr size_t kMaxItems = 64;
   if (items.size() > kMaxItems) {
     Value all;
     for (const TypeSetId item : items) all = types_.Union(all, Value{item, 0});
-    return InstanceNamed("builtins", "tuple", {WithoutLiterals(all).set});
+    return InstanceNamed("builtins", "tuple", {WithoutLiterals(all).Packed()});
   }
   return Just(types_.Add(TypeKind::kTuple, 0, 0, items));
 }
@@ -222,7 +223,10 @@ Value Inference::EvaluateItems(const SourceFile& file, ExprId expr, FrameId fram
   Value items;
   size_t count = 0;
   for (const ExprId item : file.syntax.ChildrenOf(expr)) {
-    if (++count > kMaxItems) break;
+    if (++count > kMaxItems) {
+      items.doubt |= Value::kOpen;
+      break;
+    }
     const Value value = ValueOf(file.id, item, frame);
     items =
         types_.Union(items, WithoutLiterals(file.syntax[item].kind == ExprKind::kStarred ? IterationOf(value) : value));
@@ -231,7 +235,7 @@ Value Inference::EvaluateItems(const SourceFile& file, ExprId expr, FrameId fram
   if (id == kNoId) return kUnknownValue;
   // A display remembers itself, for `[f, g][1]`.
   const std::string place = "@" + std::to_string(file.id) + ":" + std::to_string(expr) + ":" + std::to_string(frame);
-  const TypeSetId args[] = {items.set};
+  const TypeSetId args[] = {items.Packed()};
   return Just(types_.Add(TypeKind::kInstance, id, cls == "list" && count > 0 ? LiteralNumber(place) : 0, args));
 }
 
@@ -242,6 +246,7 @@ Value Inference::EvaluateDict(const SourceFile& file, ExprId expr, FrameId frame
   for (size_t i = 0; i + 1 < children.size() && i < kMaxItems; i += 2) {
     if (file.syntax[children[i]].kind == ExprKind::kDoubleStarred) {
       const Value other = ValueOf(file.id, children[i], frame);
+      if (!other.IsKnown() || other.doubt != 0) values.doubt |= Value::kOpen;
       for (const TypeId id : types_.CopyOf(other.set)) {
         keys = types_.Union(keys, Value{types_.ArgOf(id, 0), 0});
         values = types_.Union(values, Value{types_.ArgOf(id, 1), 0});
@@ -254,7 +259,7 @@ Value Inference::EvaluateDict(const SourceFile& file, ExprId expr, FrameId frame
   const ClassId id = ClassNamed("builtins", "dict");
   if (id == kNoId) return kUnknownValue;
   const std::string place = "@" + std::to_string(file.id) + ":" + std::to_string(expr) + ":" + std::to_string(frame);
-  const TypeSetId args[] = {keys.set, values.set};
+  const TypeSetId args[] = {keys.Packed(), values.Packed()};
   return Just(types_.Add(TypeKind::kInstance, id, children.empty() ? 0 : LiteralNumber(place), args));
 }
 
@@ -263,17 +268,18 @@ Value Inference::EvaluateComprehension(const SourceFile& file, ExprId expr, Fram
   const Value first = WithoutLiterals(ValueOf(file.id, syntax.ChildOf(expr, 0), frame));
   switch (syntax[expr].kind) {
     case ExprKind::kListComprehension:
-      return InstanceNamed("builtins", "list", {first.set});
+      return InstanceNamed("builtins", "list", {first.Packed()});
     case ExprKind::kSetComprehension:
-      return InstanceNamed("builtins", "set", {first.set});
+      return InstanceNamed("builtins", "set", {first.Packed()});
     case ExprKind::kDictComprehension:
-      return InstanceNamed("builtins", "dict",
-                           {first.set, WithoutLiterals(ValueOf(file.id, syntax.ChildOf(expr, 1), frame)).set});
+      return InstanceNamed(
+          "builtins", "dict",
+          {first.Packed(), WithoutLiterals(ValueOf(file.id, syntax.ChildOf(expr, 1), frame)).Packed()});
     default:
       for (const ExprId clause : syntax.ChildrenOf(expr))
         if (syntax[clause].kind == ExprKind::kComprehensionFor && (syntax[clause].flags & kAsyncClause) != 0)
-          return InstanceNamed("typing", "AsyncGenerator", {first.set, NoneValue().set});
-      return InstanceNamed("typing", "Generator", {first.set, NoneValue().set, NoneValue().set});
+          return InstanceNamed("typing", "AsyncGenerator", {first.Packed(), NoneValue().set});
+      return InstanceNamed("typing", "Generator", {first.Packed(), NoneValue().set, NoneValue().set});
   }
 }
 
@@ -361,7 +367,7 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
     key = ValueOf(file.id, index, frame);
   } else {
     std::vector<TypeSetId> parts;
-    for (const ExprId item : items) parts.push_back(ValueOf(file.id, item, frame).set);
+    for (const ExprId item : items) parts.push_back(ValueOf(file.id, item, frame).Packed());
     key = Just(types_.Add(TypeKind::kTuple, 0, 0, parts));
   }
   // A literal number; LONG_MIN without one.
@@ -403,7 +409,7 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
       if (index != kNoExpr && syntax[index].kind == ExprKind::kSlice) {
         Value all;
         for (size_t i = 0; i < t.args_count; ++i) all = types_.Union(all, Value{types_.ArgOf(id, i), 0});
-        value = types_.Union(value, InstanceNamed("builtins", "tuple", {all.set}));
+        value = types_.Union(value, InstanceNamed("builtins", "tuple", {all.Packed()}));
         continue;
       }
       for (size_t i = 0; i < t.args_count; ++i) value = types_.Union(value, Value{types_.ArgOf(id, i), 0});
@@ -574,6 +580,7 @@ Value Inference::EvaluateCall(const SourceFile& file, ExprId expr, FrameId frame
 
 Value Inference::Operate(Value left, Value right, Text method, Text reflected) {
   Value value{kNoTypes, static_cast<uint8_t>(left.doubt | right.doubt)};
+  if (IsInVain(value)) return kUnknownValue;
   const Value plain_right = WithoutLiterals(right);
   for (const TypeId id : types_.CopyOf(WithoutLiterals(left).set)) {
     if (types_[id].kind == TypeKind::kForeign) {
@@ -613,6 +620,7 @@ Value Inference::Operate(Value left, Value right, Text method, Text reflected) {
 Value Inference::EvaluateBinary(const SourceFile& file, ExprId expr, FrameId frame) {
   const FileSyntax& syntax = file.syntax;
   const Value left = ValueOf(file.id, syntax.ChildOf(expr, 0), frame);
+  if (IsInVain(left)) return kUnknownValue;
   const Value right = ValueOf(file.id, syntax.ChildOf(expr, 1), frame);
   const uint8_t op = syntax[expr].op;
   if (op == CodeOfText("|")) {

@@ -46,9 +46,9 @@ Value Inference::ValueOfParameter(FunctionId id, size_t index, FrameId frame) {
   const Expr& parameter = syntax[parameters[index]];
   const auto kind = static_cast<ParameterKind>(parameter.op);
   const auto gathered = [&](Value one) {
-    if (kind == ParameterKind::kStar) return InstanceNamed("builtins", "tuple", {one.set});
+    if (kind == ParameterKind::kStar) return InstanceNamed("builtins", "tuple", {one.Packed()});
     if (kind == ParameterKind::kDoubleStar)
-      return InstanceNamed("builtins", "dict", {InstanceNamed("builtins", "str").set, one.set});
+      return InstanceNamed("builtins", "dict", {InstanceNamed("builtins", "str").set, one.Packed()});
     return one;
   };
   const bool is_in_frame =
@@ -79,12 +79,24 @@ Value Inference::ValueOfParameter(FunctionId id, size_t index, FrameId frame) {
 
 // What the calls of a function in the project give a parameter.
 Value Inference::GuessedParameter(FunctionId id, size_t index) {
-  static constexpr int kMaxGuesses = 3;  // a guess may need others
-  const uint64_t key = uint64_t{id} << 16 | index;
-  if (const auto known = guesses_.find(key); known != guesses_.end()) return known->second;
-  if (callers_ == nullptr || guess_depth_ >= kMaxGuesses) return kUnknownValue;
-  guesses_[key] = kUnknownValue;
-  ++guess_depth_;
+  if (callers_ == nullptr) return kUnknownValue;
+  if (guess_level_ >= kMaxGuesses) {
+    needs_level_ = true;
+    return kUnknownValue;
+  }
+  const InFrame in_frame(*this, kNoFrame);
+  const Value all = Remembered(guesses_, KeyOf(0, id, 0), [&] {
+    ++guess_level_;
+    const Value value = GuessParameters(id);
+    --guess_level_;
+    return value;
+  });
+  if (!all.IsKnown()) return kUnknownValue;
+  return {types_.ArgOf(types_.TypesOf(all.set)[0], index), Value::kGuessed | Value::kOpen};
+}
+
+// A tuple of what each is given.
+Value Inference::GuessParameters(FunctionId id) {
   const FunctionInfo info = functions_[id];
   const std::vector<ExprPlace> calls = callers_->CallsOf(info);
   std::vector<Value> parameters(ParametersOf(info).size());
@@ -122,14 +134,9 @@ Value Inference::GuessedParameter(FunctionId id, size_t index) {
         parameters[i] = types_.Union(parameters[i], given[i]);
     }
   }
-  --guess_depth_;
-  const bool is_whole = steps_ > 0;
-  for (size_t i = 0; i < parameters.size(); ++i) {
-    Value& value = parameters[i];
-    value.doubt |= Value::kGuessed | Value::kOpen;
-    if (is_whole) guesses_[uint64_t{id} << 16 | i] = value;
-  }
-  return index < parameters.size() ? parameters[index] : kUnknownValue;
+  std::vector<TypeSetId> sets;
+  for (const Value& value : parameters) sets.push_back(value.Packed());
+  return Just(types_.Add(TypeKind::kTuple, 0, 0, sets));
 }
 
 Value Inference::StatedResult(FunctionId id, FrameId frame, bool& is_stated) {
@@ -143,7 +150,7 @@ Value Inference::StatedResult(FunctionId id, FrameId frame, bool& is_stated) {
   is_stated = true;
   const bool is_generator = (info.flags & kIsGenerator) != 0;
   if ((info.flags & kIsAsync) != 0 && !is_generator && !(file->is_stub && (info.flags & kIsAsync) == 0))
-    value = InstanceNamed("typing", "Coroutine", {kNoTypes, kNoTypes, value.set});
+    value = InstanceNamed("typing", "Coroutine", {kNoTypes, kNoTypes, value.Packed()});
   return value;
 }
 
@@ -219,6 +226,7 @@ Value Inference::ReturnedIn(FunctionId id, FrameId frame) {
     const auto exprs = syntax.ExprsOf(at);
     has_return = true;
     value = types_.Union(value, exprs.empty() ? NoneValue() : ValueOf(info.file, exprs[0], frame));
+    if (IsInVain(value)) return kUnknownValue;
   }
   if (has_return) return value;
   // One that always raises, or that a subclass has to write, says nothing.
@@ -244,11 +252,13 @@ Value Inference::YieldedIn(FunctionId id, FrameId frame) {
     const ExprId given = syntax.ChildOf(expr, 0);
     const Value one = given == kNoExpr ? NoneValue() : ValueOf(info.file, given, frame);
     value = types_.Union(value, at.kind == ExprKind::kYieldFrom ? IterationOf(one) : one);
+    if (IsInVain(value)) return kUnknownValue;
   }
   return value;
 }
 
 Value Inference::ResultIn(FunctionId id, FrameId frame) {
+  const InFrame in_frame(*this, frame);
   return Remembered(results_, KeyOf(0, id, frame), [&]() -> Value {
     bool is_stated = false;
     const Value stated = StatedResult(id, frame, is_stated);
@@ -259,10 +269,10 @@ Value Inference::ResultIn(FunctionId id, FrameId frame) {
     const Value returned = ReturnedIn(id, frame);
     if ((flags & kIsGenerator) != 0) {
       const Value yielded = YieldedIn(id, frame);
-      if ((flags & kIsAsync) != 0) return InstanceNamed("typing", "AsyncGenerator", {yielded.set, kNoTypes});
-      return InstanceNamed("typing", "Generator", {yielded.set, kNoTypes, returned.set});
+      if ((flags & kIsAsync) != 0) return InstanceNamed("typing", "AsyncGenerator", {yielded.Packed(), kNoTypes});
+      return InstanceNamed("typing", "Generator", {yielded.Packed(), kNoTypes, returned.Packed()});
     }
-    if ((flags & kIsAsync) != 0) return InstanceNamed("typing", "Coroutine", {kNoTypes, kNoTypes, returned.set});
+    if ((flags & kIsAsync) != 0) return InstanceNamed("typing", "Coroutine", {kNoTypes, kNoTypes, returned.Packed()});
     return returned;
   });
 }
@@ -272,20 +282,23 @@ Value Inference::ResultOfFunction(FunctionId function) { return ResultIn(functio
 FrameId Inference::FrameOf(FunctionId function, FrameId outer, std::vector<Value> parameters) {
   const bool is_empty = std::ranges::none_of(parameters, [](Value value) { return value.IsKnown(); });
   if (is_empty && outer == kNoFrame) return kNoFrame;
-  const int depth = frames_[outer].depth + 1;
-  if (frames_.size() >= kMaxFrames || depth > kMaxFrameDepth) return kNoFrame;
+  const bool is_open = std::ranges::any_of(parameters, [](Value value) { return value.doubt != 0; });
+  if (guess_level_ == kMaxGuesses && is_open && outer == kNoFrame) return kNoFrame;  // nothing sure comes of it
+  const int depth = frames_[outer].depth + 1, calls = frames_[frame_].calls + 1;
+  if (frames_.size() >= kMaxFrames || depth > kMaxFrameDepth || calls > kMaxCalls) return kNoFrame;
   uint32_t& count = frame_counts_[function];
-  uint64_t hash = uint64_t{function} * 0x9E3779B97F4A7C15u + outer;
+  uint64_t hash = (uint64_t{function} * 0x9E3779B97F4A7C15u + outer) * 8 + static_cast<uint64_t>(calls);
   for (const Value& value : parameters)
     hash = (hash ^ value.set ^ uint64_t{value.doubt} << 40) * 0x9E3779B97F4A7C15u + 1;
   std::vector<FrameId>& same = frames_by_hash_[hash];
   for (const FrameId frame : same)
-    if (frames_[frame].function == function && frames_[frame].outer == outer && frames_[frame].parameters == parameters)
+    if (frames_[frame].function == function && frames_[frame].outer == outer && frames_[frame].calls == calls &&
+        frames_[frame].parameters == parameters)
       return frame;
   if (count >= kMaxFramesOfFunction) return kNoFrame;
   ++count;
   const auto frame = static_cast<FrameId>(frames_.size());
-  frames_.push_back({function, outer, depth, std::move(parameters)});
+  frames_.push_back({function, outer, depth, calls, std::move(parameters)});
   same.push_back(frame);
   return frame;
 }

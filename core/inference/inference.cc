@@ -22,28 +22,32 @@ void Inference::Clear() {
   classes_by_name_.clear();
   frames_by_hash_.clear();
   frame_counts_.clear();
-  values_.Clear();
-  bindings_.Clear();
-  results_.Clear();
-  hints_.Clear();
+  for (Memos* memos : {&values_, &bindings_, &results_, &hints_, &guesses_}) *memos = {};
   module_names_.clear();
-  guesses_.clear();
   imports_of_foreign_.clear();
   kept_.clear();
   texts_ = TextArena();
   depth_ = 0;
-  guess_depth_ = 0;
-  shallowest_cycle_ = INT32_MAX;
+  max_depth_ = kMaxDepth;
+  guess_level_ = surface_ = 0;
+  lowest_ = INT32_MAX;
+  needs_level_ = is_unsettled_ = has_met_nothing_ = is_finding_cuts_ = false;
+  finding_.clear();
+  for_now_.clear();
+  cuts_.clear();
 }
 
 size_t Inference::ByteSize() const {
   static constexpr size_t kBytesOfANode = 56;  // of a map of small values, with its memory's head
-  const size_t nodes =
-      guesses_.size() + classes_by_place_.size() + functions_by_place_.size() + 3 * frames_by_hash_.size();
+  size_t bytes = 0;
+  for (const Memos* memos : {&values_, &bindings_, &results_, &hints_, &guesses_}) {
+    bytes += memos->known.ByteSize();
+    for (const MemosOfLevel& level : memos->levels) bytes += level.found.ByteSize();
+  }
+  const size_t nodes = classes_by_place_.size() + functions_by_place_.size() + 3 * frames_by_hash_.size();
   static constexpr size_t kBytesOfAClass = 4096;  // with its members
   return nodes * kBytesOfANode + frames_.size() * 4 * sizeof(Frame) + functions_.size() * sizeof(FunctionInfo) +
-         classes_.size() * kBytesOfAClass + types_.ByteSize() + texts_.byte_size() + values_.ByteSize() +
-         bindings_.ByteSize() + results_.ByteSize() + hints_.ByteSize();
+         classes_.size() * kBytesOfAClass + types_.ByteSize() + texts_.byte_size() + bytes;
 }
 
 Text Inference::Kept(Text text) {

@@ -14,6 +14,7 @@
 // (parameters and results), calls.cc, annotations.cc, expressions.cc, entities.cc (what a name stands for).
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <deque>
 #include <functional>
@@ -179,8 +180,12 @@ class Inference {
   // Forgets everything, after a file changed.
   void Clear();
   // Begins a question: steps are counted anew.
-  void Begin() { steps_ = kMaxSteps; }
-  bool IsExhausted() const { return steps_ == 0; }
+  void Begin() {
+    steps_ = kMaxSteps;
+    guess_steps_ = kMaxGuessSteps;
+    cut_rounds_ = 0;
+  }
+  bool IsExhausted() const { return steps_ == 0 || guess_steps_ == 0; }
   // Of what is remembered, roughly.
   size_t ByteSize() const;
   void set_callers(CallerSource* callers) { callers_ = callers; }
@@ -275,23 +280,48 @@ class Inference {
 
  private:
   static constexpr uint32_t kMaxSteps = 10'000;
+  static constexpr uint32_t kMaxGuessSteps = 4'000;
   static constexpr int kMaxDepth = 150;
   static constexpr size_t kMaxFrames = 20'000;
   static constexpr int kMaxFrameDepth = 10;
+  // Calls whose results are found by what they are given, inside of one another.
+  static constexpr int kMaxCalls = 3;
   static constexpr uint32_t kMaxFramesOfFunction = 32;
 
   struct Frame {
     FunctionId function = kNoId;
     FrameId outer = kNoFrame;
     int depth = 0;
+    int calls = 0;  // of which this is the innermost
     std::vector<Value> parameters;
   };
+  // What was found (remembered.h).
   struct Memo {
-    static constexpr int16_t kNone = -1;
-
-    TypeSetId set = kNoTypes;
-    int16_t depth = kNone;  // while it is being found: how deep; 0 when it is there, kNone when it is not
-    uint8_t doubt = 0;
+    enum State : uint8_t { kNone, kBeingFound, kForNow, kKnown };
+    Value value;
+    int at = 0;  // being found: its number in finding_; good for now: the lowest number that it was found by way of
+    State state = kNone;
+    bool needs_level = false;
+  };
+  struct MemosOfLevel {
+    NumberMap<Memo> found;
+    std::unordered_map<uint64_t, Value> assumed;
+  };
+  // How many guesses are made for the sake of one another.
+  static constexpr int kMaxGuesses = 3;
+  struct Memos {
+    NumberMap<Value> known;
+    // By how many guesses are around: what is being found, and what came out otherwise if there were more.
+    std::array<MemosOfLevel, kMaxGuesses + 1> levels;
+  };
+  struct Finding {
+    Value assumed;
+    bool is_met = false;
+  };
+  struct Found {
+    Memos* memos = nullptr;
+    uint64_t key = 0;
+    int level = 0;
   };
   struct ModuleNames {
     std::unordered_map<Text, uint32_t> symbols;  // that the module's scope binds
@@ -300,10 +330,31 @@ class Inference {
     std::vector<Text> all;  // `__all__`
   };
 
-  // What `find()` gives, remembered in `memos`. What is met again while it is being found is nothing then, and what
-  // was found by way of that is not remembered.
+  // The frame in which something is evaluated, while this lives.
+  class InFrame;
+  // ---- remembered.h, remembered.cc ----
+  // What `find()` gives, found once.
   template <class Find>
-  Value Remembered(NumberMap<Memo>& memos, uint64_t key, Find&& find);
+  Value Remembered(Memos& memos, uint64_t key, const Find& find);
+  // What is known surely, with what was guessed of it.
+  Value Guess(Value sure, Value guessed);
+  // What was found for now from here on is known, or is to be found anew.
+  void Settle(size_t first, bool needs_level, bool is_open);
+  void ForgetForNow(size_t first);
+  // Finds what was cut; whether anything was found.
+  bool FindCuts();
+  void FindCut(const Found& what);
+  // Whether nothing more has to be found of what is to be found surely.
+  bool IsInVain(Value value) const {
+    return guess_level_ == kMaxGuesses && value.doubt != 0 && (value.doubt & Value::kNotYet) == 0 && !IsForeign(value);
+  }
+  // Whether it comes from a module that is not there, and nothing else is known of it.
+  bool IsForeign(Value value) const {
+    const auto types = types_.TypesOf(value.set);
+    return types.size() == 1 && types_[types[0]].kind == TypeKind::kForeign;
+  }
+  // What is found while this lives is found as if nothing else were being found.
+  class Afresh;
 
   // ---- expressions.cc ----
   Value Evaluate(const SourceFile& file, ExprId expr, FrameId frame);
@@ -393,6 +444,7 @@ class Inference {
   int IsReached(const SourceFile& file, StmtId stmt, StmtId function, FrameId frame);
   Value YieldedIn(FunctionId function, FrameId frame);
   Value GuessedParameter(FunctionId function, size_t index);
+  Value GuessParameters(FunctionId function);
   Value SelfOf(const FunctionInfo& info);
   // ---- docstrings.cc ----
   Value ValueInDocstring(const FunctionInfo& info, Text name);
@@ -430,20 +482,32 @@ class Inference {
   std::unordered_map<std::string, ClassId> classes_by_name_;
   std::unordered_map<uint64_t, std::vector<FrameId>> frames_by_hash_;
   std::unordered_map<FunctionId, uint32_t> frame_counts_;
-  NumberMap<Memo> values_;    // of expressions, by file, expression and frame
-  NumberMap<Memo> bindings_;  // of bound names, by file, offset and frame
-  NumberMap<Memo> results_;   // of functions, by function and frame
-  NumberMap<Memo> hints_;
+  Memos values_;    // of expressions, by file, expression and frame
+  Memos bindings_;  // of bound names, by file, offset and frame
+  Memos results_;   // of functions, by function and frame
+  Memos hints_;     // of annotations, by file and expression
+  Memos guesses_;   // of parameters, as a tuple, by function
   std::unordered_map<FileId, ModuleNames> module_names_;
-  std::unordered_map<uint64_t, Value> guesses_;
   std::unordered_map<uint32_t, Binding> imports_of_foreign_;  // by the number of the name
   TextArena texts_;
   std::unordered_set<Text> kept_;  // of texts_
   uint32_t steps_ = kMaxSteps;
+  uint32_t guess_steps_ = kMaxGuessSteps;
   int depth_ = 0;
-  int shallowest_cycle_ = INT32_MAX;  // the depth of what is being found that was met again
-  int guess_depth_ = 0;
+  int max_depth_ = kMaxDepth;
+  int guess_level_ = 0;           // how many guesses are being made
+  int lowest_ = INT32_MAX;        // the number of what is being found that was met again; surface_ for a cut
+  int surface_ = 0;               // what has a number up to this is being found for another purpose
+  bool needs_level_ = false;      // whether more guesses could have found more
+  bool is_unsettled_ = false;     // whether something is not what it was assumed to be
+  bool has_met_nothing_ = false;  // whether something was met of which nothing has been found yet
+  bool is_finding_cuts_ = false;
+  int cut_rounds_ = 0;  // of this question
+  std::vector<Finding> finding_;
+  std::vector<Found> for_now_;  // in the order in which they were found
+  std::vector<Found> cuts_;
   int class_depth_ = 0;
+  FrameId frame_ = kNoFrame;  // in which something is being evaluated
 };
 
 }  // namespace quillet

@@ -29,7 +29,9 @@ TypeId TypeTable::Add(TypeKind kind, uint32_t a, uint32_t b, std::span<const Typ
     if (Same(*known, kind, a, b, args)) return *known;
   const auto id = static_cast<TypeId>(types_.size());
   const std::vector<TypeSetId> copy(args.begin(), args.end());  // `args` may be a view of args_
-  types_.push_back({kind, a, b, static_cast<uint32_t>(args_.size()), static_cast<uint32_t>(copy.size())});
+  bool has_open = false;
+  for (const TypeSetId arg : copy) has_open = has_open || arg == kNoTypes || (arg & kOpenSet) != 0 || HasOpen(arg);
+  types_.push_back({kind, a, b, static_cast<uint32_t>(args_.size()), static_cast<uint32_t>(copy.size()), has_open});
   args_.insert(args_.end(), copy.begin(), copy.end());
   types_by_hash_.Put(hash, id);
   return id;
@@ -58,19 +60,26 @@ TypeSetId TypeTable::SetOf(std::span<const TypeId> types) {
   return id;
 }
 
+bool TypeTable::HasOpen(TypeSetId set) const {
+  return std::ranges::any_of(TypesOf(set), [&](TypeId type) { return types_[type].has_open; });
+}
+
 TypeSetId TypeTable::Union(TypeSetId a, TypeSetId b) {
-  if (a == b || b == kNoTypes) return a;
-  if (a == kNoTypes) return b;
+  const TypeSetId open = (a | b) & kOpenSet;
+  a = WithoutOpen(a);
+  b = WithoutOpen(b);
+  if (a == b || b == kNoTypes) return a | open;
+  if (a == kNoTypes) return b | open;
   if (a > b) std::swap(a, b);
   const uint64_t key = uint64_t{a} << 32 | b;
-  if (const TypeSetId* known = unions_.Find(key)) return *known;
+  if (const TypeSetId* known = unions_.Find(key)) return *known | open;
   const auto first = TypesOf(a);
   std::vector<TypeId> all(first.begin(), first.end());
   const auto more = TypesOf(b);
   all.insert(all.end(), more.begin(), more.end());
   const TypeSetId set = SetOf(all);
   unions_.Put(key, set);
-  return set;
+  return set | open;
 }
 
 Value TypeTable::Union(Value a, Value b) {

@@ -17,6 +17,9 @@ namespace quillet {
 using TypeId = uint32_t;
 using TypeSetId = uint32_t;
 inline constexpr TypeSetId kNoTypes = 0;
+// Of the number of a set that a type has as an argument: it may hold others, too.
+inline constexpr TypeSetId kOpenSet = TypeSetId{1} << 31;
+inline constexpr TypeSetId WithoutOpen(TypeSetId set) { return set & ~kOpenSet; }
 
 // Behind each kind what `a` and `b` are, and the arguments.
 enum class TypeKind : uint8_t {
@@ -40,6 +43,7 @@ struct Type {
   uint32_t b = 0;
   uint32_t args_begin = 0;
   uint32_t args_count = 0;
+  bool has_open = false;  // some argument of it, or of one, is open
 };
 
 // What an expression may be.
@@ -47,10 +51,17 @@ struct Value {
   enum Doubt : uint8_t {
     kOpen = 1,     // it may be something else too: something on the way is not known
     kGuessed = 2,  // inferred from uses, such as the calls of a function
+    kNotYet = 4,   // found by way of something of which nothing has been found yet
   };
-  TypeSetId set = kNoTypes;
+  TypeSetId set = kNoTypes;  // never with kOpenSet, which is a doubt
   uint8_t doubt = 0;
 
+  constexpr Value() = default;
+  constexpr Value(TypeSetId types, uint8_t doubts)
+      : set(WithoutOpen(types)), doubt(static_cast<uint8_t>(doubts | ((types & kOpenSet) != 0 ? kOpen : 0))) {}
+
+  // As the argument of a type.
+  TypeSetId Packed() const { return set | (doubt != 0 ? kOpenSet : 0); }
   bool IsKnown() const { return set != kNoTypes; }
   friend bool operator==(const Value&, const Value&) = default;
 };
@@ -97,17 +108,21 @@ class TypeTable {
     return std::span(args_).subspan(types_[type].args_begin, types_[type].args_count);
   }
   TypeSetId ArgOf(TypeId type, size_t i) const {
-    return i < types_[type].args_count ? args_[types_[type].args_begin + i] : kNoTypes;
+    const TypeSetId set = i < types_[type].args_count ? args_[types_[type].args_begin + i] : kNoTypes;
+    return set == kNoTypes ? kOpenSet : set;  // what is not said may be anything
   }
 
   TypeSetId SetOf(TypeId type) { return SetOf(std::span(&type, 1)); }
   TypeSetId SetOf(std::span<const TypeId> types);  // in any order, repeated or not
   // Valid until the next set is added: copy where evaluation goes on.
   std::span<const TypeId> TypesOf(TypeSetId set) const {
-    return std::span(members_).subspan(sets_[set].begin, sets_[set].count);
+    const Set& found = sets_[WithoutOpen(set)];
+    return std::span(members_).subspan(found.begin, found.count);
   }
   TypeList CopyOf(TypeSetId set) const { return TypeList(TypesOf(set)); }
-  size_t SizeOf(TypeSetId set) const { return sets_[set].count; }
+  size_t SizeOf(TypeSetId set) const { return sets_[WithoutOpen(set)].count; }
+  // Whether an argument of a type of it, or of one, is open.
+  bool HasOpen(TypeSetId set) const;
   TypeSetId Union(TypeSetId a, TypeSetId b);
   Value Union(Value a, Value b);
 

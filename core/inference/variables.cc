@@ -133,6 +133,7 @@ const Inference::ModuleNames& Inference::NamesOfModule(const SourceFile& file) {
   const auto [at, is_new] = module_names_.try_emplace(file.id);
   ModuleNames& names = at->second;
   if (!is_new) return names;
+  const Afresh afresh(*this, kMaxDepth / 4);
   const Bindings& bindings = file.bindings;
   for (uint32_t symbol = bindings.scopes[0].first_symbol; symbol != kNoIndex; symbol = bindings.symbols[symbol].next) {
     const auto indices = file.occurrences().Of(symbol);
@@ -404,7 +405,10 @@ Value Inference::ValueOfName(const SourceFile& file, uint32_t index, FrameId fra
 
 Value Inference::ValueOfBindings(std::span<const Binding> bindings, FrameId frame) {
   Value value;
-  for (const Binding& binding : bindings) value = types_.Union(value, ValueOfBinding(binding, frame));
+  for (const Binding& binding : bindings) {
+    value = types_.Union(value, ValueOfBinding(binding, frame));
+    if (IsInVain(value)) return kUnknownValue;
+  }
   return value;
 }
 
@@ -460,6 +464,7 @@ Value Inference::ValueOfBinding(Binding binding, FrameId frame) {
   const uint32_t index = file->OccurrenceBeginningAt(binding.offset);
   if (index == kNoIndex) return kUnknownValue;
   const FrameId own = FrameFor(*file, file->bindings.ScopeOf(file->bindings.occurrences[index]), frame);
+  const InFrame in_frame(*this, own);
   return Remembered(bindings_, KeyOf(binding.file, binding.offset, own),
                     [&] { return FindValueOfBinding(*file, binding.offset, own); });
 }
@@ -672,7 +677,7 @@ Value Inference::Unpack(const SourceFile& file, ExprId target, ExprId root, Valu
           Value rest;
           for (size_t i = star; i + behind < items.size(); ++i)
             rest = types_.Union(rest, ValueOf(file.id, items[i], frame));
-          value = InstanceNamed("builtins", "list", {WithoutLiterals(rest).set});
+          value = InstanceNamed("builtins", "list", {WithoutLiterals(rest).Packed()});
           source.expr = kNoExpr;
         }
         container = child;
@@ -698,13 +703,13 @@ Value Inference::Unpack(const SourceFile& file, ExprId target, ExprId root, Valu
         Value rest;
         const size_t behind = targets.size() - star - 1;
         for (size_t i = star; i + behind < t.args_count; ++i) rest = types_.Union(rest, Value{types_.ArgOf(id, i), 0});
-        item = types_.Union(item, InstanceNamed("builtins", "list", {rest.set}));
+        item = types_.Union(item, InstanceNamed("builtins", "list", {rest.Packed()}));
       } else if (t.kind == TypeKind::kInstance && star == SIZE_MAX && InfoOf(t.a).is_named_tuple &&
                  index < MembersOf(t.a).fields.size()) {
         item = types_.Union(item, AttributeOfType(id, MembersOf(t.a).fields[index].name));
       } else {
         const Value items = IterationOf(Just(id));
-        item = types_.Union(item, index == star ? InstanceNamed("builtins", "list", {items.set}) : items);
+        item = types_.Union(item, index == star ? InstanceNamed("builtins", "list", {items.Packed()}) : items);
       }
     }
     value = item;
@@ -826,7 +831,7 @@ Value Inference::ValueOfTarget(const SourceFile& file, ExprId target, FrameId fr
     case StmtKind::kExcept: {
       const Value caught = exprs.empty() ? kUnknownValue : Caught(ValueOf(file.id, exprs[0], frame));
       if ((stmt.flags & kExceptGroup) == 0) return caught;
-      Value group = InstanceNamed("builtins", "ExceptionGroup", {caught.set});
+      Value group = InstanceNamed("builtins", "ExceptionGroup", {caught.Packed()});
       group.doubt |= caught.doubt;
       return group;
     }
@@ -885,7 +890,7 @@ Value Inference::ValueOfPattern(const SourceFile& file, ExprId pattern, FrameId 
           item = types_.Union(item, IterationOf(Just(id)));
         }
       }
-      return syntax[pattern].kind == ExprKind::kPatternStar ? InstanceNamed("builtins", "list", {item.set}) : item;
+      return syntax[pattern].kind == ExprKind::kPatternStar ? InstanceNamed("builtins", "list", {item.Packed()}) : item;
     }
     case ExprKind::kPatternMapping: {
       const Value whole = ValueOfPattern(file, parent, frame);
@@ -1007,8 +1012,9 @@ Value Inference::ItemsPutInto(const SourceFile& file, ExprId target) {
   if (!is_known) return kUnknownValue;
   keys = WithoutLiterals(keys);
   items = WithoutLiterals(items);
-  if (cls == "dict") return InstanceNamed("builtins", "dict", {keys.set, items.set});
-  return InstanceNamed("builtins", cls, {items.set});
+  // Others may put something into it.
+  if (cls == "dict") return InstanceNamed("builtins", "dict", {keys.set | kOpenSet, items.set | kOpenSet});
+  return InstanceNamed("builtins", cls, {items.set | kOpenSet});
 }
 
 }  // namespace quillet

@@ -7,7 +7,7 @@
 namespace quillet {
 
 std::string Workspace::Impl::TextOfSet(TypeSetId set, bool is_short, int depth) {
-  if (set == kNoTypes) return is_short ? "Any" : "typing.Any";
+  if (WithoutOpen(set) == kNoTypes) return is_short ? "Any" : "typing.Any";
   std::vector<std::string> parts;
   bool has_none = false;
   for (const TypeId id : inference.types().CopyOf(set)) {
@@ -20,6 +20,7 @@ std::string Workspace::Impl::TextOfSet(TypeSetId set, bool is_short, int depth) 
     if (std::ranges::find(parts, text) == parts.end()) parts.push_back(std::move(text));
   }
   std::ranges::sort(parts);
+  parts.erase(std::ranges::unique(parts).begin(), parts.end());
   if (has_none) parts.push_back("None");
   if (parts.empty()) return is_short ? "Any" : "typing.Any";
   std::string text;
@@ -47,7 +48,8 @@ std::string Workspace::Impl::TextOfType(TypeId id, bool is_short, int depth) {
   };
   const auto with_args = [&](std::string name) {
     bool has_any = false;
-    for (size_t i = 0; i < t.args_count; ++i) has_any = has_any || inference.types().ArgOf(id, i) != kNoTypes;
+    for (size_t i = 0; i < t.args_count; ++i)
+      has_any = has_any || WithoutOpen(inference.types().ArgOf(id, i)) != kNoTypes;
     return has_any ? name + "[" + args(0) + "]" : name;
   };
   switch (t.kind) {

@@ -396,7 +396,7 @@ TEST(Inference, EndsInRings) {
   Check({
       {"x = x\n$x\n", {""}},
       {"a = b\nb = a\n$a\n", {""}},
-      {"def f(x): return [f(x)]\n$a = f(1)\n", {"list"}},
+      {"def f(x): return [f(x)]\n$a = f(1)\n", {"list[list[list[list[...]]]]"}},
       {"class A(B): x = 1\nclass B(A): pass\nB().$x\n", {"int"}},
       {"class A:\n  def m(self):\n    self.x = self.m()\n    return self.x\nA().$x\n", {""}},
       {"x = 1\nfor i in g():\n  x = x + 1\n$x\n", {"int"}},

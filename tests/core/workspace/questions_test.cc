@@ -211,6 +211,55 @@ TEST(References, OfOtherClassesAreNeverCertain) {
             (Words{"a.py:2:7", "a.py:4:26"}));
 }
 
+TEST(References, OfItemsThatMayBeSomethingElseAreNotCertain) {
+  const std::string head = "class A:\n  def $m(self): pass\ndef f(x):\n";
+  for (const char* use : {"  for y in (A(), x): y.m()\n", "  [A(), x][1].m()\n", "  {'a': A(), **x}['b'].m()\n",
+                          "  {A(), x}.pop().m()\n", "  y = []\n  y.append(A())\n  y[0].m()\n",
+                          "  for y in [z for z in [A(), x]]: y.m()\n", "  a, *b = A(), A(), x\n  b[0].m()\n"}) {
+    const std::vector<std::string> said = Program(head + use).References();
+    ASSERT_EQ(said.size(), 2u) << use;
+    EXPECT_TRUE(said[1].ends_with(" likely")) << use << said[1];
+  }
+  for (const char* use : {"  for y in (A(), A()): y.m()\n", "  [A()][0].m()\n", "  (x, A())[1].m()\n"}) {
+    const std::vector<std::string> said = Program(head + use).References();
+    ASSERT_EQ(said.size(), 2u) << use;
+    EXPECT_FALSE(said[1].ends_with(" likely")) << use << said[1];
+  }
+}
+
+TEST(Definitions, AreAsSureWhateverWasAskedBefore) {
+  // Each of them is found by way of another.
+  const std::string text =
+      "class Node:\n"
+      "  def __init__(self): self.next = Node()\n"
+      "  def last(self): return self.next.last() if self.next else self\n"
+      "  def m(self): return self\n"
+      "def a(n): return b(n) if n else Node()\n"
+      "def b(n): return c(n).last() if n else Node()\n"
+      "def c(n): return a(n).$m() if n else b(n).next\n"
+      "x = Node()\n"
+      "while x:\n"
+      "  x = x.next\n"
+      "  x.$m()\n"
+      "a(1).$m()\n"
+      "b(1).$m()\n"
+      "c(1).$m()\n"
+      "x.last().$m()\n";
+  std::vector<std::string> first;
+  for (size_t begin = 0; begin < 6; ++begin) {
+    Program program(text);
+    std::vector<std::string> said(6);
+    for (size_t i = 0; i < 6; ++i) {
+      const size_t at = (begin + i) % 6;
+      const Words found = program.Definitions(at);
+      said[at] = found.empty() ? "" : found.front();
+    }
+    if (first.empty()) first = said;
+    EXPECT_EQ(said, first) << begin;
+  }
+  EXPECT_EQ(first, std::vector<std::string>(6, "a.py:4:7"));
+}
+
 TEST(References, OfKeywordsAreThoseOfTheFunctionThatIsCalled) {
   EXPECT_EQ(Program("def f($x): pass\ndef g(x): pass\nf(x=1)\ng(x=1)\n").References(), (Words{"a.py:1:7", "a.py:3:3"}));
   EXPECT_EQ(Program("class A:\n  def __init__(self, $x): self.x = x\nA(x=1).x\n").References(),
