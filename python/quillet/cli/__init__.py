@@ -42,6 +42,11 @@ def _run(given: list[str]) -> None:
             from quillet.cli.find import ask
 
             sys.exit(ask(**parameters))
+    # Loading what reads options takes longer than all else that is done for a plain one.
+    if given[:1] == ["serve"] and set(given[1:]) <= {"--stdio"} and "_QUILLET_COMPLETE" not in os.environ:
+        from quillet.cli.serve import run
+
+        sys.exit(run(None))
     import click
 
     from quillet.cli.commands import group
