@@ -52,15 +52,18 @@ void Workspace::Impl::Forget() {
 }
 
 void Workspace::Impl::Begin() {
-  // What is asked in one breath is asked of the same files.
-  static constexpr auto kBreath = std::chrono::milliseconds(30);
+  // What is asked in one breath is asked of the same files. Where many were read, a look at all of them takes long, and
+  // breaths are as much longer.
+  static constexpr std::chrono::steady_clock::duration kBreath = std::chrono::milliseconds(30);
+  static constexpr int kBreathOfLooks = 25;
   const auto now = std::chrono::steady_clock::now();
-  if (now - last_refresh_ > kBreath) {
-    last_refresh_ = now;
+  if (now - last_refresh_ > std::max(kBreath, last_look_ * kBreathOfLooks)) {
     defined.Forget();
     const bool has_changed = files.Refresh();
     const bool has_come_or_gone = project.Refresh() | modules.Refresh();
     if (has_changed || has_come_or_gone) Forget();
+    last_refresh_ = std::chrono::steady_clock::now();
+    last_look_ = last_refresh_ - now;
   }
   GiveBack();
   if (inference.ByteSize() > kMaxRemembered) {

@@ -163,6 +163,7 @@ class Workspace::Impl final : public CallerSource {
   static constexpr size_t kMaxRemembered = size_t{64} << 20;
 
   std::chrono::steady_clock::time_point last_refresh_{};
+  std::chrono::steady_clock::duration last_look_{};  // how long it took
   std::unordered_map<std::string, std::vector<ExprPlace>> calls_by_name_;
   std::unordered_map<std::string, bool> common_;
 };
