@@ -177,6 +177,7 @@ void Workspace::Open(FileId file, std::string text) {
 
 void Workspace::Change(FileId file, uint32_t begin, uint32_t end, Text text) {
   impl_->files.Change(file, begin, end, text);
+  impl_->ForgetCalls();
   impl_->inference.Clear();
   impl_->ForgetPlaces();
 }

@@ -25,6 +25,8 @@ class Workspace::Impl final : public CallerSource {
   // Begins a question: files that changed are read again.
   void Begin();
   void Forget();
+  // Where functions are called, by numbers of expressions: of no text but the one that they were found in.
+  void ForgetCalls() { calls_by_name_.clear(); }
   const SourceFile* Get(FileId file) { return files.Get(file); }
   // The bytes of a line from 1, without its end; (0, 0) for one in front of the file, its end for one behind.
   std::pair<uint32_t, uint32_t> LineAt(const SourceFile& file, int line);

@@ -25,7 +25,7 @@ from quillet.server.work import Job
 
 log = logging.getLogger(__name__)
 
-# How long what is under way may take to end when the client has gone.
+# How long what there is to do may take when the client has gone.
 _GRACE = 2.0
 _LOOK_AT_CLIENT = 1.0
 
@@ -116,7 +116,7 @@ class _Client:
             params = message.get("params")
             self._work.cancel(params.get("id") if isinstance(params, dict) else None)
         elif job.method == "exit":
-            self._work.end()
+            self._work.end(at_once=True)
         else:
             self._work.put(job)
 
@@ -135,7 +135,7 @@ class _Client:
         while _is_alive(process):
             time.sleep(_LOOK_AT_CLIENT)
         log.info("the client's process has ended")
-        self._work.end()
+        self._work.end(at_once=True)
         time.sleep(_GRACE)
         os._exit(1)
 

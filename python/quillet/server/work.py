@@ -100,11 +100,13 @@ class Work:
                     job.is_cancelled = True
                     return
 
-    def end(self) -> None:
-        """Nothing more will come, and nobody waits for what there is."""
+    def end(self, *, at_once: bool = False) -> None:
+        """Nothing more will come; `at_once` where nobody waits for what there is."""
         with self._changed:
             self._has_ended = True
-            self._stop(0)
+            if at_once:
+                self._jobs.clear()
+                self._stop(0)
             self._changed.notify()
 
     # ---- the main thread ----
@@ -141,12 +143,12 @@ class Work:
             self._running = None
             self._is_idle_work = False
             while True:
-                if self._has_ended:
-                    return None
                 if self._jobs:
                     self._running = self._jobs.popleft()
                     proceed()
                     return self._running
+                if self._has_ended:
+                    return None
                 now = time.monotonic()
                 due = min(self._later, key=lambda key: self._later[key][0], default=None)
                 if due is None:

@@ -102,6 +102,20 @@ TEST(Hints, SayWhatIsNotWrittenAndNotPlain) {
   EXPECT_TRUE(program->Hints(program.File("a.py"), 0, 1).empty());
 }
 
+TEST(Hints, AreThoseOfTheTextOfNow) {
+  std::string calls = "def f(a):\n  b = a\n  return b\n";
+  for (int i = 0; i < 200; ++i) calls += "f(x" + std::to_string(i) + ")\n";
+  Program program("");
+  const FileId file = program.File("a.py");
+  program->Open(file, calls);
+  program->Hints(file);
+  // What was called there is no more.
+  program->Change(file, 30, static_cast<uint32_t>(calls.size()), "\nf(1)\n");
+  const std::vector<InlineHint> hints = program->Hints(file);
+  ASSERT_EQ(hints.size(), 2u);
+  EXPECT_EQ(hints[0].text, " -> int");
+}
+
 TEST(Implementations, AreAllBelow) {
   Program program({
       {"a.py", "class $A:\n  def $m(self): pass\ndef $f(): pass\n"},

@@ -1,0 +1,1 @@
+"""Measurements of the language server; see __main__.py."""
