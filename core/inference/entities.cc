@@ -99,7 +99,16 @@ Entities Inference::EntitiesOf(const SourceFile& file, uint32_t index) {
             if (types_[function].kind == TypeKind::kFunction) add_parameter(types_[function].a);
       }
     }
-    if (result.found.empty()) result.doubt |= Value::kOpen;
+    if (result.found.empty()) {
+      // Handed on to a function that is given as well: `assertRaises(E, f, x=1)`, `partial(f, x=1)`.
+      result.doubt |= Value::kOpen;
+      for (const ExprId argument : syntax.ChildrenOf(call).subspan(1)) {
+        const ExprKind kind = syntax[argument].kind;
+        if (kind != ExprKind::kName && kind != ExprKind::kAttribute) continue;
+        for (const TypeId id : types_.CopyOf(ValueOf(file.id, argument).set))
+          if (types_[id].kind == TypeKind::kFunction) add_parameter(types_[id].a);
+      }
+    }
     return result;
   }
   if (named == kNoExpr || syntax[named].kind != ExprKind::kAttribute) return result;

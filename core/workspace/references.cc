@@ -252,6 +252,30 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
   return hits;
 }
 
+// A call of a parameter's function that is given keywords which its place does not spell, such as `f(**options)`.
+Binding Workspace::Impl::CallWithUnseenKeywords(const Entity& entity) {
+  const SourceFile* owner = entity.kind == Entity::kVariable ? Get(entity.a) : nullptr;
+  if (owner == nullptr || (owner->bindings.symbols[entity.b].uses & NameSymbol::kParameter) == 0) return {};
+  const FunctionId function = inference.FunctionOfScope(*owner, owner->bindings.symbols[entity.b].scope);
+  if (function == kNoId) return {};
+  const FunctionInfo info = inference.function(function);
+  const auto parameters = inference.ParametersOf(info);
+  const Text name = owner->bindings.texts[owner->bindings.symbols[entity.b].name];
+  for (size_t i = 0; i < parameters.size(); ++i) {
+    const Expr& parameter = owner->syntax[parameters[i]];
+    if (owner->syntax.NameOf(parameters[i]) != name) continue;
+    const bool is_receiver = i == 0 && info.cls != kNoId && (info.flags & kIsStatic) == 0;
+    if (is_receiver || parameter.op != static_cast<uint8_t>(ParameterKind::kPlain)) return {};
+  }
+  for (const ExprPlace& call : CallsOf(info)) {
+    const SourceFile* file = Get(call.file);
+    if (file == nullptr || file->syntax[call.expr].kind != ExprKind::kCall) continue;
+    for (const ExprId argument : file->syntax.ChildrenOf(call.expr).subspan(1))
+      if (file->syntax[argument].kind == ExprKind::kDoubleStarred) return {call.file, file->syntax[argument].begin};
+  }
+  return {};
+}
+
 std::vector<Location> Workspace::References(FileId id, uint32_t offset, bool everywhere) {
   Impl& in = *impl_;
   in.Begin();
@@ -321,9 +345,27 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
     rename.problem = "nothing is known of what '" + old_name + "' stands for here";
     return rename;
   }
+  if (only_certain) {
+    for (const Entity& entity : wanted.found) {
+      const Binding call = in.CallWithUnseenKeywords(entity);
+      const SourceFile* source = call.file == kNoFile ? nullptr : in.Get(call.file);
+      if (source == nullptr) continue;
+      rename.problem = "'" + std::string(old_name) + "' may be given by '**' in " + source->path + ", at line " +
+                       std::to_string(source->PlaceOf(call.offset).line);
+      return rename;
+    }
+  }
   std::vector<Impl::Hit> hits = in.Uses(*file, index, true);
   for (const Impl::Hit& hit : hits) {
-    if (only_certain && hit.location.certainty != Certainty::kCertain) continue;
+    if (only_certain && hit.location.certainty != Certainty::kCertain) {
+      const SourceFile* source = hit.occurrence == kNoIndex ? nullptr : in.Get(hit.file);
+      // What is handed on by keyword fails without it.
+      if (source == nullptr || source->bindings.occurrences[hit.occurrence].role != NameRole::kKeyword) continue;
+      rename.problem = "'" + std::string(old_name) + "' may be given by keyword in " + source->path + ", at line " +
+                       std::to_string(source->PlaceOf(hit.location.begin).line);
+      rename.edits.clear();
+      return rename;
+    }
     if (!in.IsProject(hit.file) || hit.location.role == "module") continue;
     const Impl::Visit visit(in, hit.file);
     const SourceFile* source = visit.file;

@@ -86,6 +86,7 @@ class Workspace::Impl final : public CallerSource {
   bool Meets(const Entities& use, const std::vector<Entity>& targets, Certainty& certainty);
   bool IsCommonAttribute(Text name);
   void AddOtherSides(Entities& entities);
+  Binding CallWithUnseenKeywords(const Entity& entity);
   bool IsReceiverKnown(const SourceFile& file, const Occurrence& occurrence);
 
   // ---- describe.cc ----

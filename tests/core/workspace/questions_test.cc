@@ -308,6 +308,22 @@ Words Edited(Program& program, Text name, bool only_certain = true, size_t place
   return edits;
 }
 
+TEST(Renames, RefuseWhatMayBeGivenByUnseenKeywords) {
+  for (const char* text : {"def f(a, $b): return b\ndef g(**options): return f(1, **options)\ng(b=2)\n",
+                           "class A:\n  def m(self, $b): return b\nA().m(**{'b': 1})\n"}) {
+    Program program(text);
+    const Rename rename = program->RenameTo(program[0].file, program[0].offset, "other", true);
+    EXPECT_TRUE(rename.edits.empty()) << text;
+    EXPECT_NE(rename.problem.find("'b' may be given by '**' in "), std::string::npos) << rename.problem;
+    EXPECT_FALSE(program->RenameTo(program[0].file, program[0].offset, "other", false).edits.empty()) << text;
+  }
+  Program handed("def f($a): return a\ndef call(g, **given): return g(**given)\ncall(f, a=1)\n");
+  EXPECT_EQ(handed.References(), (Words{"a.py:1:7", "a.py:1:18", "a.py:3:9 likely"}));
+  EXPECT_TRUE(handed->RenameTo(handed[0].file, handed[0].offset, "other", true).edits.empty());
+  Program program("def f($a, *, b): return a\nf(a=1, b=2)\n");
+  EXPECT_EQ(program->RenameTo(program[0].file, program[0].offset, "other", true).edits.size(), 3u);
+}
+
 TEST(Renames, ChangeWhatIsCertain) {
   Program program({
       {"a.py", "class A:\n  def $only(self): pass\n__all__ = ['A']\n"},
