@@ -310,6 +310,14 @@ def test_a_client_that_understands_less(folder: Path) -> None:
         assert set(answer) == {"changes"}
 
 
+def test_progress_of_what_reads_the_program(client: Client) -> None:
+    begin = len(client.told)
+    client.Ask("workspace/symbol", {"query": "total", "workDoneToken": "mine"})
+    # It has ended when the answer comes.
+    told = [at["params"] for at in client.told[begin:] if at.get("method") == "$/progress"]
+    assert [(at["token"], at["value"]["kind"]) for at in told] == [("mine", "begin"), ("mine", "end")]
+
+
 # ---- settings ----
 
 

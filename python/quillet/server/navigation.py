@@ -63,7 +63,7 @@ def implementation(ls: Server, params: types.ImplementationParams) -> Any:
     return _places(ls, _sure(place.settings, place.workspace.implementations(*place.at)))
 
 
-@feature(types.TEXT_DOCUMENT_REFERENCES)
+@feature(types.TEXT_DOCUMENT_REFERENCES, types.ReferenceOptions(work_done_progress=True))
 def references(ls: Server, params: types.ReferenceParams) -> Any:
     place = ls.place(params)
     found = place.workspace.references(*place.at, at_least=place.settings.certainty)
@@ -90,7 +90,7 @@ def highlight(ls: Server, params: types.DocumentHighlightParams) -> Any:
 # ---- symbols ----
 
 
-@feature(types.WORKSPACE_SYMBOL)
+@feature(types.WORKSPACE_SYMBOL, types.WorkspaceSymbolOptions(work_done_progress=True))
 def workspace_symbol(ls: Server, params: types.WorkspaceSymbolParams) -> Any:
     uri_of = ls.documents.uri_of
     return [

@@ -9,7 +9,8 @@ from __future__ import annotations
 import json
 import logging
 import time
-from collections.abc import Callable
+from collections.abc import Callable, Iterator
+from contextlib import contextmanager
 from typing import Any, cast
 
 from lsprotocol import types
@@ -35,6 +36,16 @@ CONTENT_MODIFIED = -32801
 
 # What pygls does itself, and well.
 _OF_PYGLS = frozenset({"initialize", "initialized", "shutdown", "$/setTrace", "window/workDoneProgress/cancel"})
+
+# What reads all files of a program, the first time it is asked.
+_LONG = {
+    "textDocument/references": "Looking for references",
+    "textDocument/implementation": "Looking for implementations",
+    "textDocument/rename": "Looking for what is renamed",
+    "workspace/symbol": "Looking for symbols",
+    "callHierarchy/incomingCalls": "Looking for callers",
+    "typeHierarchy/subtypes": "Looking for subclasses",
+}
 
 
 class Again(Exception):
@@ -103,7 +114,8 @@ class Protocol(LanguageServerProtocol):
             self._is_initialized |= job.method == types.INITIALIZE
             return
         try:
-            result = handler(params)
+            with self._progress(job):
+                result = handler(params)
         except Stopped:
             if not job.is_cancelled and not job.is_outdated and job.makes_way:
                 raise Again from None
@@ -120,6 +132,21 @@ class Protocol(LanguageServerProtocol):
             self.fail(job.number, INTERNAL_ERROR, f"{job.method}: {type(error).__name__}: {error}")
         else:
             self.reply(job.number, result)
+
+    @contextmanager
+    def _progress(self, job: Job) -> Iterator[None]:
+        """Tells that a question is worked at that goes over the whole program, to a client that wants to be told."""
+        given = job.message.get("params")
+        token = given.get("workDoneToken") if job.method in _LONG and isinstance(given, dict) else None
+        if not isinstance(token, (int, str)):
+            yield
+            return
+        value = {"kind": "begin", "title": _LONG[job.method], "cancellable": True}
+        self.tell("$/progress", {"token": token, "value": value})
+        try:
+            yield
+        finally:
+            self.tell("$/progress", {"token": token, "value": {"kind": "end"}})
 
     def _untimely(self, job: Job) -> tuple[int, str] | None:
         """Why a request cannot be answered now, whatever it asks."""
