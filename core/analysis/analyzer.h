@@ -113,6 +113,8 @@ class CPGenAnalyzerImpl {
   // Errors that leave it its records: of a hint, the first one, and of what the compiler does not take.
   std::optional<SyntaxError> hint_error_;
   std::optional<SyntaxError> compile_error_;
+  // The one that leaves it nothing.
+  std::optional<SyntaxError> rejection_;
   bool was_rejected_ = false;
   const Version version_;
   bool spells_error_texts_ = true;

@@ -110,6 +110,8 @@ void BlockRules::Next(size_t index, const LineRow& row, const Reading& reading) 
 void BlockRules::End() {
   if (last_index_ == kNoRow || last_was_rejected_) return;
   const Context end = Context::Index(static_cast<int32_t>(last_.token_count));
+  if (version_.AtLeast(3, 8) && TokensOf(last_).back().code == tok::BACKSLASH)
+    return Add(last_index_, end, "unexpected EOF while parsing");
   if (head_index_ != kNoRow) {
     return Add(head_index_, end, "expected an indented block after " + NameOfHead(), true,
                SyntaxError::Kind::kIndentation);

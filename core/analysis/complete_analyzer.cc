@@ -50,10 +50,15 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeCompletely(LogicalLine& log
   typing_ = &typing;
   hint_error_.reset();
   compile_error_.reset();
+  rejection_.reset();
   was_rejected_ = true;
   try {
     logical.ClearDerivedInfo();
     InspectCompletely(logical, place);
+    if (rejection_) [[unlikely]] {
+      logical.ClearDerivedInfo();
+      return std::move(rejection_);
+    }
     was_rejected_ = false;
     return compile_error_ ? std::move(compile_error_) : std::move(hint_error_);
   } catch (const ParseError& error) {
@@ -96,7 +101,9 @@ void CPGenAnalyzerImpl::InspectCompletely(LogicalLine& logical, const LinePlace&
   if (logical.kind == LineKind::kComment) return WalkCompletely(nullptr, logical, place);
   const auto parse_completely = [&] {
     CNode* const parsed = complete_parser_->ParseStatement(logical, PlaceOfStatement(place));
-    if (const auto& postponed = complete_parser_->postponed())
+    if (const auto& failure = complete_parser_->failure())
+      rejection_ = ErrorAt(failure->message(), logical, failure->context);
+    else if (const auto& postponed = complete_parser_->postponed())
       compile_error_ = ErrorAt(postponed->message(), logical, postponed->context);
     return parsed;
   };
@@ -104,11 +111,11 @@ void CPGenAnalyzerImpl::InspectCompletely(LogicalLine& logical, const LinePlace&
   bool is_of_tables = !closer_look_->NeedsCompleteParser(logical);
   if (is_of_tables) {
     try {
-      tree = logical_parser_->ParseToNode(logical, place.in_async_def);
-      if (tree == nullptr) return;
+      tree = logical_parser_->TryParseToNode(logical, place.in_async_def);
     } catch (const ParseError&) {
-      is_of_tables = false;
+      // Of a shape that the tables do not see whole.
     }
+    is_of_tables = tree != nullptr;
   }
   if (!is_of_tables) {
     tree = parse_completely();

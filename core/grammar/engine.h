@@ -61,13 +61,18 @@ class Engine {
     entries_.Push({row_, Tables::kNoPrefix, 0});
   }
 
+  // A quiet engine throws nothing where the input is not acceptable: it takes no more of it, and gives no root.
+  void set_is_quiet(bool is_quiet) { is_quiet_ = is_quiet; }
+
   // ParseError with `context` where the token is not acceptable here (message "bad input"), is no
   // terminal of the grammar ("bad token") or stands behind the end ("too much input").
   void AddToken(Grammar::LabelId label, int type, const Token& token, int32_t context) {
     const Tables& tables = *tables_;
     const Cell cell = Descend(tables.column_of_label[label]);
-    if (cell >= Tables::kFirstSpecial) [[unlikely]]
+    if (cell >= Tables::kFirstSpecial) [[unlikely]] {
+      if (is_quiet_) return;
       ThrowUnacceptable(cell, tables.needed[pending_], type, token, context);
+    }
     const Move move = tables.moves[cell];
     if (!promote_ && move.enters) [[unlikely]]
       WrapUpTo(move.prefix);
@@ -85,6 +90,7 @@ class Engine {
   // The root, which is the caller's then; ParseError "incomplete input" where something is missing.
   Node Finish() {
     if (Descend(Tables::kEndColumn) != Tables::kComplete) {
+      if (is_quiet_) return Node{};
       throw ParseError("incomplete input", -1, kNoText, Context::None());
     }
     return children_.Pop();
@@ -213,6 +219,7 @@ class Engine {
 
   Builder builder_;
   const bool promote_;
+  bool is_quiet_ = false;
   const std::shared_ptr<const Tables> tables_;
   Row row_ = Tables::kDeadRow;  // where the parse stands
   // The row that the last cell was from: of a token that is not taken and, without promotion, of any.

@@ -48,16 +48,16 @@ class RestoredValue {
 
 template <class Rule>
 bool CompleteParser::Try(Rule&& rule) {
+  if (failed_) return false;
   const size_t mark = nodes_.size();
   const size_t start = at_;
   const size_t waits = waits_.size();
   const RestoredValue<bool> trying(is_trying_, true);
-  bool is_read = true;
-  try {
-    rule();
-  } catch (const ParseError&) {
-    is_read = false;
-  }
+  rule();
+  const bool is_read = !failed_;
+  failed_ = false;
+  failure_.reset();
+  codes_ = code_.data();
   for (size_t i = mark; i < nodes_.size(); ++i) factory_.pool().Reclaim(nodes_[i]);
   nodes_.resize(mark);
   waits_.resize(std::min(waits, waits_.size()));
@@ -68,6 +68,7 @@ bool CompleteParser::Try(Rule&& rule) {
 
 template <class T>
 void CompleteParser::FinishBare(size_t mark) {
+  if (failed_) return Collapse(mark);
   T* node = factory_.NewBare<T>();
   factory_.SetChildren(node, std::span<CNode* const>(nodes_).subspan(mark));
   nodes_.resize(mark);

@@ -132,7 +132,7 @@ void CompleteParser::FailAtEqual(size_t start, size_t mark) {
       first == word::kTrue || first == word::kFalse || first == word::kNone || IsBracketed(left) || !IsBitwiseOr(left);
   if (!is_name && is_excluded) FailGeneric(equal);
   const bool is_comparison = Try([&] {
-    ++at_;
+    Skip();
     Binary(kBitOrLevel);
     if (Code() == tok::EQUAL || Code() == tok::COLONEQUAL) FailHere();
   });
@@ -313,7 +313,7 @@ void CompleteParser::AtomExpression() {
   if (Code() == word::kAwait && IsKeyword(word::kAwait)) {
     waits_.push_back({at_, /*is_comprehension=*/false});
     PushLeafOf(tok::AWAIT, TokenAt(at_), index_[at_]);
-    ++at_;
+    Skip();
   }
   Atom();
   while (Code() == tok::DOT || Code() == tok::LPAR || Code() == tok::LSQB) Trailer();
@@ -391,7 +391,8 @@ void CompleteParser::Templates() {
     const Token& prefix = TokenAt(at_);
     const Text text(prefix.text, static_cast<size_t>(TokenAt(at_ + 1).end() - prefix.text));
     nodes_.push_back(factory_.NewKeywordNode(text, Context::Index(index_[at_])));
-    at_ += 2;
+    Skip();
+    Skip();
   }
   if (Code() == tok::STRING) Fail("cannot mix t-string literals with string or bytes literals");
   if (Mark() - mark > 1) FinishBare<CExpression>(mark);
@@ -408,7 +409,7 @@ void CompleteParser::Group() {
     const size_t inner = Mark();
     const size_t start = at_;
     if (Code() == tok::DOUBLESTAR && python3_) {
-      ++at_;
+      Skip();
       Binary(kBitOrLevel);
       if (Code() == tok::RPAR) FailAt(start, "cannot use double starred expression here");
       FailGeneric(start);
@@ -614,6 +615,7 @@ void CompleteParser::Arguments() {
         PushLeaf();
         Test();
         Finish(symbols_.argument, argument);
+        if (has_unpacked_keywords || has_keyword) FailPositional(has_unpacked_keywords);
       } else if (IsComprehension()) {
         Comprehension("generator expression", start);
         Finish(symbols_.argument, argument);
@@ -672,8 +674,11 @@ void CompleteParser::Subscripts() {
 void CompleteParser::Subscript() {
   const size_t mark = Mark();
   if (Code() == tok::STAR) {
+    // Unlike the one in a list it takes all that an expression is.
     if (!Since(11)) FailHere();
-    return TestOrStar();
+    PushLeaf();
+    Test();
+    return Finish(symbols_.star_expr, mark);
   }
   if (!python3_ && Code() == tok::ELLIPSIS) return PushLeaf();
   if (Code() != tok::COLON) {
@@ -779,7 +784,7 @@ void CompleteParser::ComprehensionTail(bool is_first) {
     if (!IsKeyword(word::kAsync)) FailHere();
     has_async_for_ = true;
     PushLeafOf(tok::ASYNC, TokenAt(at_), index_[at_]);
-    ++at_;
+    Skip();
   }
   const size_t clause = Mark();
   PushLeaf();

@@ -21,7 +21,8 @@ namespace quillet {
 
 namespace {
 
-constexpr Token kNothing{};
+constexpr Token kNothing{"", 0, tok::ENDMARKER};
+constexpr Token kUnread{"_", 1, tok::NAME};
 
 bool ClosesWith(TokenCode open, TokenCode close) {
   return (open == tok::LPAR && close == tok::RPAR) || (open == tok::LSQB && close == tok::RSQB) ||
@@ -179,6 +180,10 @@ void CompleteParser::SetTokens(TokenSpan toks) {
   while (end < toks.size() && toks[end].code != tok::COMMENT) ++end;
   index_.push_back(static_cast<int32_t>(end));
   code_.push_back(tok::ENDMARKER);
+  ended_.assign(code_.size(), tok::ENDMARKER);
+  codes_ = code_.data();
+  failed_ = false;
+  failure_.reset();
   at_ = 0;
   furthest_ = 0;
   is_trying_ = false;
@@ -202,69 +207,70 @@ void CompleteParser::SetTokens(TokenSpan toks) {
 
 void CompleteParser::CheckTokens() {
   std::vector<int32_t> open;
-  for (size_t at = 0; at + 1 < code_.size(); ++at) {
+  for (size_t at = 0; at + 1 < code_.size() && !failed_; ++at) {
     const Token& token = TokenAt(at);
     const TokenCode code = token.code;
     if (IsOpeningBracket(code)) {
-      if (static_cast<int>(open.size()) >= kMaxBrackets) FailAt(at, "too many nested parentheses");
+      if (static_cast<int>(open.size()) >= kMaxBrackets) return FailAt(at, "too many nested parentheses");
       open.push_back(index_[at]);
     } else if (IsClosingBracket(code)) {
-      if (open.empty()) FailAt(at, "unmatched '" + std::string(token.view()) + "'");
+      if (open.empty()) return FailAt(at, "unmatched '" + std::string(token.view()) + "'");
       const Token& opening = toks_[static_cast<size_t>(open.back())];
       if (!ClosesWith(opening.code, code)) {
-        FailAt(at, "closing parenthesis '" + std::string(token.view()) + "' does not match opening parenthesis '" +
-                       std::string(opening.view()) + "'" + OnLineOf(open.back(), at));
+        return FailAt(at, "closing parenthesis '" + std::string(token.view()) +
+                              "' does not match opening parenthesis '" + std::string(opening.view()) + "'" +
+                              OnLineOf(open.back(), at));
       }
       open.pop_back();
     } else if (code == tok::NUMBER) {
       CheckNumber(token, index_[at]);
       const Token& next = at + 2 < code_.size() ? TokenAt(at + 1) : kNothing;
       if (!next.removed() && next.text == token.end() && IsNameCode(next.code) && !MayTouchNumber(next.code))
-        FailAt(at, "invalid decimal literal");
+        return FailAt(at, "invalid decimal literal");
     } else if (code == tok::STRING) {
       CheckString(token, index_[at]);
     } else if (code == tok::ERRORTOKEN) {
-      if (in_field_) FailAt(at, "f-string: invalid syntax");
+      if (in_field_) return FailAt(at, "f-string: invalid syntax");
       const Text text = token.view();
       const size_t quote = text.find_first_of("\"'");
       if (quote != Text::npos && quote <= 2) {
         const bool is_triple = text.size() >= quote + 3 && IsTripleQuote(text.data() + quote);
-        FailAt(at, std::string("unterminated ") + (is_triple ? "triple-quoted " : "") + "string literal" +
-                       DetectedAt(at, is_triple));
+        return FailAt(at, std::string("unterminated ") + (is_triple ? "triple-quoted " : "") + "string literal" +
+                              DetectedAt(at, is_triple));
       }
-      if (static_cast<unsigned char>(text.front()) >= 0x80) FailAt(at, InvalidCharacter(text));
-      FailAt(at, "invalid syntax");
+      if (static_cast<unsigned char>(text.front()) >= 0x80) return FailAt(at, InvalidCharacter(text));
+      return FailAt(at, "invalid syntax");
     }
   }
-  for (size_t i = 0; i < toks_.size(); ++i) {
+  for (size_t i = 0; i < toks_.size() && !failed_; ++i) {
     if (toks_[i].code != tok::BACKSLASH || i + 1 >= toks_.size()) continue;
     const char* behind = toks_[i].end();
     if (!IsLineEnd(*behind) && toks_[i].text + 1 == behind)
-      FailAtToken(static_cast<int32_t>(i + 1), "unexpected character after line continuation character");
+      return FailAtToken(static_cast<int32_t>(i + 1), "unexpected character after line continuation character");
   }
 }
 
-void CompleteParser::CheckNumber(const Token& token, int32_t index) const {
+void CompleteParser::CheckNumber(const Token& token, int32_t index) {
   const Text text = token.view();
   if (text.size() == 1) return;
   const char last = static_cast<char>(text.back() | 0x20);
   const bool is_based = text[0] == '0' && (text[1] | 0x20) >= 'a' && (text[1] | 0x20) != 'e' &&
                         (text[1] | 0x20) != 'j' && (text[1] | 0x20) != 'l';
   if (text.find('_') != Text::npos && !Since(6)) {
-    FailAtToken(index, python3_ ? "Underscores in numeric literals are only supported in Python 3.6 and greater"
-                                : "invalid decimal literal");
+    return FailAtToken(index, python3_ ? "Underscores in numeric literals are only supported in Python 3.6 and greater"
+                                       : "invalid decimal literal");
   }
   if (!python3_) return;
-  if (last == 'l' && !(is_based && (text[1] | 0x20) == 'x')) FailAtToken(index, "invalid decimal literal");
-  if (last == 'l') FailAtToken(index, "invalid hexadecimal literal");
+  if (last == 'l' && !(is_based && (text[1] | 0x20) == 'x')) return FailAtToken(index, "invalid decimal literal");
+  if (last == 'l') return FailAtToken(index, "invalid hexadecimal literal");
   if (text[0] == '0' && !is_based && last != 'j' && text.find_first_of(".eE") == Text::npos &&
       text.find_first_not_of("0_") != Text::npos) {
-    FailAtToken(index,
-                "leading zeros in decimal integer literals are not permitted; use an 0o prefix for octal integers");
+    return FailAtToken(
+        index, "leading zeros in decimal integer literals are not permitted; use an 0o prefix for octal integers");
   }
 }
 
-void CompleteParser::CheckString(const Token& token, int32_t index) const {
+void CompleteParser::CheckString(const Token& token, int32_t index) {
   const Text text = token.view();
   size_t quote = 0;
   bool is_bytes = false;
@@ -276,11 +282,12 @@ void CompleteParser::CheckString(const Token& token, int32_t index) const {
     is_unicode |= letter == 'u';
     is_formatted |= letter == 'f';
   }
-  if (is_formatted && !Since(6)) FailAtToken(index, "invalid syntax");
-  if (python3_ && is_unicode && quote > 1) FailAtToken(index, "invalid syntax");
+  if (is_formatted && !Since(6)) return FailAtToken(index, "invalid syntax");
+  if (python3_ && is_unicode && quote > 1) return FailAtToken(index, "invalid syntax");
   if (!python3_ || !is_bytes) return;
   for (const char c : text) {
-    if (static_cast<unsigned char>(c) >= 0x80) FailAtToken(index, "bytes can only contain ASCII literal characters");
+    if (static_cast<unsigned char>(c) >= 0x80)
+      return FailAtToken(index, "bytes can only contain ASCII literal characters");
   }
 }
 
@@ -313,18 +320,20 @@ int32_t CompleteParser::OpenBracket() const {
 
 // ---- failures ----
 
-void CompleteParser::FailAtToken(int32_t token, std::string message) const {
+void CompleteParser::FailAtToken(int32_t token, std::string message) {
+  if (failed_) return;
+  furthest_ = std::max(furthest_, at_);
+  failed_ = true;
+  codes_ = ended_.data();
   const bool is_at_end = static_cast<size_t>(token) >= toks_.size();
-  ParseError error(std::move(message), -1, is_at_end ? kNoText : toks_[static_cast<size_t>(token)].view(),
+  failure_.emplace(std::move(message), -1, is_at_end ? kNoText : toks_[static_cast<size_t>(token)].view(),
                    Context::Index(token));
-  throw error;
 }
 
-void CompleteParser::FailGeneric(size_t at) const {
-  FailAt(at, in_field_ ? "f-string: invalid syntax" : "invalid syntax");
-}
+void CompleteParser::FailGeneric(size_t at) { FailAt(at, in_field_ ? "f-string: invalid syntax" : "invalid syntax"); }
 
-void CompleteParser::FailAtNode(const CNode* node, std::string message) const {
+void CompleteParser::FailAtNode(const CNode* node, std::string message) {
+  if (failed_) return;
   // Brackets that only group belong to no node of the language's own trees.
   while (isa<CAtom>(node) && node->child_count == 3 && node->ChildIs(0, tok::LPAR) &&
          !isa<CTestListStarExpr>(node->children[1]))
@@ -338,13 +347,13 @@ int32_t CompleteParser::FirstTokenOf(const CNode* node) const {
 }
 
 void CompleteParser::Postpone(size_t at, std::string message, Judge judge) {
-  if (judge >= judge_) return;
+  if (failed_ || judge >= judge_) return;
   judge_ = judge;
   postponed_.emplace(std::move(message), -1, kNoText, Context::Index(index_[at]));
 }
 
 void CompleteParser::PostponeAtNode(const CNode* node, std::string message, Judge judge) {
-  if (judge >= judge_) return;
+  if (failed_ || judge >= judge_) return;
   judge_ = judge;
   postponed_.emplace(std::move(message), -1, kNoText, Context::Index(FirstTokenOf(node)));
 }
@@ -361,7 +370,20 @@ void CompleteParser::PushLeafOf(int type, const Token& token, int32_t index) {
   nodes_.push_back(factory_.ConvertToken(type, token, index));
 }
 
+const Token& CompleteParser::TokenAt(size_t at) const {
+  const auto index = static_cast<size_t>(index_[at]);
+  return index < toks_.size() ? toks_[index] : kNothing;
+}
+
+void CompleteParser::PushNothing() { PushLeafOf(tok::NAME, kUnread, 0); }
+
+void CompleteParser::Collapse(size_t mark) {
+  for (; nodes_.size() > mark + 1; nodes_.pop_back()) factory_.pool().Reclaim(nodes_.back());
+  if (nodes_.size() == mark) PushNothing();
+}
+
 void CompleteParser::PushLeaf() {
+  if (failed_) return PushNothing();
   const Token& token = TokenAt(at_);
   // The tables make a plain node of the dots, which no place for an expression takes.
   if (token.code == tok::ELLIPSIS) {
@@ -379,7 +401,7 @@ bool CompleteParser::Accept(TokenCode code) {
 }
 
 void CompleteParser::Expect(TokenCode code, const char* message) {
-  if (Accept(code)) return;
+  if (failed_ || Accept(code)) return;
   if (message != nullptr) Fail(message);
   FailHere();
 }
@@ -390,6 +412,7 @@ void CompleteParser::PushName() {
 }
 
 void CompleteParser::Finish(int symbol, size_t mark) {
+  if (failed_) return Collapse(mark);
   const size_t count = nodes_.size() - mark;
   if (count == 1) return;
   CNode* node = factory_.ConvertRule(symbol, nodes_.data() + mark, static_cast<uint32_t>(count));
@@ -410,24 +433,35 @@ CNode* CompleteParser::Run(TokenSpan toks, StatementPlace place, Rule&& rule) {
   place_ = place;
   SetTokens(toks);
   if (AtEnd()) return nullptr;
-  try {
-    rule();
-    ExpectEnd();
-    JudgeWaits(0);
-  } catch (const ParseError&) {
-    // A bracket that is never closed explains what was met on a line below it, or at the end.
-    const size_t furthest = std::max(furthest_, at_);
-    const int32_t open = OpenBracket();
-    if (open < 0) throw;
-    const bool is_at_end = furthest + 1 >= code_.size();
-    const Token& bracket = toks_[static_cast<size_t>(open)];
-    const char* const end = is_at_end ? nullptr : TokenAt(furthest).text;
-    if (is_at_end || (bracket.text < end && std::any_of(bracket.text, end, IsLineEnd)))
-      FailAtToken(open, "'" + std::string(bracket.view()) + "' was never closed");
-    throw;
+  rule();
+  ExpectEnd();
+  if (failed_) {
+    ExplainByBracket();
+    return nullptr;
   }
+  JudgeWaits(0);
   CNode* tree = nodes_.back();
   nodes_.pop_back();
+  return tree;
+}
+
+// A bracket that is never closed explains what was met on a line below it, or at the end.
+void CompleteParser::ExplainByBracket() {
+  const int32_t open = OpenBracket();
+  if (open < 0) return;
+  const bool is_at_end = furthest_ + 1 >= code_.size();
+  const Token& bracket = toks_[static_cast<size_t>(open)];
+  const char* const end = is_at_end ? nullptr : TokenAt(furthest_).text;
+  if (is_at_end || (bracket.text < end && std::any_of(bracket.text, end, IsLineEnd))) {
+    failed_ = false;
+    FailAtToken(open, "'" + std::string(bracket.view()) + "' was never closed");
+  }
+}
+
+template <class Rule>
+CNode* CompleteParser::RunOrThrow(TokenSpan toks, StatementPlace place, Rule&& rule) {
+  CNode* const tree = Run(toks, place, std::forward<Rule>(rule));
+  if (failure_) throw ParseError(*failure_);
   return tree;
 }
 
@@ -435,13 +469,13 @@ CNode* CompleteParser::ParseStatement(const LogicalLine& line, StatementPlace pl
   line_ = &line;
   return Run(line.toks, place, [&] {
     CheckTokens();
-    Statement(line.kind);
+    if (!failed_) Statement(line.kind);
   });
 }
 
 CNode* CompleteParser::ParseField(const LogicalLine& line, StatementPlace place) {
   line_ = &line;
-  return Run(line.toks, place, [&] {
+  return RunOrThrow(line.toks, place, [&] {
     in_field_ = true;
     CheckTokens();
     if (Code() == word::kYield)
@@ -453,7 +487,7 @@ CNode* CompleteParser::ParseField(const LogicalLine& line, StatementPlace place)
 
 CNode* CompleteParser::ParseHint(TokenSpan toks) {
   line_ = nullptr;
-  return Run(toks, {}, [&] {
+  return RunOrThrow(toks, {}, [&] {
     CheckTokens();
     StarExpressions(symbols_.testlist_star_expr);
   });
@@ -465,22 +499,22 @@ void CompleteParser::ExpectEnd() {
 
 CNode* CompleteParser::ParseSignature(TokenSpan toks) {
   line_ = nullptr;
-  return Run(toks, {}, [&] {
+  return RunOrThrow(toks, {}, [&] {
     CheckTokens();
     const size_t mark = Mark();
     if (Code() != tok::LPAR) FailHere();
-    ++at_;
-    if (Code() == tok::ELLIPSIS && CodeAt(1) == tok::RPAR) ++at_;
+    Skip();
+    if (Code() == tok::ELLIPSIS && CodeAt(1) == tok::RPAR) Skip();
     while (Code() != tok::RPAR) {
-      if (Code() == tok::STAR || Code() == tok::DOUBLESTAR) ++at_;
+      if (Code() == tok::STAR || Code() == tok::DOUBLESTAR) Skip();
       Test();
       if (Code() != tok::COMMA) break;
-      ++at_;
+      Skip();
     }
     if (Code() != tok::RPAR) FailHere();
-    ++at_;
+    Skip();
     if (Code() != tok::RARROW || TokenAt(at_).view() != "->") FailHere();
-    ++at_;
+    Skip();
     Test();
     FinishBare<CNode>(mark);
   });

@@ -8,8 +8,11 @@
 // whose context is the index of the token at fault.
 //
 // Each rule leaves one node on a stack of nodes, so that whatever a failure interrupts is given back in
-// one place. A rule that matched one child makes no node of its own, as in the tables. Recursion is
-// bounded: by nesting of brackets as the language bounds it, by kMaxDepth for all else.
+// one place. A failure is no exception, which costs more than many statements: the first one is kept, from then
+// on the tokens are at their end to every rule, and what they would do ends by itself. A rule only has to end
+// its loops at a token that it does not know, and to leave a node. A rule that matched one child makes no node of its
+// own, as in the tables. Recursion is bounded: by nesting of brackets as the language bounds it, by kMaxDepth for all
+// else.
 #pragma once
 
 #include <algorithm>
@@ -47,15 +50,18 @@ class CompleteParser {
   CompleteParser& operator=(const CompleteParser&) = delete;
 
   // The tree of a statement or of a statement's head, which is the caller's; null where there is nothing but
-  // comments. ParseError for what the version's grammar rejects.
+  // comments, and for what the version's grammar rejects, about which failure() says why.
   CNode* ParseStatement(const LogicalLine& line, StatementPlace place);
-  // The same for the expression in a field of a formatted string.
+  // The same for the expression in a field of a formatted string; here and below the failure is thrown.
   CNode* ParseField(const LogicalLine& line, StatementPlace place);
   // For a hint: one expression, or several with commas between them.
   CNode* ParseHint(TokenSpan toks);
   // For a signature in a comment, `(int, *str) -> bool`: a node whose last child is the type returned and whose
   // others are those of the parameters, none for `(...)`.
   CNode* ParseSignature(TokenSpan toks);
+
+  // Of the last statement.
+  const std::optional<ParseError>& failure() const { return failure_; }
 
   // What the grammar took in the last statement or field and the compiler behind it does not take, such as a
   // `return` outside of a function: an error of a statement that is understood all the same.
@@ -99,20 +105,22 @@ class CompleteParser {
   // ---- the frame (complete_parser.cc) ----
   template <class Rule>
   CNode* Run(TokenSpan toks, StatementPlace place, Rule&& rule);
+  template <class Rule>
+  CNode* RunOrThrow(TokenSpan toks, StatementPlace place, Rule&& rule);
   void SetTokens(TokenSpan toks);
   // What the language's tokeniser rejects, in front of all else.
   void CheckTokens();
-  void CheckNumber(const Token& token, int32_t index) const;
-  void CheckString(const Token& token, int32_t index) const;
+  void CheckNumber(const Token& token, int32_t index);
+  void CheckString(const Token& token, int32_t index);
   // The innermost bracket that stands open at the end, or -1.
   int32_t OpenBracket() const;
-  [[noreturn]] void FailAtToken(int32_t token, std::string message) const;
-  [[noreturn]] void FailAt(size_t at, std::string message) const { FailAtToken(index_[at], std::move(message)); }
-  [[noreturn]] void Fail(std::string message) const { FailAt(at_, std::move(message)); }
-  [[noreturn]] void FailHere() const { FailGeneric(at_); }
+  void FailAtToken(int32_t token, std::string message);
+  void FailAt(size_t at, std::string message) { FailAtToken(index_[at], std::move(message)); }
+  void Fail(std::string message) { FailAt(at_, std::move(message)); }
+  void FailHere() { FailGeneric(at_); }
   // "invalid syntax", or what the brackets say to that.
-  [[noreturn]] void FailGeneric(size_t at) const;
-  [[noreturn]] void FailAtNode(const CNode* node, std::string message) const;
+  void FailGeneric(size_t at);
+  void FailAtNode(const CNode* node, std::string message);
   // A failure that waits for the end of the statement; the first one of the earliest judge stays.
   void Postpone(size_t at, std::string message, Judge judge = kSymbolTable);
   void PostponeAtNode(const CNode* node, std::string message, Judge judge);
@@ -122,21 +130,27 @@ class CompleteParser {
   // Reads by a rule and gives it up again; whether it could be read.
   template <class Rule>
   bool Try(Rule&& rule);
+  void ExplainByBracket();
   // " on line 3" for a token that stands on another line than the one at `at`.
   std::string OnLineOf(int32_t token, size_t at) const;
   std::string DetectedAt(size_t at, bool is_triple) const;
 
   bool Since(int minor) const { return python3_ && minor_ >= minor; }
-  TokenCode Code() const { return code_[at_]; }
-  TokenCode CodeAt(size_t ahead) const { return code_[std::min(at_ + ahead, code_.size() - 1)]; }
+  TokenCode Code() const { return codes_[at_]; }
+  TokenCode CodeAt(size_t ahead) const { return codes_[std::min(at_ + ahead, code_.size() - 1)]; }
   bool AtEnd() const { return Code() == tok::ENDMARKER; }
-  const Token& TokenAt(size_t at) const { return toks_[static_cast<size_t>(index_[at])]; }
+  // Of no text behind the last one.
+  const Token& TokenAt(size_t at) const;
   bool IsKeyword(TokenCode code) const;
   bool IsName(TokenCode code) const { return IsNameCode(code) && !IsKeyword(code); }
   bool BeginsExpression(TokenCode code) const;
   size_t Mark() const { return nodes_.size(); }
   CNode* Top() const { return nodes_.back(); }
   void PushLeaf();
+  // In the place of what a failed reading lacks.
+  void PushNothing();
+  // Takes a token that no tree has.
+  void Skip() { at_ += !failed_; }
   void PushLeafOf(int type, const Token& token, int32_t index);
   void PushInvented(const Token& token);
   void PushName();
@@ -146,6 +160,8 @@ class CompleteParser {
   void ExpectEnd();
   // One node of those since the mark, for a rule with several.
   void Finish(int symbol, size_t mark);
+  // The same after a failure: one node, whatever there is.
+  void Collapse(size_t mark);
   // The same for a class without a state.
   template <class T>
   void FinishBare(size_t mark);
@@ -206,7 +222,7 @@ class CompleteParser {
   void TestOrStar();
   void NamedOrStar();
   void NamedTest();
-  [[noreturn]] void FailAtEqual(size_t start, size_t mark);
+  void FailAtEqual(size_t start, size_t mark);
   void Test();
   // Where two expressions stand side by side, the first of which is the node at `mark`: says so where that
   // explains something.
@@ -229,11 +245,11 @@ class CompleteParser {
   void ListDisplay();
   void DictOrSet();
   void DictValue();
-  [[noreturn]] void FailAtTarget(size_t start);
+  void FailAtTarget(size_t start);
   void Backquotes();
   void Arguments();
-  [[noreturn]] void FailAtTargetOf(size_t mark);
-  [[noreturn]] void FailPositional(bool behind_unpacked);
+  void FailAtTargetOf(size_t mark);
+  void FailPositional(bool behind_unpacked);
   void Subscripts();
   void Subscript();
   bool IsComprehension() const;
@@ -258,7 +274,7 @@ class CompleteParser {
   bool IsNameInBrackets(const CNode* node) const;
   bool IsBitwiseOr(const CNode* node) const;
   void CheckNoLoneStar(const CNode* node);
-  void CheckNoStars(const CNode* node) const;
+  void CheckNoStars(const CNode* node);
 
   // ---- patterns (complete_patterns.cc) ----
   void Match();
@@ -283,8 +299,11 @@ class CompleteParser {
   std::array<bool, 256> keyword_{};
 
   TokenSpan toks_;
-  std::vector<int32_t> index_;   // of the significant tokens, and the token count at the end
-  std::vector<TokenCode> code_;  // of the same; ENDMARKER at the end
+  std::vector<int32_t> index_;        // of the significant tokens, and the token count at the end
+  std::vector<TokenCode> code_;       // of the same; ENDMARKER at the end
+  std::vector<TokenCode> ended_;      // as many ENDMARKERs, for what follows a failure
+  const TokenCode* codes_ = nullptr;  // one of the two
+  bool failed_ = false;
   std::vector<CNode*> nodes_;
   std::vector<Text> names_;  // of the parameters, or what a pattern captures
   size_t at_ = 0;
@@ -308,6 +327,7 @@ class CompleteParser {
   size_t first_iterable_end_ = 0;
   size_t irrefutable_ = kNowhere;  // the name in the pattern that was read last that matches everything
   std::string irrefutable_words_;
+  std::optional<ParseError> failure_;
   std::optional<ParseError> postponed_;
   Judge judge_ = kNobody;
 };

@@ -186,14 +186,14 @@ void CompleteParser::ClosedPattern() {
 void CompleteParser::NumberPattern() {
   const size_t mark = Mark();
   if (Code() == tok::MINUS) PushLeaf();
-  if (Code() != tok::NUMBER) FailHere();
+  if (Code() != tok::NUMBER) return FailHere();
   const auto is_imaginary = [this] { return (TokenAt(at_).view().back() | 0x20) == 'j'; };
   const bool first_is_imaginary = is_imaginary();
   const size_t first = at_;
   PushLeaf();
   if (Code() == tok::PLUS || Code() == tok::MINUS) {
     PushLeaf();
-    if (Code() != tok::NUMBER) FailHere();
+    if (Code() != tok::NUMBER) return FailHere();
     if (first_is_imaginary) FailAt(first, "real number required in complex literal");
     if (!is_imaginary()) Fail("imaginary number required in complex literal");
     PushLeaf();

@@ -171,7 +171,7 @@ void CompleteParser::Except() {
   if (is_star) {
     RequireAt(at_, 11, "Exception groups are");
     // It says nothing of a name.
-    ++at_;
+    Skip();
     if (Code() == tok::COLON || AtEnd()) Fail("expected one or more exception types");
   }
   if (Code() != tok::COLON && !AtEnd()) ExceptTypes();
@@ -272,7 +272,7 @@ bool CompleteParser::WithItemsInBrackets() {
   }
   if (!has_as) return false;
   RequireAt(at_, 9, "Parenthesized context managers are");
-  ++at_;
+  Skip();
   const InBracket in_bracket(*this);
   WithItem();
   while (Code() == tok::COMMA) {
@@ -286,7 +286,7 @@ bool CompleteParser::WithItemsInBrackets() {
     WithItem();
   }
   if (Code() != tok::RPAR) FailHere();
-  ++at_;
+  Skip();
   return true;
 }
 
@@ -315,7 +315,7 @@ void CompleteParser::Async() {
   const size_t mark = Mark();
   const size_t start = at_;
   PushLeafOf(tok::ASYNC, TokenAt(at_), index_[at_]);
-  ++at_;
+  Skip();
   if (Code() == word::kDef) {
     Definition();
   } else {
@@ -383,7 +383,7 @@ void CompleteParser::Definition() {
 // The parameters wait behind the first nodes of their statement; they become the first children of what is
 // wrapped around it.
 void CompleteParser::FinishWithTypeParameters(int symbol, size_t mark, size_t parameters, size_t count) {
-  if (count == 0) return Finish(symbol, mark);
+  if (count == 0 || failed_) return Finish(symbol, mark);
   const auto begin = nodes_.begin();
   const auto at = [begin](size_t i) { return begin + static_cast<ptrdiff_t>(i); };
   std::rotate(at(mark), at(parameters), at(parameters + count));
@@ -418,7 +418,7 @@ void CompleteParser::Class() {
 size_t CompleteParser::TypeParameters() {
   RequireAt(at_, 12, "Type parameter lists are");
   const InBracket in_bracket(*this);
-  ++at_;
+  Skip();
   if (Code() == tok::RSQB) Fail("Type parameter list cannot be empty");
   size_t count = 0;
   bool has_default = false;
@@ -427,11 +427,11 @@ size_t CompleteParser::TypeParameters() {
     TypeParameter(has_default);
     ++count;
     if (Code() != tok::COMMA) break;
-    ++at_;
+    Skip();
   }
   names_ = outer_names;
   if (Code() != tok::RSQB) FailHere();
-  ++at_;
+  Skip();
   return count;
 }
 
@@ -450,7 +450,7 @@ void CompleteParser::TypeParameter(bool& has_default) {
   if (Code() == tok::COLON) {
     const size_t colon = at_;
     if (star == tok::STAR || star == tok::DOUBLESTAR) {
-      ++at_;
+      Skip();
       Test();
       const bool is_constraint = isa<CAtom>(Top()) && Top()->ChildIs(0, tok::LPAR);
       FailAt(colon, std::string("cannot use ") + (is_constraint ? "constraints" : "bound") + " with " +
@@ -476,7 +476,7 @@ void CompleteParser::TypeParameter(bool& has_default) {
 void CompleteParser::TypeStatement() {
   const size_t mark = Mark();
   RequireAt(at_, 12, "Type statement is");
-  ++at_;
+  Skip();
   PushLeaf();
   const size_t parameters = Mark();
   const size_t parameter_count = Code() == tok::LSQB ? TypeParameters() : 0;
@@ -598,7 +598,7 @@ void CompleteParser::ExpressionStatement() {
 // At the "=" behind what is no target.
 void CompleteParser::FailAtTargetOf(size_t mark) {
   const bool may_be_comparison = Try([&] {
-    ++at_;
+    Skip();
     Binary(kTargetLevel);
     if (Code() == tok::EQUAL || Code() == tok::COLONEQUAL) FailHere();
   });
@@ -615,9 +615,13 @@ void CompleteParser::Annotation(size_t mark, size_t start) {
   if (AtEnd()) FailHere();
   {
     const RestoredValue<bool> in_annotation(in_annotation_, true);
+    const size_t waits = waits_.size();
     Test();
+    // In a function it is never evaluated, and nothing in it waits.
+    if (place_.scope == StatementPlace::Scope::kFunction && Since(7)) waits_.resize(waits);
   }
   if (isa<CTestListStarExpr>(target)) FailAt(start, "only single target (not tuple) can be annotated");
+  if (isa<CStarExpression>(target)) FailGeneric(colon);
   if (IsBracketed(target)) {
     FailAt(start, target->ChildIs(0, tok::LSQB) ? "only single target (not list) can be annotated"
                                                 : "only single target (not tuple) can be annotated");
@@ -777,7 +781,7 @@ void CompleteParser::FromImport() {
   while (Code() == tok::DOT || Code() == tok::ELLIPSIS) {
     has_dots = true;
     PushLeafOf(TypeOfCode(Code()), TokenAt(at_), index_[at_]);
-    ++at_;
+    Skip();
   }
   if (!has_dots || Code() != word::kImport) DottedName();
   if (Code() != word::kImport) FailHere();
@@ -829,7 +833,7 @@ void CompleteParser::PrintStatement() {
     PushLeaf();
     Test();
     if (Code() == tok::COMMA && !BeginsExpression(CodeAt(1))) {
-      ++at_;
+      Skip();
       FailHere();
     }
   } else if (BeginsExpression(Code())) {

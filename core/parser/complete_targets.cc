@@ -191,7 +191,7 @@ void CompleteParser::CheckNoLoneStar(const CNode* node) {
 }
 
 // No star at all, as in front of the version that took them there.
-void CompleteParser::CheckNoStars(const CNode* node) const {
+void CompleteParser::CheckNoStars(const CNode* node) {
   if (isa<CStarExpression>(node)) FailAtNode(node, "invalid syntax");
   if (!isa<CTestListStarExpr>(node)) return;
   for (const CNode* child : node->fChildren())

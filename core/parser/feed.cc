@@ -80,6 +80,17 @@ CNode* CPGenParserImpl::ParseRun(TokenRun run, bool in_async_def, const Position
   return special != nullptr ? special : ParseRunImpl(run, in_async_def, &positions);
 }
 
+CNode* CPGenParserImpl::TryParseToNode(const LogicalLine& logical, bool in_async_def) {
+  const PositionView positions = logical.positions();
+  if (CNode* special = SpecialCases({logical.toks}, in_async_def, positions)) return special;
+  struct Quiet {
+    FactoryEngine& engine;
+    explicit Quiet(FactoryEngine& used) : engine(used) { engine.set_is_quiet(true); }
+    ~Quiet() { engine.set_is_quiet(false); }
+  } quiet(*engine_);
+  return ParseRunImpl({logical.toks}, in_async_def, &positions);
+}
+
 CNode* CPGenParserImpl::ParseRunImpl(TokenRun run, bool in_async_def, const PositionView* positions) {
   const bool async_keyword = async_always_keyword_ || in_async_def;
   if (external_engine_ != nullptr) [[unlikely]] {
@@ -235,6 +246,7 @@ template <class TokenEngine>
 // Takes the wrappers off: that of the file, whose children are the statement and the end marker, and
 // for a decorator the node that also holds the invented function.
 CNode* CPGenParserImpl::Unwrap(CNode* root, bool is_decorator) {
+  if (root == nullptr) return nullptr;
   const CNode* end = root->Child(1);
   if (root->ChildCount() != 2 || end == nullptr || end->fClsInfo == nullptr ||
       end->fClsInfo->fNodeType != tok::ENDMARKER) {

@@ -106,6 +106,10 @@ class CPGenParserImpl {
                                        int64_t end, bool raise_errors);
   NodeList GetTypeParameterNodes(TokenSpan toks);
 
+  // ParseToNode without an exception where the tables reject a statement: null for that, too. ParseError for one
+  // that they do not see whole.
+  CNode* TryParseToNode(const LogicalLine& logical, bool in_async_def);
+
   [[noreturn]] void RaiseParseError(int64_t context) const;
 
   const Grammar& grammar() const { return *grammar_; }

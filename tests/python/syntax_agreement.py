@@ -51,24 +51,15 @@ with open(sys.argv[2], "w") as file:
     json.dump(answers, file)
 """
 
-#: What the compiler says of more than one statement, or of what no source shows by itself.
+#: What only the names of a whole scope show, and what no reader of a source can know.
 BEYOND = re.compile(
-    r"no binding for nonlocal|is parameter and (global|nonlocal)|is (assigned to|used) (before|prior to)|"
-    r"is nonlocal and global|annotated name|'(break|continue)' |default 'except:' must be last|"
-    r"from __future__|future feature|not a chance|too many statically nested|type parameter and|"
-    r"'return' with value in async generator|'return' with argument inside generator|can not delete variable|"
-    r"unqualified exec|import \* is not allowed|cannot have both 'except'|makes remaining patterns"
+    r"no binding for nonlocal|is (parameter|local|nonlocal) and (global|nonlocal)|"
+    r"is (assigned to|used) (before|prior to)|annotated name|type parameter and|'return' with value in async generator|"
+    r"'return' with argument inside generator|can not delete variable|unqualified exec|import \* is not allowed|"
+    r"too many statically nested|unknown Unicode character name|'ascii' codec|unknown encoding|encoding problem"
 )
-#: Errors of other kinds: of the layout of lines, and of an interpreter that gives up.
-OTHER_KINDS = {
-    "IndentationError",
-    "TabError",
-    "MemoryError",
-    "RecursionError",
-    "OverflowError",
-    "ValueError",
-    "SystemError",
-}
+#: An interpreter that gives up.
+OTHER_KINDS = {"MemoryError", "RecursionError", "OverflowError", "ValueError", "SystemError"}
 #: What quillet says of hints, which Python does not read.
 OF_HINTS = re.compile(r"invalid syntax in (stringified type hint|commented type hint|signature comment)")
 

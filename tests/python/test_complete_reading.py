@@ -284,6 +284,11 @@ BY_VERSION = [
     ("x = f'{a # b}'", "EEEEEEE"),
     ("for [a in b] in c: pass", "EEEEEEE"),
     ("[x for [a in b]", "EEEEEEE"),
+    ("def f(self):\n self.m: (1, await 2)", "EE....."),
+    ("x = 1 \\", "...EEEE"),
+    ("A[*Ts in int]", "EEEEE.."),
+    ("f(a=1, b := 2)", "EEEEEEE"),
+    ("*a: int", "EEEEEEE"),
 ]
 
 
