@@ -73,7 +73,7 @@ nb::list FileResult::Rows(size_t begin, size_t end, nb::handle row_class, const 
     row.Add(nb::borrow(kinds[static_cast<size_t>(table.kinds[i])]));
     row.Add(details[table.details[i]]);
     row.Add(nb::borrow(table.is_parameter[i] ? Py_True : Py_False));
-    rows.append(row.Take());
+    rows.append(row.TakePlain());
   }
   return rows;
 }

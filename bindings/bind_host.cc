@@ -27,6 +27,9 @@ namespace {
 // From this size on other threads may run meanwhile: below it, waiting for the lock again costs more.
 constexpr size_t kSizeWithoutLock = size_t{1} << 14;
 
+// Kept to the end of the process, whose interpreter may be gone by then.
+StrCache& g_strs = *new StrCache;
+
 class AnalyzedSource {
  public:
   AnalyzedSource(Language& language, Text bytes) : store_(std::make_shared<SharedStore>()) {
@@ -52,44 +55,56 @@ class AnalyzedSource {
   bool has_print_function() const { return ImportsPrintFunction(*found_.source, found_.rows); }
   const std::vector<size_t>& rows_with_error() const { return rows_with_error_; }
 
-  // (logical, first_line, last_line, indent, in_async_def, first_in_def), with lines counted from 0.
-  nb::object At(int64_t index) const {
+  nb::object LogicalAt(int64_t index) const {
+    const size_t i = CheckedIndex(index);
+    const FileAnalyzer::LineResult& result = found_.results[i];
+    nb::object logical = NewLineObject(found_.source, found_.rows[i], store_);
+    LineOf(logical).SetAnalyzed(result.record_begin, result.record_end, result.arg_record_begin, result.arg_record_end);
+    return logical;
+  }
+
+  // (first_line, last_line, indent, in_async_def, first_in_def, error), with lines counted from 1.
+  nb::object PlaceAt(int64_t index) const {
     const size_t i = CheckedIndex(index);
     const LineRow& row = found_.rows[i];
     const FileAnalyzer::LineResult& result = found_.results[i];
-    nb::object logical = NewLineObject(found_.source, row, store_);
-    LineOf(logical).SetAnalyzed(result.record_begin, result.record_end, result.arg_record_begin, result.arg_record_end);
-    return nb::make_tuple(std::move(logical), row.first_line, row.last_line, row.indent, result.in_async_def,
-                          result.first_in_def);
-  }
-
-  nb::object ErrorAt(int64_t index) const {
-    const int32_t error = found_.results[CheckedIndex(index)].error;
-    return error < 0 ? nb::none() : ExceptionFor(found_.whole_errors[static_cast<size_t>(error)]);
+    TupleFiller place(&PyTuple_Type, 6);
+    place.Add(size_t{row.first_line} + 1);
+    place.Add(size_t{row.last_line} + 1);
+    place.Add(size_t{row.indent});
+    place.Add(nb::borrow(result.in_async_def ? Py_True : Py_False));
+    place.Add(nb::borrow(result.first_in_def ? Py_True : Py_False));
+    place.Add(result.error < 0 ? nb::object(nb::none())
+                               : ExceptionFor(found_.whole_errors[static_cast<size_t>(result.error)]));
+    return place.Take();
   }
 
   // The records of a line as found: (name, kind, detail, is_parameter), of a class that derives from tuple.
-  nb::object RecordsAt(int64_t index, nb::handle row_class, const nb::tuple& kinds) const {
+  nb::object RecordsAt(int64_t index, nb::handle row_class, const nb::tuple& kinds) {
     const size_t i = CheckedIndex(index);
     const FileAnalyzer::LineResult& result = found_.results[i];
-    CheckRowClass(row_class);
+    if (!row_class.is(row_class_)) {
+      CheckRowClass(row_class);
+      row_class_ = nb::borrow(row_class);
+    }
     if (kinds.size() != RecordKindWords().size()) ThrowError(ErrorKind::kValueError, "an object a kind is needed");
-    nb::list records;
+    TupleFiller records(&PyTuple_Type,
+                        result.record_end - result.record_begin + result.arg_record_end - result.arg_record_begin);
     std::string buffer;
     const auto add = [&](const Record& record, bool is_parameter) {
       const RecordInWords words = DecodeInfo(record.info(), buffer);
       TupleFiller row(row_class, 4);
       row.Add(ShownName(record.name()));
       row.Add(nb::borrow(kinds[static_cast<size_t>(words.kind)]));
-      row.Add(ShownText(words.detail));
+      row.Add(g_strs.Get(words.detail));
       row.Add(nb::borrow(is_parameter ? Py_True : Py_False));
-      records.append(row.Take());
+      records.Add(row.TakePlain());
     };
     // Copies: the lines of the source share the store, and one that is analysed again prolongs it.
     for (uint32_t at = result.record_begin; at < result.record_end; ++at) add(Record(store_->store.rows[at]), false);
     for (uint32_t at = result.arg_record_begin; at < result.arg_record_end; ++at)
       add(Record(store_->store.arg_rows[at]), true);
-    return nb::tuple(records);
+    return records.TakePlain();
   }
 
  private:
@@ -100,7 +115,7 @@ class AnalyzedSource {
 
   static nb::object ShownName(Text name) {
     if (!name.starts_with(kArgPrefix)) [[likely]]
-      return ShownText(name);
+      return g_strs.Get(name);
     std::string shown;
     AppendArgumentPlace(name, shown);
     return ShownText(shown);
@@ -109,9 +124,10 @@ class AnalyzedSource {
   FileAnalyzer::Found found_;
   std::shared_ptr<SharedStore> store_;
   std::vector<size_t> rows_with_error_;
+  nb::object row_class_;  // that was checked
 };
 
-// The lines of a source, not yet analysed, as AnalyzedSource::At has them: for hosts that do that themselves.
+// The lines of a source, not yet analysed, with their places: for hosts that do that themselves.
 nb::list CutSource(Any source, Any version_triple) {
   const HostText text = HostText::FromBytes(source);
   const Version version = VersionOf(version_triple);
@@ -157,11 +173,11 @@ void BindHost(nb::module_& tarvex) {
           nb::arg("language"), nb::arg("source"))
       .def("__len__", &AnalyzedSource::size)
       .def(
-          "At", [](AnalyzedSource& self, Any index) { return self.At(Int64Of(index)); }, nb::arg("index"),
-          "A line as (logical, first_line, last_line, indent, in_async_def, first_in_def), with lines from 0.")
+          "LogicalAt", [](AnalyzedSource& self, Any index) { return self.LogicalAt(Int64Of(index)); }, nb::arg("index"),
+          "A line as a CLogicalLine.")
       .def(
-          "ErrorAt", [](AnalyzedSource& self, Any index) { return self.ErrorAt(Int64Of(index)); }, nb::arg("index"),
-          "A line's SyntaxError, or None.")
+          "PlaceAt", [](AnalyzedSource& self, Any index) { return self.PlaceAt(Int64Of(index)); }, nb::arg("index"),
+          "A line's (first_line, last_line, indent, in_async_def, first_in_def, error), with lines from 1.")
       .def(
           "RecordsAt",
           [](AnalyzedSource& self, Any index, nb::handle row_class, const nb::tuple& kinds) {

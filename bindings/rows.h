@@ -2,6 +2,9 @@
 // become str once.
 #pragma once
 
+#include <array>
+#include <cstring>
+#include <memory>
 #include <utility>
 #include <vector>
 
@@ -40,26 +43,78 @@ class ShownTexts {
   std::vector<nb::object> shown_;
 };
 
+// Short texts as str, the latest of which are kept: names and what is said of them come again and again.
+class StrCache {
+ public:
+  nb::object Get(Text text) {
+    if (text.empty() || text.size() > kLongest) return Checked(ShownText(text));
+    nb::object& slot = slots_[SlotOf(text)];
+    if (slot.is_valid() && IsText(slot.ptr(), text)) [[likely]]
+      return slot;
+    nb::object made = Checked(ShownText(text));
+    // Others are told apart by more than their bytes.
+    if (PyUnicode_IS_COMPACT_ASCII(made.ptr())) {
+      const nb::object before = std::exchange(slot, made);
+    }
+    return made;
+  }
+
+ private:
+  static constexpr size_t kLongest = 40;
+  static constexpr int kSlotBits = 11;
+
+  static bool IsText(PyObject* str, Text text) {
+    return PyUnicode_GET_LENGTH(str) == static_cast<Py_ssize_t>(text.size()) &&
+           std::memcmp(PyUnicode_DATA(str), text.data(), text.size()) == 0;
+  }
+  static size_t SlotOf(Text text) {
+    uint64_t front = 0, back = 0;
+    const size_t count = std::min(text.size(), sizeof front);
+    std::memcpy(&front, text.data(), count);
+    std::memcpy(&back, text.data() + text.size() - count, count);
+    return static_cast<size_t>(((front ^ back * 31) + text.size()) * 0x9E3779B97F4A7C15u >> (64 - kSlotBits));
+  }
+
+  std::array<nb::object, size_t{1} << kSlotBits> slots_;
+};
+
 // A tuple under construction. It is made with all values at hand: the host's code may run whenever an object is made,
 // and could find a tuple that lacks some.
 class TupleFiller {
  public:
   // `type` is tuple, or passes CheckRowClass.
   TupleFiller(nb::handle type, size_t size) : type_(reinterpret_cast<PyTypeObject*>(type.ptr())) {
-    values_.reserve(size);
+    if (size > few_.size()) many_.reset(new PyObject*[size]);
+    values_ = many_ ? many_.get() : few_.data();
   }
+  ~TupleFiller() {
+    while (count_ > 0) Py_DECREF(values_[--count_]);
+  }
+  TupleFiller(const TupleFiller&) = delete;
+  TupleFiller& operator=(const TupleFiller&) = delete;
 
-  void Add(nb::object value) { values_.push_back(Checked(std::move(value))); }
+  // At most as often as was said.
+  void Add(nb::object value) { values_[count_++] = Checked(std::move(value)).release().ptr(); }
   void Add(size_t number) { Add(nb::steal(PyLong_FromSize_t(number))); }
   nb::object Take() {
-    nb::object tuple = Checked(nb::steal(type_->tp_alloc(type_, static_cast<Py_ssize_t>(values_.size()))));
-    for (size_t i = 0; i < values_.size(); ++i) PyTuple_SET_ITEM(tuple.ptr(), i, values_[i].release().ptr());
+    nb::object tuple = Checked(nb::steal(type_->tp_alloc(type_, static_cast<Py_ssize_t>(count_))));
+    for (size_t i = 0; i < count_; ++i) PyTuple_SET_ITEM(tuple.ptr(), i, values_[i]);
+    count_ = 0;
+    return tuple;
+  }
+  // The same for values that refer to nothing: no cycle goes through them, and the collector has nothing to look at.
+  nb::object TakePlain() {
+    nb::object tuple = Take();
+    if (type_->tp_dictoffset == 0 && PyObject_GC_IsTracked(tuple.ptr())) PyObject_GC_UnTrack(tuple.ptr());
     return tuple;
   }
 
  private:
   PyTypeObject* type_;
-  std::vector<nb::object> values_;
+  std::array<PyObject*, 12> few_;
+  std::unique_ptr<PyObject*[]> many_;
+  PyObject** values_;
+  size_t count_ = 0;
 };
 
 // TypeError for what is no class whose instances TupleFiller can make. The interpreter itself says whether a class is

@@ -97,6 +97,7 @@ class Line:
 
     __slots__ = (
         "_index",
+        "_logical",
         "_native",
         "_records",
         "error",
@@ -105,20 +106,23 @@ class Line:
         "in_async_def",
         "indent",
         "last_line",
-        "logical",
     )
-
-    logical: CLogicalLine
-    error: SyntaxError | None
 
     def __init__(self, native: _host.AnalyzedSource, index: int) -> None:
         self._native = native
         self._index = index
-        self.logical, first_line, last_line, self.indent, self.in_async_def, self.first_in_def = native.At(index)
-        self.first_line = first_line + 1
-        self.last_line = last_line + 1
-        self.error = native.ErrorAt(index)
+        self.first_line, self.last_line, self.indent, self.in_async_def, self.first_in_def, self.error = native.PlaceAt(
+            index
+        )
+        self._logical: CLogicalLine | None = None
         self._records: tuple[Record, ...] | None = None
+
+    @property
+    def logical(self) -> CLogicalLine:
+        """The core's own record of the line, made when it is first asked for."""
+        if self._logical is None:
+            self._logical = self._native.LogicalAt(self._index)
+        return self._logical
 
     @property
     def records(self) -> tuple[Record, ...]:
@@ -143,10 +147,10 @@ class _Lines(Sequence[Line]):
 
     def __init__(self, native: _host.AnalyzedSource) -> None:
         self._native = native
-        self._made: dict[int, Line] = {}
+        self._made: list[Line | None] = [None] * len(native)
 
     def __len__(self) -> int:
-        return len(self._native)
+        return len(self._made)
 
     @overload
     def __getitem__(self, index: int) -> Line: ...
@@ -155,19 +159,20 @@ class _Lines(Sequence[Line]):
     def __getitem__(self, index: slice) -> Sequence[Line]: ...
 
     def __getitem__(self, index: int | slice) -> Line | Sequence[Line]:
-        places = range(len(self))[index]
-        if isinstance(places, int):
-            return self._at(places)
-        return [self._at(place) for place in places]
+        if isinstance(index, slice):
+            return [self[place] for place in range(len(self))[index]]
+        line = self._made[index]
+        if line is None:
+            line = self._made[index] = Line(self._native, index % len(self))
+        return line
 
     def __iter__(self) -> Iterator[Line]:
-        return map(self._at, range(len(self)))
-
-    def _at(self, index: int) -> Line:
-        line = self._made.get(index)
-        if line is None:
-            line = self._made[index] = Line(self._native, index)
-        return line
+        # The loop of those who read all of a source.
+        made, native = self._made, self._native
+        for index, line in enumerate(made):
+            if line is None:
+                line = made[index] = Line(native, index)
+            yield line
 
 
 class Analysis:
