@@ -1,5 +1,6 @@
 // Outlines, symbols of the project, calls and problems.
 #include <algorithm>
+#include <optional>
 #include <span>
 #include <tuple>
 
@@ -286,9 +287,12 @@ std::vector<Call> Workspace::Callers(FileId id, uint32_t offset) {
   const SourceFile* file = in.Get(id);
   const uint32_t index = file == nullptr ? kNoIndex : in.OccurrenceAt(*file, offset);
   if (index == kNoIndex) return found;
+  std::optional<Impl::Visit> visit;  // of the file of the hits that follow each other
+  FileId visited = kNoFile;
   for (const Impl::Hit& hit : in.Uses(*file, index, true)) {
-    const Impl::Visit visit(in, hit.file);
-    const SourceFile* source = visit.file;
+    if (visited != hit.file) visit.emplace(in, hit.file);
+    visited = hit.file;
+    const SourceFile* source = visit->file;
     const bool decorates = hit.occurrence != kNoIndex && hit.location.role == "read" &&
                            (source->bindings.occurrences[hit.occurrence].flags & kNameDecorator) != 0;
     if (hit.location.role != "call" && !decorates) continue;

@@ -1,6 +1,7 @@
 // Uses of a name, everywhere, and what renaming it changes.
 #include <algorithm>
 #include <array>
+#include <optional>
 #include <unordered_map>
 
 #include "workspace/workspace_impl.h"
@@ -356,6 +357,8 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
     }
   }
   std::vector<Impl::Hit> hits = in.Uses(*file, index, true);
+  std::optional<Impl::Visit> visit;  // of the file of the hits that follow each other
+  FileId visited = kNoFile;
   for (const Impl::Hit& hit : hits) {
     if (only_certain && hit.location.certainty != Certainty::kCertain) {
       const SourceFile* source = hit.occurrence == kNoIndex ? nullptr : in.Get(hit.file);
@@ -367,8 +370,9 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
       return rename;
     }
     if (!in.IsProject(hit.file) || hit.location.role == "module") continue;
-    const Impl::Visit visit(in, hit.file);
-    const SourceFile* source = visit.file;
+    if (visited != hit.file) visit.emplace(in, hit.file);
+    visited = hit.file;
+    const SourceFile* source = visit->file;
     const Text there(source->text().data() + hit.location.begin, hit.location.end - hit.location.begin);
     if (there != old_name) continue;
     // A name that the scope has already would be taken for this one.
