@@ -218,6 +218,7 @@ class Inference {
   // The bindings that reach a name; empty for attributes.
   std::vector<Binding> BindingsReaching(const SourceFile& file, uint32_t occurrence, bool* may_be_unbound = nullptr);
   // The bindings of a variable that its scope is left with.
+  void DropImportsOfItself(const SourceFile& file, std::vector<uint32_t>& bindings);
   std::vector<Binding> BindingsAtEnd(const SourceFile& file, uint32_t symbol);
   // The members that an attribute of this name may be, one for each type of the receiver that has it.
   std::vector<Member> MembersOf(Value receiver, Text name, uint8_t& doubt);

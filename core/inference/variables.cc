@@ -81,6 +81,7 @@ std::vector<Binding> Inference::BindingsReaching(const SourceFile& file, uint32_
       (at == owner.scope ? own : elsewhere).push_back(other.begin);
     }
   }
+  DropImportsOfItself(file, own);
   std::vector<uint32_t> reached;
   bool is_bound = false;
   if (scope.kind != NameScopeKind::kModule && scope.kind != NameScopeKind::kFunction &&
@@ -412,6 +413,26 @@ Value Inference::ValueOfBindings(std::span<const Binding> bindings, FrameId fram
   return value;
 }
 
+// An import of a module's name by the module itself leaves the name what it is.
+void Inference::DropImportsOfItself(const SourceFile& file, std::vector<uint32_t>& bindings) {
+  if (bindings.size() < 2) return;
+  const auto is_of_itself = [&](uint32_t offset) {
+    const ExprId named = file.syntax.NamedAt(offset);
+    const ExprId alias = named == kNoExpr ? kNoExpr : file.syntax[named].parent;
+    if (alias == kNoExpr || file.syntax[alias].kind != ExprKind::kImportAlias) return false;
+    const Stmt& stmt = file.syntax.stmt(file.syntax.StatementAt(offset));
+    const auto exprs = file.syntax.ExprsOf(stmt);
+    if (stmt.kind != StmtKind::kFromImport || exprs.empty()) return false;
+    const Text name = file.syntax.NameOf(named);
+    if (file.syntax.NameOf(file.syntax.ChildOf(alias, 0)) != name) return false;
+    const ModuleId module = modules_.FindFrom(file.id, file.syntax[exprs[0]].op, file.syntax.DottedNameOf(exprs[0]));
+    return module != kNoModule && FileOfModule(module) == file.id && modules_.Child(module, name) == kNoModule;
+  };
+  std::vector<uint32_t> others;
+  std::ranges::remove_copy_if(bindings, std::back_inserter(others), is_of_itself);
+  if (!others.empty()) bindings = std::move(others);
+}
+
 std::vector<Binding> Inference::BindingsAtEnd(const SourceFile& file, uint32_t symbol) {
   std::vector<uint32_t> own, elsewhere, reached;
   const NameSymbol& owner = file.bindings.symbols[symbol];
@@ -420,6 +441,7 @@ std::vector<Binding> Inference::BindingsAtEnd(const SourceFile& file, uint32_t s
     if (!Binds(occurrence) || !IsReachable(file, file.syntax.StatementAt(occurrence.begin))) continue;
     (file.bindings.ScopeOf(occurrence) == owner.scope ? own : elsewhere).push_back(occurrence.begin);
   }
+  DropImportsOfItself(file, own);
   const NameScopeKind kind = file.bindings.scopes[owner.scope].kind;
   if (kind == NameScopeKind::kModule || kind == NameScopeKind::kClass || kind == NameScopeKind::kFunction) {
     const std::function<int(ExprId)> truth = [&](ExprId condition) { return StaticTruth(file, condition); };

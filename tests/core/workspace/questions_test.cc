@@ -17,6 +17,16 @@ using Words = std::vector<std::string>;
 
 // ---- definitions ----
 
+TEST(Definitions, OfWhatAModuleImportsFromItself) {
+  Program program({
+      {"p/__init__.py", ""},
+      {"p/a.py", "class A:\n  def m(self): pass\nfrom p.a import A\nclass B(A): pass\n$A\n"},
+      {"p/b.py", "from .a import B\nB().$m()\n"},
+  });
+  EXPECT_EQ(program.Types(0), "type[p.a.A]");
+  EXPECT_EQ(program.Types(1), "def () -> None");
+}
+
 TEST(Definitions, LieInOtherFiles) {
   Program program({
       {"main.py",
