@@ -247,6 +247,30 @@ void Inference::FindMembers(ClassId cls) {
     }
   }
   const Stmt& own = syntax.stmt(info.stmt);
+  const auto add_written = [&](uint32_t occurrence_of_name, bool is_class) {
+    const uint32_t variable =
+        occurrence_of_name == kNoIndex ? kNoIndex : bindings.VariableOf(bindings.occurrences[occurrence_of_name]);
+    if (variable == kNoIndex) return;
+    for (const uint32_t i : file->occurrences().Of(variable)) {
+      const uint32_t next = i + 1;
+      if (next >= bindings.occurrences.size()) continue;
+      const Occurrence& attribute = bindings.occurrences[next];
+      if (!attribute.is_attribute || bindings.ReceiverOf(next) != i) continue;
+      if (attribute.role != NameRole::kWrite && attribute.role != NameRole::kDefinition) continue;
+      const Text name = Kept(bindings.TextOf(attribute));
+      std::vector<uint32_t>& places = info.self_attributes[name];
+      if (std::ranges::find(places, attribute.begin) == places.end()) places.push_back(attribute.begin);
+      if (is_class) info.class_written.insert(name);
+    }
+  };
+  // Whether a call makes an instance of the class that a name stands for: `cls(x)`, `super().__new__(cls)`.
+  const auto makes_instance = [&](ExprId expr, Text class_name) {
+    if (syntax[expr].kind != ExprKind::kCall) return false;
+    const auto parts = syntax.ChildrenOf(expr);
+    if (syntax[parts[0]].kind == ExprKind::kName) return syntax.NameOf(parts[0]) == class_name;
+    return syntax[parts[0]].kind == ExprKind::kAttribute && syntax.NameOf(parts[0]) == "__new__" && parts.size() > 1 &&
+           syntax[parts[1]].kind == ExprKind::kName && syntax.NameOf(parts[1]) == class_name;
+  };
   // Statements of a block stand behind their owner.
   for (StmtId id = info.stmt + 1; id < syntax.stmts.size() && syntax.stmt(id).begin < own.block_end; ++id) {
     const Stmt& stmt = syntax.stmt(id);
@@ -269,19 +293,15 @@ void Inference::FindMembers(ClassId cls) {
     if ((functions_[function].flags & kIsStatic) != 0 && syntax.NameOf(stmt) != "__new__") continue;
     const auto parameters = syntax.ArgumentsOf(stmt);
     if (parameters.empty() || syntax[parameters[0]].op != static_cast<uint8_t>(ParameterKind::kPlain)) continue;
-    const uint32_t self = file->OccurrenceBeginningAt(syntax[parameters[0]].name_begin);
-    if (self == kNoIndex) continue;
-    const uint32_t variable = bindings.VariableOf(bindings.occurrences[self]);
-    if (variable == kNoIndex) continue;
-    for (const uint32_t i : file->occurrences().Of(variable)) {
-      const uint32_t next = i + 1;
-      if (next >= bindings.occurrences.size()) continue;
-      const Occurrence& attribute = bindings.occurrences[next];
-      if (!attribute.is_attribute || bindings.ReceiverOf(next) != i) continue;
-      if (attribute.role != NameRole::kWrite && attribute.role != NameRole::kDefinition) continue;
-      const Text name = Kept(bindings.TextOf(attribute));
-      info.self_attributes[name].push_back(attribute.begin);
-      if ((functions_[function].flags & (kIsClassMethod | kIsStatic)) != 0) info.class_written.insert(name);
+    const bool is_of_class = (functions_[function].flags & (kIsClassMethod | kIsStatic)) != 0;
+    add_written(file->OccurrenceBeginningAt(syntax[parameters[0]].name_begin), is_of_class);
+    if (!is_of_class) continue;
+    const Text class_name = syntax.NameOf(parameters[0]);
+    for (StmtId inner = id + 1; inner < syntax.stmts.size() && syntax.stmt(inner).begin < stmt.block_end; ++inner) {
+      const auto exprs = syntax.ExprsOf(syntax.stmt(inner));
+      if (syntax.stmt(inner).kind != StmtKind::kAssign || exprs.size() != 2) continue;
+      if (syntax[exprs[0]].kind == ExprKind::kName && makes_instance(exprs[1], class_name))
+        add_written(file->OccurrenceBeginningAt(syntax[exprs[0]].begin), false);
     }
   }
   if (info.is_dataclass || info.is_named_tuple || info.is_typed_dict) {

@@ -17,6 +17,20 @@ using Words = std::vector<std::string>;
 
 // ---- definitions ----
 
+TEST(Definitions, OfAttributesThatAMakerOfInstancesSets) {
+  Program program(
+      "class A(object):\n"
+      "  def __new__(cls, x):\n    obj = super().__new__(cls)\n    obj.x = x\n    other = []\n    other.y = 1\n"
+      "    return obj\n"
+      "  @classmethod\n  def made(cls):\n    new = cls(1)\n    new.z = 'z'\n    return new\n"
+      "  def m(self):\n    self.$x\n    self.$z\n    self.$y\n");
+  EXPECT_EQ(program.Say(program->Definitions(program[0].file, program[0].offset)), Words{"a.py:4:9"});
+  EXPECT_EQ(program.Say(program->Definitions(program[1].file, program[1].offset)), Words{"a.py:11:9"});
+  EXPECT_EQ(program.Types(1), "builtins.str");
+  for (const Location& place : program->Definitions(program[2].file, program[2].offset))
+    EXPECT_EQ(place.certainty, Certainty::kByName);
+}
+
 TEST(Definitions, OfWhatAModuleImportsFromItself) {
   Program program({
       {"p/__init__.py", ""},
