@@ -108,13 +108,15 @@ def test_an_empty_source_has_no_statement() -> None:
 
 @given(st.binary(max_size=200))
 def test_any_bytes_are_analysed_to_their_end(source: bytes) -> None:
-    try:
-        analysis = analyze(source)
-    except SourceEncodingError:
-        return
-    for line in analysis.lines:
-        assert 1 <= line.first_line <= line.last_line
-        assert line.error is None or not line.records
+    for exact in (False, True):
+        try:
+            analysis = analyze(source, exact=exact)
+        except SourceEncodingError:
+            return
+        for line in analysis.lines:
+            assert 1 <= line.first_line <= line.last_line
+            # What is wrong in its context alone has records, too.
+            assert line.error is None or not line.records or not exact
 
 
 # Statements and scraps of them, so that most texts come near to Python.
