@@ -36,8 +36,9 @@ BatchAnalyzer::BatchAnalyzer(Options options, std::vector<BatchInput> inputs)
     : options_(std::move(options)), inputs_(std::move(inputs)), ring_(new Ring(*this, false)) {}
 
 BatchAnalyzer::~BatchAnalyzer() {
-  Ring* const ring = ring_;
-  if (ring->IsOfThisProcess()) delete ring;
+  dismissed_.push_back(ring_);
+  for (const Ring* ring : dismissed_)
+    if (ring->IsOfThisProcess()) delete ring;
 }
 
 BatchAnalyzer::Ring& BatchAnalyzer::TheRing() {
@@ -73,7 +74,8 @@ void BatchAnalyzer::Cancel() {
 void BatchAnalyzer::DismissThreads() {
   Ring& ring = TheRing();
   ring.Dismiss();
-  // The old one stays: readers may still be on their way out of it.
+  // The old one stays as long as this does: readers may still be on their way out of it.
+  dismissed_.push_back(&ring);
   ring_ = new Ring(*this, true);
   ring_.notify_all();
 }

@@ -120,6 +120,7 @@ class BatchAnalyzer {
   std::atomic<size_t> handed_out_{0};
   std::atomic<bool> was_cancelled_{false};
   std::atomic<Ring*> ring_;
+  std::vector<Ring*> dismissed_;  // those before it
 };
 
 }  // namespace quillet

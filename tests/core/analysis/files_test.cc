@@ -223,7 +223,7 @@ TEST(Memory, WhatIsMadeOfTheResultsCounts) {
 
 // ---- the stack ----
 
-#ifdef __SANITIZE_THREAD__
+#if defined(__SANITIZE_THREAD__) || defined(__SANITIZE_ADDRESS__)
 constexpr size_t kSmallStack = size_t{4} << 20;  // frames are several times as large
 #else
 constexpr size_t kSmallStack = size_t{512} << 10;

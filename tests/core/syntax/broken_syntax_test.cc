@@ -214,7 +214,11 @@ TEST_F(BrokenSyntax, DepthHasALimit) {
   } run{this};
   pthread_attr_t attributes;
   pthread_attr_init(&attributes);
+#if defined(__SANITIZE_THREAD__) || defined(__SANITIZE_ADDRESS__)
+  pthread_attr_setstacksize(&attributes, size_t{4} << 20);  // frames are several times as large
+#else
   pthread_attr_setstacksize(&attributes, size_t{512} << 10);
+#endif
   pthread_t thread;
   ASSERT_EQ(pthread_create(&thread, &attributes, &Run::Start, &run), 0);
   pthread_join(thread, nullptr);
