@@ -8,11 +8,12 @@ from __future__ import annotations
 
 import os
 import re
-import tarfile
 import zipfile
 import zlib
 from collections.abc import Iterable, Iterator, Sequence
 from typing import Any, NamedTuple
+
+from quillet.corpus.tar import TarError, regular_files
 
 # What one row is: package, where it comes from, its path there, its bytes, and why there are none.
 Row = tuple[str, str, str, "bytes | str | None", "str | None"]
@@ -27,7 +28,7 @@ MOST_BYTES = 64 << 20
 _UNIT_BYTES = 8 << 20
 _EXPANSION = 5
 _SDIST = re.compile(r"(.+?)-v?\d[^/]*$")
-_UNREADABLE = (OSError, EOFError, ValueError, RuntimeError, NotImplementedError, tarfile.TarError, zipfile.BadZipFile)
+_UNREADABLE = (OSError, EOFError, ValueError, RuntimeError, NotImplementedError, TarError, zipfile.BadZipFile)
 
 
 class Unit(NamedTuple):
@@ -161,19 +162,15 @@ def _read_files(unit: Unit, _columns: Columns) -> Iterator[Row]:
 def _read_tar(unit: Unit, _columns: Columns) -> Iterator[Row]:
     source = os.path.basename(unit.path)
     package = package_of(source)
-    with tarfile.open(unit.path, "r|*", bufsize=1 << 18) as archive:
-        for member in archive:
-            # It remembers all members, for who asks for one by name.
-            archive.members.clear()  # type: ignore[attr-defined]
-            if not member.isreg() or not member.name.lower().endswith(_PYTHON):
-                continue
-            name = member.name.encode("utf-8", "surrogateescape").decode("utf-8", "backslashreplace")
-            if member.size > MOST_BYTES:
-                yield package, source, name, None, _too_large(member.size)
-                continue
-            file = archive.extractfile(member)
-            assert file is not None
-            yield package, source, name, file.read(), None
+    for name, size, content in regular_files(unit.path, _is_python, MOST_BYTES):
+        problem = None
+        if content is None:
+            problem = _too_large(size) if size > MOST_BYTES else "the source is stored with holes"
+        yield package, source, name, content, problem
+
+
+def _is_python(name: str) -> bool:
+    return name.lower().endswith(_PYTHON)
 
 
 def _read_zip(unit: Unit, _columns: Columns) -> Iterator[Row]:
