@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import itertools
+import sys
 from collections.abc import Iterator
 from pathlib import Path
 from typing import Any
@@ -316,6 +317,57 @@ def test_progress_of_what_reads_the_program(client: Client) -> None:
     # It has ended when the answer comes.
     told = [at["params"] for at in client.told[begin:] if at.get("method") == "$/progress"]
     assert [(at["token"], at["value"]["kind"]) for at in told] == [("mine", "begin"), ("mine", "end")]
+
+
+# The server, telling at once what takes a while.
+HASTY = [
+    sys.executable,
+    "-c",
+    "import sys; from quillet.server import main, progress; progress.DELAY = 0; sys.exit(main.serve())",
+]
+
+
+def slow_program(folder: Path) -> Path:
+    """One in which references take a while, the first time."""
+    body = "".join(f"def f_{n}(a):\n    return Base().run(a.run(f_{n}))\n\n\n" for n in range(60))
+    (folder / "base.py").write_text("class Base:\n    def run(self, x):\n        return x\n")
+    for number in range(400):
+        (folder / f"m_{number}.py").write_text(f"from base import Base\n\n\n{body}")
+    return folder.resolve()
+
+
+def test_progress_that_the_server_begins(tmp_path: Path) -> None:
+    with Client(slow_program(tmp_path), command=HASTY) as client:
+        client.open("base.py")
+        found = client.ask("references", "base.py", "run", context={"includeDeclaration": True})
+        assert len(found) == 1 + 2 * 60 * 400
+        [created] = [at for at in client.told if at.get("method") == "window/workDoneProgress/create"]
+        token = created["params"]["token"]
+        told = [at["params"] for at in client.told if at.get("method") == "$/progress"]
+        assert [(at["token"], at["value"]["kind"]) for at in told] == [(token, "begin"), (token, "end")]
+        assert told[0]["value"] == {"kind": "begin", "title": "Looking for references", "cancellable": True}
+    with Client(tmp_path.resolve(), command=HASTY, capabilities={"window": {}}) as client:
+        client.open("base.py")
+        client.ask("references", "base.py", "run", context={"includeDeclaration": True})
+        assert not [at for at in client.told if "rogress" in at.get("method", "")]
+
+
+@pytest.mark.parametrize("token", ["mine", 7, None])
+def test_what_takes_long_is_taken_back_by_its_progress(tmp_path: Path, token: str | int | None) -> None:
+    with Client(slow_program(tmp_path), command=HASTY) as client:
+        client.open("base.py")
+        asked = {**client.at("base.py", "run"), "context": {"includeDeclaration": True}}
+        question = client.Begin(
+            "textDocument/references", asked if token is None else {**asked, "workDoneToken": token}
+        )
+        begun = client.Wait(lambda told: told.get("method") == "$/progress")["params"]
+        client.Tell("window/workDoneProgress/cancel", {"token": "of another"})
+        client.Tell("window/workDoneProgress/cancel", {"token": begun["token"]})
+        with pytest.raises(Refused) as refused:
+            client.Answer(question)
+        assert refused.value.code == -32800
+        told = [at["params"]["value"]["kind"] for at in client.told if at.get("method") == "$/progress"]
+        assert told == ["begin", "end"]
 
 
 # ---- settings ----

@@ -6,16 +6,18 @@ goes or is saved.
 
 from __future__ import annotations
 
-from typing import Any
-
-from lsprotocol import types
+from typing import TYPE_CHECKING, Any
 
 from quillet.server.documents import Document
 from quillet.server.features import feature
 from quillet.server.language_server import Server
 from quillet.server.positions import range_of
 
-_ERROR, _WARNING = types.DiagnosticSeverity.Error.value, types.DiagnosticSeverity.Warning.value
+if TYPE_CHECKING:
+    from lsprotocol import types
+
+# As the protocol numbers severities.
+_ERROR, _WARNING = 1, 2
 # Behind the last change of another file.
 _DELAY_OF_OTHERS = 0.3
 
@@ -42,8 +44,9 @@ def problems_of(ls: Server, uri: str) -> list[dict[str, Any]]:
 
 
 @feature(
-    types.TEXT_DOCUMENT_DIAGNOSTIC,
-    types.DiagnosticOptions(inter_file_dependencies=True, workspace_diagnostics=False, identifier="quillet"),
+    "textDocument/diagnostic",
+    "diagnosticProvider",
+    {"interFileDependencies": True, "workspaceDiagnostics": False, "identifier": "quillet"},
 )
 def diagnostic(ls: Server, params: types.DocumentDiagnosticParams) -> Any:
     items = problems_of(ls, params.text_document.uri)
@@ -77,7 +80,7 @@ def forget(ls: Server, document: Document) -> None:
 def _check_all(ls: Server) -> None:
     if ls.pulls_diagnostics:
         if ls.refreshes_diagnostics:
-            ls.protocol.send_request("workspace/diagnostic/refresh", None)
+            ls.protocol.ask("workspace/diagnostic/refresh")
         return
     for document in ls.documents:
         check(ls, document)

@@ -6,14 +6,19 @@ import os
 import re
 from collections.abc import Iterator
 from functools import lru_cache
-from urllib.parse import quote, unquote_to_bytes, urlsplit
 
 _DRIVE = re.compile(r"/[A-Za-z]:")
+# What means itself in a path and in a URI; most of both is nothing else, and `urllib` takes a while to load.
+_PLAIN = re.compile(r"/[\w./~-]*", re.ASCII)
 
 
 @lru_cache(maxsize=4096)
 def path_of(uri: str) -> str:
     """The path that a URI stands for; one of its own for what is no file, such as a text without a name."""
+    if os.name != "nt" and uri.startswith("file:///") and _PLAIN.fullmatch(uri, 7):
+        return os.path.abspath(uri[7:])
+    from urllib.parse import unquote_to_bytes, urlsplit
+
     parts = urlsplit(uri)
     if parts.scheme != "file":
         name = "".join(letter if letter.isalnum() else "_" for letter in uri)
@@ -32,6 +37,10 @@ def uri_of(path: str) -> str:
     """The URI of a file."""
     if os.name == "nt":
         path = "/" + path.replace("\\", "/")
+    if _PLAIN.fullmatch(path):
+        return "file://" + path
+    from urllib.parse import quote
+
     return "file://" + quote(os.fsencode(path))
 
 

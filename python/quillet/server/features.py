@@ -3,26 +3,25 @@
 from __future__ import annotations
 
 from collections.abc import Callable
-from typing import Any, NamedTuple, TypeVar
+from typing import Any, TypeVar
 
 Answer = TypeVar("Answer", bound=Callable[..., Any])
 
-
-class Feature(NamedTuple):
-    """What answers a method, and what the client is told of it."""
-
-    answer: Callable[..., Any]
-    options: Any
+# What answers a method.
+FEATURES: dict[str, Callable[..., Any]] = {}
+# What clients are told of it, as `initialize` has it.
+PROVIDERS: dict[str, Any] = {}
 
 
-FEATURES: dict[str, Feature] = {}
-
-
-def feature(method: str, options: Any = None) -> Callable[[Answer], Answer]:
-    """Makes a function of the server and parameters the answer to a method."""
+def feature(method: str, provider: str | None = None, options: Any = True) -> Callable[[Answer], Answer]:
+    """Makes a function of the server and parameters the answer to a method, of which the client is told by the name
+    and the options of a provider, where it has one.
+    """
 
     def keep(answer: Answer) -> Answer:
-        FEATURES[method] = Feature(answer, options)
+        FEATURES[method] = answer
+        if provider is not None:
+            PROVIDERS[provider] = options
         return answer
 
     return keep

@@ -2,14 +2,11 @@
 
 from __future__ import annotations
 
-import logging
 from collections.abc import Callable
 from typing import Any, NamedTuple
 
-from lsprotocol import types
-from pygls.lsp.server import LanguageServer
-
 from quillet._workspace import Stopped, Workspace
+from quillet.server import log
 from quillet.server.documents import Document, Documents, path_of
 from quillet.server.positions import place_of
 from quillet.server.projects import Projects
@@ -17,10 +14,10 @@ from quillet.server.protocol import Protocol
 from quillet.server.work import Work
 from quillet.settings import Settings
 
-log = logging.getLogger(__name__)
-
 # Above so many characters a document is not read.
 MOST_TEXT = 1 << 25
+# As the protocol numbers kinds of messages.
+_ERROR = 1
 
 
 class Place(NamedTuple):
@@ -37,18 +34,16 @@ class Place(NamedTuple):
         return self.path, self.line, self.column
 
 
-class Server(LanguageServer):
+class Server:
     """The server of one client."""
 
-    protocol: Protocol
-
-    def __init__(self, version: str) -> None:
-        super().__init__("quillet", version, protocol_cls=Protocol, max_workers=1)
+    def __init__(self, protocol: Protocol) -> None:
+        self.protocol = protocol
         self.documents = Documents()
         self.projects = Projects(self.complain, self._open_all)
         self.work = Work(self._stop)
-        # Where names were offered last, of which more may be asked: the document, its version, the position.
-        self.completed: tuple[str, int | None, types.Position] | None = None
+        # Where names were offered last, of which more may be asked: the document, its version, the place.
+        self.completed: tuple[str, int | None, int, int] | None = None
         self.completion_number = 0
         # What the client understands, as the answers need it.
         self.has_markdown = True
@@ -58,7 +53,6 @@ class Server(LanguageServer):
         self.refreshes_diagnostics = False
         self.has_watchers = False
         self.has_configuration = False
-        self.has_progress = False
 
     # ---- what answers need ----
 
@@ -99,7 +93,7 @@ class Server(LanguageServer):
     def complain(self, text: str) -> None:
         """Tells the user what is wrong."""
         log.warning("%s", text)
-        self.protocol.tell("window/showMessage", {"type": types.MessageType.Error.value, "message": f"quillet: {text}"})
+        self.protocol.tell("window/showMessage", {"type": _ERROR, "message": f"quillet: {text}"})
 
     # ---- texts ----
 

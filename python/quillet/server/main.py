@@ -3,27 +3,24 @@
 from __future__ import annotations
 
 import json
-import logging
 import os
 import signal
 import sys
 import threading
 import time
+from collections.abc import Callable
 from functools import partial
 from typing import Any
 
-from lsprotocol import types
-
 from quillet import __version__
-from quillet.server import diagnostics, navigation, reading, sync, writing  # noqa: F401
+from quillet._workspace import Columns
+from quillet.server import diagnostics, log, navigation, reading, sync, writing  # noqa: F401
 from quillet.server.documents import path_of
-from quillet.server.features import FEATURES
+from quillet.server.features import FEATURES, PROVIDERS
 from quillet.server.language_server import Server
-from quillet.server.protocol import INVALID_REQUEST, PARSE_ERROR, Again
+from quillet.server.protocol import INVALID_REQUEST, PARSE_ERROR, Again, Protocol
 from quillet.server.streams import MalformedFrame, MessageReader, MessageWriter
 from quillet.server.work import Job
-
-log = logging.getLogger(__name__)
 
 # How long what there is to do may take when the client has gone.
 _GRACE = 2.0
@@ -33,7 +30,8 @@ _LOOK_AT_CLIENT = 1.0
 def serve(log_file: str | None = None) -> int:
     """Serves the client at standard input and output; the exit code. Neither stream is used by anything else."""
     source, sink = _take_streams()
-    _log_to(log_file)
+    if log_file is not None:
+        log.write_to(log_file)
     signal.signal(signal.SIGINT, signal.SIG_IGN)  # one for the editor in the same terminal is none for this
     try:
         return _serve(source, sink)
@@ -43,12 +41,10 @@ def serve(log_file: str | None = None) -> int:
 
 
 def _serve(source: int, sink: int) -> int:
-    server = Server(__version__)
-    server.protocol.set_writer(MessageWriter(sink))
-    for method, (answer, options) in FEATURES.items():
-        server.feature(method, options)(partial(answer, server))
-    server.feature(types.INITIALIZE)(partial(_initialize, server))
-    server.feature(types.INITIALIZED)(partial(_initialized, server))
+    features: dict[str, Callable[[Any], Any]] = {}
+    server = Server(Protocol(MessageWriter(sink), features))
+    for method, answer in {**FEATURES, **_LIFE}.items():
+        features[method] = partial(answer, server)
     client = _Client(server)
     threading.Thread(target=client.read, args=(MessageReader(source),), daemon=True).start()
     return client.work()
@@ -62,18 +58,6 @@ def _take_streams() -> tuple[int, int]:
         os.dup2(nothing, descriptor)
     os.close(nothing)
     return source, sink
-
-
-def _log_to(log_file: str | None) -> None:
-    root = logging.getLogger()
-    if log_file is None:
-        root.addHandler(logging.NullHandler())
-        logging.disable()
-        return
-    logging.basicConfig(
-        filename=log_file, level=logging.INFO, format="%(asctime)s %(levelname)s %(name)s: %(message)s", force=True
-    )
-    logging.getLogger("pygls").setLevel(logging.WARNING)
 
 
 class _Client:
@@ -112,9 +96,14 @@ class _Client:
         job = Job(message)
         if job.method == "initialize":
             self._watch_process(message)
+        if job.method is None and self._server.protocol.take_at_once(message):
+            return
+        params = message.get("params")
+        given = params if isinstance(params, dict) else {}
         if job.method == "$/cancelRequest":
-            params = message.get("params")
-            self._work.cancel(params.get("id") if isinstance(params, dict) else None)
+            self._work.cancel(given.get("id"))
+        elif job.method == "window/workDoneProgress/cancel":
+            self._work.cancel_progress(given.get("token"))
         elif job.method == "exit":
             self._work.end(at_once=True)
         else:
@@ -177,34 +166,69 @@ def _is_alive(process: int) -> bool:
         return sys.platform != "linux"
 
 
-# ---- the first messages ----
+# ---- how a session begins and ends ----
+
+_ENCODINGS = ("utf-8", "utf-16", "utf-32")
 
 
-def _initialize(ls: Server, params: types.InitializeParams) -> None:
-    can = params.capabilities
-    text, workspace = can.text_document, can.workspace
-    ls.projects.columns = ls.protocol.agreed_columns()
-    hover = text and text.hover
-    formats = (hover and hover.content_format) or []
-    ls.has_markdown = not formats or types.MarkupKind.Markdown in formats
-    symbols = text and text.document_symbol
-    ls.has_hierarchy = bool(symbols and symbols.hierarchical_document_symbol_support)
-    edits = workspace and workspace.workspace_edit
-    ls.has_versions = bool(edits and edits.document_changes)
-    ls.pulls_diagnostics = bool(text and text.diagnostic)
-    ls.refreshes_diagnostics = bool(workspace and workspace.diagnostics and workspace.diagnostics.refresh_support)
-    watched = workspace and workspace.did_change_watched_files
-    ls.has_watchers = bool(watched and watched.dynamic_registration)
-    ls.has_configuration = bool(workspace and workspace.configuration)
-    ls.has_progress = bool(can.window and can.window.work_done_progress)
-    folders = [path_of(folder.uri) for folder in params.workspace_folders or ()]
-    if not folders and (params.root_uri or params.root_path):
-        folders = [path_of(params.root_uri) if params.root_uri else os.path.abspath(params.root_path or "")]
-    ls.projects.start(folders, sync.own_settings(params.initialization_options))
+def _initialize(ls: Server, params: Any) -> Any:
+    given = params if isinstance(params, dict) else {}
+    can = given.get("capabilities")
+    wanted = _list(_part(can, "general", "positionEncodings"))
+    encoding: Columns = next((each for each in wanted if each in _ENCODINGS), "utf-16")
+    ls.projects.columns = encoding
+    formats = _list(_part(can, "textDocument", "hover", "contentFormat"))
+    ls.has_markdown = not formats or "markdown" in formats
+    ls.has_hierarchy = bool(_part(can, "textDocument", "documentSymbol", "hierarchicalDocumentSymbolSupport"))
+    ls.has_versions = bool(_part(can, "workspace", "workspaceEdit", "documentChanges"))
+    ls.pulls_diagnostics = bool(_part(can, "textDocument", "diagnostic"))
+    ls.refreshes_diagnostics = bool(_part(can, "workspace", "diagnostics", "refreshSupport"))
+    ls.has_watchers = bool(_part(can, "workspace", "didChangeWatchedFiles", "dynamicRegistration"))
+    ls.has_configuration = bool(_part(can, "workspace", "configuration"))
+    ls.protocol.has_progress = bool(_part(can, "window", "workDoneProgress"))
+    uris = [_part(folder, "uri") for folder in _list(given.get("workspaceFolders"))] or [given.get("rootUri")]
+    folders = [path_of(uri) for uri in uris if isinstance(uri, str) and uri]
+    if not folders and isinstance(given.get("rootPath"), str):
+        folders = [os.path.abspath(given["rootPath"])]
+    ls.projects.start(folders, sync.own_settings(given.get("initializationOptions")))
+    prepares = bool(_part(can, "textDocument", "rename", "prepareSupport"))
+    return {
+        "capabilities": {
+            "positionEncoding": encoding,
+            "textDocumentSync": {"openClose": True, "change": _INCREMENTAL, "save": True},
+            **PROVIDERS,
+            # No options for clients that do not know of them.
+            "renameProvider": PROVIDERS["renameProvider"] if prepares else True,
+            "workspace": {"workspaceFolders": {"supported": True, "changeNotifications": True}},
+        },
+        "serverInfo": {"name": "quillet", "version": __version__},
+    }
 
 
-def _initialized(ls: Server, _: types.InitializedParams) -> None:
+# As the protocol numbers ways to tell of changes.
+_INCREMENTAL = 2
+
+
+def _part(given: Any, *keys: str) -> Any:
+    """What stands in objects within objects, None where there is nothing."""
+    for key in keys:
+        given = given.get(key) if isinstance(given, dict) else None
+    return given
+
+
+def _list(given: Any) -> list[Any]:
+    return given if isinstance(given, list) else []
+
+
+def _initialized(ls: Server, _: Any) -> None:
     if ls.has_watchers:
         sync.watch_files(ls)
     if ls.has_configuration:
         sync.ask_for_settings(ls)
+
+
+def _shutdown(ls: Server, _: Any) -> None:
+    ls.protocol.is_shut_down = True
+
+
+_LIFE = {"initialize": _initialize, "initialized": _initialized, "shutdown": _shutdown}

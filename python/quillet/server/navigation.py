@@ -3,9 +3,7 @@
 from __future__ import annotations
 
 from collections.abc import Iterable
-from typing import Any
-
-from lsprotocol import types
+from typing import TYPE_CHECKING, Any
 
 from quillet._workspace import Call, Location, Workspace
 from quillet.server.documents import path_of
@@ -14,15 +12,19 @@ from quillet.server.language_server import Place, Server
 from quillet.server.positions import name_range, part_of, place_of
 from quillet.settings import Settings
 
+if TYPE_CHECKING:
+    from lsprotocol import types
+
+# As the protocol numbers kinds of symbols.
 SYMBOL_KINDS = {
-    "module": types.SymbolKind.Module.value,
-    "class": types.SymbolKind.Class.value,
-    "function": types.SymbolKind.Function.value,
-    "method": types.SymbolKind.Method.value,
-    "variable": types.SymbolKind.Variable.value,
-    "attribute": types.SymbolKind.Field.value,
-    "property": types.SymbolKind.Property.value,
-    "parameter": types.SymbolKind.Variable.value,
+    "module": 2,
+    "class": 5,
+    "function": 12,
+    "method": 6,
+    "variable": 13,
+    "attribute": 8,
+    "property": 7,
+    "parameter": 13,
 }
 _MOST_SYMBOLS = 300
 
@@ -39,31 +41,31 @@ def _sure(settings: Settings, locations: Iterable[Location]) -> list[Location]:
 # ---- from a name to where it comes from ----
 
 
-@feature(types.TEXT_DOCUMENT_DEFINITION)
+@feature("textDocument/definition", "definitionProvider")
 def definition(ls: Server, params: types.DefinitionParams) -> Any:
     place = ls.place(params)
     return _places(ls, place.workspace.definitions(*place.at, at_least=place.settings.certainty))
 
 
-@feature(types.TEXT_DOCUMENT_DECLARATION)
+@feature("textDocument/declaration", "declarationProvider")
 def declaration(ls: Server, params: types.DeclarationParams) -> Any:
     place = ls.place(params)
     return _places(ls, _sure(place.settings, place.workspace.declarations(*place.at)))
 
 
-@feature(types.TEXT_DOCUMENT_TYPE_DEFINITION)
+@feature("textDocument/typeDefinition", "typeDefinitionProvider")
 def type_definition(ls: Server, params: types.TypeDefinitionParams) -> Any:
     place = ls.place(params)
     return _places(ls, _sure(place.settings, place.workspace.type_definitions(*place.at)))
 
 
-@feature(types.TEXT_DOCUMENT_IMPLEMENTATION)
+@feature("textDocument/implementation", "implementationProvider")
 def implementation(ls: Server, params: types.ImplementationParams) -> Any:
     place = ls.place(params)
     return _places(ls, _sure(place.settings, place.workspace.implementations(*place.at)))
 
 
-@feature(types.TEXT_DOCUMENT_REFERENCES, types.ReferenceOptions(work_done_progress=True))
+@feature("textDocument/references", "referencesProvider", {"workDoneProgress": True})
 def references(ls: Server, params: types.ReferenceParams) -> Any:
     place = ls.place(params)
     found = place.workspace.references(*place.at, at_least=place.settings.certainty)
@@ -75,10 +77,11 @@ def references(ls: Server, params: types.ReferenceParams) -> Any:
 
 
 _ORDER = {"certain": 0, "likely": 1, "by name": 2}
-_READ, _WRITE = types.DocumentHighlightKind.Read.value, types.DocumentHighlightKind.Write.value
+# As the protocol numbers kinds of highlights.
+_READ, _WRITE = 2, 3
 
 
-@feature(types.TEXT_DOCUMENT_DOCUMENT_HIGHLIGHT)
+@feature("textDocument/documentHighlight", "documentHighlightProvider")
 def highlight(ls: Server, params: types.DocumentHighlightParams) -> Any:
     place = ls.place(params)
     found = place.workspace.references(*place.at, at_least=place.settings.certainty, everywhere=False)
@@ -90,7 +93,7 @@ def highlight(ls: Server, params: types.DocumentHighlightParams) -> Any:
 # ---- symbols ----
 
 
-@feature(types.WORKSPACE_SYMBOL, types.WorkspaceSymbolOptions(work_done_progress=True))
+@feature("workspace/symbol", "workspaceSymbolProvider", {"resolveProvider": False, "workDoneProgress": True})
 def workspace_symbol(ls: Server, params: types.WorkspaceSymbolParams) -> Any:
     uri_of = ls.documents.uri_of
     return [
@@ -105,7 +108,7 @@ def workspace_symbol(ls: Server, params: types.WorkspaceSymbolParams) -> Any:
     ]
 
 
-@feature(types.TEXT_DOCUMENT_DOCUMENT_SYMBOL)
+@feature("textDocument/documentSymbol", "documentSymbolProvider")
 def document_symbol(ls: Server, params: types.DocumentSymbolParams) -> Any:
     workspace, _, path = ls.file(params.text_document.uri)
     outline = workspace.outline(path)
@@ -180,7 +183,7 @@ def _prepare(ls: Server, params: Any, kinds: tuple[str, ...]) -> Any:
     return [_item(ls, place.workspace, at) for at in found if at.kind in kinds] or None
 
 
-@feature(types.TEXT_DOCUMENT_PREPARE_CALL_HIERARCHY)
+@feature("textDocument/prepareCallHierarchy", "callHierarchyProvider")
 def prepare_call_hierarchy(ls: Server, params: types.CallHierarchyPrepareParams) -> Any:
     return _prepare(ls, params, ("function", "class"))
 
@@ -197,30 +200,30 @@ def _calls(ls: Server, place: Place, end: str, calls: Iterable[Call]) -> Any:
     return answer
 
 
-@feature(types.CALL_HIERARCHY_INCOMING_CALLS)
+@feature("callHierarchy/incomingCalls")
 def incoming_calls(ls: Server, params: types.CallHierarchyIncomingCallsParams) -> Any:
     place = _asked(ls, params.item)
     return _calls(ls, place, "from", place.workspace.callers(*place.at))
 
 
-@feature(types.CALL_HIERARCHY_OUTGOING_CALLS)
+@feature("callHierarchy/outgoingCalls")
 def outgoing_calls(ls: Server, params: types.CallHierarchyOutgoingCallsParams) -> Any:
     place = _asked(ls, params.item)
     return _calls(ls, place, "to", place.workspace.callees(*place.at))
 
 
-@feature(types.TEXT_DOCUMENT_PREPARE_TYPE_HIERARCHY)
+@feature("textDocument/prepareTypeHierarchy", "typeHierarchyProvider")
 def prepare_type_hierarchy(ls: Server, params: types.TypeHierarchyPrepareParams) -> Any:
     return _prepare(ls, params, ("class",))
 
 
-@feature(types.TYPE_HIERARCHY_SUPERTYPES)
+@feature("typeHierarchy/supertypes")
 def supertypes(ls: Server, params: types.TypeHierarchySupertypesParams) -> Any:
     place = _asked(ls, params.item)
     return [_item(ls, place.workspace, at) for at in _sure(place.settings, place.workspace.supertypes(*place.at))]
 
 
-@feature(types.TYPE_HIERARCHY_SUBTYPES)
+@feature("typeHierarchy/subtypes")
 def subtypes(ls: Server, params: types.TypeHierarchySubtypesParams) -> Any:
     place = _asked(ls, params.item)
     return [_item(ls, place.workspace, at) for at in _sure(place.settings, place.workspace.subtypes(*place.at))]

@@ -2,11 +2,12 @@
 
 from __future__ import annotations
 
-from typing import Any
-
-from lsprotocol import types
+from typing import TYPE_CHECKING, Any
 
 from quillet._workspace import Columns
+
+if TYPE_CHECKING:
+    from lsprotocol import types
 
 _MOST = 2**31 - 2
 

@@ -7,15 +7,12 @@ that led there, and where none is open in that of the project that it lies in.
 
 from __future__ import annotations
 
-import logging
 import os
 from collections.abc import Callable, Iterable, Mapping
 from typing import Any
 
 from quillet._workspace import Columns, Workspace
 from quillet.settings import Settings, SettingsError, load_settings
-
-log = logging.getLogger(__name__)
 
 CLIENT = "the editor's settings"
 

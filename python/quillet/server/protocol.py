@@ -1,28 +1,22 @@
-"""pygls' protocol, with what it leaves open: errors for whatever is no message, requests that are taken back or come
-too early, and answers that are plain dictionaries.
+"""Messages: what is asked is handed to what answers it, and answered, whatever it is.
 
-The text of a document is kept in the workspaces and not here a second time.
+What a message must hold is said by params.py. Answers are plain dictionaries, and the texts of documents are kept in
+the workspaces alone.
 """
 
 from __future__ import annotations
 
 import json
-import logging
 import time
-from collections.abc import Callable, Iterator
-from contextlib import contextmanager
-from typing import Any, cast
+from collections.abc import Callable, Mapping
+from typing import Any
 
-from lsprotocol import types
-from pygls.exceptions import JsonRpcException
-from pygls.lsp.server import LanguageServer
-from pygls.protocol import LanguageServerProtocol
-
-from quillet._workspace import Columns, RenameError, Stopped
+from quillet._workspace import RenameError, Stopped
+from quillet.server import log
+from quillet.server.params import read
+from quillet.server.progress import Progress
 from quillet.server.streams import MessageWriter
 from quillet.server.work import Job
-
-log = logging.getLogger(__name__)
 
 PARSE_ERROR = -32700
 INVALID_REQUEST = -32600
@@ -34,19 +28,6 @@ REQUEST_FAILED = -32803
 REQUEST_CANCELLED = -32800
 CONTENT_MODIFIED = -32801
 
-# What pygls does itself, and well.
-_OF_PYGLS = frozenset({"initialize", "initialized", "shutdown", "$/setTrace", "window/workDoneProgress/cancel"})
-
-# What reads all files of a program, the first time it is asked.
-_LONG = {
-    "textDocument/references": "Looking for references",
-    "textDocument/implementation": "Looking for implementations",
-    "textDocument/rename": "Looking for what is renamed",
-    "workspace/symbol": "Looking for symbols",
-    "callHierarchy/incomingCalls": "Looking for callers",
-    "typeHierarchy/subtypes": "Looking for subclasses",
-}
-
 
 class Again(Exception):
     """A question made way and is to be asked again."""
@@ -56,26 +37,19 @@ class RequestFailed(Exception):
     """A request cannot be done, for a reason that the user is to see."""
 
 
-class Protocol(LanguageServerProtocol):
-    """The protocol of one client."""
+class Protocol:
+    """The protocol of one client. `features` answers the methods that there are, each by its parameters."""
 
-    writer: MessageWriter
-
-    def __init__(self, server: LanguageServer, converter: Any) -> None:
-        super().__init__(server, converter)
+    def __init__(self, writer: MessageWriter, features: Mapping[str, Callable[[Any], Any]]) -> None:
+        self._writer = writer
+        self._features = features
+        # What is done with the client's answers, by the numbers of what it was asked; and whether at once.
+        self._asked: dict[Any, tuple[Callable[[Any], None] | None, bool]] = {}
+        self._number = 0
         self._is_initialized = False
-
-    def structure_message(self, data: dict[str, Any]) -> Any:
-        """Messages stay as they are until they are handled, where what is wrong with them can be answered."""
-        return data
-
-    @property
-    def is_shut_down(self) -> bool:
-        return bool(self._shutdown)
-
-    def agreed_columns(self) -> Columns:
-        """What columns count, as the client and the server agreed."""
-        return cast(Columns, str(getattr(self.workspace.position_encoding, "value", self.workspace.position_encoding)))
+        self.is_shut_down = False
+        # Whether the client takes tokens of progress that it did not give.
+        self.has_progress = False
 
     # ---- messages ----
 
@@ -89,41 +63,35 @@ class Protocol(LanguageServerProtocol):
         if not isinstance(job.method, str) or not ("id" not in message or isinstance(job.number, (int, str))):
             self.fail(None, INVALID_REQUEST, "a message needs a method, and an identifier that is a number or a text")
         elif job.is_request:
-            self._handle_request_of(job)
+            self._handle_request(job)
         else:
-            self._handle_notification_of(job)
+            self._handle_notification(job)
         log.info("%s %s: %.1f ms", job.method, job.number, (time.perf_counter() - began) * 1e3)
 
-    def _handle_request_of(self, job: Job) -> None:
+    def _handle_request(self, job: Job) -> None:
         problem = self._untimely(job)
         if problem is not None:
             self.fail(job.number, *problem)
             return
-        handler = self._handler_of(job.method)
-        if handler is None:
+        feature = self._features.get(job.method)
+        if feature is None:
             self.fail(job.number, METHOD_NOT_FOUND, f"there is no method {job.method}")
             return
         try:
-            params = self._params_of(job)
+            params = read(job.method, job.message.get("params"))
         except Exception as error:
             log.info("%s: cannot be read: %s", job.method, error)
             self.fail(job.number, INVALID_PARAMS, f"the parameters of {job.method} are not what they have to be")
             return
-        if job.method in _OF_PYGLS:
-            self._handle_request(job.number, job.method, params)
-            self._is_initialized |= job.method == types.INITIALIZE
-            return
         try:
-            with self._progress(job):
-                result = handler(params)
+            with Progress(job, self.tell, self._ask_at_once if self.has_progress else None):
+                result = feature(params)
         except Stopped:
             if not job.is_cancelled and not job.is_outdated and job.makes_way:
                 raise Again from None
             self.fail(job.number, *(_CANCELLED if job.is_cancelled else _OUTDATED))
         except (RequestFailed, RenameError) as error:
             self.fail(job.number, REQUEST_FAILED, str(error))
-        except JsonRpcException as error:
-            self.fail(job.number, error.code, error.message)
         except OSError as error:  # a file that has gone, or that nobody may read
             log.info("%s: %s", job.method, error)
             self.reply(job.number, None)
@@ -131,22 +99,8 @@ class Protocol(LanguageServerProtocol):
             log.exception("%s failed", job.method)
             self.fail(job.number, INTERNAL_ERROR, f"{job.method}: {type(error).__name__}: {error}")
         else:
+            self._is_initialized |= job.method == "initialize"
             self.reply(job.number, result)
-
-    @contextmanager
-    def _progress(self, job: Job) -> Iterator[None]:
-        """Tells that a question is worked at that goes over the whole program, to a client that wants to be told."""
-        given = job.message.get("params")
-        token = given.get("workDoneToken") if job.method in _LONG and isinstance(given, dict) else None
-        if not isinstance(token, (int, str)):
-            yield
-            return
-        value = {"kind": "begin", "title": _LONG[job.method], "cancellable": True}
-        self.tell("$/progress", {"token": token, "value": value})
-        try:
-            yield
-        finally:
-            self.tell("$/progress", {"token": token, "value": {"kind": "end"}})
 
     def _untimely(self, job: Job) -> tuple[int, str] | None:
         """Why a request cannot be answered now, whatever it asks."""
@@ -154,58 +108,60 @@ class Protocol(LanguageServerProtocol):
             return _CANCELLED
         if job.is_outdated and job.tries:
             return _OUTDATED
-        if self._shutdown:
+        if self.is_shut_down:
             return INVALID_REQUEST, "the server is shutting down"
-        if (job.method == types.INITIALIZE) == self._is_initialized:
+        if (job.method == "initialize") == self._is_initialized:
             if self._is_initialized:
                 return INVALID_REQUEST, "the server is initialized already"
             return NOT_INITIALIZED, "the server is not initialized"
         return None
 
-    def _handle_notification_of(self, job: Job) -> None:
-        handler = self._handler_of(job.method)
-        if handler is None or not self._is_initialized:
+    def _handle_notification(self, job: Job) -> None:
+        feature = self._features.get(job.method)
+        if feature is None or not self._is_initialized:
             log.info("ignored: %s", job.method)
             return
         try:
-            params = self._params_of(job)
-            if job.method in _OF_PYGLS:
-                self._handle_notification(job.method, params)
-            else:
-                handler(params)
+            feature(read(job.method, job.message.get("params")))
         except Exception:
             log.exception("%s failed", job.method)
 
-    def _handler_of(self, method: str) -> Callable[[Any], Any] | None:
-        return self.fm.builtin_features.get(method) if method in _OF_PYGLS else self.fm.features.get(method)
+    # ---- what the client is asked ----
 
-    def _params_of(self, job: Job) -> Any:
-        kind = self.get_message_type(job.method)
-        if kind is None:
-            return job.message.get("params")
-        message = job.message
-        if message.get("jsonrpc") != "2.0":
-            message = {**message, "jsonrpc": "2.0"}
-        return self._converter.structure(message, kind).params
+    def ask(self, method: str, params: Any = None, then: Callable[[Any], None] | None = None) -> None:
+        """A request to the client. What it answers is handed on in its turn, unless it is an error."""
+        self._ask(method, params, then, at_once=False)
+
+    def _ask_at_once(self, method: str, params: Any, then: Callable[[Any], None]) -> None:
+        self._ask(method, params, then, at_once=True)
+
+    def _ask(self, method: str, params: Any, then: Callable[[Any], None] | None, *, at_once: bool) -> None:
+        self._number += 1
+        number = f"quillet-{self._number}"
+        self._asked[number] = then, at_once
+        self._write({"jsonrpc": "2.0", "id": number, "method": method, "params": params})
+
+    def take_at_once(self, message: dict[str, Any]) -> bool:
+        """Takes an answer of the client's that need not wait for its turn; False for any other one."""
+        number = message.get("id")
+        _, at_once = self._asked.get(number, (None, False)) if isinstance(number, str) else (None, False)
+        if at_once:
+            self._take_response(message)
+        return at_once
 
     def _take_response(self, message: dict[str, Any]) -> None:
-        """What the client answers to a request of the server's."""
-        error = message.get("error")
-        try:
-            if "id" not in message:
-                self.fail(None, INVALID_REQUEST, "a message needs a method or an identifier")
-            elif error is not None:
-                log.info("the client refused %s: %s", message["id"], error)
-                self._request_futures.pop(message["id"], None)
-                self._result_types.pop(message["id"], None)
-            else:
-                kind = self._result_types.pop(message["id"], None)
-                result = message.get("result")
-                if kind is not None:
-                    result = self._converter.structure({"jsonrpc": "2.0", **message, "result": result}, kind).result
-                self._handle_response(message["id"], result)
-        except Exception:
-            log.exception("an answer of the client's failed")
+        if "id" not in message:
+            self.fail(None, INVALID_REQUEST, "a message needs a method or an identifier")
+            return
+        number = message["id"]
+        then, _ = self._asked.pop(number, (None, False)) if isinstance(number, str) else (None, False)
+        if message.get("error") is not None:
+            log.info("the client refused %s: %s", number, message["error"])
+        elif then is not None:
+            try:
+                then(message.get("result"))
+            except Exception:
+                log.exception("an answer of the client's failed")
 
     # ---- answers ----
 
@@ -223,8 +179,8 @@ class Protocol(LanguageServerProtocol):
         self._write({"jsonrpc": "2.0", "method": method, "params": params})
 
     def _write(self, message: dict[str, Any]) -> None:
-        body = json.dumps(message, separators=(",", ":"), default=self._serialize_message)
-        self.writer.write_body(body.encode())
+        body = json.dumps(message, separators=(",", ":"))
+        self._writer.write_body(body.encode())
 
 
 _CANCELLED = (REQUEST_CANCELLED, "the request was cancelled")

@@ -2,14 +2,17 @@
 
 from __future__ import annotations
 
-from typing import Any
-
-from lsprotocol import types
+from typing import TYPE_CHECKING, Any
 
 from quillet.server.features import feature
 from quillet.server.language_server import Server
 from quillet.server.positions import place_of, range_of
 
+if TYPE_CHECKING:
+    from lsprotocol import types
+
+# As the protocol numbers kinds of hints.
+_TYPE, _PARAMETER = 1, 2
 # In the order of the numbers that workspaces give.
 TOKEN_TYPES = [
     "namespace",
@@ -27,7 +30,7 @@ TOKEN_TYPES = [
 TOKEN_MODIFIERS = ["declaration", "readonly", "static", "async", "modification", "documentation", "defaultLibrary"]
 
 
-@feature(types.TEXT_DOCUMENT_HOVER)
+@feature("textDocument/hover", "hoverProvider")
 def hover(ls: Server, params: types.HoverParams) -> Any:
     place = ls.place(params)
     found = place.workspace.hover(*place.at)
@@ -73,8 +76,9 @@ def documentation(ls: Server, text: str) -> Any:
 
 
 @feature(
-    types.TEXT_DOCUMENT_SIGNATURE_HELP,
-    types.SignatureHelpOptions(trigger_characters=["(", ","], retrigger_characters=[")"]),
+    "textDocument/signatureHelp",
+    "signatureHelpProvider",
+    {"triggerCharacters": ["(", ","], "retriggerCharacters": [")"]},
 )
 def signature_help(ls: Server, params: types.SignatureHelpParams) -> Any:
     place = ls.place(params)
@@ -102,7 +106,7 @@ def signature_help(ls: Server, params: types.SignatureHelpParams) -> Any:
 # ---- the shape of a text ----
 
 
-@feature(types.TEXT_DOCUMENT_FOLDING_RANGE)
+@feature("textDocument/foldingRange", "foldingRangeProvider")
 def folding_range(ls: Server, params: types.FoldingRangeParams) -> Any:
     workspace, _, path = ls.file(params.text_document.uri)
     return [
@@ -111,7 +115,7 @@ def folding_range(ls: Server, params: types.FoldingRangeParams) -> Any:
     ]
 
 
-@feature(types.TEXT_DOCUMENT_SELECTION_RANGE)
+@feature("textDocument/selectionRange", "selectionRangeProvider")
 def selection_range(ls: Server, params: types.SelectionRangeParams) -> Any:
     workspace, _, path = ls.file(params.text_document.uri)
     answer = []
@@ -124,23 +128,24 @@ def selection_range(ls: Server, params: types.SelectionRangeParams) -> Any:
     return answer
 
 
-_LEGEND = types.SemanticTokensLegend(token_types=TOKEN_TYPES, token_modifiers=TOKEN_MODIFIERS)
-
-
-@feature(types.TEXT_DOCUMENT_SEMANTIC_TOKENS_FULL, _LEGEND)
+@feature(
+    "textDocument/semanticTokens/full",
+    "semanticTokensProvider",
+    {"legend": {"tokenTypes": TOKEN_TYPES, "tokenModifiers": TOKEN_MODIFIERS}, "range": True, "full": True},
+)
 def semantic_tokens(ls: Server, params: types.SemanticTokensParams) -> Any:
     workspace, _, path = ls.file(params.text_document.uri)
     return {"data": workspace.tokens(path)}
 
 
-@feature(types.TEXT_DOCUMENT_SEMANTIC_TOKENS_RANGE, _LEGEND)
+@feature("textDocument/semanticTokens/range")
 def semantic_tokens_range(ls: Server, params: types.SemanticTokensRangeParams) -> Any:
     workspace, _, path = ls.file(params.text_document.uri)
     first, last = place_of(params.range.start)[0], place_of(params.range.end)[0]
     return {"data": workspace.tokens(path, first, last)}
 
 
-@feature(types.TEXT_DOCUMENT_INLAY_HINT)
+@feature("textDocument/inlayHint", "inlayHintProvider", {"resolveProvider": False})
 def inlay_hint(ls: Server, params: types.InlayHintParams) -> Any:
     workspace, settings, path = ls.file(params.text_document.uri)
     first, last = place_of(params.range.start)[0], place_of(params.range.end)[0]
@@ -153,7 +158,7 @@ def inlay_hint(ls: Server, params: types.InlayHintParams) -> Any:
             {
                 "position": {"line": hint.line - 1, "character": hint.column - 1},
                 "label": hint.text,
-                "kind": (types.InlayHintKind.Type if is_type else types.InlayHintKind.Parameter).value,
+                "kind": _TYPE if is_type else _PARAMETER,
                 "paddingRight": not is_type,
             }
         )

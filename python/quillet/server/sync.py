@@ -2,21 +2,19 @@
 
 from __future__ import annotations
 
-import logging
 import os
-from typing import Any
-
-from lsprotocol import types
+from typing import TYPE_CHECKING, Any
 
 from quillet._workspace import Edit
-from quillet.server import diagnostics
+from quillet.server import diagnostics, log
 from quillet.server.documents import Document, path_of
 from quillet.server.features import feature
 from quillet.server.language_server import Server
 from quillet.server.positions import place_of
 from quillet.settings import PROJECT_FILE
 
-log = logging.getLogger(__name__)
+if TYPE_CHECKING:
+    from lsprotocol import types
 
 SECTION = "quillet"
 _WATCHED = ("**/*.py", "**/*.pyi", f"**/{PROJECT_FILE}", "**/.gitignore", "**/pyvenv.cfg")
@@ -25,7 +23,7 @@ _WATCHED = ("**/*.py", "**/*.pyi", f"**/{PROJECT_FILE}", "**/.gitignore", "**/py
 # ---- texts ----
 
 
-@feature(types.TEXT_DOCUMENT_DID_OPEN)
+@feature("textDocument/didOpen")
 def did_open(ls: Server, params: types.DidOpenTextDocumentParams) -> None:
     opened = params.text_document
     path = path_of(opened.uri)
@@ -35,7 +33,7 @@ def did_open(ls: Server, params: types.DidOpenTextDocumentParams) -> None:
     diagnostics.check(ls, document)
 
 
-@feature(types.TEXT_DOCUMENT_DID_CHANGE)
+@feature("textDocument/didChange")
 def did_change(ls: Server, params: types.DidChangeTextDocumentParams) -> None:
     document = ls.documents.get(params.text_document.uri)
     if document is None:
@@ -56,7 +54,7 @@ def did_change(ls: Server, params: types.DidChangeTextDocumentParams) -> None:
     diagnostics.check(ls, document)
 
 
-@feature(types.TEXT_DOCUMENT_DID_CLOSE)
+@feature("textDocument/didClose")
 def did_close(ls: Server, params: types.DidCloseTextDocumentParams) -> None:
     document = ls.documents.remove(params.text_document.uri)
     if document is None:
@@ -67,7 +65,7 @@ def did_close(ls: Server, params: types.DidCloseTextDocumentParams) -> None:
     diagnostics.check_others(ls)
 
 
-@feature(types.TEXT_DOCUMENT_DID_SAVE, types.SaveOptions(include_text=False))
+@feature("textDocument/didSave")
 def did_save(ls: Server, params: types.DidSaveTextDocumentParams) -> None:
     if os.path.basename(path_of(params.text_document.uri)) == PROJECT_FILE:
         ls.projects.reload()
@@ -77,7 +75,7 @@ def did_save(ls: Server, params: types.DidSaveTextDocumentParams) -> None:
 # ---- files and folders ----
 
 
-@feature(types.WORKSPACE_DID_CHANGE_WATCHED_FILES)
+@feature("workspace/didChangeWatchedFiles")
 def did_change_watched_files(ls: Server, params: types.DidChangeWatchedFilesParams) -> None:
     names = {os.path.basename(path_of(change.uri)) for change in params.changes}
     if names & {PROJECT_FILE, "pyvenv.cfg"}:
@@ -87,7 +85,7 @@ def did_change_watched_files(ls: Server, params: types.DidChangeWatchedFilesPara
     diagnostics.check_others(ls)
 
 
-@feature(types.WORKSPACE_DID_CHANGE_WORKSPACE_FOLDERS)
+@feature("workspace/didChangeWorkspaceFolders")
 def did_change_workspace_folders(ls: Server, params: types.DidChangeWorkspaceFoldersParams) -> None:
     added, removed = ([path_of(folder.uri) for folder in side] for side in (params.event.added, params.event.removed))
     ls.projects.change_folders(added, removed)
@@ -96,25 +94,19 @@ def did_change_workspace_folders(ls: Server, params: types.DidChangeWorkspaceFol
 
 def watch_files(ls: Server) -> None:
     """Asks the client to tell which files change, where it can."""
-    watchers = [types.FileSystemWatcher(glob_pattern=pattern) for pattern in _WATCHED]
-    ls.protocol.send_request(
-        types.CLIENT_REGISTER_CAPABILITY,
-        types.RegistrationParams(
-            registrations=[
-                types.Registration(
-                    id="quillet-files",
-                    method=types.WORKSPACE_DID_CHANGE_WATCHED_FILES,
-                    register_options=types.DidChangeWatchedFilesRegistrationOptions(watchers=watchers),
-                )
-            ]
-        ),
-    )
+    watchers = [{"globPattern": pattern} for pattern in _WATCHED]
+    registration = {
+        "id": "quillet-files",
+        "method": "workspace/didChangeWatchedFiles",
+        "registerOptions": {"watchers": watchers},
+    }
+    ls.protocol.ask("client/registerCapability", {"registrations": [registration]})
 
 
 # ---- settings ----
 
 
-@feature(types.WORKSPACE_DID_CHANGE_CONFIGURATION)
+@feature("workspace/didChangeConfiguration")
 def did_change_configuration(ls: Server, params: types.DidChangeConfigurationParams) -> None:
     if ls.has_configuration:
         ask_for_settings(ls)
@@ -124,10 +116,10 @@ def did_change_configuration(ls: Server, params: types.DidChangeConfigurationPar
 
 def ask_for_settings(ls: Server) -> None:
     """Asks the client for its settings, which then count."""
-    ls.protocol.send_request(
-        types.WORKSPACE_CONFIGURATION,
-        types.ConfigurationParams(items=[types.ConfigurationItem(section=SECTION)]),
-        lambda answer: take_settings(ls, answer[0] if answer else None),
+    ls.protocol.ask(
+        "workspace/configuration",
+        {"items": [{"section": SECTION}]},
+        lambda answer: take_settings(ls, answer[0] if isinstance(answer, list) and answer else None),
     )
 
 

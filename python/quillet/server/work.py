@@ -30,13 +30,14 @@ _MOST_TRIES = 3
 class Job:
     """A message, and what became of it meanwhile."""
 
-    __slots__ = ("is_cancelled", "is_outdated", "makes_way", "message", "method", "number", "tries", "uri")
+    __slots__ = ("is_cancelled", "is_outdated", "makes_way", "message", "method", "number", "token", "tries", "uri")
 
     def __init__(self, message: dict[str, Any]) -> None:
         self.message = message
         self.method: Any = message.get("method")
         self.number: Any = message.get("id")  # of a request
         self.uri: str | None = None
+        self.token: int | str | None = None  # by which its progress is told
         self.is_cancelled = False  # by the client
         self.is_outdated = False  # its text has changed
         self.makes_way = False  # it is to be asked again
@@ -46,6 +47,8 @@ class Job:
             document = params.get("textDocument")
             if isinstance(document, dict) and isinstance(document.get("uri"), str):
                 self.uri = document["uri"]
+            if isinstance(params.get("workDoneToken"), (int, str)):
+                self.token = params["workDoneToken"]
 
     @property
     def is_request(self) -> bool:
@@ -89,14 +92,22 @@ class Work:
 
     def cancel(self, number: Any) -> None:
         """Takes a request back, which is answered by an error then."""
+        self._cancel(lambda job: bool(job.number == number))
+
+    def cancel_progress(self, token: Any) -> None:
+        """The same for one whose progress is told by a token."""
+        if token is not None:
+            self._cancel(lambda job: bool(job.token == token))
+
+    def _cancel(self, is_meant: Callable[[Job], bool]) -> None:
         with self._changed:
             running = self._running
-            if running is not None and running.is_request and running.number == number:
+            if running is not None and running.is_request and is_meant(running):
                 running.is_cancelled = True
                 self._stop(0)
                 return
             for job in self._jobs:
-                if job.is_request and job.number == number:
+                if job.is_request and is_meant(job):
                     job.is_cancelled = True
                     return
 

@@ -2,35 +2,38 @@
 
 from __future__ import annotations
 
-from typing import Any
-
-from lsprotocol import types
+from typing import TYPE_CHECKING, Any
 
 from quillet.server.documents import uri_of
 from quillet.server.features import feature
 from quillet.server.language_server import Server
-from quillet.server.positions import name_range, part_of, place_of, range_of
+from quillet.server.positions import name_range, part_of, range_of
 from quillet.server.protocol import RequestFailed
 from quillet.server.reading import documentation
 
+if TYPE_CHECKING:
+    from lsprotocol import types
+
+# As the protocol numbers kinds of completions.
 _KINDS = {
-    "class": types.CompletionItemKind.Class.value,
-    "function": types.CompletionItemKind.Function.value,
-    "method": types.CompletionItemKind.Method.value,
-    "property": types.CompletionItemKind.Property.value,
-    "variable": types.CompletionItemKind.Variable.value,
-    "parameter": types.CompletionItemKind.Variable.value,
-    "module": types.CompletionItemKind.Module.value,
-    "keyword": types.CompletionItemKind.Keyword.value,
-    "attribute": types.CompletionItemKind.Field.value,
+    "class": 7,
+    "function": 3,
+    "method": 2,
+    "property": 10,
+    "variable": 6,
+    "parameter": 6,
+    "module": 9,
+    "keyword": 14,
+    "attribute": 5,
 }
 
 
-@feature(types.TEXT_DOCUMENT_COMPLETION, types.CompletionOptions(trigger_characters=["."], resolve_provider=True))
+@feature("textDocument/completion", "completionProvider", {"triggerCharacters": ["."], "resolveProvider": True})
 def completion(ls: Server, params: types.CompletionParams) -> Any:
     place = ls.place(params)
     # What an item says of itself is found when it is looked at.
-    ls.completed = (params.text_document.uri, ls.version_of(params.text_document.uri), params.position)
+    uri = params.text_document.uri
+    ls.completed = (uri, ls.version_of(uri), place.line, place.column)
     ls.completion_number += 1
     items = []
     for index, each in enumerate(place.workspace.complete(*place.at)):
@@ -50,29 +53,28 @@ def completion(ls: Server, params: types.CompletionParams) -> Any:
     return {"isIncomplete": False, "items": items}
 
 
-@feature(types.COMPLETION_ITEM_RESOLVE)
-def completion_resolve(ls: Server, item: types.CompletionItem) -> Any:
-    if item.data != ls.completion_number or ls.completed is None:
+@feature("completionItem/resolve")
+def completion_resolve(ls: Server, item: dict[str, Any]) -> Any:
+    if item.get("data") != ls.completion_number or ls.completed is None:
         return item
-    uri, version, position = ls.completed
+    uri, version, line, column = ls.completed
     if ls.version_of(uri) != version:  # the place is not what it was
         return item
     workspace, _, path = ls.file(uri)
-    found = workspace.describe_completion(path, *place_of(position), item.label)
+    found = workspace.describe_completion(path, line, column, item["label"])
     if found is None:
         return item
     if found.text:
-        item.detail = found.text
+        item["detail"] = found.text
     if found.documentation:
-        markup = documentation(ls, found.documentation)
-        item.documentation = types.MarkupContent(kind=types.MarkupKind(markup["kind"]), value=markup["value"])
+        item["documentation"] = documentation(ls, found.documentation)
     return item
 
 
 # ---- other names ----
 
 
-@feature(types.TEXT_DOCUMENT_PREPARE_RENAME)
+@feature("textDocument/prepareRename")
 def prepare_rename(ls: Server, params: types.PrepareRenameParams) -> Any:
     place = ls.place(params)
     here = [
@@ -90,7 +92,7 @@ def prepare_rename(ls: Server, params: types.PrepareRenameParams) -> Any:
     return {"range": name_range(at), "placeholder": part_of(line, at.column, at.end_column, ls.projects.columns)}
 
 
-@feature(types.TEXT_DOCUMENT_RENAME, types.RenameOptions(prepare_provider=True))
+@feature("textDocument/rename", "renameProvider", {"prepareProvider": True})
 def rename(ls: Server, params: types.RenameParams) -> Any:
     place = ls.place(params)
     changes: dict[str, list[dict[str, Any]]] = {}
