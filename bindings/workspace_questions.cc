@@ -1,5 +1,6 @@
 // The questions of a workspace: places in, plain tuples out, which the package gives names.
 #include <algorithm>
+#include <numeric>
 #include <string>
 #include <unordered_map>
 #include <utility>
@@ -175,8 +176,13 @@ nb::list SymbolsLike(WorkspaceObject& self, nb::handle query, size_t most) {
     Answer made;
     made.symbols = workspace.Symbols(asked.text(), most);
     Placer placer(workspace);
-    for (const SymbolInfo& symbol : made.symbols)
-      made.ranges.push_back(placer.Range(symbol.file, symbol.begin, symbol.end));
+    // Those of a file one after the other, so that it is read once.
+    std::vector<uint32_t> order(made.symbols.size());
+    std::iota(order.begin(), order.end(), 0);
+    std::ranges::sort(order, {}, [&](uint32_t at) { return std::pair(made.symbols[at].file, made.symbols[at].begin); });
+    made.ranges.resize(order.size());
+    for (const uint32_t at : order)
+      made.ranges[at] = placer.Range(made.symbols[at].file, made.symbols[at].begin, made.symbols[at].end);
     made.paths = placer.TakePaths();
     return made;
   });

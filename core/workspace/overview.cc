@@ -440,7 +440,7 @@ std::vector<SymbolInfo> Workspace::Symbols(Text query, size_t most) {
     const DefinedNames::Definition* definition;
   };
   std::vector<Ranked> found;
-  const auto lower = [](char c) { return static_cast<char>(std::tolower(static_cast<unsigned char>(c))); };
+  const auto lower = [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c; };
   // 0 exact, 1 but for case, 2 prefix, 3 part, 4 its letters in order; -1 not at all.
   const auto match = [&](Text name) {
     if (name == query) return 0;

@@ -47,7 +47,7 @@ def uri_of(path: str) -> str:
 class Document:
     """A text that the editor holds. The workspaces have its content; this says which one it is."""
 
-    __slots__ = ("is_python", "is_read", "path", "uri", "version")
+    __slots__ = ("is_python", "is_read", "outline", "path", "uri", "version")
 
     def __init__(self, uri: str, path: str, version: int, is_python: bool) -> None:
         self.uri = uri
@@ -55,6 +55,7 @@ class Document:
         self.version = version
         self.is_python = is_python
         self.is_read = True  # not too large for that
+        self.outline: str | None = None  # of this text; editors ask for it again and again
 
 
 class Documents:

@@ -10,6 +10,7 @@ from quillet.server.documents import path_of
 from quillet.server.features import feature
 from quillet.server.language_server import Place, Server
 from quillet.server.positions import name_range, part_of, place_of
+from quillet.server.protocol import Encoded, encode
 from quillet.settings import Settings
 
 if TYPE_CHECKING:
@@ -26,7 +27,7 @@ SYMBOL_KINDS = {
     "property": 7,
     "parameter": 13,
 }
-_MOST_SYMBOLS = 300
+_MOST_SYMBOLS = 128
 
 
 def _places(ls: Server, locations: Iterable[Location]) -> list[dict[str, Any]]:
@@ -110,11 +111,16 @@ def workspace_symbol(ls: Server, params: types.WorkspaceSymbolParams) -> Any:
 
 @feature("textDocument/documentSymbol", "documentSymbolProvider")
 def document_symbol(ls: Server, params: types.DocumentSymbolParams) -> Any:
-    workspace, _, path = ls.file(params.text_document.uri)
+    uri = params.text_document.uri
+    document = ls.documents.get(uri)
+    if document is not None and document.outline is not None:
+        return Encoded(document.outline)
+    workspace, _, path = ls.file(uri)
     outline = workspace.outline(path)
-    if ls.has_hierarchy:
-        return _symbols(outline)
-    return list(_flat_symbols(outline, params.text_document.uri, ""))
+    answer = Encoded(encode(_symbols(outline) if ls.has_hierarchy else list(_flat_symbols(outline, uri, ""))))
+    if document is not None:
+        document.outline = answer
+    return answer
 
 
 def _symbols(items: Iterable[Any]) -> list[dict[str, Any]]:

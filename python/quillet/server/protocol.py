@@ -33,6 +33,10 @@ class Again(Exception):
     """A question made way and is to be asked again."""
 
 
+class Encoded(str):
+    """An answer that is JSON already."""
+
+
 class RequestFailed(Exception):
     """A request cannot be done, for a reason that the user is to see."""
 
@@ -166,8 +170,11 @@ class Protocol:
     # ---- answers ----
 
     def reply(self, number: Any, result: Any) -> None:
-        """Answers a request by what can be written as JSON."""
-        self._write({"jsonrpc": "2.0", "id": number, "result": result})
+        """Answers a request by what can be written as JSON, or was."""
+        if isinstance(result, Encoded):
+            self._writer.write_body(f'{{"jsonrpc":"2.0","id":{json.dumps(number)},"result":{result}}}'.encode())
+        else:
+            self._write({"jsonrpc": "2.0", "id": number, "result": result})
 
     def fail(self, number: Any, code: int, said: str) -> None:
         """Answers a request, or what is none, by an error."""
@@ -179,8 +186,11 @@ class Protocol:
         self._write({"jsonrpc": "2.0", "method": method, "params": params})
 
     def _write(self, message: dict[str, Any]) -> None:
-        body = json.dumps(message, separators=(",", ":"))
-        self._writer.write_body(body.encode())
+        self._writer.write_body(encode(message).encode())
+
+
+# What it writes is ASCII. A new one for each message takes longer than most messages.
+encode = json.JSONEncoder(separators=(",", ":")).encode
 
 
 _CANCELLED = (REQUEST_CANCELLED, "the request was cancelled")

@@ -40,6 +40,7 @@ def did_change(ls: Server, params: types.DidChangeTextDocumentParams) -> None:
         log.warning("a change of what is not open: %s", params.text_document.uri)
         return
     document.version = params.text_document.version
+    document.outline = None
     if not document.is_read:
         return
     path = document.path
