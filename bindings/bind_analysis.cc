@@ -1,4 +1,5 @@
 // CPGenAnalyzerImpl and CreateSyntaxError.
+#include <algorithm>
 #include <limits>
 
 #include "analysis/analyzer.h"
@@ -16,6 +17,11 @@
 namespace quillet::host {
 namespace {
 
+// Whether the host gave states other classes than they have.
+bool HasOwnKinds(const CPGenAnalyzerImpl::Options& options) {
+  return !std::ranges::is_permutation(options.kinds_by_state, KindsByStateName());
+}
+
 void InitAnalyzer(AnalyzerObject* self, Any version_triple, Any grammar_file, Any keyword_seq, Truth py3_grammar,
                   Any hint_grammar_file) {
   new (self) AnalyzerObject();
@@ -28,6 +34,7 @@ void InitAnalyzer(AnalyzerObject* self, Any version_triple, Any grammar_file, An
     options.py3_grammar = py3_grammar;
     self->version_triple = nb::borrow(version_triple);
     self->analyzer = std::make_shared<CPGenAnalyzerImpl>(options);
+    if (!HasOwnKinds(options)) self->shapes = std::make_unique<StatementShapes>(*self->analyzer);
   } catch (...) {
     self->~AnalyzerObject();
     throw;
@@ -77,7 +84,9 @@ nb::object Analyze(AnalyzerObject& self, Any logical, Truth in_async_def, Truth 
   std::optional<SyntaxError> error;
   {
     const Retained retained(*self.analyzer, line.source);
-    error = self.analyzer->AnalyzeSingleLogical(line, in_async_def, first_in_def);
+    error = self.shapes == nullptr || self.is_looked_into
+                ? self.analyzer->AnalyzeSingleLogical(line, in_async_def, first_in_def)
+                : self.shapes->AnalyzeSingleLogical(line, in_async_def, first_in_def);
   }
   object.EndWriting();
   if (!error) [[likely]] {
@@ -92,7 +101,7 @@ bool Inspect(AnalyzerObject& self, Any logical, Truth in_async_def, Truth in_emb
   const AnalyzerUse use(*self.analyzer);
   Recording recording(&object);
   const Retained retained(*self.analyzer, object.line().source);
-  return self.analyzer->InspectSingleLogical(object.line(), in_async_def, in_embedded_expression, first_in_def);
+  return self.LookInto().InspectSingleLogical(object.line(), in_async_def, in_embedded_expression, first_in_def);
 }
 
 void InspectEmbedded(AnalyzerObject& self, Any logical, Any node, Truth in_async_def, Truth first_in_def) {
@@ -101,7 +110,7 @@ void InspectEmbedded(AnalyzerObject& self, Any logical, Any node, Truth in_async
   const AnalyzerUse use(*self.analyzer);
   Recording recording(&object);
   const Retained retained(*self.analyzer, object.line().source);
-  self.analyzer->InspectEmbeddedExpressions(object.line(), in_async_def, first_in_def);
+  self.LookInto().InspectEmbeddedExpressions(object.line(), in_async_def, first_in_def);
 }
 
 // ---- syntax errors ----
@@ -157,39 +166,39 @@ void BindAnalysis(nb::module_& tarvex) {
   DefOperation(
       cls, "ParseToNode",
       [](AnalyzerObject& self, Any logical, Truth in_async_def) {
-        return ForwardParseToNode(self.analyzer->logical_parser(), logical, in_async_def);
+        return ForwardParseToNode(self.LookInto().logical_parser(), logical, in_async_def);
       },
       nb::arg("logical"), nb::arg("in_async_def"));
   DefOperation(
       cls, "ParseTokenListToNode",
       [](AnalyzerObject& self, Any logical, Truth in_async_def) {
-        return ForwardParseTokenListToNode(self.analyzer->logical_parser(), logical, in_async_def);
+        return ForwardParseTokenListToNode(self.LookInto().logical_parser(), logical, in_async_def);
       },
       nb::arg("logical"), nb::arg("in_async_def"));
   DefOperation(
       cls, "GetTypeParameterNodes",
       [](AnalyzerObject& self, Any toks) {
-        return ForwardGetTypeParameterNodes(self.analyzer->logical_parser(), toks);
+        return ForwardGetTypeParameterNodes(self.LookInto().logical_parser(), toks);
       },
       nb::arg("toks"));
   cls.def_prop_ro("_fLogicalParser", [](AnalyzerObject& self) {
     if (!self.logical_parser.is_valid()) {
       self.logical_parser =
-          NewParserObject(std::shared_ptr<CPGenParserImpl>(self.analyzer, &self.analyzer->logical_parser()),
+          NewParserObject(std::shared_ptr<CPGenParserImpl>(self.analyzer, &self.LookInto().logical_parser()),
                           self.version_triple, self.keywords);
     }
     return self.logical_parser;
   });
   cls.def_prop_ro("_fNodeWalker", [](AnalyzerObject& self) {
     if (!self.node_walker.is_valid())
-      self.node_walker = NewWalkerObject(std::shared_ptr<CNodeWalker>(self.analyzer, &self.analyzer->node_walker()));
+      self.node_walker = NewWalkerObject(std::shared_ptr<CNodeWalker>(self.analyzer, &self.LookInto().node_walker()));
     return self.node_walker;
   });
   cls.def_prop_ro("_fTypeHintWalker", [](nb::handle self) {
     auto& object = nb::cast<AnalyzerObject&>(self);
     if (!object.type_hint_walker.is_valid()) {
       object.type_hint_walker =
-          NewHintWalkerObject(std::shared_ptr<CTypeHintWalker>(object.analyzer, &object.analyzer->type_hint_walker()),
+          NewHintWalkerObject(std::shared_ptr<CTypeHintWalker>(object.analyzer, &object.LookInto().type_hint_walker()),
                               nb::object(self.attr("_fNodeWalker")), object.version_triple);
     }
     return object.type_hint_walker;

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "analysis/analyzer.h"
+#include "analysis/statement_shapes.h"
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
 #include "bindings/optpgen_host.h"
@@ -41,11 +42,21 @@ struct ParserObject : AnalyzerBase {
 
 struct AnalyzerObject : AnalyzerBase {
   std::shared_ptr<CPGenAnalyzerImpl> analyzer;
+  // Statements are told from others of their shape as long as nothing of the analyzer but records was shown: nodes,
+  // and what a parser and walkers keep from line to line, show which statements were really read.
+  std::unique_ptr<StatementShapes> shapes;
   nb::object version_triple;
   nb::object keywords;
   nb::object logical_parser;  // made when read, as are the walkers
   nb::object node_walker;
   nb::object type_hint_walker;
+
+  // For all that shows more than records.
+  CPGenAnalyzerImpl& LookInto() {
+    is_looked_into = true;
+    return *analyzer;
+  }
+  bool is_looked_into = false;
 };
 
 // The absolute path of a grammar file: an absolute one as it stands, any other is one of the

@@ -572,8 +572,8 @@ StatementShapes::StatementShapes(CPGenAnalyzerImpl& analyzer, uint8_t frequent)
 StatementShapes::~StatementShapes() = default;
 
 bool StatementShapes::Tell(LogicalLine& line, const LinePlace& place, const TypingNames& typing) {
-  if (!is_able_ || !line.no_embedded || line.toks.size() > kMaxTokens || line.kind == LineKind::kComment ||
-      typing.has_renamed_cast())
+  if (!is_able_ || is_learning_ || !line.no_embedded || line.toks.size() > kMaxTokens ||
+      line.kind == LineKind::kComment || typing.has_renamed_cast())
     return false;
   Key key;
   if (!key.Make(line, place.in_async_def)) return false;
@@ -599,10 +599,32 @@ bool StatementShapes::Tell(LogicalLine& line, const LinePlace& place, const Typi
   if (!plan.is_whole() || (plan.is_bounded() && key.MostJoined() > CNodeWalker::kMaxOperatorText) ||
       analyzer_.IsDoubtful(line, place))
     return false;
-  CountSteps(static_cast<int64_t>(line.toks.size()));
   plan.Tell(line, scratch_);
   analyzer_.CountAsRead();
+  // Comes last: a host that is asked whether to stop may have other lines analysed, and plans replaced.
+  CountSteps(static_cast<int64_t>(line.toks.size()));
   return true;
+}
+
+std::optional<SyntaxError> StatementShapes::AnalyzeSingleLogical(LogicalLine& line, bool in_async_def,
+                                                                 bool first_in_def) {
+  const bool is_as_cut = line.hooks == nullptr && !line.has_stored_positions() && !line.toks.empty() &&
+                         line.toks.size() == static_cast<size_t>(line.token_count);
+  if (is_as_cut && !line.parsed) {
+    static const TypingNames no_names;
+    line.parsed = true;
+    line.ClearDerivedInfo();
+    try {
+      if (Tell(line, {in_async_def, first_in_def}, no_names)) return std::nullopt;
+      line.parsed = false;
+    } catch (...) {
+      // As if it had not begun.
+      line.ClearDerivedInfo();
+      line.parsed = false;
+      throw;
+    }
+  }
+  return analyzer_.AnalyzeSingleLogical(line, in_async_def, first_in_def);
 }
 
 bool StatementShapes::IsFrequent(uint64_t hash) {
@@ -617,6 +639,12 @@ bool StatementShapes::IsFrequent(uint64_t hash) {
 
 std::unique_ptr<const StatementShapes::Plan> StatementShapes::Learn(const Key& key, const LogicalLine& line,
                                                                     bool in_async_def) {
+  struct Learning {
+    bool& is_on;
+    ~Learning() { is_on = false; }
+  };
+  is_learning_ = true;
+  const Learning learning{is_learning_};
   const MadeUp statement(key);
   made_up_records_.Reset();
   LogicalLine made_up;

@@ -26,6 +26,7 @@
 #include <array>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -47,6 +48,10 @@ class StatementShapes {
   // Appends to the line's records what its analysis would, and is true; or does nothing and is false, where the
   // analysis itself is asked for. The line is one that was cut from its source, without hooks.
   bool Tell(LogicalLine& line, const LinePlace& place, const TypingNames& typing);
+
+  // The analyzer's own AnalyzeSingleLogical, for any line of a host's, and told where that can be. Nobody may look
+  // into the analyzer meanwhile, where nodes that were never made would be missed.
+  std::optional<SyntaxError> AnalyzeSingleLogical(LogicalLine& line, bool in_async_def, bool first_in_def);
 
  private:
   class Key;
@@ -72,6 +77,7 @@ class StatementShapes {
   std::vector<Slot> slots_;        // by hash
   std::vector<uint8_t> counters_;  // by hash: how often shapes without a plan were met
   size_t misses_ = 0;              // since the counters were halved
+  bool is_learning_ = false;       // a host may come back in the middle
   RecordStore made_up_records_;
   std::string scratch_;
 };

@@ -11,6 +11,7 @@
 #include <string>
 #include <vector>
 
+#include "foundations/stop.h"
 #include "tests/core/support/analyzer_helper.h"
 #include "tests/core/support/both_ways.h"
 
@@ -128,6 +129,61 @@ TEST(Told, NeverWhereAnAnalyzerHasWordsOfItsOwn) {
     RecordStore store;
     line->WriteTo(&store);
     EXPECT_FALSE(shapes.Tell(*line, {}, TypingNames()));
+  }
+}
+
+// ---- lines of a host's ----
+
+TEST_F(Shapes, ALineOfAHostIsToldOnce) {
+  for (int i = 0; i < 5; ++i) {
+    const testing::CutSource source("x" + std::to_string(i) + " = f(y)\n");
+    const auto line = source.Line(0);
+    EXPECT_EQ(shapes_.AnalyzeSingleLogical(*line, false, false), std::nullopt);
+    EXPECT_TRUE(line->parsed);
+    const std::vector<std::string> records = testing::RecordStrings(*line);
+    EXPECT_EQ(records, testing::AnalyzeLine(*source.Line(0)).records);
+    EXPECT_EQ(shapes_.AnalyzeSingleLogical(*line, false, false), std::nullopt);
+    EXPECT_EQ(testing::RecordStrings(*line), records);
+  }
+}
+
+TEST_F(Shapes, ALineOfAHostThatWasStoppedIsAsIfItHadNotBegun) {
+  const std::string text = "x = f(y)\n";
+  for (int i = 0; i < 5; ++i) IsTold(text);
+  const testing::CutSource source(text);
+  const auto line = source.Line(0);
+  {
+    const ThreadStopQuestion stops([] { throw Stopped(); });
+    stop::steps_left = 0;
+    EXPECT_THROW(shapes_.AnalyzeSingleLogical(*line, false, false), Stopped);
+  }
+  EXPECT_FALSE(line->parsed);
+  EXPECT_TRUE(testing::RecordStrings(*line).empty());
+  EXPECT_EQ(shapes_.AnalyzeSingleLogical(*line, false, false), std::nullopt);
+  EXPECT_FALSE(testing::RecordStrings(*line).empty());
+}
+
+// A host that is asked whether to stop may have other lines analysed.
+TEST(Told, WhereAHostComesBackWhileAShapeIsLearnt) {
+  CPGenAnalyzerImpl analyzer(AnalyzerOptions(testing::kPy3));
+  const testing::CutSource other("z = w\n");
+  for (const char* text : {"x = f(y)\n", "return x.y\n", "def f(a, b=c): pass\n"}) {
+    StatementShapes shapes(analyzer, 1);
+    int asked = 0;
+    const ThreadStopQuestion comes_back([&] {
+      if (asked++ > 0) return;
+      const auto line = other.Line(0);
+      EXPECT_EQ(shapes.AnalyzeSingleLogical(*line, false, false), std::nullopt);
+      EXPECT_EQ(testing::RecordStrings(*line), testing::AnalyzeLine(*other.Line(0)).records);
+    });
+    const testing::CutSource source(text);
+    for (int i = 0; i < 2; ++i) {
+      const auto line = source.Line(0);
+      stop::steps_left = 0;
+      EXPECT_EQ(shapes.AnalyzeSingleLogical(*line, false, false), std::nullopt);
+      EXPECT_EQ(testing::RecordStrings(*line), testing::AnalyzeLine(*source.Line(0)).records);
+    }
+    EXPECT_GT(asked, 1);
   }
 }
 
