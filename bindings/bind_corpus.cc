@@ -91,7 +91,7 @@ class SourceRowsObject {
  public:
   // `decode` is that of a batch.
   SourceRowsObject(const std::vector<Language*>& languages, const std::string& form, std::string path,
-                   std::string content, std::vector<std::string> keep, nb::object decode, std::string problem)
+                   std::string content, std::vector<std::string> keep, nb::object decode)
       : decoder_(std::move(decode)) {
     SourceRows::Options options;
     options.form = FormOf(form);
@@ -100,7 +100,6 @@ class SourceRowsObject {
     options.path_column = std::move(path);
     options.content_column = std::move(content);
     options.kept_columns = std::move(keep);
-    options.problem_column = std::move(problem);
     options.decode = [this](Text bytes, std::string& utf8) { return decoder_.Decode(bytes, utf8); };
     rows_ = std::make_unique<SourceRows>(std::move(options));
   }
@@ -122,11 +121,6 @@ class SourceRowsObject {
     }
     decoder_.RaiseFailure();
     return ExportTable(table);
-  }
-
-  nb::object TakeFiles() {
-    const InUse in_use(*this);
-    return ExportTable(rows_->TakeFiles());
   }
 
   // Of a form, without those that are carried along.
@@ -210,15 +204,13 @@ void BindCorpus(nb::module_& tarvex) {
   nb::module_ host = SiblingModule(tarvex, "host");
   nb::class_<SourceRowsObject>(host, "SourceRows", "Record batches of sources to record batches of what they say.")
       .def(nb::init<const std::vector<Language*>&, const std::string&, std::string, std::string,
-                    std::vector<std::string>, nb::object, std::string>(),
+                    std::vector<std::string>, nb::object>(),
            nb::arg("languages"), nb::arg("form"), nb::arg("path"), nb::arg("content"), nb::arg("keep"),
-           nb::arg("decode"), nb::arg("problem") = "")
+           nb::arg("decode"))
       .def("Begin", &SourceRowsObject::Begin, nb::arg("schema"), nb::arg("array"),
            "Takes an input batch over, as capsules.")
       .def("Next", &SourceRowsObject::Next,
            "The next full batch, as capsules of its schema and its array; None where the input batch is at its end.")
-      .def("TakeFiles", &SourceRowsObject::TakeFiles,
-           "With a column of problems: a row for each source so far, as the form \"files\" has them, or None.")
       .def_static("Columns", &SourceRowsObject::Columns, nb::arg("form"),
                   "The columns of a form behind those that are carried along, as (name, format, may be null).")
       .def("Finish", &SourceRowsObject::Finish, "The rows that are left, in the same form, or None.");

@@ -40,6 +40,7 @@ void BindNames(nb::module_& tarvex);
 void BindIndex(nb::module_& tarvex);
 void BindBatch(nb::module_& tarvex);
 void BindCorpus(nb::module_& tarvex);
+void BindShard(nb::module_& tarvex);
 void BindSite(nb::module_& tarvex);
 void BindSyntax(nb::module_& tarvex);
 void BindWorkspace(nb::module_& tarvex);

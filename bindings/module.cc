@@ -75,6 +75,7 @@ NB_MODULE(tarvex_in_main, tarvex) {
   BindIndex(tarvex);
   BindBatch(tarvex);
   BindCorpus(tarvex);
+  BindShard(tarvex);
   BindSite(tarvex);
   BindSyntax(tarvex);
   BindWorkspace(tarvex);

@@ -10,11 +10,16 @@
 namespace quillet {
 
 void TextColumn::Repeat(Text text, size_t count) {
+  if (texts_ != nullptr) {
+    numbers_.insert(numbers_.end(), count, texts_->NumberOf(text));
+    return;
+  }
   bytes_.reserve(bytes_.size() + text.size() * count);
   for (size_t i = 0; i < count; ++i) Add(text);
 }
 
 void TextColumn::Truncate(size_t size) {
+  if (texts_ != nullptr) return numbers_.resize(size);
   offsets_.resize(size + 1);
   bytes_.resize(static_cast<size_t>(offsets_.back()));
 }
@@ -112,6 +117,11 @@ ColumnBuffers CarriedColumn::Buffers() const {
 
 // ---- tables ----
 
+RowTable::RowTable(std::vector<CarriedColumn> carried, TextForm text_form, size_t most_rows)
+    : text_form_(text_form), most_rows_(most_rows), carried_(std::move(carried)) {
+  for (CarriedColumn& column : carried_) column.SetTextForm(text_form, most_rows);
+}
+
 void RowTable::Carry(const InputRow& input) {
   const size_t count = size() - carried_rows_;
   if (count == 0) return;
@@ -156,6 +166,8 @@ namespace {
 // Texts that most rows lack.
 class RareTexts {
  public:
+  RareTexts(TextForm form, size_t rows) : texts_(form, rows) {}
+
   void Add(Text text) {
     texts_.Add(text);
     are_there_.Add(true);
@@ -180,7 +192,11 @@ class RareTexts {
 
 class RecordRows : public RowTable {
  public:
-  using RowTable::RowTable;
+  RecordRows(std::vector<CarriedColumn> carried, TextForm text_form, size_t most_rows)
+      : RowTable(std::move(carried), text_form, most_rows) {
+    lines_.reserve(most_rows);
+    columns_.reserve(most_rows);
+  }
 
   size_t size() const override { return lines_.size(); }
 
@@ -234,20 +250,19 @@ class RecordRows : public RowTable {
 
   std::vector<int32_t> lines_;
   std::vector<int32_t> columns_;
-  TextColumn scopes_;
-  TextColumn names_;
-  TextColumn kinds_;
-  TextColumn details_;
+  TextColumn scopes_{text_form(), most_rows()};
+  TextColumn names_{text_form(), most_rows()};
+  TextColumn kinds_{text_form(), most_rows()};
+  TextColumn details_{text_form(), most_rows()};
   Bits are_parameters_;
-  RareTexts errors_;
+  RareTexts errors_{text_form(), most_rows()};
 };
 
 // ---- occurrences ----
 
 class OccurrenceRows : public RowTable {
  public:
-  explicit OccurrenceRows(std::vector<CarriedColumn> carried)
-      : RowTable(std::move(carried)), flags_(NameFlagWords().size()) {}
+  using RowTable::RowTable;
 
   size_t size() const override { return indices_.size(); }
 
@@ -355,19 +370,19 @@ class OccurrenceRows : public RowTable {
   std::vector<int32_t> lines_;
   std::vector<int32_t> columns_;
   std::vector<int32_t> end_columns_;
-  TextColumn texts_;
-  TextColumn roles_;
-  RareTexts kinds_;
-  std::vector<Bits> flags_;
+  TextColumn texts_{text_form(), most_rows()};
+  TextColumn roles_{text_form(), most_rows()};
+  RareTexts kinds_{text_form(), most_rows()};
+  std::vector<Bits> flags_ = std::vector<Bits>(NameFlagWords().size());
   std::vector<int32_t> receivers_;
   Bits have_receivers_;
   Bits are_attributes_;
   std::vector<int32_t> scopes_;
-  TextColumn scope_names_;
+  TextColumn scope_names_{text_form(), most_rows()};
   std::vector<int32_t> symbols_;
   Bits have_symbols_;
-  TextColumn symbol_names_;
-  RareTexts errors_;
+  TextColumn symbol_names_{text_form(), most_rows()};
+  RareTexts errors_{text_form(), most_rows()};
   std::string shown_;
 };
 
@@ -408,26 +423,28 @@ class FileRows : public RowTable {
   }
 
  private:
-  TextColumn pythons_;
+  TextColumn pythons_{text_form(), most_rows()};
   std::vector<int64_t> bytes_;
   std::vector<int64_t> lines_;
   std::vector<int64_t> statements_;
   std::vector<int64_t> errors_;
-  RareTexts problems_;
+  RareTexts problems_{text_form(), most_rows()};
 };
 
 }  // namespace
 
-std::shared_ptr<RowTable> MakeRowTable(RowForm form, std::vector<CarriedColumn> carried) {
+std::shared_ptr<RowTable> MakeRowTable(RowForm form, std::vector<CarriedColumn> carried, size_t numbered_rows) {
+  const TextForm texts = numbered_rows != 0 ? TextForm::kNumbered : TextForm::kPlain;
+  const size_t most_rows = numbered_rows != 0 ? numbered_rows : RowTable::kMostRows;
   switch (form) {
     case RowForm::kRecords:
-      return std::make_shared<RecordRows>(std::move(carried));
+      return std::make_shared<RecordRows>(std::move(carried), texts, most_rows);
     case RowForm::kOccurrences:
-      return std::make_shared<OccurrenceRows>(std::move(carried));
+      return std::make_shared<OccurrenceRows>(std::move(carried), texts, most_rows);
     case RowForm::kFiles:
       break;
   }
-  return std::make_shared<FileRows>(std::move(carried));
+  return std::make_shared<FileRows>(std::move(carried), texts, most_rows);
 }
 
 }  // namespace quillet

@@ -5,6 +5,8 @@
 // A row with an `error` is about a file and no record: "error" (of syntax), "report" (a statement was given up for
 // another reason) or "problem" (the file could not be read at all) where a record has its kind, the message in
 // `error`, the place, and nothing in the other columns.
+//
+// In a table that is to be sorted, texts are dictionaries: copied once each, and compared once each.
 #pragma once
 
 #include <cstddef>
@@ -16,27 +18,74 @@
 #include "analysis/file_worker.h"
 #include "corpus/input_batch.h"
 #include "names/bindings.h"
+#include "names/text_table.h"
 #include "output/arrow_export.h"
 
 namespace quillet {
 
-// Texts with 32-bit offsets; rows that may be missing.
+// The texts of a column, each once.
+class ColumnTexts {
+ public:
+  ColumnTexts() { table_.Begin(0); }
+
+  uint32_t NumberOf(Text text) {
+    // Many rows have what the one before them has.
+    if (last_ < table_.size() && table_.TextOf(last_) == text) return last_;
+    const size_t count = table_.size();
+    last_ = table_.NumberOfCopy(text);
+    if (table_.size() != count) byte_size_ += text.size();
+    return last_;
+  }
+  size_t byte_size() const { return byte_size_; }
+  // All of them, in the order of their numbers. They stand until one is added.
+  ColumnBuffers::Texts Listed() {
+    table_.CopyTo(list_);
+    return ColumnBuffers::DictionaryOf(list_);
+  }
+
+ private:
+  TextTable table_;
+  TextList list_;
+  uint32_t last_ = 0;
+  size_t byte_size_ = 0;
+};
+
+enum class TextForm : uint8_t { kPlain, kNumbered };
+
+// Texts with 32-bit offsets, or a dictionary of them and their numbers; rows that may be missing. A copy of one with
+// numbers shares them.
 class TextColumn {
  public:
-  size_t size() const { return offsets_.size() - 1; }
-  size_t byte_size() const { return bytes_.size(); }
+  // With numbers there is room for so many rows.
+  explicit TextColumn(TextForm form = TextForm::kPlain, size_t rows = 0) {
+    if (form == TextForm::kPlain) {
+      offsets_.push_back(0);
+    } else {
+      texts_ = std::make_shared<ColumnTexts>();
+      numbers_.reserve(rows);
+    }
+  }
+
+  size_t byte_size() const { return texts_ != nullptr ? texts_->byte_size() : bytes_.size(); }
   void Add(Text text) {
-    bytes_.append(text);
-    offsets_.push_back(static_cast<int32_t>(bytes_.size()));
+    if (texts_ != nullptr) {
+      numbers_.push_back(texts_->NumberOf(text));
+    } else {
+      bytes_.append(text);
+      offsets_.push_back(static_cast<int32_t>(bytes_.size()));
+    }
   }
   void Repeat(Text text, size_t count);
   void Truncate(size_t size);
   ColumnBuffers Buffers(const Bits* validity = nullptr) const {
+    if (texts_ != nullptr) return {{numbers_.data()}, texts_->Listed(), validity};
     return {{offsets_.data(), bytes_.data()}, {}, validity};
   }
 
  private:
-  std::vector<int32_t> offsets_{0};
+  std::shared_ptr<ColumnTexts> texts_;
+  std::vector<uint32_t> numbers_;
+  std::vector<int32_t> offsets_;
   std::string bytes_;
 };
 
@@ -50,6 +99,9 @@ class CarriedColumn {
 
   const Column& schema() const { return schema_; }
   bool has_schema_of(const CarriedColumn& other) const { return schema_.format == other.schema_.format; }
+
+  // Before the first value.
+  void SetTextForm(TextForm form, size_t rows) { texts_ = TextColumn(form, rows); }
 
   // The value of an input's row, `count` times.
   void Repeat(const InputColumn& input, size_t row, size_t count);
@@ -80,10 +132,11 @@ class RowTable : public ColumnTable {
   static constexpr size_t kMostRows = size_t{1} << 16;
   static constexpr size_t kMostBytes = size_t{16} << 20;
 
-  explicit RowTable(std::vector<CarriedColumn> carried) : carried_(std::move(carried)) {}
+  RowTable(std::vector<CarriedColumn> carried, TextForm text_form, size_t most_rows);
 
+  // Types as they are where texts are plain.
   std::vector<Column> Schema() const;
-  bool IsFull() const { return size() >= kMostRows || byte_size() >= kMostBytes; }
+  bool IsFull() const { return size() >= most_rows_ || byte_size() >= kMostBytes; }
 
   // Each has to be followed by a Carry, sooner or later.
   virtual void AddRecord(const PlacedRecord&, Text /*scope*/) {}
@@ -104,13 +157,20 @@ class RowTable : public ColumnTable {
   virtual size_t own_byte_size() const = 0;
   virtual void TruncateOwn(size_t size) = 0;
 
+  // With what a table's own columns are made.
+  TextForm text_form() const { return text_form_; }
+  size_t most_rows() const { return most_rows_; }
+
  private:
+  TextForm text_form_;
+  size_t most_rows_;
   std::vector<CarriedColumn> carried_;
   size_t carried_rows_ = 0;
 };
 
 enum class RowForm : uint8_t { kRecords, kOccurrences, kFiles };
 
-std::shared_ptr<RowTable> MakeRowTable(RowForm form, std::vector<CarriedColumn> carried);
+// With `numbered_rows` a table of so many rows, whose texts are numbered.
+std::shared_ptr<RowTable> MakeRowTable(RowForm form, std::vector<CarriedColumn> carried, size_t numbered_rows = 0);
 
 }  // namespace quillet

@@ -26,6 +26,9 @@ std::string InWords(Version version) {
 // Puts records into rows.
 class SourceRows::Writer : public FileWriter {
  public:
+  // Between two looks at whether a table is full.
+  static constexpr size_t kRecordsAtOnce = 16;
+
   explicit Writer(SourceRows& rows) : rows_(rows) {}
 
   void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
@@ -33,11 +36,14 @@ class SourceRows::Writer : public FileWriter {
     if (rows_.options_.form != RowForm::kRecords) return;
     placed.Begin(file, scopes);
     size_t held = 0;
+    RowTable* table = nullptr;
+    size_t added = 0;
     for (size_t row = 0; row < file.rows().size(); ++row) {
       file.CheckMemory(held);
       for (const PlacedRecord& record : placed.OfRow(row)) {
         const Text scope = scopes.names()[record.scope];
-        rows_.Room().AddRecord(record, scope);
+        if (added++ % kRecordsAtOnce == 0) table = &rows_.Room();
+        table->AddRecord(record, scope);
         held += record.name.size() + record.detail.size() + scope.size() + sizeof(PlacedRecord);
       }
     }
@@ -142,7 +148,7 @@ RowTable& SourceRows::Room() {
     table_->Carry({&columns_, row_});
     full_.push_back(std::exchange(table_, nullptr));
   }
-  if (table_ == nullptr) table_ = MakeRowTable(options_.form, carried_);
+  if (table_ == nullptr) table_ = MakeRowTable(options_.form, carried_, options_.numbered_rows);
   return *table_;
 }
 
@@ -174,10 +180,15 @@ void SourceRows::AnalyzeRow() {
     if (options_.form == RowForm::kFiles) Room().AddFile(result, reading->python);
     if (table_ != nullptr) table_->Carry({&columns_, row_});
     if (problem_ != nullptr) {
-      if (files_ == nullptr) files_ = MakeRowTable(RowForm::kFiles, carried_);
+      if (files_ == nullptr) files_ = MakeRowTable(RowForm::kFiles, carried_, options_.numbered_rows);
       files_->AddFile(result, reading->python);
       files_->Carry({&columns_, row_});
     }
+    ++totals_.files;
+    totals_.bytes += result.byte_count;
+    totals_.lines += result.line_count;
+    totals_.errors += result.errors.size();
+    totals_.problems += !result.problem.empty();
   } catch (...) {
     GoBackTo(mark);
     throw;

@@ -31,6 +31,17 @@ class SourceRows {
     // Texts that say why a source could not be had, null where it is there. With such a column TakeFiles gives rows.
     std::string problem_column;
     std::function<bool(Text bytes, std::string& utf8)> decode;  // as FileWorker::Options has it
+    // With it, tables of so many rows with numbers for texts, as MakeRowTable has it.
+    size_t numbered_rows = 0;
+  };
+
+  // Of all sources.
+  struct Totals {
+    size_t files = 0;
+    size_t bytes = 0;
+    size_t lines = 0;
+    size_t errors = 0;
+    size_t problems = 0;  // sources that could not be read
   };
 
   explicit SourceRows(Options options);
@@ -47,6 +58,7 @@ class SourceRows {
   std::shared_ptr<const RowTable> Finish();
   // A row for each source since the last call, of the form kFiles; null where that is none.
   std::shared_ptr<const RowTable> TakeFiles() { return std::exchange(files_, nullptr); }
+  const Totals& totals() const { return totals_; }
 
  private:
   class Writer;
@@ -81,6 +93,7 @@ class SourceRows {
   std::deque<std::shared_ptr<RowTable>> full_;
   std::shared_ptr<RowTable> table_;
   std::shared_ptr<RowTable> files_;
+  Totals totals_;
 };
 
 }  // namespace quillet

@@ -142,6 +142,29 @@ def test_row_groups_hold_few_names(tmp_path: Path, monkeypatch: pytest.MonkeyPat
     assert sum(each.min <= "name_050" <= each.max for each in statistics) <= 2
 
 
+@pytest.mark.parametrize("reader", ["duckdb", "polars", "pandas"])
+def test_other_readers_take_the_files(reader: str, mirror: Path, tmp_path: Path) -> None:
+    module = pytest.importorskip(reader)
+    out = tmp_path / "out"
+    assert run(mirror, "-o", out, "--python", "auto").returncode == 0
+    for form in ("records", "files"):
+        [file] = (out / form).iterdir()
+        expected = parquet.read_table(file).to_pylist()
+        if reader == "duckdb":
+            found = module.connect().execute(f"select * from read_parquet('{file}')")
+            rows = [dict(zip([each[0] for each in found.description], row, strict=True)) for row in found.fetchall()]
+        elif reader == "polars":
+            rows = module.read_parquet(file).to_dicts()
+        else:
+            rows = module.read_parquet(file, dtype_backend="pyarrow").to_dict("records")
+            rows = [{key: None if value is module.NA else value for key, value in row.items()} for row in rows]
+        assert rows == expected
+        assert len(rows) > 8
+    if reader == "polars":
+        names = module.scan_parquet(out / "records").filter(module.col("name") == "json.loads").collect()
+        assert set(names["kind"]) == {"called", "get"}
+
+
 def test_finding_a_name(mirror: Path, tmp_path: Path) -> None:
     out = tmp_path / "out"
     run(mirror / "plain", mirror / "flask-login-3.0.tar.gz", "-o", out)

@@ -1,0 +1,48 @@
+// Rows in the order of one of their columns, as row groups of a Parquet file.
+//
+// Equal ones stay in the order in which they came. A table with numbered texts is what this takes: the texts of the
+// column are ranked, each once, and the rows counted into their places; each group gets dictionaries of what it holds.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "corpus/parquet_file.h"
+#include "corpus/row_tables.h"
+
+namespace quillet {
+
+class SortedRun {
+ public:
+  // `key` is a column of texts that are never missing.
+  SortedRun(const RowTable& table, size_t key);
+
+  // All rows, `group_rows` a group.
+  void WriteTo(ParquetFile& file, size_t group_rows);
+
+ private:
+  // What the spans of a group's column are of.
+  struct Gathered {
+    std::vector<uint32_t> places;
+    std::vector<Text> dictionary;
+    std::vector<int32_t> numbers;
+    std::vector<int64_t> long_numbers;
+    Bits bits;
+    Bits validity;
+  };
+
+  void Sort();
+  ParquetColumn Gather(size_t column, size_t begin, size_t end, Gathered& gathered);
+  void GatherTexts(const ColumnBuffers& buffers, std::span<const uint32_t> rows, Gathered& gathered);
+
+  const RowTable& table_;
+  const size_t key_;
+  const std::vector<Column> schema_;
+  const std::vector<ColumnBuffers> buffers_;
+  std::vector<uint32_t> order_;   // the rows
+  std::vector<uint32_t> places_;  // of texts in the dictionary that is being made
+};
+
+}  // namespace quillet
