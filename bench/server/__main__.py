@@ -1,7 +1,7 @@
 """Measures the language server.
 
 python -m bench.server soak FOLDER [--steps N] [--seed N]
-python -m bench.server peers FOLDER FILE [--line N] [--column N] [--only NAME]... [--bin FOLDER] [--query WORD]
+python -m bench.server peers --project FOLDER FILE LINE COLUMN WORD... [--only NAME]... [--bin FOLDER] [--save FILE]
 """
 
 from __future__ import annotations
@@ -20,14 +20,19 @@ def main() -> int:
     soak.add_argument("--steps", type=int, default=20_000)
     soak.add_argument("--seed", type=int, default=1)
     peers = kinds.add_parser("peers", help="the same questions to other servers")
-    peers.add_argument("folder", type=Path)
-    peers.add_argument("file", help="of the folder, in which is asked")
-    peers.add_argument("--line", type=int, default=1, help="of a name that is asked about")
-    peers.add_argument("--column", type=int, default=1)
-    peers.add_argument("--query", default="solve", help="what symbols of the program are looked for")
+    peers.add_argument(
+        "--project",
+        dest="projects",
+        action="append",
+        required=True,
+        nargs=5,
+        metavar=("FOLDER", "FILE", "LINE", "COLUMN", "WORD"),
+        help="where is asked, at a name behind a dot, and the word that symbols are looked for by",
+    )
     peers.add_argument("--only", action="append", help="a server; all of them without it")
     peers.add_argument("--bin", type=Path, help="where the other servers are installed")
-    peers.add_argument("--timeout", type=float, default=120)
+    peers.add_argument("--timeout", type=float, default=120, help="seconds that an answer may take")
+    peers.add_argument("--save", type=Path, help="where each figure is written to as well, a line of JSON each")
     given = parser.parse_args()
     if given.kind == "soak":
         from bench.server.soak import run
