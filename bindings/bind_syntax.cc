@@ -67,7 +67,7 @@ void BindSyntax(nb::module_& tarvex) {
           const Unlocked unlocked;
           const Ref<SourceText> source = SourceText::Copy(text.text());
           std::vector<LineRow> rows;
-          CutLines(*source, version, rows);
+          CutLinesCompletely(*source, version, rows);
           lines = SyntaxLines(*source, rows, version);
         }
         return StrOf(lines);

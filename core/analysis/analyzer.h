@@ -66,8 +66,8 @@ class CPGenAnalyzerImpl {
   // Walks a line without embedded expressions, which nobody asked for and of which nothing is reported. False
   // where its analysis would fail, or would not end with the walks.
   bool WalkWithoutDoubt(LogicalLine& logical, bool in_async_def);
-  // Whether the analysis of a line would not end with the walks, for what its own tokens are.
-  bool IsDoubtful(const LogicalLine& logical, const LinePlace& place) const;
+  // In which places the analysis of a line would not end with the walks, for what its own tokens are.
+  uint8_t DoubtOf(const LogicalLine& logical) const;
   // What was told is as if it had been read.
   void CountAsRead() { was_rejected_ = false; }
 
@@ -77,9 +77,6 @@ class CPGenAnalyzerImpl {
 
   // Whether returned errors say what the parser waited for (error_words.h) instead of "invalid syntax" alone.
   void set_explains_errors(bool explains) { explains_errors_ = explains; }
-
-  // Of one that reads completely: about the source that the lines are of, see CloserLook.
-  void set_holds_debug_name(bool holds);
 
   // Whether the grammar rejected the statement that was read completely last.
   bool was_rejected() const { return was_rejected_; }

@@ -2,7 +2,8 @@
 // last one may be a jump.
 #include "analysis/block_rules.h"
 
-#include <algorithm>
+#include <array>
+#include <initializer_list>
 #include <utility>
 
 #include "lines/token_search.h"
@@ -13,26 +14,36 @@ namespace {
 
 constexpr size_t kMostBlocks = 100;  // as deep as the language lets blocks nest, the file itself with them
 
-bool IsHeadKind(LineKind kind) {
-  switch (kind) {
-    case LineKind::kIfBeginning:
-    case LineKind::kElifBeginning:
-    case LineKind::kElseBeginning:
-    case LineKind::kForBeginning:
-    case LineKind::kWhileBeginning:
-    case LineKind::kWith:
-    case LineKind::kTry:
-    case LineKind::kExcept:
-    case LineKind::kFinally:
-    case LineKind::kFunctionDef:
-    case LineKind::kClassDef:
-    case LineKind::kMatch:
-    case LineKind::kCase:
-      return true;
-    default:
-      return false;
-  }
-}
+// What a kind of row is to the blocks.
+enum class Role : uint8_t {
+  kNothing,
+  kOther,  // clauses and jumps
+  kPlain,  // a statement that holds no others
+  kMaybePlain,
+  kHead,
+  kPlainHead,  // of a statement, and what stands inside does not depend on it
+};
+
+constexpr auto kRoles = [] {
+  std::array<Role, static_cast<size_t>(LineKind::kOther) + 1> table{};
+  table.fill(Role::kOther);
+  const auto set = [&table](Role role, std::initializer_list<LineKind> kinds) {
+    for (const LineKind kind : kinds) table[static_cast<size_t>(kind)] = role;
+  };
+  set(Role::kNothing, {LineKind::kBlankLine, LineKind::kComment});
+  set(Role::kPlain, {LineKind::kStringExpression, LineKind::kAssignment, LineKind::kPass, LineKind::kRaise,
+                     LineKind::kAssert, LineKind::kReturn, LineKind::kImport, LineKind::kFromImport, LineKind::kPrint,
+                     LineKind::kDelete, LineKind::kTypeStatement});
+  set(Role::kMaybePlain, {LineKind::kUnknown});
+  set(Role::kPlainHead, {LineKind::kIfBeginning, LineKind::kWith, LineKind::kFunctionDef, LineKind::kClassDef,
+                         LineKind::kForBeginning, LineKind::kWhileBeginning});
+  set(Role::kHead, {LineKind::kElifBeginning, LineKind::kElseBeginning, LineKind::kTry, LineKind::kExcept,
+                    LineKind::kFinally, LineKind::kMatch, LineKind::kCase});
+  return table;
+}();
+
+Role RoleOf(LineKind kind) { return kRoles[static_cast<size_t>(kind)]; }
+bool IsHeadKind(LineKind kind) { return RoleOf(kind) >= Role::kHead; }
 
 bool IsDefinitionKind(LineKind kind) { return kind == LineKind::kFunctionDef || kind == LineKind::kClassDef; }
 
@@ -61,19 +72,102 @@ bool IsFutureFeature(Text name, Version version) {
 
 }  // namespace
 
-void BlockRules::Reset(const SourceText& source, Version version) {
+void BlockRules::Reset(const SourceText& source, std::span<const LineRow> rows, Version version) {
   source_ = &source;
+  rows_ = rows;
   version_ = version;
   blocks_.clear();
   blocks_.push_back({0, 0, Head::kFile});
   inline_.clear();
+  irrefutables_.clear();
   head_index_ = last_index_ = told_row_ = kNoRow;
-  last_was_rejected_ = has_except_star_ = false;
-  may_import_future_ = true;
+  watch_ = kFutureImports;
   findings_.clear();
 }
 
-void BlockRules::Next(size_t index, const LineRow& row, const Reading& reading) {
+inline BlockRules::Clauses BlockRules::ClausesBehind(LineKind kind) {
+  switch (kind) {
+    case LineKind::kIfBeginning:
+      return Clauses::kElif;
+    case LineKind::kForBeginning:
+    case LineKind::kWhileBeginning:
+      return Clauses::kElse;
+    default:
+      return Clauses::kNone;
+  }
+}
+
+inline BlockRules::Head BlockRules::HeadOfPlain(LineKind kind) {
+  switch (kind) {
+    case LineKind::kForBeginning:
+    case LineKind::kWhileBeginning:
+      return Head::kLoop;
+    case LineKind::kFunctionDef:
+    case LineKind::kClassDef:
+      return Head::kDefinition;
+    default:
+      return Head::kPlain;
+  }
+}
+
+inline bool BlockRules::Begin(size_t index, Block& block) {
+  const LineKind kind = rows_[index].kind;
+  if (block.clauses >= Clauses::kTry && (block.clauses != Clauses::kDecorated || !IsDefinitionKind(kind))) return false;
+  block.clauses = ClausesBehind(kind);
+  const bool is_head = RoleOf(kind) == Role::kPlainHead;
+  if (is_head) {
+    head_index_ = index;
+    head_ = HeadOfPlain(kind);
+  } else {
+    head_index_ = kNoRow;
+  }
+  watch_ = is_head ? kHead : 0;
+  inline_.clear();
+  last_index_ = index;
+  return true;
+}
+
+bool BlockRules::GoesOn(size_t index, bool was_rejected) {
+  const LineRow& row = rows_[index];
+  const Role role = RoleOf(row.kind);
+  if (role == Role::kNothing) return true;
+  if (role == Role::kOther || role == Role::kHead || row.continues_physical_line || was_rejected ||
+      (watch_ & ~kHead) != 0)
+    return false;
+  const Token* const toks = source_->tokens.data() + row.first_token;
+  const TokenCode first = toks->code;
+  if (role == Role::kMaybePlain &&
+      (first == tok::AT || first == word::kBreak || first == word::kContinue || IsSkipCode(first)))
+    return false;
+  if (row.kind == LineKind::kFromImport && (row.token_count < 2 || toks[1].length == Text("__future__").size()))
+    return false;
+  if (role == Role::kPlainHead && (toks[row.token_count - 1].code != tok::COLON || row.has_inline_body)) return false;
+  const auto narrow = static_cast<uint32_t>(toks->text - (source_->begin() + source_->line_starts[row.first_line]));
+  if (narrow != row.indent) return false;
+  if (watch_ != 0) return Enter(index, narrow);
+  Block* block = &blocks_.back();
+  if (row.indent < block->column) [[unlikely]] {
+    // The first one stands at the margin.
+    while (row.indent < block->column && block->clauses < Clauses::kTry) --block;
+    if (row.indent != block->column || narrow != block->narrow_column) return false;
+    while (&blocks_.back() != block) blocks_.pop_back();
+  }
+  return row.indent == block->column && narrow == block->narrow_column && Begin(index, *block);
+}
+
+// The first row behind a head.
+bool BlockRules::Enter(size_t index, uint32_t narrow_column) {
+  const Block& around = blocks_.back();
+  const uint32_t column = rows_[index].indent;
+  if (column <= around.column || narrow_column <= around.narrow_column || blocks_.size() == kMostBlocks ||
+      head_ == Head::kMatch)
+    return false;
+  blocks_.push_back({column, narrow_column, head_});
+  return Begin(index, blocks_.back());
+}
+
+void BlockRules::Next(size_t index, const Reading& reading) {
+  const LineRow& row = rows_[index];
   if (row.kind == LineKind::kBlankLine || row.kind == LineKind::kComment) return;
   const TokenSpan toks = TokensOf(row);
   const size_t last = LastSignificant(toks);
@@ -87,30 +181,33 @@ void BlockRules::Next(size_t index, const LineRow& row, const Reading& reading) 
   }
   const TokenCode code = toks[last].code;
   if (code == word::kBreak || code == word::kContinue) Jump(index, row, last);
-  if (has_except_star_) [[unlikely]] {
+  if (Watches(kStarredExcept)) [[unlikely]] {
     for (size_t i = 0; i < toks.size(); ++i)
       if (toks[i].code == word::kReturn) Jump(index, row, i);
   }
-  const bool is_on_line_of_head = IsHeadKind(row.kind) && code != tok::COLON;
-  if (may_import_future_ || row.kind == LineKind::kFromImport || is_on_line_of_head) FutureImport(index, row);
-  if (IsHeadKind(row.kind)) {
+  const bool is_head = IsHeadKind(row.kind);
+  const bool is_on_line_of_head = is_head && code != tok::COLON;
+  if (Watches(kFutureImports) || row.kind == LineKind::kFromImport || is_on_line_of_head) FutureImport(index, row);
+  if (is_head) {
     // A definition's body on its line is a row of its own.
+    const Head head = HeadOf(row);
     if (code == tok::COLON && !row.has_inline_body) {
       head_index_ = index;
-      head_ = row;
+      head_ = head;
     } else {
-      inline_.push_back(HeadOf(row));
+      inline_.push_back(head);
     }
   }
+  SetWatch(kHead, head_index_ != kNoRow);
+  SetWatch(kRejection, reading.was_rejected);
   last_index_ = index;
-  last_ = row;
-  last_was_rejected_ = reading.was_rejected;
 }
 
 void BlockRules::End() {
-  if (last_index_ == kNoRow || last_was_rejected_) return;
-  const Context end = Context::Index(static_cast<int32_t>(last_.token_count));
-  if (version_.AtLeast(3, 8) && TokensOf(last_).back().code == tok::BACKSLASH)
+  if (last_index_ == kNoRow || Watches(kRejection)) return;
+  const LineRow& last = rows_[last_index_];
+  const Context end = Context::Index(static_cast<int32_t>(last.token_count));
+  if (version_.AtLeast(3, 8) && TokensOf(last).back().code == tok::BACKSLASH)
     return Add(last_index_, end, "unexpected EOF while parsing");
   if (head_index_ != kNoRow) {
     return Add(head_index_, end, "expected an indented block after " + NameOfHead(), true,
@@ -127,8 +224,8 @@ void BlockRules::End() {
 void BlockRules::Indent(size_t index, const LineRow& row) {
   const uint32_t column = row.indent;
   const uint32_t narrow = NarrowColumn(row);
-  const bool may_indent = head_index_ != kNoRow || last_was_rejected_;
-  const bool must_indent = head_index_ != kNoRow && !last_was_rejected_;
+  const bool may_indent = head_index_ != kNoRow || Watches(kRejection);
+  const bool must_indent = head_index_ != kNoRow && !Watches(kRejection);
   const Block& top = blocks_.back();
   if (column > top.column) {
     const bool is_mixed = narrow <= top.narrow_column;
@@ -140,8 +237,11 @@ void BlockRules::Indent(size_t index, const LineRow& row) {
       Add(index, Context::At({0, static_cast<int32_t>(width) - 1}), "unexpected indent", true,
           SyntaxError::Kind::kIndentation);
     }
-    Push(index, column, narrow, must_indent ? HeadOf(head_) : Head::kUnknown,
-         must_indent ? Clauses::kNone : Clauses::kUnknown);
+    const Head head = must_indent ? head_ : Head::kUnknown;
+    Push(index, column, narrow, head,
+         !must_indent           ? Clauses::kUnknown
+         : head == Head::kMatch ? Clauses::kCase
+                                : Clauses::kNone);
   } else {
     if (must_indent) {
       Context place = FirstToken(row);
@@ -170,7 +270,7 @@ void BlockRules::Dedent(size_t index, const LineRow& row, uint32_t column, uint3
   while (left > 1 && blocks_[left - 1].column > column) --left;
   const Block& now = blocks_[left - 1];
   const bool fits = now.column == column;
-  if (!fits && !last_was_rejected_) {
+  if (!fits && !Watches(kRejection)) {
     const char* const begin = source_->begin() + source_->line_starts[row.first_line];
     const char* end = begin;
     while (end < source_->end() && *end != '\n' && *end != '\r') ++end;
@@ -181,7 +281,7 @@ void BlockRules::Dedent(size_t index, const LineRow& row, uint32_t column, uint3
         SyntaxError::Kind::kTab);
   }
   for (; blocks_.size() > left; blocks_.pop_back()) {
-    if (last_was_rejected_) continue;
+    if (Watches(kRejection)) continue;
     if (blocks_.back().clauses == Clauses::kTry)
       Add(index, FirstToken(row), "expected 'except' or 'finally' block");
     else if (blocks_.back().clauses == Clauses::kDecorated)
@@ -190,11 +290,9 @@ void BlockRules::Dedent(size_t index, const LineRow& row, uint32_t column, uint3
   if (!fits) Push(index, column, narrow_column, Head::kUnknown, Clauses::kUnknown);
 }
 
-uint32_t BlockRules::NarrowColumn(const LineRow& row) const {
+uint32_t BlockRules::CountNarrowColumn(const LineRow& row) const {
   const char* at = source_->begin() + source_->line_starts[row.first_line];
   const char* const end = TokensOf(row)[0].text;
-  if (end - at == static_cast<ptrdiff_t>(row.indent)) [[likely]]
-    return row.indent;
   uint32_t column = 0;
   for (; at < end; ++at) column = *at == '\f' ? 0 : column + 1;
   return column;
@@ -204,16 +302,8 @@ uint32_t BlockRules::NarrowColumn(const LineRow& row) const {
 
 // A statement behind another one, or behind a head, on the same line: one that holds no others.
 void BlockRules::ContinueLine(size_t index, const LineRow& row) {
-  Block& block = blocks_.back();
   const TokenCode code = TokensOf(row)[static_cast<size_t>(FirstToken(row).value)].code;
-  if (block.clauses == Clauses::kDecorated && inline_.empty()) {
-    block.clauses = Clauses::kUnknown;
-    // At the ";", which is in no row.
-    const char* const begin = source_->begin() + source_->line_starts[row.first_line];
-    const char* at = TokensOf(row)[0].text;
-    while (at > begin && *at != ';') --at;
-    Add(index, Context::At({0, static_cast<int32_t>(at - begin)}), "invalid syntax");
-  } else if (IsHeadKind(row.kind) || code == tok::AT) {
+  if (IsHeadKind(row.kind) || code == tok::AT) {
     Add(index, FirstToken(row), "invalid syntax");
   }
 }
@@ -237,8 +327,11 @@ void BlockRules::Clause(size_t index, const LineRow& row, const Reading& reading
     block.clauses = Clauses::kUnknown;
     return false;
   };
-  if (block.head == Head::kMatch && row.kind != LineKind::kCase) {
-    if (!reading.was_rejected) Add(index, FirstToken(row), "invalid syntax");
+  if (before == Clauses::kCase) {
+    if (row.kind == LineKind::kCase)
+      Case(index, reading, block);
+    else if (!reading.was_rejected)
+      Add(index, FirstToken(row), "invalid syntax");
     return;
   }
   switch (row.kind) {
@@ -260,11 +353,9 @@ void BlockRules::Clause(size_t index, const LineRow& row, const Reading& reading
       go_on(before == Clauses::kTry || before == Clauses::kExcept || before == Clauses::kTryElse, Clauses::kNone);
       break;
     case LineKind::kIfBeginning:
-      begin(Clauses::kElif);
-      break;
     case LineKind::kForBeginning:
     case LineKind::kWhileBeginning:
-      begin(Clauses::kElse);
+      begin(ClausesBehind(row.kind));
       break;
     case LineKind::kTry:
       begin(Clauses::kTry);
@@ -277,11 +368,24 @@ void BlockRules::Clause(size_t index, const LineRow& row, const Reading& reading
       break;
     default: {
       const TokenSpan toks = TokensOf(row);
-      const size_t first = NextSignificant(toks, 0, toks.size());
-      begin(toks[first].code == tok::AT ? Clauses::kDecorated : Clauses::kNone);
+      const bool is_decorator = toks[NextSignificant(toks, 0, toks.size())].code == tok::AT;
+      begin(is_decorator ? Clauses::kDecorated : Clauses::kNone);
+      if (is_decorator) Decorator(index, row);
       break;
     }
   }
+}
+
+// It ends with its line, and not at a ";" on it, which is in no row.
+void BlockRules::Decorator(size_t index, const LineRow& row) {
+  const TokenSpan toks = TokensOf(row);
+  const char* at = toks[LastSignificant(toks)].end();
+  while (at < source_->end() && (*at == ' ' || *at == '\t')) ++at;
+  if (at == source_->end() || *at != ';') return;
+  const Position place = source_->PositionOf(at);
+  blocks_.back().clauses = Clauses::kUnknown;
+  Add(index, Context::At({place.line - static_cast<int32_t>(row.first_line), place.col}), "invalid syntax",
+      /*comes_first=*/false);
 }
 
 void BlockRules::Except(size_t index, const LineRow& row, Block& block) {
@@ -292,7 +396,7 @@ void BlockRules::Except(size_t index, const LineRow& row, Block& block) {
   if (is_star ? block.has_except : block.has_except_star)
     Add(index, FirstToken(row), "cannot have both 'except' and 'except*' on the same 'try'");
   (is_star ? block.has_except_star : block.has_except) = true;
-  has_except_star_ |= is_star;
+  if (is_star) SetWatch(kStarredExcept, true);
   if (block.bare_except != kNoRow)
     Add(block.bare_except, Context::Index(0), "default 'except:' must be last", /*comes_first=*/false);
   block.bare_except = next < toks.size() && toks[next].code == tok::COLON ? index : kNoRow;
@@ -304,15 +408,14 @@ void BlockRules::Case(size_t index, const Reading& reading, Block& block) {
     if (block.head != Head::kUnknown && !reading.was_rejected) Add(index, Context::Index(1), "invalid syntax");
     return;
   }
-  if (block.irrefutable_row != kNoRow) {
-    Add(block.irrefutable_row, Context::Index(block.irrefutable_at), std::exchange(block.irrefutable, {}),
-        /*comes_first=*/false);
-    block.irrefutable_row = kNoRow;
+  if (block.irrefutable != kNoRow) {
+    Irrefutable& found = irrefutables_[block.irrefutable];
+    Add(found.row, Context::Index(found.at), std::move(found.words), /*comes_first=*/false);
+    block.irrefutable = kNoRow;
   }
-  if (reading.irrefutable.empty()) return;
-  block.irrefutable_row = index;
-  block.irrefutable_at = reading.irrefutable_at;
-  block.irrefutable = reading.irrefutable;
+  if (reading.irrefutable == nullptr) return;
+  block.irrefutable = irrefutables_.size();
+  irrefutables_.push_back({index, reading.irrefutable_at, *reading.irrefutable});
 }
 
 // ---- statements in their place ----
@@ -357,13 +460,13 @@ void BlockRules::FutureImport(size_t index, const LineRow& row) {
   const size_t from = FutureImportIn(toks);
   if (from == toks.size()) {
     const bool is_docstring = last_index_ == kNoRow && row.kind == LineKind::kStringExpression;
-    may_import_future_ = may_import_future_ && is_docstring;
+    if (!is_docstring) SetWatch(kFutureImports, false);
     return;
   }
   const auto tell = [&](std::string message) {
     Add(index, Context::Index(static_cast<int32_t>(from)), std::move(message), /*comes_first=*/false);
   };
-  if (!may_import_future_ || blocks_.size() > 1 || !inline_.empty() || from != 0)
+  if (!Watches(kFutureImports) || blocks_.size() > 1 || !inline_.empty() || from != 0)
     return tell("from __future__ imports must occur at the beginning of the file");
   bool is_feature = false;
   for (const Token& token : toks) {
@@ -392,29 +495,24 @@ Context BlockRules::FirstToken(const LineRow& row) const {
 }
 
 std::string BlockRules::NameOfHead() const {
-  const TokenSpan toks = TokensOf(head_);
+  const LineRow& head = rows_[head_index_];
+  const TokenSpan toks = TokensOf(head);
   size_t first = NextSignificant(toks, 0, toks.size());
-  if (head_.is_async) first = NextSignificant(toks, first + 1, toks.size());
+  if (head.is_async) first = NextSignificant(toks, first + 1, toks.size());
   std::string name;
-  if (head_.kind == LineKind::kFunctionDef) {
+  if (head.kind == LineKind::kFunctionDef) {
     name = "function definition";
-  } else if (head_.kind == LineKind::kClassDef) {
+  } else if (head.kind == LineKind::kClassDef) {
     name = "class definition";
   } else {
-    const bool is_star = HeadOf(head_) == Head::kExceptStar;
+    const bool is_star = head_ == Head::kExceptStar;
     name = "'" + std::string(toks[first].view()) + (is_star ? "*" : "") + "' statement";
   }
-  return name + " on line " + std::to_string(head_.first_line + 1);
+  return name + " on line " + std::to_string(head.first_line + 1);
 }
 
 BlockRules::Head BlockRules::HeadOf(const LineRow& row) const {
   switch (row.kind) {
-    case LineKind::kForBeginning:
-    case LineKind::kWhileBeginning:
-      return Head::kLoop;
-    case LineKind::kFunctionDef:
-    case LineKind::kClassDef:
-      return Head::kDefinition;
     case LineKind::kFinally:
       return Head::kFinally;
     case LineKind::kMatch:
@@ -426,7 +524,7 @@ BlockRules::Head BlockRules::HeadOf(const LineRow& row) const {
       return next < toks.size() && toks[next].code == tok::STAR ? Head::kExceptStar : Head::kPlain;
     }
     default:
-      return Head::kPlain;
+      return HeadOfPlain(row.kind);
   }
 }
 

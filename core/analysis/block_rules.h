@@ -7,6 +7,7 @@
 #pragma once
 
 #include <cstdint>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -28,24 +29,30 @@ class BlockRules {
   struct Reading {
     bool was_rejected = false;  // by the grammar
     // Of a case without a guard that matches everything: what that makes of the cases behind it, and at which token.
-    std::string irrefutable;
+    const std::string* irrefutable = nullptr;
     int32_t irrefutable_at = 0;
   };
 
-  // For another source; keeps its memory.
-  void Reset(const SourceText& source, Version version);
+  // For another source, whose rows stay where they are; keeps its memory.
+  void Reset(const SourceText& source, std::span<const LineRow> rows, Version version);
+  // Whether the next row is one more plain statement, head or body of a head in its place, as most are: then that is
+  // all there is to it. All others go to Next.
+  bool GoesOn(size_t index, bool was_rejected);
   // What is wrong is in findings(), for rows up to this one.
-  void Next(size_t index, const LineRow& row, const Reading& reading);
+  void Next(size_t index, const Reading& reading);
   void End();
 
   std::vector<Finding>& findings() { return findings_; }
 
  private:
   static constexpr size_t kNoRow = SIZE_MAX;
+
   // As far as what stands inside depends on it.
   enum class Head : uint8_t { kFile, kPlain, kLoop, kDefinition, kExceptStar, kFinally, kMatch, kUnknown };
-  // Which clauses may come next: those of the statement that stands last in a block.
-  enum class Clauses : uint8_t { kNone, kElse, kElif, kTry, kExcept, kTryElse, kDecorated, kUnknown };
+  // Which clauses may come next: those of the statement that stands last in a block. From kTry on something has to.
+  enum class Clauses : uint8_t { kNone, kElse, kElif, kExcept, kTryElse, kUnknown, kTry, kDecorated, kCase };
+  // What makes the next row one to look at.
+  enum Watch : uint8_t { kHead = 1, kRejection = 2, kFutureImports = 4, kStarredExcept = 8 };
 
   struct Block {
     uint32_t column;
@@ -56,19 +63,28 @@ class BlockRules {
     bool has_except = false;
     bool has_except_star = false;
     size_t bare_except = kNoRow;
-    // Of a match: the case that leaves nothing to those behind it.
-    size_t irrefutable_row = kNoRow;
-    int32_t irrefutable_at = 0;
-    std::string irrefutable{};
+    // Of a match: the number of the case that leaves nothing to those behind it.
+    size_t irrefutable = kNoRow;
+  };
+  struct Irrefutable {
+    size_t row;
+    int32_t at;
+    std::string words;
   };
 
+  bool Begin(size_t index, Block& block);
+  bool Enter(size_t index, uint32_t narrow_column);
   void Indent(size_t index, const LineRow& row);
   void Dedent(size_t index, const LineRow& row, uint32_t column, uint32_t narrow_column);
   void Push(size_t index, uint32_t column, uint32_t narrow_column, Head head, Clauses clauses);
   void ContinueLine(size_t index, const LineRow& row);
   void Clause(size_t index, const LineRow& row, const Reading& reading);
+  // Of a statement that holds no others, or of the head of one.
+  static Clauses ClausesBehind(LineKind kind);
+  static Head HeadOfPlain(LineKind kind);
   void Except(size_t index, const LineRow& row, Block& block);
   void Case(size_t index, const Reading& reading, Block& block);
+  void Decorator(size_t index, const LineRow& row);
   void Jump(size_t index, const LineRow& row, size_t token);
   void FutureImport(size_t index, const LineRow& row);
   void Add(size_t row, Context place, std::string message, bool comes_first = true,
@@ -79,22 +95,26 @@ class BlockRules {
   Head HeadOf(const LineRow& row) const;
   TokenSpan TokensOf(const LineRow& row) const;
   // The width of the indentation with tabs one wide.
-  uint32_t NarrowColumn(const LineRow& row) const;
+  uint32_t NarrowColumn(const LineRow& row) const {
+    const auto width =
+        source_->tokens[row.first_token].text - (source_->begin() + source_->line_starts[row.first_line]);
+    return width == static_cast<ptrdiff_t>(row.indent) ? row.indent : CountNarrowColumn(row);
+  }
+  uint32_t CountNarrowColumn(const LineRow& row) const;
+  void SetWatch(Watch watch, bool is_set) { watch_ = static_cast<uint8_t>(is_set ? watch_ | watch : watch_ & ~watch); }
+  bool Watches(Watch watch) const { return (watch_ & watch) != 0; }
 
   const SourceText* source_ = nullptr;
+  std::span<const LineRow> rows_;
   Version version_;
   std::vector<Block> blocks_;
-  std::vector<Head> inline_;  // heads whose bodies are on the line under way
-  // The head that waits for its block.
-  size_t head_index_ = kNoRow;
-  LineRow head_{};
-  // The statement before.
-  size_t last_index_ = kNoRow;
-  LineRow last_{};
-  bool last_was_rejected_ = false;
-  size_t told_row_ = kNoRow;  // the last one of which something was told
-  bool may_import_future_ = true;
-  bool has_except_star_ = false;  // somewhere
+  std::vector<Head> inline_;    // heads whose bodies are on the line under way
+  size_t head_index_ = kNoRow;  // the head that waits for its block
+  Head head_ = Head::kPlain;    // what it is to that
+  size_t last_index_ = kNoRow;  // the statement before
+  size_t told_row_ = kNoRow;    // the last one of which something was told
+  uint8_t watch_ = 0;
+  std::vector<Irrefutable> irrefutables_;
   std::vector<Finding> findings_;
 };
 

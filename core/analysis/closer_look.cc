@@ -6,17 +6,15 @@
 
 #include "lines/token_search.h"
 #include "parser/string_escapes.h"
+#include "tokens/byte_scan.h"
 #include "tokens/token_ends.h"
 
 namespace quillet {
 
 namespace {
 
-bool HoldsDebugName(TokenSpan toks) {
-  for (const Token& token : toks)
-    if (token.code == tok::NAME && token.view() == "__debug__") return true;
-  return false;
-}
+constexpr Text kDebugName = "__debug__";
+constexpr uint32_t kAnyLength = UINT32_MAX;
 
 // `*args, name`, where a parameter or an argument may begin.
 bool IsStarredWithNameBehind(TokenSpan toks, size_t star) {
@@ -26,6 +24,12 @@ bool IsStarredWithNameBehind(TokenSpan toks, size_t star) {
          toks[star + 2].code == tok::COMMA && toks[star + 3].code != tok::DOUBLESTAR;
 }
 
+bool IsDottedName(TokenSpan toks) {
+  for (size_t i = 0; i < toks.size(); ++i)
+    if (toks[i].code != (i % 2 == 0 ? tok::NAME : tok::DOT)) return false;
+  return toks.size() % 2 == 1;
+}
+
 bool IsDefinitionHead(const LogicalLine& line) {
   const size_t first = NextSignificant(line.toks, 0, line.toks.size());
   const size_t count = line.toks.size();
@@ -33,6 +37,35 @@ bool IsDefinitionHead(const LogicalLine& line) {
   if (line.toks[first].code == word::kDef) return true;
   const size_t next = NextSignificant(line.toks, first + 1, count);
   return line.toks[first].code == word::kAsync && next < count && line.toks[next].code == word::kDef;
+}
+
+// Whether an escape may be wrong: most are a letter for a line end or a quote.
+bool MayHoldWrongEscape(const Token& string) {
+  const char* const end = string.end();
+  for (const char* at = string.text; at < end; at += 2) {
+    at = static_cast<const char*>(std::memchr(at, '\\', static_cast<size_t>(end - at)));
+    if (at == nullptr) return false;
+    if (at[1] == 'x' || at[1] == 'N' || (at[1] | 0x20) == 'u') return true;
+  }
+  return false;
+}
+
+// Nearly all of what is looked at.
+bool IsUsual(const Token& token) {
+  switch (token.code) {
+    case tok::NAME:
+      return token.text[2] != kDebugName[2];
+    case tok::NUMBER: {
+      const char* at = token.text;
+      if (token.length > 1 && *at == '0') return false;
+      while (at < token.end() && IsAsciiDigit(*at)) ++at;
+      return at == token.end() && !IsAsciiIdentifierByte(*at);
+    }
+    case tok::STRING:
+      return IsQuote(*token.text) && !MayHoldWrongEscape(token);
+    default:
+      return false;
+  }
 }
 
 bool IsUnusualNumber(const Token& number, const Token* next, bool underscores_are_known) {
@@ -45,13 +78,30 @@ bool IsUnusualNumber(const Token& number, const Token* next, bool underscores_ar
   return !underscores_are_known && text.find('_') != Text::npos;
 }
 
+// Of a token beside bytes: whether it may be text, or stand in front of some.
+bool MayBeText(const Token& token, bool is_last) {
+  if (token.code != tok::STRING) return !is_last && (token.removed() || IsSkipCode(token.code));
+  return (token.text[0] | 0x20) != 'b' && (IsQuote(token.text[0]) || (token.text[1] | 0x20) != 'b');
+}
+
+// Bytes are ASCII, and no text stands beside them.
+bool AreUnusualBytes(TokenSpan toks, size_t i) {
+  const Text text = toks[i].view();
+  if (std::ranges::any_of(text, [](char c) { return static_cast<unsigned char>(c) >= 0x80; })) return true;
+  return (i > 0 && MayBeText(toks[i - 1], false)) ||
+         (i + 1 < toks.size() && MayBeText(toks[i + 1], i + 2 == toks.size()));
+}
+
 // A prefix that not all versions take, and bytes.
-bool IsUnusualString(const Token& string, bool python3, bool formatted_are_known) {
+bool IsUnusualString(TokenSpan toks, size_t i, bool python3, bool formatted_are_known) {
+  const Token& string = toks[i];
   if (IsQuote(string.text[0])) return false;
   for (const char* at = string.text; !IsQuote(*at); ++at) {
     const char letter = static_cast<char>(*at | 0x20);
     if (letter == 'f' && !(python3 && formatted_are_known)) return true;
-    if (python3 && (letter == 'b' || (letter == 'u' && !IsQuote(at[1])))) return true;
+    if (python3 && letter == 'b' && AreUnusualBytes(toks, i)) return true;
+    if (python3 && letter == 'u' && !IsQuote(at[1])) return true;
+    if (!python3 && letter == 'r' && !IsQuote(at[1])) return true;
   }
   return false;
 }
@@ -60,22 +110,37 @@ bool IsUnusualString(const Token& string, bool python3, bool formatted_are_known
 
 CloserLook::CloserLook(Version version)
     : python3_(version.AtLeast(3, 0)), minor_(version.parts[1]), is_old_(python3_ && minor_ < 6) {
-  for (const TokenCode code : {TokenCode{tok::COLONEQUAL}, TokenCode{word::kYield}, TokenCode{tok::NOTEQUAL},
-                               TokenCode{tok::RARROW}, TokenCode{tok::NUMBER}})
-    unusual_[code] = true;
-  unusual_[tok::STRING] = true;
-  unusual_[word::kAwait] = unusual_[word::kAsync] = unusual_[word::kNonlocal] = python3_;
-  unusual_[word::kReturn] = true;
-  unusual_[tok::SLASH] = python3_ && minor_ < 8;
+  const auto set = [this](TokenCode code, bool is_unusual) { unusual_[code] = is_unusual ? kAnyLength : 0; };
+  for (const TokenCode code :
+       {TokenCode{tok::COLONEQUAL}, TokenCode{word::kYield}, TokenCode{tok::NOTEQUAL}, TokenCode{tok::RARROW},
+        TokenCode{tok::NUMBER}, TokenCode{tok::STRING}, TokenCode{word::kReturn}})
+    set(code, true);
+  for (const TokenCode code : {word::kAwait, word::kAsync, word::kNonlocal}) set(code, python3_);
+  set(tok::SLASH, python3_ && minor_ < 8);
   // The walk of the tables' trees sees all other targets.
-  unusual_[tok::VBAREQUAL] = true;
-  unusual_[tok::STAR] = unusual_[word::kNone] = !python3_;
-  if (!python3_) unusual_[tok::NOTEQUAL] = false;
+  set(tok::VBAREQUAL, true);
+  set(tok::STAR, !python3_);
+  set(word::kNone, !python3_);
+  if (!python3_) set(tok::NOTEQUAL, false);
+  unusual_[tok::NAME] = uint32_t{1} << kDebugName.size();
 }
 
 bool CloserLook::NeedsCompleteParser(const LogicalLine& line) const {
-  if (line.kind == LineKind::kMatch || line.kind == LineKind::kCase || line.kind == LineKind::kTypeStatement)
-    return true;
+  switch (line.kind) {
+    case LineKind::kMatch:
+    case LineKind::kCase:
+    case LineKind::kTypeStatement:
+      return true;
+    // Of these, and of what no kind is said of, it is their first tokens that tell.
+    case LineKind::kExcept:
+    case LineKind::kWith:
+    case LineKind::kFunctionDef:
+    case LineKind::kClassDef:
+      break;
+    default:
+      if (!line.toks.empty() && line.toks[0].code == tok::NAME) return false;
+      break;
+  }
   const size_t count = line.toks.size();
   size_t i = NextSignificant(line.toks, 0, count);
   if (i >= count) return false;
@@ -102,59 +167,67 @@ bool CloserLook::NeedsCompleteParser(const LogicalLine& line) const {
   }
 }
 
-bool CloserLook::IsDoubtful(const LogicalLine& line, const LinePlace& place) const {
-  if (is_old_ || (holds_debug_name_ && HoldsDebugName(line.toks))) return true;
+uint8_t CloserLook::DoubtOf(const LogicalLine& line) const {
+  if (is_old_) return kEverywhere;
+  uint8_t doubt = kNowhere;
   if (line.kind == LineKind::kFromImport) {
     TokenCode last = tok::ENDMARKER;
     for (const Token& token : line.toks) {
-      if (token.code == tok::STAR && place.depth != 0) return true;
+      if (token.code == tok::STAR) doubt |= kInDefinition;
       if (!IsSkipCode(token.code)) last = token.code;
     }
-    if (last == tok::COMMA) return true;
+    if (last == tok::COMMA) return kEverywhere;
   }
-  for (size_t i = 0; i < line.toks.size(); ++i) {
-    const Token& token = line.toks[i];
-    if (!unusual_[token.code]) [[likely]]
+  const Token* const begin = line.toks.data();
+  const Token* const end = begin + line.toks.size();
+  for (const Token* token = begin; token < end; ++token) {
+    if ((unusual_[token->code] >> (token->length & 31) & 1) == 0 || IsUsual(*token)) [[likely]]
       continue;
-    // Nearly all strings and many numbers.
-    if (token.code == tok::STRING && IsQuote(*token.text) &&
-        std::memchr(token.text, '\\', static_cast<size_t>(token.length)) == nullptr)
-      continue;
-    if (IsDoubtfulToken(line, i, place)) return true;
+    doubt |= DoubtOfToken(line, static_cast<size_t>(token - begin));
   }
-  return false;
+  return doubt;
 }
 
-bool CloserLook::IsDoubtfulToken(const LogicalLine& line, size_t i, const LinePlace& place) const {
+uint8_t CloserLook::DoubtOfToken(const LogicalLine& line, size_t i) const {
   const Token& token = line.toks[i];
   const Token* const next = i + 1 < line.toks.size() ? &line.toks[i + 1] : nullptr;
+  const auto if_so = [](bool is_doubtful) { return static_cast<uint8_t>(is_doubtful ? kEverywhere : kNowhere); };
   switch (token.code) {
-    case word::kYield:
+    case tok::NAME:
+      return if_so(token.view() == kDebugName);
     case word::kReturn:
-      return !place.in_def || place.in_async_def;
+      return kOutsideOfFunction;
+    case word::kYield:
+      // In brackets it may be in a comprehension.
+      if (python3_ && i > 0 && line.toks[i - 1].code == tok::LPAR) return kEverywhere;
+      return next != nullptr && next->code == word::kFrom ? kOutsideOfFunction | kInAsync : kOutsideOfFunction;
     case word::kAwait:
       // A comprehension in another could not wait before 3.11.
-      return !place.in_async_def || minor_ < 11;
-    case word::kAsync:
-      if (place.in_async_def) return minor_ < 11;
-      return next != nullptr && (next->code == word::kFor || next->code == word::kWith);
+      return minor_ < 11 ? kEverywhere : kOutsideOfAsync;
+    case word::kAsync: {
+      const bool is_waiting = next != nullptr && (next->code == word::kFor || next->code == word::kWith);
+      return static_cast<uint8_t>((minor_ < 11 ? kInAsync : kNowhere) | (is_waiting ? kOutsideOfAsync : kNowhere));
+    }
     case word::kNonlocal:
-      return place.depth == 0;
+      return kInModule;
     case tok::NOTEQUAL:
-      return *token.text == '<';
+      return if_so(*token.text == '<');
     case tok::RARROW:
-      return *token.text != '-' || !IsDefinitionHead(line);
+      return if_so(*token.text != '-' || !IsDefinitionHead(line));
     case tok::NUMBER:
-      return python3_ ? IsUnusualNumber(token, next, minor_ >= 6) : IsUnusualNumber(token, next, false);
+      return if_so(IsUnusualNumber(token, next, python3_ && minor_ >= 6));
     case tok::STRING:
-      return IsUnusualString(token, python3_, minor_ >= 6) || !WrongEscape(token.view(), python3_).empty();
+      return if_so(IsUnusualString(line.toks, i, python3_, minor_ >= 6) ||
+                   !WrongEscape(token.view(), python3_).empty());
     case tok::STAR:
-      return IsStarredWithNameBehind(line.toks, i);
+      return if_so(IsStarredWithNameBehind(line.toks, i));
+    case tok::VBAREQUAL:
+      return if_so(!IsDottedName(line.toks.first(i)));
     case word::kNone:
-      return line.kind == LineKind::kImport || line.kind == LineKind::kFromImport || line.kind == LineKind::kExcept ||
-             (i > 0 && line.toks[i - 1].code == tok::DOT);
+      return if_so(line.kind == LineKind::kImport || line.kind == LineKind::kFromImport ||
+                   line.kind == LineKind::kExcept || (i > 0 && line.toks[i - 1].code == tok::DOT));
     default:
-      return true;
+      return kEverywhere;
   }
 }
 

@@ -80,8 +80,6 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeCompletely(LogicalLine& log
   }
 }
 
-void CPGenAnalyzerImpl::set_holds_debug_name(bool holds) { closer_look_->set_holds_debug_name(holds); }
-
 SyntaxError CPGenAnalyzerImpl::ErrorAt(const std::string& message, const LogicalLine& logical, Context context) const {
   // What is missing at the end of a line is missing where the line ends.
   if (context.IsIndex() && context.value >= logical.token_count && logical.source && !logical.toks.empty()) {

@@ -34,8 +34,6 @@ size_t MostTokensIn(Text text) {
   return count;
 }
 
-bool Holds(Text text, Text part) { return memmem(text.data(), text.size(), part.data(), part.size()) != nullptr; }
-
 template <class T>
 size_t SizeOf(const std::vector<T>& items) {
   return items.size() * sizeof(T);
@@ -79,7 +77,6 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   CPGenAnalyzerImpl& analyzer = analyzer_and_shapes.analyzer;
   analyzer.set_spells_error_texts(options_.keeps_whole_errors);
   analyzer.set_explains_errors(true);
-  if (options_.reads_completely) analyzer.set_holds_debug_name(Holds(found_.source->text(), "__debug__"));
   const NodePool& pool = analyzer.logical_parser().factory().pool();
   const NodePool& other_pool = analyzer.type_hint_walker().hint_parser().factory().pool();
   const auto node_count = [&] { return pool.node_count() + other_pool.node_count(); };
@@ -89,13 +86,14 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   wanted_.assign(filter != nullptr ? found_.rows.size() : 0, false);
   const bool is_filtered = filter != nullptr && filter->Choose(*found_.source, found_.rows, wanted_);
   const bool has_rules = options_.reads_completely && !is_filtered;
-  if (has_rules) block_rules_.Reset(*found_.source, options_.version);
+  if (has_rules) block_rules_.Reset(*found_.source, found_.rows, options_.version);
   LogicalLine line;
   for (size_t i = 0; i < found_.rows.size(); ++i) {
     const LineRow& row = found_.rows[i];
     CheckMemory(std::max(MostMemoryOf(row), sizeof(CNode) * (node_count() - nodes_before)));
     AnalyzeRow(analyzer_and_shapes, row, !is_filtered || wanted_[i], line);
-    if (has_rules) ApplyBlockRules(analyzer, i);
+    if (has_rules && row.token_count != 0 && !block_rules_.GoesOn(i, analyzer.was_rejected()))
+      ApplyBlockRules(analyzer, i);
     CountMemory();
   }
   if (has_rules) {
@@ -125,7 +123,8 @@ void FileAnalyzer::Reset(Text bytes) {
 // While tokens and rows grow they are there twice for a moment.
 void FileAnalyzer::Cut() {
   try {
-    CutLines(*found_.source, options_.version, found_.rows, memory_limit_ / 3);
+    const auto cut = options_.reads_completely ? CutLinesCompletely : CutLines;
+    cut(*found_.source, options_.version, found_.rows, memory_limit_ / 3);
   } catch (const Error& error) {
     if (error.kind() != ErrorKind::kOverflowError) throw;
     ThrowTooLarge();
@@ -160,14 +159,16 @@ std::optional<SyntaxError> FileAnalyzer::AnalyzeLine(Analyzer& analyzer, Logical
 }
 
 void FileAnalyzer::ApplyBlockRules(CPGenAnalyzerImpl& analyzer, size_t index) {
-  const LineRow& row = found_.rows[index];
   BlockRules::Reading reading;
-  reading.was_rejected = row.token_count != 0 && analyzer.was_rejected();
-  if (row.kind == LineKind::kCase && !reading.was_rejected) {
-    reading.irrefutable = analyzer.complete_parser().irrefutable();
-    if (!reading.irrefutable.empty()) reading.irrefutable_at = analyzer.complete_parser().irrefutable_at();
+  reading.was_rejected = analyzer.was_rejected();
+  if (found_.rows[index].kind == LineKind::kCase && !reading.was_rejected) {
+    const CompleteParser& parser = analyzer.complete_parser();
+    if (!parser.irrefutable().empty()) {
+      reading.irrefutable = &parser.irrefutable();
+      reading.irrefutable_at = parser.irrefutable_at();
+    }
   }
-  block_rules_.Next(index, row, reading);
+  block_rules_.Next(index, reading);
   if (!block_rules_.findings().empty()) [[unlikely]]
     AddFindings(analyzer);
 }

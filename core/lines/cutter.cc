@@ -358,9 +358,9 @@ class Cutter {
 };
 
 template <class Client>
-void Scan(SourceText& source, Version version, size_t most_memory, Client& client) {
+void Scan(SourceText& source, Version version, size_t most_memory, Client& client, bool templates = false) {
   Scanner<Client>(source.text(), version.AtLeast(3, 12), source.tokens, source.line_starts, client,
-                  most_memory / sizeof(Token))
+                  most_memory / sizeof(Token), templates)
       .Run();
 }
 
@@ -369,6 +369,11 @@ void Scan(SourceText& source, Version version, size_t most_memory, Client& clien
 void CutLines(SourceText& source, Version version, std::vector<LineRow>& rows, size_t most_memory) {
   Cutter cutter(version, rows, most_memory);
   Scan(source, version, most_memory, cutter);
+}
+
+void CutLinesCompletely(SourceText& source, Version version, std::vector<LineRow>& rows, size_t most_memory) {
+  Cutter cutter(version, rows, most_memory);
+  Scan(source, version, most_memory, cutter, version.AtLeast(3, 14));
 }
 
 void TokenizeOnly(SourceText& source, Version version) {

@@ -36,6 +36,8 @@ static_assert(sizeof(LineRow) == 24);
 // Fills source.tokens and source.line_starts and appends the rows. `version` settles how f-strings
 // end (from 3.12 on they nest). OverflowError where tokens and rows would take more than `most_memory`.
 void CutLines(SourceText& source, Version version, std::vector<LineRow>& rows, size_t most_memory = SIZE_MAX);
+// The same where template strings (3.14) end as they do, and not at their first own quote.
+void CutLinesCompletely(SourceText& source, Version version, std::vector<LineRow>& rows, size_t most_memory = SIZE_MAX);
 
 // Only the tokens, for measuring and for checks; NEWLINE is not among them.
 void TokenizeOnly(SourceText& source, Version version);

@@ -192,10 +192,8 @@ bool IsFormattedString(const Token& string) {
 }
 
 bool IsTemplateString(const Token& name, const Token& string) {
-  if (name.end() != string.text || string.code != tok::STRING || !IsQuote(*string.text)) return false;
-  const auto lower = [&name](uint32_t i) { return static_cast<char>(name.text[i] | 0x20); };
-  if (name.length == 1) return lower(0) == 't';
-  return name.length == 2 && ((lower(0) == 't' && lower(1) == 'r') || (lower(0) == 'r' && lower(1) == 't'));
+  return name.end() == string.text && string.code == tok::STRING && IsQuote(*string.text) &&
+         IsTemplatePrefix(name.view());
 }
 
 void AppendFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields) {

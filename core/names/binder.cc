@@ -27,7 +27,7 @@ class NameBinder::Impl {
   const Bindings& Bind(Text bytes) {
     source_->Assign(bytes);
     rows_.clear();
-    CutLines(*source_, version_, rows_);
+    CutLinesCompletely(*source_, version_, rows_);
     return Bind(*source_, rows_);
   }
 

@@ -614,6 +614,11 @@ void CompleteParser::Arguments() {
         CheckWalrus(start);
         PushLeaf();
         Test();
+        if (Since(9) && IsComprehension()) {
+          Finish(symbols_.namedexpr_test, argument);
+          Comprehension("generator expression", start);
+          if (generator == kNowhere) generator = start;
+        }
         Finish(symbols_.argument, argument);
         if (has_unpacked_keywords || has_keyword) FailPositional(has_unpacked_keywords);
       } else if (IsComprehension()) {

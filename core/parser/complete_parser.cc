@@ -284,6 +284,8 @@ void CompleteParser::CheckString(const Token& token, int32_t index) {
   }
   if (is_formatted && !Since(6)) return FailAtToken(index, "invalid syntax");
   if (python3_ && is_unicode && quote > 1) return FailAtToken(index, "invalid syntax");
+  // `ur` and `br`, and not the other way round.
+  if (!python3_ && quote == 2 && (text[0] | 0x20) == 'r') return FailAtToken(index, "invalid syntax");
   if (!python3_ || !is_bytes) return;
   for (const char c : text) {
     if (static_cast<unsigned char>(c) >= 0x80)

@@ -73,7 +73,7 @@ class Files::Impl {
       file.source->tokens.swap(tokens_);
       file.source->tokens.clear();
       rows_.clear();
-      CutLines(*file.source, version_, rows_);
+      CutLinesCompletely(*file.source, version_, rows_);
       file.bindings = binder_.Bind(*file.source, rows_);
       syntax_.Clear();
       syntax_reader_.Read(*file.source, rows_, syntax_);

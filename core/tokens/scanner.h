@@ -185,13 +185,15 @@ template <class Client>
 class Scanner : private ScanOutput {
  public:
   // The bytes are followed by padding of NUL bytes, 32 at least. `nested_fstrings`: as from 3.12 on.
+  // `templates`: a string behind a name that is the prefix of a template string ends as a formatted one does.
   // Tokens and line starts are replaced; a line start follows each line end, so the last one is the
   // end of a source that ends with a line end. More than about `most` of either are an OverflowError.
   Scanner(Text bytes, bool nested_fstrings, std::vector<Token>& tokens, std::vector<uint32_t>& line_starts,
-          Client& client, size_t most = SIZE_MAX)
+          Client& client, size_t most = SIZE_MAX, bool templates = false)
       : ScanOutput(bytes.data(), tokens, line_starts, most),
         end_(bytes.data() + bytes.size()),
         nested_fstrings_(nested_fstrings),
+        templates_(templates),
         failed_search_budget_(8 * bytes.size() + 4096),
         client_(client) {}
 
@@ -381,6 +383,9 @@ class Scanner : private ScanOutput {
     if (quote != at) {
       const StringPrefix prefix = PrefixOf(at, static_cast<size_t>(quote - at));
       if (prefix.formatted) return ScanFormattedString(at, quote, prefix.raw);
+    } else if (templates_ && token_count() > 0) {
+      const Token& name = tokens()[token_count() - 1];
+      if (name.end() == at && IsTemplatePrefix(name.view())) return ScanFormattedString(at, quote, name.length == 2);
     }
     client_.String(tokens_.count(), false);
     return ScanPlainString(at, quote);
@@ -455,6 +460,7 @@ class Scanner : private ScanOutput {
 
   const char* const end_;
   const bool nested_fstrings_;
+  const bool templates_;
   size_t failed_search_budget_;
   bool unclosed_triple_[2] = {};
   Unclosed unclosed_single_[2] = {{begin_, begin_}, {begin_, begin_}};

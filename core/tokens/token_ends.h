@@ -116,6 +116,13 @@ inline StringPrefix PrefixOf(const char* at, size_t length) {
   return {valid, other == 'f', true};
 }
 
+// `t`, `tr` or `rt`, in any case: of strings that are a name and a string to the tokeniser.
+inline bool IsTemplatePrefix(Text name) {
+  const auto lower = [name](size_t i) { return static_cast<char>(name[i] | 0x20); };
+  if (name.size() == 1) return lower(0) == 't';
+  return name.size() == 2 && ((lower(0) == 't' && lower(1) == 'r') || (lower(0) == 'r' && lower(1) == 't'));
+}
+
 inline bool IsTripleQuote(const char* quote) { return quote[1] == quote[0] && quote[2] == quote[0]; }
 
 template <char kQuote>

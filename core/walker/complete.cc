@@ -30,6 +30,16 @@ bool IsPlainPower(const CNode* node) {
   return isa<CTrailer>(trailer) && trailer->child_count > 0 && trailer->children[0]->code != tok::LPAR;
 }
 
+// In brackets.
+bool IsPlainTuple(const CNode* node) {
+  if (!IsTupleLiteralNode(node)) return false;
+  const SubExprView elements = cast<CExpression>(node)->GetSubExprView();
+  for (int32_t i = 0; i < elements.count; ++i) {
+    if (!IsPlainTarget(elements.At(i)) && !IsPlainPower(elements.At(i))) return false;
+  }
+  return elements.count > 0;
+}
+
 }  // namespace
 
 void CNodeWalker::ReadCompletely() {
@@ -46,7 +56,7 @@ void CNodeWalker::DoubtTarget(const CNode* target) {
       if (element->code != tok::COMMA && !IsPlainTarget(element) && !IsPlainPower(element)) met_doubtful_ = true;
     return;
   }
-  met_doubtful_ = true;
+  met_doubtful_ |= !IsPlainTuple(target);
 }
 
 void CNodeWalker::DoubtArguments(const UsedArgList& arg_list) {
