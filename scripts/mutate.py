@@ -4,6 +4,7 @@
     scripts/mutate.py                      150 changes, spread over all folders of the core
     scripts/mutate.py --sample 40 --seed 7 --folder walker --folder hints
     scripts/mutate.py --list               the changes that would be tried
+    scripts/mutate.py --at-once 2          by as many copies of the tree, each with builds of its own
     scripts/mutate.py --show               what is known by now
 
 A change is a comparison with its bound moved or turned round, "and" for "or", a condition that is always or
@@ -35,9 +36,11 @@ import signal
 import subprocess
 import sys
 import sysconfig
+import threading
 import time
 from collections import Counter
 from collections.abc import Iterator, Sequence
+from concurrent.futures import ThreadPoolExecutor
 from dataclasses import asdict, dataclass
 from pathlib import Path
 
@@ -250,6 +253,7 @@ class Workshop:
         self.digest = ""
 
     def prepare(self) -> None:
+        """Copies what differs, builds it, and asks the digest and the tests unless the same tree was asked before."""
         self.tree.mkdir(parents=True, exist_ok=True)
         for name in COPIED:
             mirror(ROOT / name, self.tree / name)
@@ -274,7 +278,7 @@ class Workshop:
         say("building the tree as it is")
         require(self.ninja(self.build, [f"{name}_test" for _, name, _ in self.tests] + ["quillet_digest"]))
         self.corpus = self.make_corpus()
-        state = self.folder / "as_it_is.json"
+        state = self.folder.parent / "as_it_is.json"
         known = json.loads(state.read_text()) if state.exists() else {}
         fingerprint = f"{fingerprint_of(self.tree)} {self.tests}"
         if known.get("of") != fingerprint:
@@ -440,7 +444,7 @@ def fingerprint_of(tree: Path) -> str:
     sha = hashlib.sha1()
     for path in sorted(path for name in ("core", "tests/core", "resources") for path in (tree / name).rglob("*")):
         if path.is_file():
-            sha.update(str(path).encode() + path.read_bytes())
+            sha.update(str(path.relative_to(tree)).encode() + path.read_bytes())
     return sha.hexdigest()
 
 
@@ -471,7 +475,8 @@ def main() -> int:
         "--folder", action="append", choices=FOLDERS, help="only of this one, by its own tests (may be repeated)"
     )
     parser.add_argument("--work", type=Path, default=ROOT / "build" / "mutate")
-    parser.add_argument("--jobs", type=int, default=2)
+    parser.add_argument("--jobs", type=int, default=2, help="compilers at once, in each copy")
+    parser.add_argument("--at-once", type=int, default=1, help="copies of the tree, with a change each")
     parser.add_argument("--python", action="store_true", help="ask the package's tests about survivors")
     parser.add_argument("--again", action="store_true", help="try the survivors again")
     parser.add_argument("--list", action="store_true")
@@ -506,18 +511,33 @@ def main() -> int:
         todo = []
     signal.signal(signal.SIGTERM, lambda *_: sys.exit(143))
     if todo:
-        workshop = Workshop(options.work, folders=options.folder or FOLDERS, jobs=options.jobs, python=options.python)
-        workshop.prepare()
-        begin = time.monotonic()
-        for i, change in enumerate(todo):
-            outcome, by = workshop.try_change(change)
-            entry = {**asdict(change), "key": keys[change], "outcome": outcome, "by": by}
-            known[keys[change]] = entry
-            with log.open("a") as out:
-                out.write(json.dumps(entry) + "\n")
-            left = (time.monotonic() - begin) / (i + 1) * (len(todo) - i - 1)
-            progress = f"[{i + 1}/{len(todo)}, {left / 60:.0f} min left]"
-            print(f"{progress} {outcome} ({by}) {change.shown(texts[change.file])}", flush=True)
+        workshops = [
+            Workshop(options.work / str(i), folders=options.folder or FOLDERS, jobs=options.jobs, python=options.python)
+            for i in range(options.at_once)
+        ]
+        for workshop in workshops:
+            workshop.prepare()
+        begin, total = time.monotonic(), len(todo)
+        lock = threading.Lock()
+
+        def work_in(workshop: Workshop) -> None:
+            while True:
+                with lock:
+                    if not todo:
+                        return
+                    change = todo.pop(0)
+                outcome, by = workshop.try_change(change)
+                entry = {**asdict(change), "key": keys[change], "outcome": outcome, "by": by}
+                with lock, log.open("a") as out:
+                    known[keys[change]] = entry
+                    out.write(json.dumps(entry) + "\n")
+                    left = (time.monotonic() - begin) / (total - len(todo)) * len(todo)
+                    progress = f"[{total - len(todo)}/{total}, {left / 60:.0f} min left]"
+                    print(f"{progress} {outcome} ({by}) {change.shown(texts[change.file])}", flush=True)
+
+        with ThreadPoolExecutor(len(workshops)) as pool:
+            for future in [pool.submit(work_in, workshop) for workshop in workshops]:
+                future.result()
     results = [known[keys[change]] for change in sample if keys[change] in known]
     for change in sample:
         entry = known.get(keys[change])

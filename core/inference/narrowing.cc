@@ -358,7 +358,7 @@ int Inference::TruthIn(const SourceFile& file, ExprId condition, FrameId frame) 
       const Value value = ValueOf(file.id, syntax.ChildOf(condition, 0), frame);
       if (!value.IsKnown() || value.doubt != 0) return -1;
       size_t nones = 0;
-      for (const TypeId id : types_.CopyOf(value.set)) nones += types_[id].kind == TypeKind::kNone;
+      for (const TypeId id : types_.TypesOf(value.set)) nones += types_[id].kind == TypeKind::kNone;
       if (nones != 0 && nones != types_.SizeOf(value.set)) return -1;
       return (nones != 0) == (op == CompareOperator::kIs) ? 1 : 0;
     }

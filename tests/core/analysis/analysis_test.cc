@@ -126,8 +126,8 @@ class FlowWithHooks : public ::testing::Test {
 // The tokens cannot be told then, as a host's join would say.
 TEST_F(FlowWithHooks, AFailureOfAWalkOverRemovedTokensIsReportedAsThat) {
   hooks_.on_append = [] { ThrowError(ErrorKind::kKeyError, "k"); };
-  std::vector<Token> toks(line_->toks.begin(), line_->toks.end());
-  toks.insert(toks.begin() + 1, Token{});
+  std::vector<Token> toks{line_->toks[0], Token{}};
+  toks.insert(toks.end(), line_->toks.begin() + 1, line_->toks.end());
   line_->SetPositions({{0, 0}, {0, 1}, {0, 2}, {0, 4}});
   line_->toks = toks;
   line_->token_count = 4;
