@@ -43,7 +43,7 @@ TypeSetId TypeTable::SetOf(std::span<const TypeId> types) {
     return single_sets_[types[0]];
   std::vector<TypeId> sorted(types.begin(), types.end());
   std::ranges::sort(sorted);
-  sorted.erase(std::ranges::unique(sorted).begin(), sorted.end());
+  sorted.erase(std::unique(sorted.begin(), sorted.end()), sorted.end());
   uint64_t hash = sorted.size();
   for (const TypeId type : sorted) hash = Stir(hash, type);
   hash |= 1;

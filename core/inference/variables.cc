@@ -317,7 +317,7 @@ std::vector<Binding> Inference::BindingsOf(const Entity& entity) {
     }
   }
   std::ranges::sort(found);
-  found.erase(std::ranges::unique(found).begin(), found.end());
+  found.erase(std::unique(found.begin(), found.end()), found.end());
   return found;
 }
 

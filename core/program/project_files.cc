@@ -31,6 +31,9 @@ struct FolderRules {
   std::string folder;
   IgnoreRules rules;
 
+  FolderRules(std::shared_ptr<FolderRules> outer_rules, std::string path, IgnoreRules own)
+      : outer(std::move(outer_rules)), folder(std::move(path)), rules(std::move(own)) {}
+
   // What they say themselves of a path below.
   IgnoreRules::Verdict Of(Text path, bool is_folder) {
     return rules.Of(path.substr(folder.ends_with('/') ? folder.size() : folder.size() + 1), is_folder);

@@ -20,7 +20,7 @@ std::string Workspace::Impl::TextOfSet(TypeSetId set, bool is_short, int depth) 
     if (std::ranges::find(parts, text) == parts.end()) parts.push_back(std::move(text));
   }
   std::ranges::sort(parts);
-  parts.erase(std::ranges::unique(parts).begin(), parts.end());
+  parts.erase(std::unique(parts.begin(), parts.end()), parts.end());
   if (has_none) parts.push_back("None");
   if (parts.empty()) return is_short ? "Any" : "typing.Any";
   std::string text;

@@ -136,9 +136,8 @@ void Workspace::Impl::Sort(std::vector<Location>& locations) const {
     if (a.file != b.file) return files.PathOf(a.file) < files.PathOf(b.file);
     return std::pair(a.begin, a.certainty) < std::pair(b.begin, b.certainty);
   });
-  const auto rest = std::ranges::unique(
-      locations, [](const Location& a, const Location& b) { return a.file == b.file && a.begin == b.begin; });
-  locations.erase(rest.begin(), rest.end());
+  const auto is_same = [](const Location& a, const Location& b) { return a.file == b.file && a.begin == b.begin; };
+  locations.erase(std::unique(locations.begin(), locations.end(), is_same), locations.end());
 }
 
 std::vector<Location> Workspace::Impl::LocationsOf(const Entities& entities, bool follows_source) {

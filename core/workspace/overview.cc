@@ -447,7 +447,7 @@ std::vector<SymbolInfo> Workspace::Symbols(Text query, size_t most) {
     const auto same = [&](char a, char b) { return lower(a) == lower(b); };
     if (std::ranges::equal(name, query, same)) return 1;
     if (name.size() >= query.size() && std::ranges::equal(name.substr(0, query.size()), query, same)) return 2;
-    if (!std::ranges::search(name, query, same).empty()) return 3;
+    if (std::search(name.begin(), name.end(), query.begin(), query.end(), same) != name.end()) return 3;
     size_t at = 0;
     for (const char c : name)
       if (at < query.size() && lower(c) == lower(query[at])) ++at;

@@ -398,9 +398,8 @@ Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_cert
     if (a.file != b.file) return in.files.PathOf(a.file) < in.files.PathOf(b.file);
     return a.begin < b.begin;
   });
-  const auto rest = std::ranges::unique(
-      rename.edits, [](const TextEdit& a, const TextEdit& b) { return a.file == b.file && a.begin == b.begin; });
-  rename.edits.erase(rest.begin(), rest.end());
+  const auto is_same = [](const TextEdit& a, const TextEdit& b) { return a.file == b.file && a.begin == b.begin; };
+  rename.edits.erase(std::unique(rename.edits.begin(), rename.edits.end(), is_same), rename.edits.end());
   if (rename.edits.empty()) rename.problem = "nothing that is certain is to be renamed";
   return rename;
 }

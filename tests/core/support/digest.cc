@@ -5,13 +5,15 @@
 // Each file is taken as it is and with some of its lines spoilt, always the same ones in the same way, as
 // 2.7, 3.8 and 3.12: tokens and rows, trees with their contexts and texts, records and errors, what is
 // printed and reported, the lines of each format, names and what they are bound to, statements and expressions,
-// the words of an index, answers to questions, and the page of a site. Two builds that print the same numbers
-// tell nobody apart by this corpus. scripts/mutate.py asks it about changes that no test noticed.
+// the words of an index, answers to questions, and the page of a site; as 3.12, what a workspace with a small library
+// answers at some of its names. Two builds that print the same numbers tell nobody apart by this corpus.
+// scripts/mutate.py asks it about changes that no test noticed.
 #include <algorithm>
 #include <cstdint>
 #include <cstdio>
 #include <filesystem>
 #include <fstream>
+#include <initializer_list>
 #include <iterator>
 #include <memory>
 #include <string>
@@ -29,8 +31,11 @@
 #include "site/site_index.h"
 #include "tests/core/support/analyzer_helper.h"
 #include "tests/core/support/names_helper.h"
+#include "tests/core/support/small_library.h"
 #include "tests/core/support/syntax_text.h"
+#include "tests/core/support/temporary_folder.h"
 #include "tests/core/support/tree_text.h"
+#include "workspace/questions.h"
 
 namespace quillet {
 namespace {
@@ -54,7 +59,7 @@ class Digest {
 };
 
 struct Digests {
-  Digest tokens, trees, records, output, names, syntax, index, site;
+  Digest tokens, trees, records, output, names, syntax, index, site, answers;
 };
 
 Digests digests;
@@ -266,6 +271,76 @@ class Analysis {
   SyntaxReader syntax_{version_};
 };
 
+// What is answered about a text that an editor has open, all of it by one workspace.
+class Answers {
+ public:
+  Answers() : workspace_({.roots = {folder_.path()}, .typeshed = testing::SmallLibrary(), .version = kVersion}) {
+    folder_.Write("b.py", "class B:\n  x = 1\n  def f(self, y: int = 2) -> str: ...\n");
+  }
+
+  void Add(const std::string& bytes) {
+    const FileId file = workspace_.FileOf(folder_ / "a.py");
+    workspace_.Open(file, bytes);
+    const std::vector<ColouredName> names = workspace_.Colours(file);
+    for (const ColouredName& name : names) AddNumbers({name.begin, int64_t(name.kind), name.modifiers});
+    const size_t step = names.size() / kPlaces + 1;
+    for (size_t i = 0; i < names.size(); i += step) AddPlace(file, names[i].begin, i % (7 * step) == 0);
+    for (const InlineHint& hint : workspace_.Hints(file)) {
+      digests.answers.Add(hint.text);
+      AddNumbers({hint.offset, int64_t(hint.certainty)});
+    }
+    for (const OutlineItem& item : workspace_.Outline(file)) {
+      for (const Text text : {Text(item.name), Text(item.kind), Text(item.detail)}) digests.answers.Add(text);
+      AddNumbers({item.begin, item.end, item.name_begin, item.name_end, item.parent});
+    }
+    for (const Problem& problem : workspace_.Problems(file)) {
+      digests.answers.Add(problem.message);
+      AddNumbers({problem.begin, problem.end});
+    }
+    for (const Fold& fold : workspace_.Folds(file)) AddNumbers({fold.first_line, fold.last_line});
+  }
+
+ private:
+  static constexpr Version kVersion = Version::Of(3, 12);
+  static constexpr size_t kPlaces = 30;
+
+  static void AddNumbers(std::initializer_list<int64_t> numbers) {
+    for (const int64_t number : numbers) digests.answers.Add(number);
+  }
+  void AddAll(const std::vector<Location>& locations) {
+    for (const Location& location : locations) {
+      AddNumbers({location.file, location.begin, location.end, int64_t(location.certainty)});
+      digests.answers.Add(location.role);
+      digests.answers.Add(location.kind);
+    }
+  }
+  void AddPlace(FileId file, uint32_t offset, bool all) {
+    for (const std::string& type : workspace_.Types(file, offset)) digests.answers.Add(type);
+    AddAll(workspace_.Definitions(file, offset));
+    const Hover hover = workspace_.HoverAt(file, offset);
+    digests.answers.Add(hover.text);
+    digests.answers.Add(hover.documentation);
+    for (const Signature& signature : workspace_.Signatures(file, offset)) {
+      digests.answers.Add(signature.label);
+      AddNumbers({signature.active, int64_t(signature.certainty)});
+    }
+    if (!all) return;
+    AddAll(workspace_.References(file, offset));
+    AddAll(workspace_.TypeDefinitions(file, offset));
+    for (const Completion& completion : workspace_.Complete(file, offset)) {
+      for (const Text text : {Text(completion.name), Text(completion.kind), Text(completion.detail)})
+        digests.answers.Add(text);
+    }
+    const Rename rename = workspace_.RenameTo(file, offset, "another_name");
+    digests.answers.Add(rename.problem);
+    for (const TextEdit& edit : rename.edits) AddNumbers({edit.file, edit.begin, edit.end});
+    for (const Span& span : workspace_.Selections(file, offset)) AddNumbers({span.begin, span.end});
+  }
+
+  testing::TemporaryFolder folder_;
+  Workspace workspace_;
+};
+
 std::vector<std::filesystem::path> FilesOf(int argc, char** argv) {
   std::vector<std::filesystem::path> files;
   for (int i = 1; i < argc; ++i) {
@@ -290,6 +365,7 @@ int main(int argc, char** argv) {
     digests.records.Add(ReprOfException(failure));
   };
   Analysis analyses[] = {Analysis(Version::Of(2, 7)), Analysis(Version::Of(3, 8)), Analysis(Version::Of(3, 12))};
+  Answers answers;
   size_t count = 0;
   for (const std::filesystem::path& path : FilesOf(argc, argv)) {
     std::ifstream in(path, std::ios::binary);
@@ -298,6 +374,7 @@ int main(int argc, char** argv) {
     for (uint32_t seed = 0; seed < 3; ++seed) {
       const std::string text = seed == 0 ? bytes : Spoilt(bytes, seed * 7919 + static_cast<uint32_t>(bytes.size()));
       for (Analysis& analysis : analyses) analysis.Add(text);
+      if (seed < 2) answers.Add(text);
     }
   }
   std::printf("%zu files", count);
@@ -308,7 +385,8 @@ int main(int argc, char** argv) {
                                      {"names", &digests.names},
                                      {"syntax", &digests.syntax},
                                      {"index", &digests.index},
-                                     {"site", &digests.site}})
+                                     {"site", &digests.site},
+                                     {"answers", &digests.answers}})
     std::printf("  %s %016llx", name, static_cast<unsigned long long>(digest->value()));
   std::printf("\n");
   return 0;
