@@ -360,10 +360,71 @@ def test_rings_of_links_and_files_that_nobody_may_read(tmp_path: Path) -> None:
 def test_a_text_that_is_too_large_is_left_alone(tmp_path: Path) -> None:
     with Client(tmp_path.resolve()) as client:
         client.open("large.py", "x = 1\n" * 6_000_000)
+        said = client.Wait(lambda told: told.get("method") == "window/showMessage")["params"]["message"]
+        assert said.endswith("large.py is not read: it has 36,000,000 characters, and 33,554,432 are the most")
         client.change("large.py", edit(0, 0, 0, 1, "y"))
         assert client.ask("documentSymbol", "large.py") == []
         client.open("small.py", "x = 1\n")
         assert len(client.ask("documentSymbol", "small.py")) == 1
+
+
+def test_files_that_are_too_large_are_left_alone(tmp_path: Path) -> None:
+    with (tmp_path / "large.py").open("wb") as file:  # on disk it takes no room
+        file.truncate(100_000_000)
+    (tmp_path / "a.py").write_text("import large\ndef here(): pass\nhere()\nlarge.here\n")
+    with Client(tmp_path.resolve()) as client:
+        client.open("a.py")
+        assert client.shown(client.ask("definition", "a.py", "here()\n")) == ["a.py:1:4-8"]
+        assert client.shown(client.ask("definition", "a.py", "large")) == ["large.py:0:0-0"]
+        found = client.ask("references", "a.py", "here()", context={"includeDeclaration": True})
+        assert client.shown(found)[:2] == ["a.py:1:4-8", "a.py:2:0-4"]
+        assert [at["name"] for at in client.Ask("workspace/symbol", {"query": "here"})] == ["here"]
+        asked = {"textDocument": {"uri": client.uri("large.py")}}
+        assert not client.Ask("textDocument/documentSymbol", asked)
+
+
+def test_files_and_folders_that_vanish(tmp_path: Path) -> None:
+    folder = tmp_path.resolve()
+    for name in ("one", "two"):
+        (folder / name).mkdir()
+        (folder / name / "__init__.py").write_text(f"def in_{name}(): pass\n")
+    text = "from one import in_one\nfrom two import in_two\nin_one()\nin_two()\n"
+    with Client(folder) as client:
+        client.open("a.py", text)
+        assert client.diagnostics("a.py") == []
+        assert client.shown(client.ask("definition", "a.py", "in_two()")) == ["__init__.py:0:4-10"]
+        (folder / "one" / "__init__.py").unlink()
+        (folder / "one").rmdir()
+        (folder / "two").rename(folder / "three")
+        changes = [{"uri": client.uri(name), "type": kind} for name, kind in (("one", 3), ("two", 3), ("three", 1))]
+        client.Tell("workspace/didChangeWatchedFiles", {"changes": changes})
+        client.change("a.py", edit(4, 0, 4, 0, "\n"))
+        told = client.diagnostics("a.py")
+        assert [(at["code"], at["range"]["start"]["line"]) for at in told] == [
+            ("unresolved-import", 0),
+            ("unresolved-import", 1),
+        ]
+        [symbol] = client.Ask("workspace/symbol", {"query": "in_two"})
+        assert symbol["location"]["uri"] == client.uri("three/__init__.py")
+        client.open("b.py", "from three import in_two\nin_two()\n")
+        assert client.shown(client.ask("definition", "b.py", "in_two()")) == ["__init__.py:0:4-10"]
+
+
+def test_a_folder_that_vanishes(tmp_path: Path) -> None:
+    folder = tmp_path.resolve() / "gone"
+    folder.mkdir()
+    (folder / "a.py").write_text("def here(): pass\n")
+    with Client(folder) as client:
+        client.open("a.py")
+        assert len(client.Ask("workspace/symbol", {"query": "here"})) == 1
+        (folder / "a.py").unlink()
+        folder.rename(tmp_path / "other")
+        client.Tell("workspace/didChangeWatchedFiles", {"changes": [{"uri": folder.as_uri(), "type": 3}]})
+        # The buffer is there still.
+        assert [at["name"] for at in client.ask("documentSymbol", "a.py")] == ["here"]
+        assert client.ask("references", "a.py", "here", context={"includeDeclaration": True})
+        client.change("a.py", edit(0, 4, 0, 8, "there"))
+        assert [at["name"] for at in client.ask("documentSymbol", "a.py")] == ["there"]
 
 
 def test_a_server_that_has_gone_is_noticed(tmp_path: Path) -> None:

@@ -100,7 +100,9 @@ class Server:
     def open_document(self, document: Document, text: str) -> None:
         """An editor's text counts from now on."""
         if len(text) > MOST_TEXT:
-            log.warning("%s is too large to be read", document.uri)
+            self.complain(
+                f"{document.path} is not read: it has {len(text):,} characters, and {MOST_TEXT:,} are the most"
+            )
             document.is_read, text = False, ""
         self.documents.add(document)
         self.projects.of(document.path)  # which may be a new one
