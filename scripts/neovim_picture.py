@@ -1,10 +1,10 @@
 #!/usr/bin/env python3
-"""Draws docs/images/neovim.svg: the screen of Neovim with the language server, set up as docs/editors.md says.
+"""Draws the pictures of docs/editors.md: the screen of Neovim with the language server, set up as it says there.
 
-scripts/neovim_picture.py [FILE]
+scripts/neovim_picture.py [FOLDER]
 
 Neovim runs in a terminal of this script's, its keys are pressed, and what its screen holds in the end is drawn as it
-is. Needs nvim and the package pyte.
+is. Needs nvim, the command quillet and the package pyte.
 """
 
 from __future__ import annotations
@@ -21,6 +21,7 @@ import sys
 import tempfile
 import termios
 import time
+from collections.abc import Sequence
 from pathlib import Path
 
 import pyte
@@ -56,8 +57,15 @@ def check_out(basket: Basket) -> float:
 
 check_out(Basket(limit=3))
 """
-# Look at what is wrong, then at `total`.
-KEYS = (b":set termguicolors noruler noshowcmd\r", b":call cursor(6, 22)\r", b":lua vim.lsp.buf.hover()\r")
+QUIET = b":set termguicolors noruler noshowcmd completeopt=menuone,noselect\r"
+PICTURES = {
+    # Look at what is wrong, then at `total`.
+    "neovim.svg": (QUIET, b":call cursor(6, 22)\r", b":lua vim.lsp.buf.hover()\r"),
+    # Write one more line.
+    "neovim-completion.svg": (QUIET, b":call cursor(6, 1)\r", b"obasket.", b"\x18\x0f"),
+    # Who uses `total`?
+    "neovim-references.svg": (QUIET, b":call cursor(6, 22)\r", b":lua vim.lsp.buf.references()\r"),
+}
 LOOK = """
 vim.cmd("colorscheme desert")
 vim.cmd("hi Normal guibg=#1d2021 | hi NormalFloat guibg=#3c3836 | hi SignColumn guibg=#1d2021")
@@ -69,7 +77,7 @@ NAMED = {
 PAPER, INK = "1d2021", "ebdbb2"
 
 
-def screen_of_neovim(folder: Path) -> pyte.Screen:
+def screen_of_neovim(folder: Path, all_keys: Sequence[bytes]) -> pyte.Screen:
     """The screen once the keys are pressed and nothing more is drawn."""
     screen = pyte.Screen(COLUMNS, ROWS)
     stream = pyte.ByteStream(screen)
@@ -99,7 +107,7 @@ def screen_of_neovim(folder: Path) -> pyte.Screen:
         deadline = time.monotonic() + 60
         while not any("no module named" in line for line in screen.display) and time.monotonic() < deadline:
             draw(0.5)
-        for keys in KEYS:
+        for keys in all_keys:
             os.write(ours, keys)
             draw(1.5)
     finally:
@@ -153,17 +161,18 @@ def svg(screen: pyte.Screen) -> str:
 
 def main() -> int:
     """Runs the command."""
-    target = Path(sys.argv[1]) if len(sys.argv) > 1 else ROOT / "docs" / "images" / "neovim.svg"
+    target = Path(sys.argv[1]) if len(sys.argv) > 1 else ROOT / "docs" / "images"
+    target.mkdir(parents=True, exist_ok=True)
     _, old = re.findall(r"```lua\n(.*?)```", (ROOT / "docs" / "editors.md").read_text(encoding="utf-8"), re.DOTALL)
     with tempfile.TemporaryDirectory() as name:
         folder = Path(name).resolve()
         (folder / "shop.py").write_text(SHOP)
         (folder / "main.py").write_text(MAIN)
         (folder / "init.lua").write_text(old + LOOK)
-        screen = screen_of_neovim(folder)
-    target.parent.mkdir(parents=True, exist_ok=True)
-    target.write_text(svg(screen), encoding="utf-8")
-    print("\n".join(line.rstrip() for line in screen.display))
+        for file, keys in PICTURES.items():
+            screen = screen_of_neovim(folder, keys)
+            (target / file).write_text(svg(screen), encoding="utf-8")
+            print("\n".join(line.rstrip() for line in screen.display))
     return 0
 
 

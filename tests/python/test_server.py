@@ -409,6 +409,18 @@ def test_certainty_leaves_out(folder: Path) -> None:
         assert "market.py:15:18-23" in client.shown(found)
 
 
+def test_python_2_and_type_comments(tmp_path: Path) -> None:
+    text = "print 'old'\nx = u'a' <> 3L\ndef f(a, b):\n    # type: (int, str) -> str\n    return b\nf(1, '').upper()\n"
+    (tmp_path / "pyproject.toml").write_text('[tool.quillet]\nversion = "2.7"\n')
+    with Client(tmp_path.resolve()) as client:
+        client.open("a.py", text)
+        assert client.diagnostics("a.py") == []
+        assert "def f(a: int, b: str) -> str" in client.ask("hover", "a.py", "f(1")["contents"]["value"]
+        assert "def upper()" in client.ask("hover", "a.py", "upper")["contents"]["value"]
+        client.open("b.py", "x = ...\nx: int\n")
+        assert [at["code"] for at in client.diagnostics("b.py")][:1] == ["syntax"]
+
+
 def test_excluded_files_and_folders_that_come_and_go(tmp_path: Path) -> None:
     one, two = (tmp_path / "one").resolve(), (tmp_path / "two").resolve()
     for at in (one, two):
@@ -416,6 +428,9 @@ def test_excluded_files_and_folders_that_come_and_go(tmp_path: Path) -> None:
         (at / f"mod_{at.name}.py").write_text("def here(): pass\n")
     (one / "left_out.py").write_text("def here(): pass\n")
     (one / "pyproject.toml").write_text('[tool.quillet]\nexclude = ["left_out.py"]\n')
+    (one / ".gitignore").write_text("made/\n")
+    (one / "made").mkdir()
+    (one / "made" / "ignored.py").write_text("def here(): pass\n")
     with Client(one) as client:
 
         def names() -> list[str]:
