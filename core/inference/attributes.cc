@@ -24,9 +24,19 @@ bool Inference::IsDeclared(const Member& member) {
   return member.self_attributes != nullptr && std::ranges::any_of(*member.self_attributes, is_annotated);
 }
 
+const Member* Inference::FindMember(ClassId cls, Text name, bool on_class) {
+  if (cls == kNoId) return nullptr;
+  const uint64_t key = (uint64_t{cls} << 32 | NumberOfName(name)) * 2 + (on_class ? 2 : 1);
+  if (const uint32_t* known = members_by_class_.Find(key)) return *known == 0 ? nullptr : &members_[*known - 1];
+  std::optional<Member> found = LookUpMember(cls, name, on_class);
+  if (found) members_.push_back(std::move(*found));
+  const bool is_final = classes_[cls].has_bases;  // not while they are being found
+  if (is_final) members_by_class_.Put(key, found ? static_cast<uint32_t>(members_.size()) : 0);
+  return found ? &members_.back() : nullptr;
+}
+
 // What a class only assigns, and a class above it declares, is the attribute of that one.
-std::optional<Member> Inference::FindMember(ClassId cls, Text name, bool on_class) {
-  if (cls == kNoId) return std::nullopt;
+std::optional<Member> Inference::LookUpMember(ClassId cls, Text name, bool on_class) {
   InfoOf(cls);
   const size_t size = classes_[cls].order.size();
   std::optional<Member> assigned;
@@ -56,10 +66,10 @@ std::optional<Member> Inference::FindMember(ClassId cls, Text name, bool on_clas
 std::vector<Member> Inference::MembersOf(Value receiver, Text name, uint8_t& doubt) {
   std::vector<Member> found;
   doubt = receiver.doubt;
-  const auto add = [&](std::optional<Member> member) {
-    if (!member) return false;
+  const auto add = [&](const Member* member) {
+    if (member == nullptr) return false;
     if (member->is_behind_open_base) doubt |= Value::kOpen;
-    found.push_back(std::move(*member));
+    found.push_back(*member);
     return true;
   };
   for (const TypeId id : types_.CopyOf(receiver.set)) {

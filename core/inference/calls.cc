@@ -442,7 +442,8 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
         }
         const ClassId dict = ClassNamed("builtins", "dict");
         const TypeSetId args[] = {InstanceNamed("builtins", "str").set, given[i].Packed()};
-        given[i] = Just(types_.Add(TypeKind::kInstance, dict, LiteralNumber(entries), args));
+        given[i] =
+            dict == kNoId ? kUnknownValue : Just(types_.Add(TypeKind::kInstance, dict, LiteralNumber(entries), args));
       } else if (!is_given[i] && kind_of(i) == ParameterKind::kPlain && syntax.ChildOf(parameters[i], 1) != kNoExpr) {
         given[i] = ValueOf(info.file, syntax.ChildOf(parameters[i], 1));
       }
@@ -659,6 +660,7 @@ Value Inference::ResultOfSpecialCall(TypeId callee, std::vector<Argument>& argum
     }
     if (name == "property" || name == "abstractproperty") {
       const ClassId property = ClassNamed("builtins", "property");
+      if (property == kNoId) return answer(kUnknownValue);
       TypeSetId getter = kNoTypes;
       if (!arguments.empty() && (arguments[0].kind == Argument::kPlain || arguments[0].name == "fget"))
         getter = at(0).set;
@@ -771,7 +773,7 @@ Value Inference::ResultOfType(TypeId callee, std::vector<Argument>& arguments, E
 
 Value Inference::ResultOf(Value callee, std::vector<Argument>& arguments, ExprPlace place) {
   static constexpr int kMoreDepth = 20;  // what goes deeper is cut where it is remembered
-  if (steps_ == 0 || depth_ >= max_depth_ + kMoreDepth) {
+  if ((guess_level_ == kMaxGuesses ? steps_ : guess_steps_) == 0 || depth_ >= max_depth_ + kMoreDepth) {
     lowest_ = std::min(lowest_, surface_);
     return kUnknownValue;
   }

@@ -33,7 +33,7 @@ constexpr OperatorRow kOperators[] = {
 Value Inference::ValueOf(FileId id, ExprId expr, FrameId frame) {
   const SourceFile* file = FileOf(id);
   if (file == nullptr || expr == kNoExpr) return kUnknownValue;
-  if (frame != kNoFrame) frame = FrameFor(*file, file->ScopeAt(file->syntax[expr].begin), frame);
+  if (frame != kNoFrame) frame = FrameFor(*file, file->ScopeAround(expr), frame);
   const InFrame in_frame(*this, frame);
   return Remembered(values_, KeyOf(id, expr, frame), [&] { return Evaluate(*file, expr, frame); });
 }
@@ -569,7 +569,7 @@ Value Inference::EvaluateCall(const SourceFile& file, ExprId expr, FrameId frame
   if (frame != kNoFrame) {
     for (const TypeId id : types_.CopyOf(result.set)) {
       if (types_[id].kind != TypeKind::kSuper || children.size() > 1) continue;
-      const FrameId own = FrameFor(file, file.ScopeAt(file.syntax[expr].begin), frame);
+      const FrameId own = FrameFor(file, file.ScopeAround(expr), frame);
       if (own != kNoFrame && !frames_[own].parameters.empty() && frames_[own].parameters[0].IsKnown() &&
           functions_[frames_[own].function].cls == types_[id].a)
         return Just(types_.Add(TypeKind::kSuper, types_[id].a, 0, {frames_[own].parameters[0].set}));

@@ -286,7 +286,6 @@ FrameId Inference::FrameOf(FunctionId function, FrameId outer, std::vector<Value
   if (guess_level_ == kMaxGuesses && is_open && outer == kNoFrame) return kNoFrame;  // nothing sure comes of it
   const int depth = frames_[outer].depth + 1, calls = frames_[frame_].calls + 1;
   if (frames_.size() >= kMaxFrames || depth > kMaxFrameDepth || calls > kMaxCalls) return kNoFrame;
-  uint32_t& count = frame_counts_[function];
   uint64_t hash = (uint64_t{function} * 0x9E3779B97F4A7C15u + outer) * 8 + static_cast<uint64_t>(calls);
   for (const Value& value : parameters)
     hash = (hash ^ value.set ^ uint64_t{value.doubt} << 40) * 0x9E3779B97F4A7C15u + 1;
@@ -295,8 +294,6 @@ FrameId Inference::FrameOf(FunctionId function, FrameId outer, std::vector<Value
     if (frames_[frame].function == function && frames_[frame].outer == outer && frames_[frame].calls == calls &&
         frames_[frame].parameters == parameters)
       return frame;
-  if (count >= kMaxFramesOfFunction) return kNoFrame;
-  ++count;
   const auto frame = static_cast<FrameId>(frames_.size());
   frames_.push_back({function, outer, depth, calls, std::move(parameters)});
   same.push_back(frame);

@@ -20,9 +20,14 @@ void Inference::Clear() {
   classes_by_place_.clear();
   functions_by_place_.clear();
   classes_by_name_.clear();
+  members_.clear();
+  members_by_class_.Clear();
   frames_by_hash_.clear();
-  frame_counts_.clear();
   for (Memos* memos : {&values_, &bindings_, &results_, &hints_, &guesses_}) *memos = {};
+  reaching_ = {};
+  at_end_ = {};
+  annotated_ = {};
+  conditions_ = {};
   module_names_.clear();
   imports_of_foreign_.clear();
   kept_.clear();
@@ -44,10 +49,12 @@ size_t Inference::ByteSize() const {
     bytes += memos->known.ByteSize();
     for (const MemosOfLevel& level : memos->levels) bytes += level.found.ByteSize();
   }
+  bytes += reaching_.ByteSize() + at_end_.ByteSize() + annotated_.ByteSize() + conditions_.ByteSize();
   const size_t nodes = classes_by_place_.size() + functions_by_place_.size() + 3 * frames_by_hash_.size();
   static constexpr size_t kBytesOfAClass = 4096;  // with its members
   return nodes * kBytesOfANode + frames_.size() * 4 * sizeof(Frame) + functions_.size() * sizeof(FunctionInfo) +
-         classes_.size() * kBytesOfAClass + types_.ByteSize() + texts_.byte_size() + bytes;
+         classes_.size() * kBytesOfAClass + members_.size() * sizeof(Member) + members_by_class_.ByteSize() +
+         types_.ByteSize() + texts_.byte_size() + bytes;
 }
 
 Text Inference::Kept(Text text) {
@@ -171,10 +178,7 @@ std::span<const ExprId> Inference::ParametersOf(const FunctionInfo& info) {
 }
 
 ClassId Inference::ClassNamed(Text module, Text name) {
-  std::string key(module);
-  key += '.';
-  key += name;
-  if (const auto known = classes_by_name_.find(key); known != classes_by_name_.end()) return known->second;
+  if (const auto known = classes_by_name_.find({module, name}); known != classes_by_name_.end()) return known->second;
   ClassId found = kNoId;
   const ModuleId id = modules_.Find(module);
   if (id != kNoModule) {
@@ -187,7 +191,7 @@ ClassId Inference::ClassNamed(Text module, Text name) {
       }
     }
   }
-  classes_by_name_[key] = found;
+  classes_by_name_[{Kept(module), Kept(name)}] = found;
   return found;
 }
 

@@ -14,6 +14,7 @@
 // (parameters and results), calls.cc, annotations.cc, expressions.cc, entities.cc (what a name stands for).
 #pragma once
 
+#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <deque>
@@ -24,9 +25,11 @@
 #include <string>
 #include <unordered_map>
 #include <unordered_set>
+#include <utility>
 #include <vector>
 
 #include "foundations/arena.h"
+#include "foundations/number_map.h"
 #include "foundations/text.h"
 #include "inference/types.h"
 #include "program/files.h"
@@ -183,6 +186,7 @@ class Inference {
   void Begin() {
     steps_ = kMaxSteps;
     guess_steps_ = kMaxGuessSteps;
+    read_ = files_.bytes_read();
     cut_rounds_ = 0;
   }
   bool IsExhausted() const { return steps_ == 0 || guess_steps_ == 0; }
@@ -216,14 +220,14 @@ class Inference {
   // The places that bind an entity, in order of files and offsets.
   std::vector<Binding> BindingsOf(const Entity& entity);
   // The bindings that reach a name; empty for attributes.
-  std::vector<Binding> BindingsReaching(const SourceFile& file, uint32_t occurrence, bool* may_be_unbound = nullptr);
+  const std::vector<Binding>& BindingsReaching(const SourceFile& file, uint32_t occurrence,
+                                               bool* may_be_unbound = nullptr);
   // The bindings of a variable that its scope is left with.
-  void DropImportsOfItself(const SourceFile& file, std::vector<uint32_t>& bindings);
-  std::vector<Binding> BindingsAtEnd(const SourceFile& file, uint32_t symbol);
+  const std::vector<Binding>& BindingsAtEnd(const SourceFile& file, uint32_t symbol);
   // The members that an attribute of this name may be, one for each type of the receiver that has it.
   std::vector<Member> MembersOf(Value receiver, Text name, uint8_t& doubt);
-  // On a class only what classes have: no attribute that methods give their instances.
-  std::optional<Member> FindMember(ClassId cls, Text name, bool on_class = false);
+  // On a class only what classes have: no attribute that methods give their instances. nullptr without one.
+  const Member* FindMember(ClassId cls, Text name, bool on_class = false);
   Entity EntityOfMember(const Member& member, Text name);
   Entity EntityOfVariable(const SourceFile& file, uint32_t symbol);
   // The variable of a name in a module, its star imports included.
@@ -280,14 +284,15 @@ class Inference {
   ExprId HintOfParameter(const SourceFile& file, const FunctionInfo& info, size_t index);
 
  private:
-  static constexpr uint32_t kMaxSteps = 10'000;
-  static constexpr uint32_t kMaxGuessSteps = 4'000;
+  // What is found surely is remembered, however much it took; few questions take a tenth of this. Guesses, and what is
+  // found surely for their sake, end much earlier.
+  static constexpr uint32_t kMaxSteps = 20'000;
+  static constexpr uint32_t kMaxGuessSteps = 3'000;
   static constexpr int kMaxDepth = 150;
-  static constexpr size_t kMaxFrames = 20'000;
+  static constexpr size_t kMaxFrames = 500'000;  // a question begins with far fewer (ByteSize)
   static constexpr int kMaxFrameDepth = 10;
   // Calls whose results are found by what they are given, inside of one another.
   static constexpr int kMaxCalls = 3;
-  static constexpr uint32_t kMaxFramesOfFunction = 32;
 
   struct Frame {
     FunctionId function = kNoId;
@@ -354,6 +359,14 @@ class Inference {
     const auto types = types_.TypesOf(value.set);
     return types.size() == 1 && types_[types[0]].kind == TypeKind::kForeign;
   }
+  // Makes guesses pay for the files that were read for them.
+  void CountReading() {
+    static constexpr uint64_t kBytesOfAStep = 512;
+    const uint64_t read = files_.bytes_read();
+    if (read == read_) return;
+    guess_steps_ -= static_cast<uint32_t>(std::min<uint64_t>(guess_steps_, (read - read_) / kBytesOfAStep));
+    read_ = read;
+  }
   // What is found while this lives is found as if nothing else were being found.
   class Afresh;
 
@@ -385,6 +398,15 @@ class Inference {
   Value LiteralValue(Text cls, Text text);
 
   // ---- variables.cc ----
+  struct Reaching {
+    std::vector<Binding> bindings;
+    bool may_be_unbound = false;
+  };
+  Reaching FindBindingsReaching(const SourceFile& file, uint32_t occurrence);
+  std::vector<Binding> FindBindingsAtEnd(const SourceFile& file, uint32_t symbol);
+  // Where a variable is given an annotation, in the version and on the platform asked for.
+  const std::vector<Binding>& AnnotatedBindings(const SourceFile& file, uint32_t symbol);
+  void DropImportsOfItself(const SourceFile& file, std::vector<uint32_t>& bindings);
   Value ValueOfName(const SourceFile& file, uint32_t occurrence, FrameId frame);
   Value ValueOfVariable(const SourceFile& file, uint32_t symbol, FrameId frame);
   Value ValueOfBindings(std::span<const Binding> bindings, FrameId frame);
@@ -405,6 +427,12 @@ class Inference {
 
   // ---- narrowing.cc ----
   class Narrowing;
+  // What holds, or does not, where an expression stands.
+  struct Condition {
+    ExprId expr;
+    bool holds;
+  };
+  std::vector<Condition> ConditionsOn(const SourceFile& file, ExprId expr);
   Value Narrowed(const SourceFile& file, ExprId expr, Value value, FrameId frame);
   // -1 where it is not known before the program runs.
   int StaticTruth(const SourceFile& file, ExprId condition);
@@ -422,6 +450,7 @@ class Inference {
   // ---- attributes.cc ----
   Value AttributeOfType(TypeId type, Text name);
   bool IsDeclared(const Member& member);
+  std::optional<Member> LookUpMember(ClassId cls, Text name, bool on_class);
   Value AttributeOfModule(ModuleId module, Text name);
 
   Value ValueOfMember(const Member& member, Text name, TypeId receiver, bool on_class);
@@ -480,20 +509,47 @@ class Inference {
   std::unordered_map<std::string, uint32_t> numbers_of_literals_;
   std::unordered_map<uint64_t, ClassId> classes_by_place_;
   std::unordered_map<uint64_t, FunctionId> functions_by_place_;
-  std::unordered_map<std::string, ClassId> classes_by_name_;
+  // By the names of module and class.
+  struct HashOfTexts {
+    size_t operator()(const std::pair<Text, Text>& texts) const {
+      return std::hash<Text>()(texts.first) * 31 + std::hash<Text>()(texts.second);
+    }
+  };
+  std::unordered_map<std::pair<Text, Text>, ClassId, HashOfTexts> classes_by_name_;
+  std::deque<Member> members_;            // that were looked up
+  NumberMap<uint32_t> members_by_class_;  // by class and name, from 1; 0 where there is none
   std::unordered_map<uint64_t, std::vector<FrameId>> frames_by_hash_;
-  std::unordered_map<FunctionId, uint32_t> frame_counts_;
   Memos values_;    // of expressions, by file, expression and frame
   Memos bindings_;  // of bound names, by file, offset and frame
   Memos results_;   // of functions, by function and frame
   Memos hints_;     // of annotations, by file and expression
   Memos guesses_;   // of parameters, as a tuple, by function
+  // What follows from sources alone, by file and occurrence, symbol or expression.
+  template <class T>
+  struct FoundOnce {
+    std::deque<T> found;
+    NumberMap<uint32_t> numbers;  // from 1
+    template <class Find>
+    const T& Get(FileId file, uint32_t node, const Find& find) {
+      const uint64_t key = (uint64_t{file} << 32 | node) + 1;
+      if (const uint32_t* known = numbers.Find(key)) return found[*known - 1];
+      found.push_back(find());
+      numbers.Put(key, static_cast<uint32_t>(found.size()));
+      return found.back();
+    }
+    size_t ByteSize() const { return numbers.ByteSize() + found.size() * 2 * sizeof(T); }
+  };
+  FoundOnce<Reaching> reaching_;
+  FoundOnce<std::vector<Binding>> at_end_;
+  FoundOnce<std::vector<Binding>> annotated_;
+  FoundOnce<std::vector<Condition>> conditions_;
   std::unordered_map<FileId, ModuleNames> module_names_;
   std::unordered_map<uint32_t, Binding> imports_of_foreign_;  // by the number of the name
   TextArena texts_;
   std::unordered_set<Text> kept_;  // of texts_
   uint32_t steps_ = kMaxSteps;
   uint32_t guess_steps_ = kMaxGuessSteps;
+  uint64_t read_ = 0;  // bytes of files, as far as guesses have paid for them
   int depth_ = 0;
   int max_depth_ = kMaxDepth;
   int guess_level_ = 0;           // how many guesses are being made

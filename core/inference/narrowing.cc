@@ -210,14 +210,18 @@ class Inference::Narrowing {
   FrameId frame_;
 };
 
-// Conditions are applied from the outermost to the innermost, those only behind which nothing was assigned.
+// Conditions are applied from the outermost to the innermost.
 Value Inference::Narrowed(const SourceFile& file, ExprId expr, Value value, FrameId frame) {
+  if (!IsChain(file.syntax, expr) || (file.syntax[expr].flags & kIsTarget) != 0) return value;
+  const std::vector<Condition>& conditions = conditions_.Get(file.id, expr, [&] { return ConditionsOn(file, expr); });
+  Narrowing narrowing(*this, file, expr, frame);
+  for (size_t i = conditions.size(); i-- > 0;) value = narrowing.Where(conditions[i].expr, conditions[i].holds, value);
+  return value;
+}
+
+// The innermost first, and those only behind which nothing was assigned.
+std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file, ExprId expr) {
   const FileSyntax& syntax = file.syntax;
-  if (!IsChain(syntax, expr) || (syntax[expr].flags & kIsTarget) != 0) return value;
-  struct Condition {
-    ExprId expr;
-    bool holds;
-  };
   std::vector<Condition> conditions;
   ExprId root = expr;
   while (syntax[root].kind == ExprKind::kAttribute) root = syntax.ChildOf(root, 0);
@@ -298,10 +302,10 @@ Value Inference::Narrowed(const SourceFile& file, ExprId expr, Value value, Fram
       }
     }
   }
-  if (conditions.empty()) return value;
+  if (conditions.empty()) return conditions;
   // What was assigned in between.
   const uint32_t index = file.OccurrenceBeginningAt(syntax[root].begin);
-  if (index == kNoIndex) return value;
+  if (index == kNoIndex) return {};
   uint32_t last_bound = 0;
   const uint32_t variable = file.bindings.VariableOf(file.bindings.occurrences[index]);
   if (variable != kNoIndex) {
@@ -325,11 +329,8 @@ Value Inference::Narrowed(const SourceFile& file, ExprId expr, Value value, Fram
       }
     }
   }
-  Narrowing narrowing(*this, file, expr, frame);
-  for (size_t i = conditions.size(); i-- > 0;)
-    if (syntax[conditions[i].expr].begin >= last_bound)
-      value = narrowing.Where(conditions[i].expr, conditions[i].holds, value);
-  return value;
+  std::erase_if(conditions, [&](const Condition& condition) { return syntax[condition.expr].begin < last_bound; });
+  return conditions;
 }
 
 int Inference::TruthIn(const SourceFile& file, ExprId condition, FrameId frame) {

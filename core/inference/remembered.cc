@@ -36,7 +36,7 @@ void Inference::Settle(size_t first, bool needs_level, bool is_open) {
     if (is_open || (value.doubt & Value::kNotYet) != 0) value = kUnknownValue;
     if (!needs_level && each.memos->known.Find(each.key) == nullptr) each.memos->known.Put(each.key, value);
     level.found.Put(each.key, needs_level ? Memo{value, 0, Memo::kKnown, true} : Memo());
-    level.assumed.erase(each.key);
+    if (!level.assumed.empty()) level.assumed.erase(each.key);
   }
   for_now_.resize(first);
 }

@@ -42,9 +42,10 @@ class Inference::InFrame {
 
 class Inference::Afresh {
  public:
-  Afresh(Inference& inference, int depth)
+  Afresh(Inference& inference, int depth, bool is_for_guess = false)
       : in_(inference),
         first_(in_.for_now_.size()),
+        is_for_guess_(is_for_guess),
         steps_(in_.steps_),
         max_depth_(in_.max_depth_),
         guess_level_(in_.guess_level_),
@@ -58,13 +59,18 @@ class Inference::Afresh {
     in_.lowest_ = INT32_MAX;
     in_.guess_level_ = kMaxGuesses;
     in_.max_depth_ = std::min(std::max(max_depth_, in_.depth_ + depth), 2 * kMaxDepth);
-    in_.steps_ = std::max(steps_, kSteps);
+    in_.steps_ = is_for_guess ? in_.guess_steps_ : std::max(steps_, kSteps);
     given_ = in_.steps_;
   }
   ~Afresh() {
     in_.ForgetForNow(first_);
     const uint32_t used = given_ - in_.steps_;
-    in_.steps_ = steps_ > used ? steps_ - used : 0;
+    if (is_for_guess_) {
+      in_.guess_steps_ -= std::min(in_.guess_steps_, used);
+      in_.steps_ = steps_;
+    } else {
+      in_.steps_ = steps_ > used ? steps_ - used : 0;
+    }
     in_.max_depth_ = max_depth_;
     in_.guess_level_ = guess_level_;
     in_.lowest_ = lowest_;
@@ -79,6 +85,7 @@ class Inference::Afresh {
  private:
   Inference& in_;
   const size_t first_;
+  const bool is_for_guess_;  // what is found surely for its sake counts as steps of the guess
   const uint32_t steps_;
   uint32_t given_ = 0;
   const int max_depth_, guess_level_, lowest_, surface_;
@@ -98,7 +105,7 @@ Value Inference::Remembered(Memos& memos, uint64_t key, const Find& find) {
     if (known != nullptr && known->state == Memo::kKnown) {
       sure = known->value;
     } else {
-      const Afresh afresh(*this, kMaxDepth);
+      const Afresh afresh(*this, kMaxDepth, depth_ > 0);
       sure = Remembered(memos, key, find);
       if (key != 0 && memos.known.Find(key) != nullptr) return sure;
     }
@@ -130,6 +137,7 @@ Value Inference::Remembered(Memos& memos, uint64_t key, const Find& find) {
     }
   }
   uint32_t& steps = is_sure ? steps_ : guess_steps_;
+  if (!is_sure) CountReading();
   if (steps == 0 || depth_ >= max_depth_) {
     lowest_ = std::min(lowest_, surface_);
     if (key != 0 && before.state == Memo::kNone && steps != 0 && is_sure) {
@@ -148,7 +156,9 @@ Value Inference::Remembered(Memos& memos, uint64_t key, const Find& find) {
   const size_t first_for_now = for_now_.size();
   const int number = static_cast<int>(finding_.size()) + 1;
   Value assumed{kNoTypes, static_cast<uint8_t>(is_sure ? Value::kNotYet : 0)};
-  if (const auto at = own.assumed.find(key); at != own.assumed.end()) assumed = at->second;
+  if (!own.assumed.empty()) {
+    if (const auto at = own.assumed.find(key); at != own.assumed.end()) assumed = at->second;
+  }
   finding_.push_back({assumed, false});
   Value value;
   bool is_whole = false;
@@ -179,7 +189,7 @@ Value Inference::Remembered(Memos& memos, uint64_t key, const Find& find) {
         needs_level_ = true;
       }
       Settle(first_for_now, needs_level_, is_unsettled_);
-      own.assumed.erase(key);
+      if (!own.assumed.empty()) own.assumed.erase(key);
       break;
     }
     ForgetForNow(first_for_now);

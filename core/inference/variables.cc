@@ -58,7 +58,13 @@ bool Inference::IsReachable(const SourceFile& file, StmtId id) {
   return true;
 }
 
-std::vector<Binding> Inference::BindingsReaching(const SourceFile& file, uint32_t index, bool* may_be_unbound) {
+const std::vector<Binding>& Inference::BindingsReaching(const SourceFile& file, uint32_t index, bool* may_be_unbound) {
+  const Reaching& found = reaching_.Get(file.id, index, [&] { return FindBindingsReaching(file, index); });
+  if (may_be_unbound != nullptr) *may_be_unbound = found.may_be_unbound;
+  return found.bindings;
+}
+
+Inference::Reaching Inference::FindBindingsReaching(const SourceFile& file, uint32_t index) {
   const Occurrence& occurrence = file.bindings.occurrences[index];
   const uint32_t variable = file.bindings.VariableOf(occurrence);
   if (variable == kNoIndex) return {};
@@ -108,11 +114,11 @@ std::vector<Binding> Inference::BindingsReaching(const SourceFile& file, uint32_
   }
   if (!is_bound) reached.insert(reached.end(), parameters.begin(), parameters.end());
   if (reached.empty()) reached = own.empty() ? unreachable : own;
-  if (may_be_unbound != nullptr) *may_be_unbound = !is_bound && parameters.empty();
   std::ranges::sort(reached);
-  std::vector<Binding> found;
-  found.reserve(reached.size());
-  for (const uint32_t offset : reached) found.push_back({file.id, offset});
+  Reaching found;
+  found.may_be_unbound = !is_bound && parameters.empty();
+  found.bindings.reserve(reached.size());
+  for (const uint32_t offset : reached) found.bindings.push_back({file.id, offset});
   return found;
 }
 
@@ -373,17 +379,14 @@ Value Inference::ValueOfName(const SourceFile& file, uint32_t index, FrameId fra
   const uint32_t variable = file.bindings.VariableOf(occurrence);
   if (variable == kNoIndex) return kUnknownValue;
   // What is declared is what it is, whatever it was given.
-  for (const uint32_t i : file.occurrences().Of(variable)) {
-    const Occurrence& other = file.bindings.occurrences[i];
-    if (!Binds(other) || other.kind != NameKind::kVariable || other.role == NameRole::kRead) continue;
-    const StmtId stmt = file.syntax.StatementAt(other.begin);
-    if (file.syntax.stmt(stmt).hint == kNoExpr || file.syntax.stmt(stmt).kind != StmtKind::kAnnotated) continue;
-    if (!IsReachable(file, stmt)) continue;
-    const Value value = ValueOfBinding({file.id, other.begin}, frame);
+  for (const Binding& binding : AnnotatedBindings(file, variable)) {
+    const Occurrence& other = file.bindings.occurrences[file.OccurrenceBeginningAt(binding.offset)];
+    if (other.role == NameRole::kRead || file.syntax.stmt(file.syntax.StatementAt(other.begin)).hint == kNoExpr)
+      continue;
+    const Value value = ValueOfBinding(binding, frame);
     if (value.IsKnown()) return value;
   }
-  bool may_be_unbound = false;
-  const std::vector<Binding> bindings = BindingsReaching(file, index, &may_be_unbound);
+  const std::vector<Binding>& bindings = BindingsReaching(file, index);
   if (!bindings.empty()) return ValueOfBindings(bindings, frame);
   const Text name = file.bindings.texts[file.bindings.symbols[variable].name];
   // Nothing in the file binds it: star imports, then what the language has.
@@ -433,7 +436,11 @@ void Inference::DropImportsOfItself(const SourceFile& file, std::vector<uint32_t
   if (!others.empty()) bindings = std::move(others);
 }
 
-std::vector<Binding> Inference::BindingsAtEnd(const SourceFile& file, uint32_t symbol) {
+const std::vector<Binding>& Inference::BindingsAtEnd(const SourceFile& file, uint32_t symbol) {
+  return at_end_.Get(file.id, symbol, [&] { return FindBindingsAtEnd(file, symbol); });
+}
+
+std::vector<Binding> Inference::FindBindingsAtEnd(const SourceFile& file, uint32_t symbol) {
   std::vector<uint32_t> own, elsewhere, reached;
   const NameSymbol& owner = file.bindings.symbols[symbol];
   for (const uint32_t i : file.occurrences().Of(symbol)) {
@@ -454,15 +461,25 @@ std::vector<Binding> Inference::BindingsAtEnd(const SourceFile& file, uint32_t s
   return found;
 }
 
+const std::vector<Binding>& Inference::AnnotatedBindings(const SourceFile& file, uint32_t symbol) {
+  const auto find = [&] {
+    std::vector<Binding> found;
+    for (const uint32_t i : file.occurrences().Of(symbol)) {
+      const Occurrence& occurrence = file.bindings.occurrences[i];
+      if (occurrence.kind != NameKind::kVariable) continue;
+      const StmtId stmt = file.syntax.StatementAt(occurrence.begin);
+      if (file.syntax.stmt(stmt).kind == StmtKind::kAnnotated && IsReachable(file, stmt))
+        found.push_back({file.id, occurrence.begin});
+    }
+    return found;
+  };
+  return annotated_.Get(file.id, symbol, find);
+}
+
 Value Inference::ValueOfVariable(const SourceFile& file, uint32_t symbol, FrameId frame) {
   Value declared;
-  for (const uint32_t i : file.occurrences().Of(symbol)) {
-    const Occurrence& occurrence = file.bindings.occurrences[i];
-    if (occurrence.kind != NameKind::kVariable) continue;
-    const StmtId stmt = file.syntax.StatementAt(occurrence.begin);
-    if (file.syntax.stmt(stmt).kind == StmtKind::kAnnotated && IsReachable(file, stmt))
-      declared = types_.Union(declared, ValueOfBinding({file.id, occurrence.begin}, frame));
-  }
+  for (const Binding& binding : AnnotatedBindings(file, symbol))
+    declared = types_.Union(declared, ValueOfBinding(binding, frame));
   return declared.IsKnown() ? declared : ValueOfBindings(BindingsAtEnd(file, symbol), frame);
 }
 
@@ -481,6 +498,9 @@ Value Inference::ValueOfEntity(const Entity& entity) {
 }
 
 Value Inference::ValueOfBinding(Binding binding, FrameId frame) {
+  if (const uint64_t key = KeyOf(binding.file, binding.offset, kNoFrame); frame == kNoFrame && key != 0) {
+    if (const Value* known = bindings_.known.Find(key)) return *known;
+  }
   const SourceFile* file = FileOf(binding.file);
   if (file == nullptr) return kUnknownValue;
   const uint32_t index = file->OccurrenceBeginningAt(binding.offset);

@@ -227,6 +227,7 @@ class Files::Impl {
     if (IsHeld(file) && !IsOpen(file)) GiveBack(entries_[file]);
   }
   bool IsHeld(FileId file) const { return entries_[file].file != nullptr; }
+  uint64_t bytes_read() const { return bytes_read_; }
 
  private:
   struct Entry {
@@ -296,6 +297,7 @@ class Files::Impl {
     ReaderFor(file->is_stub).Read(text, *file);
     entry.byte_size = file->ByteSize();
     held_ += entry.byte_size;
+    bytes_read_ += text.size();
     entry.file = std::move(file);
     if (memory_.capacity() > kMostMemoryKept) memory_ = {};
   }
@@ -318,6 +320,7 @@ class Files::Impl {
   FileId lines_of_ = kNoFile;
   std::vector<uint32_t> lines_;  // where they begin
   size_t held_ = 0;
+  uint64_t bytes_read_ = 0;
   uint64_t asked_ = 0;
 };
 
@@ -353,5 +356,6 @@ void Files::Trim(size_t bytes) { impl_->Trim(bytes); }
 void Files::GiveBack(FileId file) { impl_->GiveBack(file); }
 bool Files::IsHeld(FileId file) const { return impl_->IsHeld(file); }
 size_t Files::ByteSize() const { return impl_->ByteSize(); }
+uint64_t Files::bytes_read() const { return impl_->bytes_read(); }
 
 }  // namespace quillet

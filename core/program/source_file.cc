@@ -185,6 +185,13 @@ uint32_t SourceFile::ScopeAt(uint32_t offset) const {
   return 0;
 }
 
+uint32_t SourceFile::ScopeAround(ExprId expr) const {
+  if (scopes_around_.empty()) scopes_around_.assign(syntax.exprs.size(), kNoIndex);
+  uint32_t& scope = scopes_around_[expr];
+  if (scope == kNoIndex) scope = ScopeAt(syntax[expr].begin);
+  return scope;
+}
+
 // ---- places ----
 
 Position SourceFile::PlaceOf(uint32_t offset) const {
@@ -205,7 +212,7 @@ uint32_t SourceFile::OffsetOf(int line, int column) const {
 
 size_t SourceFile::ByteSize() const {
   // What is made when it is asked for counts from the beginning.
-  const size_t maps = bindings.scopes.size() * 3 * sizeof(uint32_t);
+  const size_t maps = (bindings.scopes.size() * 3 + syntax.exprs.size()) * sizeof(uint32_t);
   const size_t occurrences = (bindings.occurrences.size() + bindings.symbols.size() + 1) * sizeof(uint32_t);
   return sizeof(SourceFile) + path.capacity() + source->size() + MemoryOf(source->line_starts) + bindings.ByteSize() +
          syntax.ByteSize() + maps + occurrences;

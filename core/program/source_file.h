@@ -37,6 +37,8 @@ class SourceFile {
 
   // The innermost scope whose body an offset lies in; on a line of its own between statements its column decides.
   uint32_t ScopeAt(uint32_t offset) const;
+  // That of the place where an expression begins, remembered.
+  uint32_t ScopeAround(ExprId expr) const;
   // The scope that a `def`, a `class`, a lambda or a comprehension opens; kNoIndex without one. A scope of type
   // parameters around it is its parent.
   uint32_t ScopeOfStmt(StmtId stmt) const;
@@ -62,6 +64,7 @@ class SourceFile {
   mutable std::vector<uint32_t> scopes_by_begin_;  // of definitions, lambdas and comprehensions
   mutable std::vector<StmtId> stmt_of_scope_;
   mutable std::vector<ExprId> expr_of_scope_;
+  mutable std::vector<uint32_t> scopes_around_;  // of expressions; kNoIndex where it was not asked for
   mutable bool has_maps_ = false;
 };
 

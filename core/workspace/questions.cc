@@ -96,8 +96,8 @@ bool Workspace::Impl::IsProject(FileId file) {
 
 // The calls of a function by its name, in the files that hold it: the first of them, so many.
 std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
-  static constexpr size_t kMaxFiles = 24;
-  static constexpr size_t kMaxCalls = 64;
+  static constexpr size_t kMaxFiles = 8;
+  static constexpr size_t kMaxCalls = 32;
   const SourceFile* own = Get(function.file);
   if (own == nullptr || own->is_stub) return {};
   Text name;
@@ -126,12 +126,15 @@ std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
     }
   }
   for (const FileId id : candidates) {
+    if (calls.size() >= kMaxCalls) break;
     const SourceFile* file = Get(id);
-    if (file == nullptr) continue;
+    const uint32_t number = file == nullptr ? kNoIndex : NumberOfText(file->bindings, name);
+    if (number == kNoIndex) continue;
     for (const Occurrence& occurrence : file->bindings.occurrences) {
+      if (occurrence.text != number) continue;
       if (calls.size() >= kMaxCalls) break;
       const bool decorates = (occurrence.flags & kNameDecorator) != 0 && occurrence.role == NameRole::kRead;
-      if ((occurrence.role != NameRole::kCall && !decorates) || file->bindings.TextOf(occurrence) != name) continue;
+      if (occurrence.role != NameRole::kCall && !decorates) continue;
       const ExprId named = file->syntax.NamedAt(occurrence.begin);
       if (decorates) {
         if (named != kNoExpr) calls.push_back({id, named});

@@ -17,11 +17,11 @@ bool Workspace::Impl::IsCommonAttribute(Text name) {
   bool is_common = false;
   for (const Text cls : kClasses) {
     const ClassId id = inference.ClassNamed("builtins", cls);
-    is_common = is_common || (id != kNoId && inference.FindMember(id, name).has_value());
+    is_common = is_common || (id != kNoId && inference.FindMember(id, name) != nullptr);
   }
   for (const Text cls : {Text("IO"), Text("Generator")}) {
     const ClassId id = inference.ClassNamed("typing", cls);
-    is_common = is_common || (id != kNoId && inference.FindMember(id, name).has_value());
+    is_common = is_common || (id != kNoId && inference.FindMember(id, name) != nullptr);
   }
   common_[std::string(name)] = is_common;
   return is_common;
@@ -157,9 +157,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
     const SourceFile* source = visit.file;
     if (source == nullptr) continue;
     const Bindings& bindings = source->bindings;
-    uint32_t number = kNoIndex;
-    for (uint32_t i = 0; i < bindings.texts.size() && number == kNoIndex; ++i)
-      if (bindings.texts[i] == name) number = i;
+    const uint32_t number = NumberOfText(bindings, name);
     if (number == kNoIndex) continue;
     struct Known {
       bool meets;

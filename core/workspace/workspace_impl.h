@@ -171,6 +171,13 @@ class Workspace::Impl final : public CallerSource {
   std::unordered_map<std::string, bool> common_;
 };
 
+// The number of a text among those of a file; kNoIndex where no name is spelled so.
+inline uint32_t NumberOfText(const Bindings& bindings, Text name) {
+  for (uint32_t i = 0; i < bindings.texts.size(); ++i)
+    if (bindings.texts[i] == name) return i;
+  return kNoIndex;
+}
+
 inline Certainty CertaintyOf(uint8_t doubt) { return doubt == 0 ? Certainty::kCertain : Certainty::kLikely; }
 
 }  // namespace quillet

@@ -413,5 +413,17 @@ TEST(Inference, EndsInRings) {
   Program(classes + "C1999.$x\n").AllTypes();
 }
 
+TEST(Inference, KnowsTheLastOfManyCalls) {
+  static constexpr int kCalls = 60;
+  std::string text = "def same(x): return x\n";
+  std::vector<std::string> types;
+  for (int i = 0; i < kCalls; ++i) {
+    const std::string name = "C" + std::to_string(i);
+    text += "class " + name + ": pass\n$v" + name + " = same(" + name + "())\n";
+    types.push_back("a." + name);
+  }
+  EXPECT_EQ(Program(text).AllTypes(), types);
+}
+
 }  // namespace
 }  // namespace quillet

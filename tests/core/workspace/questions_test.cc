@@ -712,6 +712,20 @@ TEST(Questions, AreAnsweredWithoutALibrary) {
   EXPECT_EQ(workspace.Types(file, workspace.OffsetOf(file, 4, 11)), Words{});
 }
 
+TEST(Questions, AreAnsweredWhereTheLibraryLacksAClass) {
+  const testing::TemporaryFolder folder = {
+      {"a.py",
+       "def f(**options):\n  return options['a'].x\nf(a=1)\nclass A:\n  @property\n  def p(self): return 1\nA().p\n"}};
+  Workspace::Settings settings;
+  settings.roots = {folder.path()};
+  settings.version = Version::Of(3, 12);
+  Workspace workspace(std::move(settings));
+  const FileId file = workspace.FileOf(folder / "a.py");
+  EXPECT_EQ(workspace.Types(file, workspace.OffsetOf(file, 2, 10)), Words{});
+  EXPECT_EQ(workspace.Types(file, workspace.OffsetOf(file, 2, 23)), Words{});
+  EXPECT_EQ(workspace.Definitions(file, workspace.OffsetOf(file, 7, 5)).size(), 1u);
+}
+
 TEST(Questions, AreAnsweredAtEveryPlace) {
   const std::string_view text =
       "from a import *\nimport a.a as b\nclass A(A, B[int]):\n  x: 'A' = f(\n  def m(self, *a, **k): return self.\n"
