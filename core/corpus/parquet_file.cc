@@ -198,40 +198,65 @@ ParquetFile::Chunk ParquetFile::WriteColumn(size_t size, const Column& type, con
   const size_t null_count = column.validity != nullptr ? column.validity->false_count() : 0;
   Chunk chunk{written_, 0, size, null_count, 0, 0, {}};
   const PhysicalType physical = PhysicalTypeOf(type);
+  std::span<const uint32_t> places = column.places;
+  size_t dictionary_size = column.dictionary.size();
+  page_.clear();
   if (physical == kByteArray) {
-    page_.clear();
     for (const Text text : column.dictionary) {
       const auto length = static_cast<uint32_t>(text.size());
       page_.append(reinterpret_cast<const char*>(&length), 4);
       page_ += text;
     }
-    WritePage(true, column.dictionary.size(), false, chunk);
-    chunk.dictionary_size = chunk.size;
     if (column.bounds && std::max(column.bounds->least.size(), column.bounds->greatest.size()) <= kLongestBound)
       chunk.bounds.emplace(column.bounds->least, column.bounds->greatest);
+  } else if (physical == kInt32 && FindNumbers(column.numbers)) {
+    AppendPlain(std::span<const int32_t>(found_numbers_), page_);
+    places = number_places_;
+    dictionary_size = found_numbers_.size();
+  }
+  const bool has_dictionary = physical == kByteArray || !places.empty();
+  if (has_dictionary) {
+    WritePage(true, dictionary_size, false, chunk);
+    chunk.dictionary_size = chunk.size;
   }
   page_.clear();
   if (type.may_be_null) AppendValidity(size, column.validity, page_);
-  switch (physical) {
-    case kByteArray: {
-      const size_t count = column.dictionary.size();
-      const uint32_t bits = count <= 1 << 8 ? 8 : count <= 1 << 16 ? 16 : 32;
-      page_ += static_cast<char>(bits);
-      RunLengths(bits, page_).Append(column.places.size(), [&column](size_t i) { return column.places[i]; });
-      break;
-    }
-    case kInt32:
-      AppendPlain(column.numbers, page_);
-      break;
-    case kInt64:
-      AppendPlain(column.long_numbers, page_);
-      break;
-    case kBoolean:
-      page_.append(static_cast<const char*>(column.bits->data()), (size + 7) / 8);
-      break;
+  if (has_dictionary) {
+    const uint32_t bits = dictionary_size <= 1 << 8 ? 8 : dictionary_size <= 1 << 16 ? 16 : 32;
+    page_ += static_cast<char>(bits);
+    RunLengths(bits, page_).Append(places.size(), [places](size_t i) { return places[i]; });
+  } else if (physical == kInt32) {
+    AppendPlain(column.numbers, page_);
+  } else if (physical == kInt64) {
+    AppendPlain(column.long_numbers, page_);
+  } else {
+    page_.append(static_cast<const char*>(column.bits->data()), (size + 7) / 8);
   }
-  WritePage(false, size, physical == kByteArray, chunk);
+  WritePage(false, size, has_dictionary, chunk);
   return chunk;
+}
+
+// Makes a dictionary of small numbers; false where it is not worth while.
+bool ParquetFile::FindNumbers(std::span<const int32_t> numbers) {
+  constexpr uint32_t kNoPlace = UINT32_MAX;
+  constexpr uint32_t kMost = 1 << 16;
+  found_numbers_.clear();
+  number_places_.clear();
+  if (place_of_number_.empty()) place_of_number_.assign(kMost, kNoPlace);
+  for (const int32_t number : numbers) {
+    const auto small = static_cast<uint32_t>(number);
+    if (small >= kMost) break;
+    uint32_t& place = place_of_number_[small];
+    if (place == kNoPlace) {
+      place = static_cast<uint32_t>(found_numbers_.size());
+      found_numbers_.push_back(number);
+    }
+    number_places_.push_back(place);
+  }
+  for (const int32_t number : found_numbers_) place_of_number_[static_cast<uint32_t>(number)] = kNoPlace;
+  if (number_places_.size() == numbers.size() && found_numbers_.size() * 4 <= numbers.size()) return true;
+  number_places_.clear();
+  return false;
 }
 
 void ParquetFile::WritePage(bool is_dictionary, size_t value_count, bool has_places, Chunk& chunk) {
@@ -309,10 +334,10 @@ std::string ParquetFile::Footer(Text key, Text value) const {
       out.Number(2, ThriftText::kLong, 0);  // where this is written again, which is nowhere
       out.Open(3);
       out.Number(1, ThriftText::kWord, physical);
-      out.List(2, ThriftText::kWord, physical == kByteArray ? 3 : 2);
+      out.List(2, ThriftText::kWord, chunk.dictionary_size != 0 ? 3 : 2);
       out.AppendZigzag(kPlain);
       out.AppendZigzag(kRunLengths);
-      if (physical == kByteArray) out.AppendZigzag(kDictionaryPlaces);
+      if (chunk.dictionary_size != 0) out.AppendZigzag(kDictionaryPlaces);
       out.List(3, ThriftText::kBinary, 1);
       out.AppendBinary(columns_[i].name);
       out.Number(4, ThriftText::kWord, kZstd);

@@ -1,8 +1,9 @@
 // A Parquet file that grows row group by row group.
 //
 // Texts are dictionaries, a group its own, and their places in it as wide as a byte or two, so that they are written
-// as they lie and compress as well as narrower ones. Numbers are plain. Pages are compressed by whoever asks for the
-// file, with zstd. One column may have its bounds in each group, for readers that skip groups by them.
+// as they lie and compress as well as narrower ones. So are small numbers where they repeat; others are plain. Pages
+// are compressed by whoever asks for the file, with zstd. One column may have its bounds in each group, for readers
+// that skip groups by them.
 //
 // The format is laid down in the Apache Parquet specification; the footer is in Thrift's compact protocol.
 #pragma once
@@ -68,6 +69,7 @@ class ParquetFile {
     std::vector<Chunk> chunks;
   };
 
+  bool FindNumbers(std::span<const int32_t> numbers);
   Chunk WriteColumn(size_t size, const Column& type, const ParquetColumn& column);
   // The bytes in `page_` as a page with this header behind its sizes; sets the chunk's sizes.
   void WritePage(bool is_dictionary, size_t value_count, bool has_places, Chunk& chunk);
@@ -82,6 +84,10 @@ class ParquetFile {
   std::vector<Group> groups_;
   std::string page_;
   std::string compressed_;
+  // The dictionary of a column of numbers, and the places of these in it.
+  std::vector<int32_t> found_numbers_;
+  std::vector<uint32_t> number_places_;
+  std::vector<uint32_t> place_of_number_;
 };
 
 }  // namespace quillet

@@ -33,15 +33,28 @@ class SortedRun {
     Bits validity;
   };
 
+  void LayOut();
   void Sort();
   ParquetColumn Gather(size_t column, size_t begin, size_t end, Gathered& gathered);
-  void GatherTexts(const ColumnBuffers& buffers, std::span<const uint32_t> rows, Gathered& gathered);
+  void GatherTexts(size_t column, size_t begin, size_t end, Gathered& gathered);
+  void GatherBits(size_t bit, size_t begin, size_t end, Bits& bits) const;
+  // Word `word` of a row.
+  uint32_t WordAt(size_t row, size_t word) const { return rows_[row * row_words_ + word]; }
+  bool BitAt(size_t row, size_t bit) const { return (WordAt(row, bit / 32) >> bit % 32 & 1) != 0; }
 
   const RowTable& table_;
   const size_t key_;
   const std::vector<Column> schema_;
   const std::vector<ColumnBuffers> buffers_;
-  std::vector<uint32_t> order_;   // the rows
+  // Where a column is in a row: its first word, or its bit where it is a truth value.
+  struct Place {
+    size_t at;
+    size_t validity;  // the bit that says whether it is there; of columns that may be missing
+  };
+  std::vector<Place> layout_;
+  size_t row_words_ = 0;
+  // In order. A row is together, since rows come from all over the table.
+  std::vector<uint32_t> rows_;
   std::vector<uint32_t> places_;  // of texts in the dictionary that is being made
 };
 
