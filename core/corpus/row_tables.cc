@@ -54,7 +54,7 @@ CarriedColumn::CarriedColumn(std::string name, const InputColumn& input, bool mu
 void CarriedColumn::Repeat(const InputColumn& input, size_t row, size_t count) {
   const bool is_null = input.IsNull(row);
   size_ += count;
-  for (size_t i = 0; i < count; ++i) validity_.Add(!is_null);
+  validity_.Add(!is_null, count);
   switch (form_) {
     case InputColumn::Form::kText:
     case InputColumn::Form::kBytes: {
@@ -123,6 +123,7 @@ RowTable::RowTable(std::vector<CarriedColumn> carried, TextForm text_form, size_
 }
 
 void RowTable::Carry(const InputRow& input) {
+  ForgetSource();
   const size_t count = size() - carried_rows_;
   if (count == 0) return;
   for (size_t i = 0; i < carried_.size(); ++i) carried_[i].Repeat((*input.columns)[i], input.row, count);
@@ -130,6 +131,7 @@ void RowTable::Carry(const InputRow& input) {
 }
 
 void RowTable::Truncate(size_t size) {
+  ForgetSource();
   TruncateOwn(size);
   if (carried_rows_ <= size) return;
   for (CarriedColumn& column : carried_) column.Truncate(size);
@@ -173,7 +175,7 @@ class RareTexts {
     are_there_.Add(true);
   }
   void AddNone() {
-    texts_.Add({});
+    texts_.AddNone();
     are_there_.Add(false);
   }
   void Truncate(size_t size) {
@@ -202,9 +204,9 @@ class RecordRows : public RowTable {
 
   void AddRecord(const PlacedRecord& record, Text scope) override {
     AddPlace(record.line, record.column);
-    scopes_.Add(scope);
+    AddScope(record.scope, scope);
     names_.Add(record.name);
-    kinds_.Add(RecordKindWords()[static_cast<size_t>(record.kind)]);
+    kinds_.AddWord(static_cast<size_t>(record.kind), RecordKindWords());
     details_.Add(record.detail);
     are_parameters_.Add(record.is_parameter);
     errors_.AddNone();
@@ -241,8 +243,15 @@ class RecordRows : public RowTable {
     are_parameters_.Truncate(size);
     errors_.Truncate(size);
   }
+  void ForgetSource() override { scope_numbers_.clear(); }
 
  private:
+  void AddScope(uint32_t index, Text scope) {
+    if (!scopes_.has_numbers()) return scopes_.Add(scope);
+    if (index >= scope_numbers_.size()) scope_numbers_.resize(index + 1, kNoIndex);
+    if (scope_numbers_[index] == kNoIndex) scope_numbers_[index] = scopes_.NumberOf(scope);
+    scopes_.AddNumber(scope_numbers_[index]);
+  }
   void AddPlace(uint32_t line, uint32_t column) {
     lines_.push_back(static_cast<int32_t>(line));
     columns_.push_back(static_cast<int32_t>(column));
@@ -251,6 +260,7 @@ class RecordRows : public RowTable {
   std::vector<int32_t> lines_;
   std::vector<int32_t> columns_;
   TextColumn scopes_{text_form(), most_rows()};
+  std::vector<uint32_t> scope_numbers_;  // of a source's scopes
   TextColumn names_{text_form(), most_rows()};
   TextColumn kinds_{text_form(), most_rows()};
   TextColumn details_{text_form(), most_rows()};

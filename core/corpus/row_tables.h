@@ -26,7 +26,8 @@ namespace quillet {
 // The texts of a column, each once.
 class ColumnTexts {
  public:
-  ColumnTexts() { table_.Begin(0); }
+  // For so many rows.
+  explicit ColumnTexts(size_t rows) { table_.Begin(rows / kRowsOfAText); }
 
   uint32_t NumberOf(Text text) {
     // Many rows have what the one before them has.
@@ -44,6 +45,8 @@ class ColumnTexts {
   }
 
  private:
+  static constexpr size_t kRowsOfAText = 16;  // more or less
+
   TextTable table_;
   TextList list_;
   uint32_t last_ = 0;
@@ -61,7 +64,7 @@ class TextColumn {
     if (form == TextForm::kPlain) {
       offsets_.push_back(0);
     } else {
-      texts_ = std::make_shared<ColumnTexts>();
+      texts_ = std::make_shared<ColumnTexts>(rows);
       numbers_.reserve(rows);
     }
   }
@@ -75,6 +78,23 @@ class TextColumn {
       offsets_.push_back(static_cast<int32_t>(bytes_.size()));
     }
   }
+  // Of a text that is asked for often: its number, and a row of it.
+  bool has_numbers() const { return texts_ != nullptr; }
+  uint32_t NumberOf(Text text) { return texts_->NumberOf(text); }
+  void AddNumber(uint32_t number) { numbers_.push_back(number); }
+  // A text of a few that are known before, by its number among them.
+  void AddWord(size_t word, std::span<const Text> words) {
+    if (texts_ == nullptr) return Add(words[word]);
+    while (word_numbers_.size() < words.size()) word_numbers_.push_back(texts_->NumberOf(words[word_numbers_.size()]));
+    numbers_.push_back(word_numbers_[word]);
+  }
+  // In a row that has none.
+  void AddNone() {
+    if (texts_ == nullptr)
+      Add({});
+    else
+      numbers_.push_back(0);
+  }
   void Repeat(Text text, size_t count);
   void Truncate(size_t size);
   ColumnBuffers Buffers(const Bits* validity = nullptr) const {
@@ -85,6 +105,7 @@ class TextColumn {
  private:
   std::shared_ptr<ColumnTexts> texts_;
   std::vector<uint32_t> numbers_;
+  std::vector<uint32_t> word_numbers_;
   std::vector<int32_t> offsets_;
   std::string bytes_;
 };
@@ -156,6 +177,8 @@ class RowTable : public ColumnTable {
   virtual std::vector<ColumnBuffers> OwnBuffers() const = 0;
   virtual size_t own_byte_size() const = 0;
   virtual void TruncateOwn(size_t size) = 0;
+  // What was noted of the source is of use no longer.
+  virtual void ForgetSource() {}
 
   // With what a table's own columns are made.
   TextForm text_form() const { return text_form_; }

@@ -40,19 +40,22 @@ SortedRun::SortedRun(const RowTable& table, size_t key)
   Sort();
 }
 
-// The bits first, then the words.
 void SortedRun::LayOut() {
   size_t bits = 0;
   for (size_t i = 0; i < schema_.size(); ++i) {
     Place& place = layout_.emplace_back();
     if (schema_[i].format == "b") place.at = bits++;
-    if (buffers_[i].validity != nullptr) place.validity = bits++;
+    const Bits* const validity = buffers_[i].validity;
+    is_missing_.push_back(validity != nullptr && validity->false_count() == table_.size());
+    if (validity != nullptr && !is_missing_.back()) place.validity = bits++;
   }
   row_words_ = (bits + 31) / 32;
-  for (size_t i = 0; i < schema_.size(); ++i) {
-    if (schema_[i].format == "b") continue;
-    layout_[i].at = row_words_;
-    row_words_ += schema_[i].format == "l" ? 2 : 1;
+  for (const bool is_long : {false, true}) {
+    for (size_t i = 0; i < schema_.size(); ++i) {
+      if (schema_[i].format == "b" || (schema_[i].format == "l") != is_long) continue;
+      layout_[i].at = row_words_;
+      row_words_ += is_long ? 2 : 1;
+    }
   }
 }
 
@@ -71,29 +74,37 @@ void SortedRun::Sort() {
   uint32_t begin = 0;
   for (const RankedText& text : ranked) begin += std::exchange(next[text.number], begin);
 
-  // What is copied into a row: words, and bits of bytes.
-  std::vector<std::pair<const uint32_t*, size_t>> words;  // and the distance between two rows
-  std::vector<size_t> places;
-  std::vector<std::pair<const uint8_t*, size_t>> bits;
+  // What is copied into a row: bits, and behind them words, those of long numbers last.
+  struct BitSource {
+    const uint8_t* bytes;
+    size_t bit;
+  };
+  std::vector<BitSource> bits;
+  std::vector<const uint32_t*> words;
+  std::vector<const uint64_t*> long_words;
   for (size_t i = 0; i < schema_.size(); ++i) {
-    const auto* const values = buffers_[i].values[0];
-    if (schema_[i].format == "b") {
-      bits.emplace_back(static_cast<const uint8_t*>(values), layout_[i].at);
-    } else {
-      const size_t step = schema_[i].format == "l" ? 2 : 1;
-      for (size_t word = 0; word < step; ++word) {
-        words.emplace_back(static_cast<const uint32_t*>(values) + word, step);
-        places.push_back(layout_[i].at + word);
-      }
-    }
-    if (const Bits* const validity = buffers_[i].validity)
-      bits.emplace_back(static_cast<const uint8_t*>(validity->data()), layout_[i].validity);
+    const void* const values = buffers_[i].values[0];
+    if (schema_[i].format == "b")
+      bits.push_back({static_cast<const uint8_t*>(values), layout_[i].at});
+    else if (schema_[i].format == "l")
+      long_words.push_back(static_cast<const uint64_t*>(values));
+    else
+      words.push_back(static_cast<const uint32_t*>(values));
+    if (layout_[i].validity != kNone)
+      bits.push_back({static_cast<const uint8_t*>(buffers_[i].validity->data()), layout_[i].validity});
   }
+  const size_t bit_words = row_words_ - words.size() - 2 * long_words.size();
   rows_.resize(size * row_words_);
   for (size_t row = 0; row < size; ++row) {
-    uint32_t* const out = rows_.data() + next[keys[row]]++ * row_words_;
-    for (size_t i = 0; i < words.size(); ++i) out[places[i]] = words[i].first[row * words[i].second];
-    for (const auto& [bytes, bit] : bits) out[bit / 32] |= (bytes[row / 8] >> row % 8 & 1u) << bit % 32;
+    uint32_t* out = rows_.data() + next[keys[row]]++ * row_words_;
+    for (const BitSource& source : bits)
+      out[source.bit / 32] |= (source.bytes[row / 8] >> row % 8 & 1u) << source.bit % 32;
+    out += bit_words;
+    for (const uint32_t* const from : words) *out++ = from[row];
+    for (const uint64_t* const from : long_words) {
+      std::memcpy(out, from + row, sizeof *from);
+      out += 2;
+    }
   }
 }
 
@@ -112,30 +123,30 @@ void SortedRun::WriteTo(ParquetFile& file, size_t group_rows) {
 
 ParquetColumn SortedRun::Gather(size_t column, size_t begin, size_t end, Gathered& gathered) {
   ParquetColumn out;
-  const bool may_be_missing = buffers_[column].validity != nullptr;
   const Place place = layout_[column];
-  if (may_be_missing) {
+  if (is_missing_[column]) {
+    gathered.validity = Bits();
+    gathered.validity.Add(false, end - begin);
+    out.validity = &gathered.validity;
+    return out;
+  }
+  if (place.validity != kNone) {
     GatherBits(place.validity, begin, end, gathered.validity);
     out.validity = &gathered.validity;
   }
-  const auto for_each = [&](const auto& take) {
-    for (size_t row = begin; row < end; ++row) {
-      if (!may_be_missing || BitAt(row, place.validity)) take(row);
-    }
-  };
   switch (schema_[column].format[0]) {
     case 'i':
-      gathered.numbers.clear();
-      for_each([&](size_t row) { gathered.numbers.push_back(static_cast<int32_t>(WordAt(row, place.at))); });
+      gathered.numbers.resize(end - begin);
+      gathered.numbers.resize(ForEachValue(
+          place, begin, end,
+          [to = gathered.numbers.data()](size_t i, const uint32_t* at) { to[i] = static_cast<int32_t>(*at); }));
       out.numbers = gathered.numbers;
       break;
     case 'l':
-      gathered.long_numbers.clear();
-      for_each([&](size_t row) {
-        int64_t number;
-        std::memcpy(&number, &rows_[row * row_words_ + place.at], sizeof number);
-        gathered.long_numbers.push_back(number);
-      });
+      gathered.long_numbers.resize(end - begin);
+      gathered.long_numbers.resize(ForEachValue(
+          place, begin, end,
+          [to = gathered.long_numbers.data()](size_t i, const uint32_t* at) { std::memcpy(to + i, at, sizeof *to); }));
       out.long_numbers = gathered.long_numbers;
       break;
     case 'b':
@@ -150,28 +161,40 @@ ParquetColumn SortedRun::Gather(size_t column, size_t begin, size_t end, Gathere
   return out;
 }
 
+template <class Take>
+size_t SortedRun::ForEachValue(Place place, size_t begin, size_t end, const Take& take) const {
+  const size_t step = row_words_;
+  const uint32_t* at = rows_.data() + begin * step + place.at;
+  if (place.validity == kNone) {
+    for (size_t i = 0; i < end - begin; ++i, at += step) take(i, at);
+    return end - begin;
+  }
+  size_t count = 0;
+  for (size_t row = begin; row < end; ++row, at += step) {
+    if (BitAt(row, place.validity)) take(count++, at);
+  }
+  return count;
+}
+
 void SortedRun::GatherBits(size_t bit, size_t begin, size_t end, Bits& bits) const {
   bits = Bits();
   for (size_t row = begin; row < end; ++row) bits.Add(BitAt(row, bit));
 }
 
 void SortedRun::GatherTexts(size_t column, size_t begin, size_t end, Gathered& gathered) {
-  const bool may_be_missing = buffers_[column].validity != nullptr;
-  const Place at = layout_[column];
-  gathered.places.resize(end - begin);
-  uint32_t* out = gathered.places.data();
   std::vector<uint32_t> used;
-  for (size_t row = begin; row < end; ++row) {
-    if (may_be_missing && !BitAt(row, at.validity)) continue;
-    const uint32_t number = WordAt(row, at.at);
-    uint32_t& place = places_[number];
-    if (place == kNoPlace) [[unlikely]] {
-      place = static_cast<uint32_t>(used.size());
-      used.push_back(number);
-    }
-    *out++ = place;
-  }
-  gathered.places.resize(static_cast<size_t>(out - gathered.places.data()));
+  gathered.places.resize(end - begin);
+  const size_t count =
+      ForEachValue(layout_[column], begin, end,
+                   [to = gathered.places.data(), places = places_.data(), &used](size_t i, const uint32_t* at) {
+                     uint32_t& place = places[*at];
+                     if (place == kNoPlace) [[unlikely]] {
+                       place = static_cast<uint32_t>(used.size());
+                       used.push_back(*at);
+                     }
+                     to[i] = place;
+                   });
+  gathered.places.resize(count);
   gathered.dictionary.clear();
   for (const uint32_t number : used) {
     gathered.dictionary.push_back(TextOf(buffers_[column].dictionary, number));

@@ -23,6 +23,13 @@ class SortedRun {
   void WriteTo(ParquetFile& file, size_t group_rows);
 
  private:
+  static constexpr size_t kNone = SIZE_MAX;
+
+  // Where a column is in a row: its first word, or its bit where it is a truth value.
+  struct Place {
+    size_t at = 0;
+    size_t validity = kNone;  // the bit that says whether it is there; none where it always is, or never
+  };
   // What the spans of a group's column are of.
   struct Gathered {
     std::vector<uint32_t> places;
@@ -38,20 +45,17 @@ class SortedRun {
   ParquetColumn Gather(size_t column, size_t begin, size_t end, Gathered& gathered);
   void GatherTexts(size_t column, size_t begin, size_t end, Gathered& gathered);
   void GatherBits(size_t bit, size_t begin, size_t end, Bits& bits) const;
-  // Word `word` of a row.
-  uint32_t WordAt(size_t row, size_t word) const { return rows_[row * row_words_ + word]; }
-  bool BitAt(size_t row, size_t bit) const { return (WordAt(row, bit / 32) >> bit % 32 & 1) != 0; }
+  // Calls take(i, its first word) for each value that is there, the ith one; gives how many there are.
+  template <class Take>
+  size_t ForEachValue(Place place, size_t begin, size_t end, const Take& take) const;
+  bool BitAt(size_t row, size_t bit) const { return (rows_[row * row_words_ + bit / 32] >> bit % 32 & 1) != 0; }
 
   const RowTable& table_;
   const size_t key_;
   const std::vector<Column> schema_;
   const std::vector<ColumnBuffers> buffers_;
-  // Where a column is in a row: its first word, or its bit where it is a truth value.
-  struct Place {
-    size_t at;
-    size_t validity;  // the bit that says whether it is there; of columns that may be missing
-  };
   std::vector<Place> layout_;
+  std::vector<bool> is_missing_;  // in all rows
   size_t row_words_ = 0;
   // In order. A row is together, since rows come from all over the table.
   std::vector<uint32_t> rows_;

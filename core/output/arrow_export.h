@@ -30,6 +30,13 @@ class Bits {
     ++size_;
     false_count_ += !value;
   }
+  void Add(bool value, size_t count) {
+    for (; count > 0 && size_ % 8 != 0; --count) Add(value);
+    bytes_.insert(bytes_.end(), count / 8, value ? uint8_t{0xFF} : uint8_t{0});
+    size_ += count / 8 * 8;
+    false_count_ += value ? 0 : count / 8 * 8;
+    for (count %= 8; count > 0; --count) Add(value);
+  }
   void Truncate(size_t size);
   const void* data() const { return bytes_.data(); }
   size_t size() const { return size_; }
