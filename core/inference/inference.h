@@ -184,12 +184,19 @@ class Inference {
   void Clear();
   // Begins a question: steps are counted anew.
   void Begin() {
-    steps_ = kMaxSteps;
-    guess_steps_ = kMaxGuessSteps;
-    read_ = files_.bytes_read();
-    cut_rounds_ = 0;
+    steps_of_all_ = kMaxStepsOfAll;
+    has_met_bound_ = false;
+    CountAnew();
   }
-  bool IsExhausted() const { return steps_ == 0 || guess_steps_ == 0; }
+  // Begins the next part of a question about many places: steps are counted anew as long as all parts together have not
+  // taken too many.
+  void BeginPart() {
+    has_met_bound_ = IsExhausted();
+    steps_of_all_ -= std::min(steps_of_all_, first_steps_ - steps_ + first_guess_steps_ - guess_steps_);
+    CountAnew();
+  }
+  // Whether the question, or a part of it, has met a bound.
+  bool IsExhausted() const { return has_met_bound_ || steps_ == 0 || guess_steps_ == 0; }
   // Of what is remembered, roughly.
   size_t ByteSize() const;
   void set_callers(CallerSource* callers) { callers_ = callers; }
@@ -288,6 +295,7 @@ class Inference {
   // found surely for their sake, end much earlier.
   static constexpr uint32_t kMaxSteps = 20'000;
   static constexpr uint32_t kMaxGuessSteps = 3'000;
+  static constexpr uint32_t kMaxStepsOfAll = 4'000'000;  // of the parts of a question, some seconds
   static constexpr int kMaxDepth = 150;
   static constexpr size_t kMaxFrames = 500'000;  // a question begins with far fewer (ByteSize)
   static constexpr int kMaxFrameDepth = 10;
@@ -358,6 +366,12 @@ class Inference {
   bool IsForeign(Value value) const {
     const auto types = types_.TypesOf(value.set);
     return types.size() == 1 && types_[types[0]].kind == TypeKind::kForeign;
+  }
+  void CountAnew() {
+    steps_ = first_steps_ = std::min(kMaxSteps, steps_of_all_);
+    guess_steps_ = first_guess_steps_ = std::min(kMaxGuessSteps, steps_of_all_);
+    read_ = files_.bytes_read();
+    cut_rounds_ = 0;
   }
   // Makes guesses pay for the files that were read for them.
   void CountReading() {
@@ -549,6 +563,10 @@ class Inference {
   std::unordered_set<Text> kept_;  // of texts_
   uint32_t steps_ = kMaxSteps;
   uint32_t guess_steps_ = kMaxGuessSteps;
+  uint32_t first_steps_ = kMaxSteps;
+  uint32_t first_guess_steps_ = kMaxGuessSteps;
+  uint32_t steps_of_all_ = kMaxStepsOfAll;
+  bool has_met_bound_ = false;
   uint64_t read_ = 0;  // bytes of files, as far as guesses have paid for them
   int depth_ = 0;
   int max_depth_ = kMaxDepth;

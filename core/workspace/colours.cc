@@ -174,7 +174,7 @@ std::vector<ColouredName> Workspace::Colours(FileId id, uint32_t begin, uint32_t
   const auto& occurrences = file->bindings.occurrences;
   const auto first = std::ranges::lower_bound(occurrences, begin, {}, &Occurrence::begin);
   for (auto at = first; at != occurrences.end() && at->begin < end; ++at) {
-    in.inference.Begin();
+    in.inference.BeginPart();
     const ColouredName name = painter.Of(static_cast<uint32_t>(at - occurrences.begin()));
     // Names in the string of a hint may be written by escapes; those overlap.
     if (!names.empty() && names.back().end > name.begin) continue;

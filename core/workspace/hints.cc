@@ -99,7 +99,7 @@ std::vector<InlineHint> Workspace::Hints(FileId id, uint32_t begin, uint32_t end
   for (StmtId stmt = 1; stmt < syntax.stmts.size(); ++stmt) {
     const Stmt& at = syntax.stmt(stmt);
     if (at.begin < begin || at.begin >= end) continue;
-    in.inference.Begin();
+    in.inference.BeginPart();
     if (at.kind == StmtKind::kDef && at.hint == kNoExpr && at.first_child != kModuleStmt &&
         (at.flags & kStmtIsBroken) == 0 && syntax.NameOf(at) != "__init__") {
       const FunctionId function = in.inference.FunctionOfStmt(id, stmt);
@@ -122,7 +122,7 @@ std::vector<InlineHint> Workspace::Hints(FileId id, uint32_t begin, uint32_t end
   }
   for (ExprId expr = 1; expr < syntax.exprs.size(); ++expr) {
     if (syntax[expr].kind != ExprKind::kCall || syntax[expr].begin < begin || syntax[expr].begin >= end) continue;
-    in.inference.Begin();
+    in.inference.BeginPart();
     in.AddParameterHints(*file, expr, hints);
   }
   std::ranges::stable_sort(hints, {}, &InlineHint::offset);

@@ -201,7 +201,7 @@ std::vector<Location> Workspace::Impl::MembersNamed(Text name) {
     is_bounded = true;
     candidates.resize(kMaxFiles);
   }
-  defined.Read(candidates);
+  defined.ReadForMember(candidates, name);
   const uint32_t number = defined.Find(name);
   if (number == kNoIndex) return found;
   for (const FileId file : candidates) {

@@ -242,7 +242,7 @@ std::vector<Call> Workspace::Callees(FileId id, uint32_t offset) {
       const ExprId called = syntax.ChildOf(expr, 0);
       if (!is_here(syntax[called].kind == ExprKind::kAttribute ? syntax[called].name_begin : syntax[called].begin))
         continue;
-      in.inference.Begin();
+      in.inference.BeginPart();
       const std::vector<Impl::Callee> callees = in.CalleesOf(*file, expr);
       add(called, callees);
       // What the library is given to call, it likely calls.

@@ -55,7 +55,7 @@ void Workspace::Impl::Begin() {
   // What is asked in one breath is asked of the same files. Where many were read, a look at all of them takes long, and
   // breaths are as much longer.
   static constexpr std::chrono::steady_clock::duration kBreath = std::chrono::milliseconds(30);
-  static constexpr int kBreathOfLooks = 25;
+  static constexpr int kBreathOfLooks = 100;
   const auto now = std::chrono::steady_clock::now();
   if (now - last_refresh_ > std::max(kBreath, last_look_ * kBreathOfLooks)) {
     defined.Forget();

@@ -167,7 +167,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
     for (uint32_t i = 0; i < bindings.occurrences.size(); ++i) {
       const Occurrence& other = bindings.occurrences[i];
       if (other.text != number) continue;
-      inference.Begin();
+      inference.BeginPart();
       const uint32_t variable = bindings.VariableOf(other);
       Certainty certainty = Certainty::kCertain;
       bool meets = false;

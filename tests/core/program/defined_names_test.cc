@@ -127,5 +127,54 @@ TEST(DefinedNames, AreTheSameFromTwoThreads) {
   EXPECT_EQ(names.Of(all[0])[0].name, names.Of(all[2])[0].name);
 }
 
+// Whether a file with such a text is read for the member `x`.
+bool IsReadForX(std::string_view text) {
+  const std::string source = std::string(text) + "\ndef other(): pass\n";
+  const TemporaryFolder folder;
+  folder.Write("a.py", source);
+  Files files(Version::Of(3, 12));
+  DefinedNames names(files);
+  const FileId file = files.NumberOf(folder / "a.py");
+  names.ReadForMember({{file}}, "x");
+  return !names.Of(file).empty();
+}
+
+TEST(DefinedNames, AreReadForAMemberWhereItMayBeDefined) {
+  for (const char* text : {"class A:\n  x = 1",
+                           "class A: x = 1",
+                           "class A:\n  y, x = 1, 2",
+                           "class A:\n  def x(self): pass",
+                           "class A:\n  class x: pass",
+                           "class A:\n  if y:\n    x: int",
+                           "class A:\n  for x in y: pass",
+                           "class A:\n  with y as x: pass",
+                           "class A:\n  y = 'def'\n  x = 1",
+                           "class A:\n\ty = 1\n        x = 1",
+                           "class A:\n  y = \"\"\"\ndef f():\n  z\n\"\"\"\n  x = 1",
+                           "class A:\n  y = [\n1,\n]\n  x = 1",
+                           "class A:\n  def f(self): pass\n  x = 1",
+                           "class A:\n  y = 1\n\f\n  x = 1",
+                           "def f():\n  class A:\n    x = 1",
+                           "class A:\n  def f(self):\n    self.x = 1",
+                           "class A:\n  def f(self):\n    y, self.x = 1, 2",
+                           "class A:\n  def f(self):\n    self.x += 1",
+                           "class A:\n  def f(self):\n    self.x: int",
+                           "class A:\n  def f(self):\n    for self.x in y: pass",
+                           "class A:\n  def f(self):\n    (y,\n     self.x\n    ) = 1, 2"}) {
+    EXPECT_TRUE(IsReadForX(text)) << text;
+  }
+}
+
+TEST(DefinedNames, AreNotReadForAMemberThatIsPlainlyNone) {
+  for (const char* text :
+       {"x = 1", "def x(): pass", "def f(x): x = 1", "def f():\n  x = 1", "class A:\n  def f(self):\n    x = 1",
+        "class A:\n  def f(self,\n        x=1): pass", "class A:\n  def f(self):\n    self.x()\n    x.y = self.x.y",
+        "class A:\n  def f(self):\n    y.x = 1\n    self.x == 1",
+        "class A:\n  def f(self):\n    'x'\n    return self.x + 1",
+        "def f():\n  \"\"\"Of x.\"\"\"\n  if y:\n    x = 1"}) {
+    EXPECT_FALSE(IsReadForX(text)) << text;
+  }
+}
+
 }  // namespace
 }  // namespace quillet

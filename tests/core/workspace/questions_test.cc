@@ -699,6 +699,20 @@ TEST(Buffers, NeedNoFile) {
 
 // ---- any place of any file ----
 
+TEST(Questions, SayThatAnyOfTheirPartsMetABound) {
+  static constexpr int kFunctions = 48;
+  std::string text = "class A:\n  def $m(self): pass\n";
+  for (int i = 0; i < kFunctions; ++i) {
+    text += "def f" + std::to_string(i) + "(x, y, z, u, v, w):\n  x.m()\n";
+    for (int j = 0; j < kFunctions; ++j) text += "  f" + std::to_string(j) + "(y, z, u, v, w, x)\n";
+  }
+  Program program(text + "A().$m()\n");
+  EXPECT_EQ(program->References(program[0].file, program[0].offset).size(), kFunctions + 2);
+  EXPECT_TRUE(program->was_bounded());
+  EXPECT_EQ(program->Definitions(program[1].file, program[1].offset).size(), 1u);
+  EXPECT_FALSE(program->was_bounded());
+}
+
 TEST(Questions, AreAnsweredWithoutALibrary) {
   const testing::TemporaryFolder folder = {
       {"a.py", "class A:\n  x = None\n  def f(self): self.y = A(); return self.y.x or 'a'\nA().y.f().z\n"}};
