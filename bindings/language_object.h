@@ -10,6 +10,7 @@
 #include "analysis/file_analyzer.h"
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
+#include "names/scope_rules.h"
 
 namespace quillet::host {
 
@@ -24,6 +25,7 @@ class Language {
     options_.keywords = std::move(keywords);
     options_.py3_grammar = py3_grammar;
     options_.reads_completely = !exact;
+    options_.make_name_rules = MakeScopeRules;
     options_.print_function_grammar_file = std::move(print_function_grammar_file);
   }
 

@@ -12,6 +12,8 @@ namespace quillet {
 
 namespace {
 
+// So many blocks need no look at how deep the language lets some of them nest.
+constexpr size_t kDeepBlocks = 10;
 constexpr size_t kMostBlocks = 100;  // as deep as the language lets blocks nest, the file itself with them
 
 // What a kind of row is to the blocks.
@@ -82,6 +84,7 @@ void BlockRules::Reset(const SourceText& source, std::span<const LineRow> rows, 
   irrefutables_.clear();
   head_index_ = last_index_ = told_row_ = kNoRow;
   watch_ = kFutureImports;
+  may_misuse_names_ = false;
   findings_.clear();
 }
 
@@ -136,12 +139,13 @@ bool BlockRules::GoesOn(size_t index, bool was_rejected) {
     return false;
   const Token* const toks = source_->tokens.data() + row.first_token;
   const TokenCode first = toks->code;
-  if (role == Role::kMaybePlain &&
-      (first == tok::AT || first == word::kBreak || first == word::kContinue || IsSkipCode(first)))
+  if (role == Role::kMaybePlain && (first == tok::AT || first == word::kBreak || first == word::kContinue ||
+                                    first == word::kGlobal || first == word::kNonlocal || IsSkipCode(first)))
     return false;
   if (row.kind == LineKind::kFromImport && (row.token_count < 2 || toks[1].length == Text("__future__").size()))
     return false;
-  if (role == Role::kPlainHead && (toks[row.token_count - 1].code != tok::COLON || row.has_inline_body)) return false;
+  if (role == Role::kPlainHead && (toks[row.token_count - 1].code != tok::COLON || row.has_inline_body || row.is_async))
+    return false;
   const auto narrow = static_cast<uint32_t>(toks->text - (source_->begin() + source_->line_starts[row.first_line]));
   if (narrow != row.indent) return false;
   if (watch_ != 0) return Enter(index, narrow);
@@ -159,10 +163,10 @@ bool BlockRules::GoesOn(size_t index, bool was_rejected) {
 bool BlockRules::Enter(size_t index, uint32_t narrow_column) {
   const Block& around = blocks_.back();
   const uint32_t column = rows_[index].indent;
-  if (column <= around.column || narrow_column <= around.narrow_column || blocks_.size() == kMostBlocks ||
+  if (column <= around.column || narrow_column <= around.narrow_column || blocks_.size() >= kDeepBlocks ||
       head_ == Head::kMatch)
     return false;
-  blocks_.push_back({column, narrow_column, head_});
+  blocks_.push_back({column, narrow_column, head_, Clauses::kNone, head_index_});
   return Begin(index, blocks_.back());
 }
 
@@ -195,8 +199,13 @@ void BlockRules::Next(size_t index, const Reading& reading) {
       head_index_ = index;
       head_ = head;
     } else {
+      if (blocks_.size() >= kDeepBlocks) CheckNesting(index);
       inline_.push_back(head);
     }
+  }
+  may_misuse_names_ |= row.is_async && row.kind == LineKind::kFunctionDef;
+  if (!is_head || is_on_line_of_head) {
+    for (const Token& token : toks) may_misuse_names_ |= token.code == word::kGlobal || token.code == word::kNonlocal;
   }
   SetWatch(kHead, head_index_ != kNoRow);
   SetWatch(kRejection, reading.was_rejected);
@@ -262,7 +271,8 @@ void BlockRules::Push(size_t index, uint32_t column, uint32_t narrow_column, Hea
   if (blocks_.size() == kMostBlocks) {
     Add(index, Context::At({0, 0}), "too many levels of indentation", true, SyntaxError::Kind::kIndentation);
   }
-  blocks_.push_back({column, narrow_column, head, clauses});
+  if (blocks_.size() >= kDeepBlocks && head != Head::kUnknown) CheckNesting(head_index_);
+  blocks_.push_back({column, narrow_column, head, clauses, head != Head::kUnknown ? head_index_ : kNoRow});
 }
 
 void BlockRules::Dedent(size_t index, const LineRow& row, uint32_t column, uint32_t narrow_column) {
@@ -453,6 +463,40 @@ void BlockRules::Jump(size_t index, const LineRow& row, size_t token) {
     if (pass(inline_[i])) return;
   for (size_t i = blocks_.size(); i-- > 0;)
     if (pass(blocks_[i].head)) return;
+}
+
+void BlockRules::CheckNesting(size_t index) {
+  int around = 0;
+  for (size_t i = blocks_.size(); i-- > 0 && blocks_[i].head != Head::kDefinition;)
+    if (blocks_[i].head_row != kNoRow) around += NestingOf(blocks_[i].head_row);
+  const int most = version_.AtLeast(3, 13) ? 21 : 20;
+  if (around <= most && around + NestingOf(index) > most)
+    Add(index, FirstToken(rows_[index]), "too many statically nested blocks", /*comes_first=*/false);
+}
+
+// For how many blocks of the compiler's a head stands. That a try has both kinds of clauses is not known yet.
+int BlockRules::NestingOf(size_t index) const {
+  const LineRow& row = rows_[index];
+  switch (row.kind) {
+    case LineKind::kForBeginning:
+    case LineKind::kWhileBeginning:
+    case LineKind::kTry:
+    case LineKind::kFinally:
+      return 1;
+    case LineKind::kExcept:
+      return version_.AtLeast(3, 9) ? 2 : version_.AtLeast(3, 0) ? 1 : 0;
+    case LineKind::kWith: {
+      const TokenSpan toks = TokensOf(row);
+      int items = 1;
+      VisitOwnTokens(toks, 0, toks.size(), [&](size_t i) {
+        items += toks[i].code == tok::COMMA;
+        return toks[i].code != tok::COLON;
+      });
+      return items;
+    }
+    default:
+      return 0;
+  }
 }
 
 void BlockRules::FutureImport(size_t index, const LineRow& row) {

@@ -43,6 +43,8 @@ class BlockRules {
   void End();
 
   std::vector<Finding>& findings() { return findings_; }
+  // Whether a row gives reason to look at the names of the source (name_rules.h).
+  bool may_misuse_names() const { return may_misuse_names_; }
 
  private:
   static constexpr size_t kNoRow = SIZE_MAX;
@@ -59,6 +61,7 @@ class BlockRules {
     uint32_t narrow_column;  // with tabs one wide
     Head head;
     Clauses clauses = Clauses::kNone;
+    size_t head_row = kNoRow;
     // Of the try whose clauses may come.
     bool has_except = false;
     bool has_except_star = false;
@@ -86,6 +89,9 @@ class BlockRules {
   void Case(size_t index, const Reading& reading, Block& block);
   void Decorator(size_t index, const LineRow& row);
   void Jump(size_t index, const LineRow& row, size_t token);
+  // Of a head, with the blocks around it.
+  void CheckNesting(size_t index);
+  int NestingOf(size_t index) const;
   void FutureImport(size_t index, const LineRow& row);
   void Add(size_t row, Context place, std::string message, bool comes_first = true,
            SyntaxError::Kind kind = SyntaxError::Kind::kSyntax);
@@ -114,6 +120,7 @@ class BlockRules {
   size_t last_index_ = kNoRow;  // the statement before
   size_t told_row_ = kNoRow;    // the last one of which something was told
   uint8_t watch_ = 0;
+  bool may_misuse_names_ = false;
   std::vector<Irrefutable> irrefutables_;
   std::vector<Finding> findings_;
 };

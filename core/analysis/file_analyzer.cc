@@ -99,6 +99,8 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   if (has_rules) {
     block_rules_.End();
     AddFindings(analyzer);
+    ApplyNameRules();
+    AddFindings(analyzer);
   }
   CheckMemory(0);
 }
@@ -194,6 +196,34 @@ void FileAnalyzer::AddFindings(CPGenAnalyzerImpl& analyzer) {
     found_.whole_errors.pop_back();
   }
   block_rules_.findings().clear();
+}
+
+void FileAnalyzer::ApplyNameRules() {
+  if (options_.make_name_rules == nullptr) return;
+  if (!block_rules_.may_misuse_names() && (options_.version.AtLeast(3, 0) || !MayMisuseNamesOf2())) return;
+  if (name_rules_ == nullptr) name_rules_ = options_.make_name_rules(options_.version);
+  name_rules_->Check(*found_.source, found_.rows, block_rules_.findings());
+}
+
+bool FileAnalyzer::MayMisuseNamesOf2() const {
+  const auto begins = [&](const LineRow& row, TokenCode code) {
+    const TokenSpan toks = TokenSpan(found_.source->tokens).subspan(row.first_token, std::min(row.token_count, 4u));
+    return std::ranges::any_of(toks, [code](const Token& token) { return token.code == code; });
+  };
+  return std::ranges::any_of(found_.rows, [&](const LineRow& row) {
+    switch (row.kind) {
+      case LineKind::kDelete:
+        return true;
+      case LineKind::kFromImport:
+        return row.indent > 0;
+      case LineKind::kUnknown:
+        return begins(row, word::kYield) || begins(row, word::kExec);
+      case LineKind::kAssignment:
+        return begins(row, word::kYield);
+      default:
+        return false;
+    }
+  });
 }
 
 int32_t FileAnalyzer::AddError(const SyntaxError& error) {

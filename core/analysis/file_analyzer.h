@@ -16,6 +16,7 @@
 
 #include "analysis/analyzer.h"
 #include "analysis/block_rules.h"
+#include "analysis/name_rules.h"
 #include "analysis/statement_shapes.h"
 #include "lines/cutter.h"
 #include "lines/scopes.h"
@@ -64,6 +65,8 @@ class FileAnalyzer {
     size_t least_memory_limit = kLeastMemoryLimit;
     // Whether errors are kept whole as well, with the texts of their lines.
     bool keeps_whole_errors = false;
+    // What is asked about the names of a source that is read completely; null: nothing is.
+    std::unique_ptr<NameRules> (*make_name_rules)(Version) = nullptr;
     // How often the shape of a statement is met until others are told from it, which is faster and says the same;
     // 0: each is analysed.
     uint8_t frequent_shape = StatementShapes::kFrequent;
@@ -125,6 +128,9 @@ class FileAnalyzer {
   // What the row has to say to those around it.
   void ApplyBlockRules(CPGenAnalyzerImpl& analyzer, size_t index);
   void AddFindings(CPGenAnalyzerImpl& analyzer);
+  void ApplyNameRules();
+  // What the names of a function may not be used for in 2.7: whether a row may do so.
+  bool MayMisuseNamesOf2() const;
   // What the analysis of a row may take beside its results, at most.
   size_t MostMemoryOf(const LineRow& row) const;
   // Counts what the results hold by now.
@@ -138,6 +144,7 @@ class FileAnalyzer {
   std::vector<bool> wanted_;  // of the rows, where there is a filter
   ScopeTracker scopes_;
   BlockRules block_rules_;
+  std::unique_ptr<NameRules> name_rules_;  // built at first need
   TypingNames typing_;
   size_t memory_limit_ = kLeastMemoryLimit;
   size_t held_ = 0;

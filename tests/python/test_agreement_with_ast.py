@@ -40,6 +40,31 @@ def test_the_library_is_told_of_alike(library: Report, kind: Kind) -> None:
         assert tally.agreeing / tally.facts > 0.95
 
 
+#: What a complete reading says otherwise on purpose.
+OF_ALL_READINGS = {
+    Rule.AUGMENTED,
+    Rule.DELETED,
+    Rule.ANNOTATION_ONLY,
+    Rule.IN_TARGET,
+    Rule.BRACKETED_CHAIN,
+    Rule.STRING_HINT,
+    Rule.COMMENT_HINT,
+    Rule.CONSTANT_CHAIN,
+    Rule.LONE_STAR,
+    Rule.DECORATOR,
+}
+
+
+def test_a_complete_reading_loses_nothing() -> None:
+    report = Report(exact=False)
+    for path in agreement.own_library()[:: 2 * EACH_NTH_FILE]:
+        report.compare(str(path), path.read_bytes())
+    assert (report.unexplained, report.faults) == ([], [])
+    assert report.events.internal_errors == report.events.limits == 0
+    assert {rule for tally in report.tallies.values() for rule in tally.explained} <= OF_ALL_READINGS
+    assert report.tallies[Kind.READ].agreeing > 10_000
+
+
 def test_every_statement_of_the_library_is_served(library: Report) -> None:
     assert library.faults == []
     assert library.events.internal_errors == library.bare_ellipses

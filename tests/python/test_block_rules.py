@@ -10,6 +10,8 @@ import sys
 import pytest
 
 from quillet import analyze, analyze_files
+from survey import Library, libraries
+from syntax_agreement import answers_of
 
 NEWEST = (3, 14)
 
@@ -163,3 +165,79 @@ def test_an_exact_reading_looks_at_statements_alone() -> None:
 def test_results_of_many_files_hold_them() -> None:
     [result] = analyze_files([("a.py", b"if x:\ny\n")], version=(3, 13))
     assert result.errors == [(2, 1, "expected an indented block after 'if' statement on line 1")]
+
+
+# ---- names of a scope ----
+
+LIBRARY = (3, 13)
+#: Asked of every interpreter that is found: whether it takes them, and of the newest its words and places.
+SCOPES = [
+    "x = 1\nglobal x",
+    "def f():\n print(x)\n global x",
+    "def f(x):\n global x",
+    "def f():\n x += 1\n global x",
+    "def f():\n del x\n global x",
+    "def f():\n import x\n global x",
+    "def f():\n g = lambda: x\n global x",
+    "def f():\n g = [y for y in x]\n global x",
+    "def f():\n g = [x for y in z]\n global x",
+    "def f():\n def g(): return x\n global x",
+    "def f():\n def g(a=x): pass\n global x",
+    "def f():\n @x\n def g(): pass\n global x",
+    "def f():\n class x: pass\n global x",
+    "def f():\n global x\n x = 1\n def x(): pass",
+    "def f():\n if a: global x\n x = 1",
+    "def f():\n x.y = 1\n global x",
+    "def f():\n g(x=1)\n global x",
+    "class A:\n def f(self):\n  __x\n  global __x",
+    "class C:\n x = 1\n global x",
+    "def f():\n nonlocal x",
+    "x = 1\ndef f():\n nonlocal x",
+    "class C:\n x = 1\n def f(self):\n  nonlocal x",
+    "class C:\n def f(self):\n  nonlocal __class__",
+    "def f():\n global x\n def g():\n  nonlocal x",
+    "def f():\n def g():\n  nonlocal x\n x = 1",
+    "def f():\n x = 1\n def g():\n  x = 2\n  nonlocal x",
+    "def f():\n x = 1\n def g():\n  nonlocal x\n  global x",
+    "def f(x):\n nonlocal x",
+    "def f():\n yield 1\n return 2",
+    "def f():\n return 2\n yield",
+    "def f():\n x = lambda: (yield)\n return 2",
+    "def f():\n yield\n def g(): return 1",
+    "def f():\n from x import *",
+    "def f():\n from x import *\n def g(): return y",
+    "def f():\n from x import *\n def g(y): return y",
+    "def f():\n x = 1\n del x\n def g(): x = 1",
+    "def f():\n x = 1\n del x\n def g(): return x",
+    *("\n".join(" " * i + "for x in y:" for i in range(n)) + "\n" + " " * n + "pass" for n in (20, 21, 22)),
+    *("\n".join(" " * i + "if x:" for i in range(n)) + "\n" + " " * n + "pass" for n in (22,)),
+    *("\n".join(" " * i + "with x, y:" for i in range(n)) + "\n" + " " * n + "pass" for n in (10, 11)),
+]
+SCOPES_OF_3_6 = [
+    "def f():\n x: int\n global x",
+    "def f():\n global x\n x: int = 1",
+    "class C:\n global x\n x: int",
+    "def f():\n print(f'{x}')\n global x",
+    "async def f():\n yield 1\n return 2",
+    "async def f():\n yield 1\n return",
+    "async def f():\n return 2\n x = yield",
+    "async def f():\n yield 1\n def g(): return 2",
+]
+
+
+@pytest.mark.parametrize("library", list(libraries().values()), ids=lambda library: library.name)
+def test_names_are_used_as_each_interpreter_allows(library: Library) -> None:
+    sources = [source + "\n" for source in SCOPES + (SCOPES_OF_3_6 if library.version >= (3, 6) else [])]
+    answers = answers_of(library, sources)
+    assert sum(answer is not None for answer in answers) > 8
+    for source, answer in zip(sources, answers, strict=True):
+        found = first_error(source, library.version)
+        assert (found is None) == (answer is None), source
+        if answer is not None and library.version == LIBRARY and "with" not in source:
+            assert found == f"{answer[0]} {answer[2]}:{answer[3]} {answer[1]}", source
+
+
+def test_what_is_wrong_with_a_name_leaves_the_records() -> None:
+    lines = analyze("def f():\n x = a\n global x\n", version=NEWEST).lines
+    assert lines[2].error is not None
+    assert [record.name for record in lines[2].records] == ["x"]
