@@ -57,6 +57,10 @@ def run_dask(plan: Plan, shards: Sequence[int], jobs: int, address: str | None) 
     """Runs shards by the workers of a Dask scheduler, or by those of one that is started for it."""
     distributed = _load("distributed", "dask")
     if address is None:
+        import dask
+
+        # Its workers look at their own stacks a hundred times a second, for a dashboard that nobody sees here.
+        dask.config.set({"distributed.worker.profile.enabled": False})
         cluster = distributed.LocalCluster(n_workers=jobs, threads_per_worker=1, dashboard_address=None)
         client = distributed.Client(cluster)
     else:
