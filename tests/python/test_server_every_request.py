@@ -2,7 +2,9 @@
 
 from __future__ import annotations
 
-from collections.abc import Callable
+import contextlib
+import json
+from collections.abc import Callable, Iterator
 from pathlib import Path
 from typing import Any
 
@@ -154,6 +156,23 @@ def test_every_request_in_every_encoding(tmp_path: Path) -> None:
     assert {"summe"} == {edit["newText"] for edit in first["rename"]["documentChanges"][0]["edits"]}
 
 
+@contextlib.contextmanager
+def at_once(client: Client) -> Iterator[None]:
+    """What is sent goes in one piece, at the end."""
+    held: list[bytes] = []
+
+    def hold(message: Any) -> None:
+        body = json.dumps(message).encode()
+        held.append(b"Content-Length: %d\r\n\r\n%s" % (len(body), body))
+
+    client.Send = hold  # type: ignore[method-assign]
+    try:
+        yield
+    finally:
+        del client.Send  # type: ignore[method-assign]
+    client.Send(b"".join(held))
+
+
 def test_every_request_is_taken_back(tmp_path: Path) -> None:
     body = "".join(f"def f_{n}(a):\n    return Base().run(a.run(f_{n}))\n\n\n" for n in range(60))
     (tmp_path / "base.py").write_text("class Base:\n    def run(self, x):\n        return x\n")
@@ -166,17 +185,18 @@ def test_every_request_is_taken_back(tmp_path: Path) -> None:
         document = {"textDocument": {"uri": client.uri("shop.py")}}
         [call] = client.ask("prepareCallHierarchy", "base.py", "run")
         asked = {**client.at("base.py", "run"), "context": {"includeDeclaration": True}}
-        busy = client.Begin("textDocument/references", asked)  # the others wait behind it
-        at = {"position": {"line": 0, "character": 6}, "positions": [], "range": WHOLE, "context": {}, "newName": "x"}
+        at = {"position": {"line": 0, "character": 6}, "positions": [], "range": WHOLE, "newName": "x"}
         at["context"] = {"includeDeclaration": True}
-        questions = {method: client.Begin(method, {**document, **at}) for method in REQUESTS}
-        for methods in HIERARCHIES.values():
-            questions |= {method: client.Begin(method, {"item": call}) for method in methods}
-        questions["workspace/symbol"] = client.Begin("workspace/symbol", {"query": "f"})
-        questions["completionItem/resolve"] = client.Begin("completionItem/resolve", {"label": "x"})
-        for number in questions.values():
-            client.Tell("$/cancelRequest", {"id": number})
-        client.Tell("$/cancelRequest", {"id": busy})
+        with at_once(client):
+            busy = client.Begin("textDocument/references", asked)  # the others wait behind it
+            questions = {method: client.Begin(method, {**document, **at}) for method in REQUESTS}
+            for methods in HIERARCHIES.values():
+                questions |= {method: client.Begin(method, {"item": call}) for method in methods}
+            questions["workspace/symbol"] = client.Begin("workspace/symbol", {"query": "f"})
+            questions["completionItem/resolve"] = client.Begin("completionItem/resolve", {"label": "x"})
+            for number in questions.values():
+                client.Tell("$/cancelRequest", {"id": number})
+            client.Tell("$/cancelRequest", {"id": busy})
         for method, number in {**questions, "busy": busy}.items():
             with pytest.raises(Refused) as refused:
                 client.Answer(number)
