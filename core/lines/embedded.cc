@@ -59,7 +59,7 @@ class EmbeddedSearch {
  private:
   void AddFields(size_t i, const Token& string) {
     fields_.clear();
-    AppendFieldTokens(string, tokens_, fields_);
+    AppendFieldTokens(string, tokens_, fields_, typing_ != nullptr);
     for (const TokenRange& field : fields_) AddFound(LineKind::kFstringFieldExp, field, i);
   }
 

@@ -27,8 +27,8 @@ size_t PrefixLength(Text string) {
 class FieldScan {
  public:
   FieldScan(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields,
-            std::vector<Token>& nested)
-      : tokens_(tokens), fields_(fields), nested_(nested) {
+            std::vector<Token>& nested, bool templates)
+      : tokens_(tokens), fields_(fields), nested_(nested), templates_(templates) {
     const size_t prefix_length = PrefixLength(string.view());
     raw_ = PrefixOf(string.text, prefix_length).raw;
     at_ = string.text + prefix_length;
@@ -104,6 +104,10 @@ class FieldScan {
       check.Add(token);
       tokens_.push_back(token);
       if (token.code == tok::STRING && IsFormattedString(token)) nested_.push_back(token);
+      if (templates_ && tokens_.size() - field_begin_ > 1 && IsTemplateString(tokens_[tokens_.size() - 2], token)) {
+        const char* const begin = tokens_[tokens_.size() - 2].text;
+        nested_.push_back({begin, static_cast<uint32_t>(token.end() - begin), tok::STRING});
+      }
     }
     fields_.push_back({field_begin_, tokens_.size()});
   }
@@ -177,6 +181,7 @@ class FieldScan {
   std::vector<Token>& tokens_;
   std::vector<TokenRange>& fields_;
   std::vector<Token>& nested_;
+  const bool templates_;
   const char* at_;
   const char* end_;  // the closing quotes
   bool raw_;
@@ -196,17 +201,18 @@ bool IsTemplateString(const Token& name, const Token& string) {
          IsTemplatePrefix(name.view());
 }
 
-void AppendFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields) {
+void AppendFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields,
+                       bool templates) {
   std::vector<Token> strings{string};
   for (size_t i = 0; i < strings.size(); ++i) {
     const Token next = strings[i];
-    FieldScan(next, tokens, fields, strings).Run();
+    FieldScan(next, tokens, fields, strings, templates).Run();
   }
 }
 
 void AppendOwnFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields) {
   std::vector<Token> nested;
-  FieldScan(string, tokens, fields, nested).Run();
+  FieldScan(string, tokens, fields, nested, /*templates=*/false).Run();
 }
 
 }  // namespace quillet

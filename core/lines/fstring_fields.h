@@ -25,8 +25,10 @@ bool IsTemplateString(const Token& name, const Token& string);
 // Appends the tokens of each field of a formatted string, and the ranges of them, at least one token
 // each. Where the language has no field (an empty one, one that is not closed, a lone closing brace),
 // the range ends with or consists of an error token in the place that is at fault, which no grammar
-// takes. The string's token is followed by 32 readable bytes at least.
-void AppendFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields);
+// takes. The string's token is followed by 32 readable bytes at least. `templates`: fields of template strings within
+// the fields as well.
+void AppendFieldTokens(const Token& string, std::vector<Token>& tokens, std::vector<TokenRange>& fields,
+                       bool templates = false);
 
 // The same for the string's own fields alone, in the order of the source: of formatted strings inside of
 // them there are the tokens.

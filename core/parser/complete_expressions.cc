@@ -17,6 +17,8 @@ namespace quillet {
 
 namespace {
 
+constexpr char kMixedTemplate[] = "cannot mix t-string literals with string or bytes literals";
+
 enum Level : int {
   kOrLevel,
   kAndLevel,
@@ -379,6 +381,8 @@ void CompleteParser::Strings() {
     if (std::string wrong = WrongEscape(TokenAt(at_).view(), python3_); !wrong.empty()) Fail(std::move(wrong));
     PushLeaf();
   }
+  if (Since(14) && Code() == tok::NAME && CodeAt(1) == tok::STRING && IsTemplateString(TokenAt(at_), TokenAt(at_ + 1)))
+    FailAt(at_ - 1, kMixedTemplate);
   if (is_mixed && python3_) Fail("cannot mix bytes and nonbytes literals");
   Finish(symbols_.atom, mark);
 }
@@ -394,7 +398,7 @@ void CompleteParser::Templates() {
     Skip();
     Skip();
   }
-  if (Code() == tok::STRING) Fail("cannot mix t-string literals with string or bytes literals");
+  if (Code() == tok::STRING) FailAt(at_ - 2, kMixedTemplate);
   if (Mark() - mark > 1) FinishBare<CExpression>(mark);
 }
 

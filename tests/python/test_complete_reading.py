@@ -338,3 +338,48 @@ def test_an_escape_that_means_nothing_is_an_error(source: str, words: str) -> No
 def test_an_escape_of_bytes_is_none_of_text() -> None:
     assert read('x = b"a\\x4"', (3, 13))[0] == "1:5 (value error) invalid \\x escape at position 1"
     assert read('x = b"\\u12"', (3, 13))[0] == "x set"
+
+
+# ---- 3.14, of which no interpreter may be there ----
+
+#: With their errors, of which most have none; (3, 13) rejects those that are marked.
+NEWEST_FORMS = [
+    ('x = t"Hello {name}"', None, True),
+    ('x = T\'{a}\' tR\'{b}\\d\' rT"""{c}\n{d}"""', None, True),
+    ('x = t"{name!r} {name!s:>{width}} {value:.{precision}f} {now:%Y-%m-%d}"', None, True),
+    ("x = t\"{{}} {a=} {(lambda: b)()} {d['k']!a}\"", None, True),
+    ("x = t\"{t'{inner}'} {f'{other}'}\"", None, True),
+    ("x = f\"{t'{inner}'}\"", None, True),
+    ('x = t"{d["key"]} {e[\'}\']}"', None, True),
+    ('x = t"" "y"', "1:5 cannot mix t-string literals with string or bytes literals", True),
+    ('x = "y" t"{a}"', "1:5 cannot mix t-string literals with string or bytes literals", True),
+    ('x = t"{a b}"', "", True),
+    ('x = t"{}"', "", True),
+    ("try: x\nexcept A, B: y", None, True),
+    ("try: x\nexcept A, b.C, D[0]: y", None, True),
+    ("try: x\nexcept* A, B: y", None, True),
+    ("try: x\nexcept (A, B) as e: y", None, False),
+    ("try: x\nexcept A, B as e: y", "2:8 multiple exception types must be parenthesized when using 'as'", True),
+    ("def f():\n try: x\n finally: return y", None, False),
+    ("for x in y:\n try: x\n finally: break", None, False),
+    ("for x in y:\n try: x\n finally: continue", None, False),
+    ("class A:\n b: B\n def f(self, c: C = 1, *d: *D) -> A: ...\nclass B: ...", None, False),
+    ("def f[T: (int, str) = int, *Ts = *tuple[T], **P = [T]](): pass", None, False),
+    ("type X[T = int] = list[T]", None, False),
+    ("x: yield", "", True),
+]
+
+
+@pytest.mark.parametrize(("source", "error", "is_new"), NEWEST_FORMS, ids=[form[0][:40] for form in NEWEST_FORMS])
+def test_the_newest_version_reads_its_reference(source: str, error: str | None, is_new: bool) -> None:
+    errors = analyze(source + "\n", version=NEWEST).errors
+    assert bool(errors) == (error is not None)
+    if error:
+        row, column = errors[0].error_position or (0, 0)
+        assert errors[0].error is not None
+        assert f"{row}:{column} {errors[0].error.msg}" == error
+    assert bool(analyze(source + "\n", version=(3, 13)).errors) == is_new
+
+
+def test_what_a_template_reads_is_read() -> None:
+    assert read('x = t"{t\'{inner}\'} {d["key"]:{w}}"') == ["x set", "d get", "w get", "inner get"]
