@@ -264,9 +264,13 @@ Value Inference::ValueOfMember(const Member& member, Text name, TypeId receiver,
                                                          : kUnknownValue;
     return types_.Union(value, field);
   }
-  bool is_declared = false;
+  bool is_declared = false, is_property = false;
   if (member.symbol != kNoIndex) {
     const Value raw = ValueOfVariable(*file, member.symbol, kNoFrame);
+    // What a property is given is not what it gives.
+    const ClassId property = ClassNamed("builtins", "property");
+    for (const TypeId id : types_.CopyOf(raw.set))
+      is_property = is_property || (types_[id].kind == TypeKind::kInstance && IsSubclass(types_[id].a, property));
     for (const uint32_t i : file->occurrences().Of(member.symbol)) {
       const Stmt& stmt = file->syntax.stmt(file->syntax.StatementAt(file->bindings.occurrences[i].begin));
       if (stmt.kind == StmtKind::kAnnotated) is_declared = raw.IsKnown();
@@ -285,7 +289,7 @@ Value Inference::ValueOfMember(const Member& member, Text name, TypeId receiver,
     }
     value = types_.Union(value, Bound(raw, receiver, on_class, member.owner));
   }
-  if (member.self_attributes != nullptr && !is_declared) {
+  if (member.self_attributes != nullptr && !is_declared && !is_property) {
     Value written;
     for (const uint32_t offset : *member.self_attributes) {
       const ExprId target = file->syntax.NamedAt(offset);
@@ -378,8 +382,14 @@ Value Inference::AttributeOfType(TypeId id, Text name) {
       if (file != nullptr && (literal.empty() || literal == member_name) && !member_name.starts_with("_") &&
           file->syntax.stmts.size() > 1) {
         const Value one = ValueOfVariable(*file, symbol, kNoFrame);
-        for (const TypeId part : types_.CopyOf(one.set))
-          if (types_[part].kind != TypeKind::kFunction) value = types_.Union(value, Just(part));
+        for (const TypeId part : types_.CopyOf(one.set)) {
+          if (types_[part].kind == TypeKind::kFunction) continue;
+          const bool is_auto = types_[part].kind == TypeKind::kInstance && classes_[types_[part].a].name == "auto";
+          value = types_.Union(
+              value, !is_auto
+                         ? Just(part)
+                         : InstanceNamed("builtins", IsSubclass(cls, ClassNamed("builtins", "str")) ? "str" : "int"));
+        }
       }
     if (value.IsKnown()) return WithoutLiterals(value);
   }
@@ -392,7 +402,8 @@ Value Inference::AttributeOfType(TypeId id, Text name) {
     result.doubt |= Value::kOpen;
     return result;
   }
-  return ForeignMember(cls, name);
+  const Value foreign = ForeignMember(cls, name);
+  return foreign.IsKnown() || t.kind != TypeKind::kInstance ? foreign : AttributeBelow(cls, name);
 }
 
 // What a class may have from a base that is not there.

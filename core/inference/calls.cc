@@ -144,6 +144,21 @@ void Inference::Solve(TypeSetId hint, TypeSetId value, Solution& solution, int d
                 const Value result = ResultIn(types_[function].a, kNoFrame);
                 std::vector<Argument> none;
                 const Value found = AttributeOfType(v, name);
+                // Called as the protocol has it.
+                const FunctionInfo stated_info = functions_[types_[function].a];
+                const auto stated_parameters = ParametersOf(stated_info);
+                for (size_t i = 1; i < stated_parameters.size(); ++i) {
+                  if (file->syntax[stated_parameters[i]].op != static_cast<uint8_t>(ParameterKind::kPlain) ||
+                      file->syntax.ChildOf(stated_parameters[i], 1) != kNoExpr)
+                    continue;
+                  const ExprId stated_hint = HintOfParameter(*file, stated_info, i);
+                  Argument argument;
+                  argument.value = stated_hint == kNoExpr
+                                       ? kUnknownValue
+                                       : Substitute(ValueOfHint(stated_info.file, stated_hint), solution, true);
+                  argument.is_evaluated = true;
+                  none.push_back(std::move(argument));
+                }
                 Solution inner;
                 Solve(result.set, ResultOf(found, none).Packed(), inner, depth + 2);
                 for (const auto& [variable, solved] : inner)
@@ -181,7 +196,11 @@ void Inference::Solve(TypeSetId hint, TypeSetId value, Solution& solution, int d
               const size_t at = i - 1 + (given.args_count > 0 ? 1 : 0);
               if (at >= parameters.size()) break;
               const ExprId own = HintOfParameter(*file, info, at);
-              if (own != kNoExpr) Solve(types_.ArgOf(h, i), ValueOfHint(info.file, own).Packed(), solution, depth + 1);
+              if (own == kNoExpr) continue;
+              const Value stated = ValueOfHint(info.file, own);
+              std::vector<TypeId> variables_of_it;
+              CollectTypeVars(stated.set, variables_of_it);
+              if (variables_of_it.empty()) Solve(types_.ArgOf(h, i), stated.Packed(), solution, depth + 1);
             }
           }
           if (t.b == 0 && given.kind == TypeKind::kFunction) {
@@ -271,7 +290,13 @@ int Inference::Assignable(TypeSetId hint, Value value, int depth) {
   static constexpr int kMaxNesting = 3;
   if (WithoutOpen(hint) == kNoTypes || !value.IsKnown() || depth > kMaxNesting) return 1;
   int worst = 2;
-  for (const TypeId v : types_.CopyOf(value.set)) {
+  const TypeList values = types_.CopyOf(value.set);
+  for (const TypeId v : values) {
+    // What may be None is taken for what it is otherwise.
+    if (types_[v].kind == TypeKind::kNone && values.size() > 1) {
+      worst = std::min(worst, 1);
+      continue;
+    }
     int best = 0;
     for (const TypeId h : types_.CopyOf(hint)) {
       if (best == 2) break;
@@ -427,7 +452,7 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
                             : InstanceNamed("builtins", "tuple", {given[i].Packed()});
       } else if (kind_of(i) == ParameterKind::kDoubleStar && is_given[i]) {
         // What each keyword was given is remembered by its name.
-        std::string entries = "#";
+        std::vector<std::pair<Text, Value>> entries;
         for (Argument& argument : arguments) {
           if (argument.kind != Argument::kKeyword) continue;
           const bool is_own = std::ranges::any_of(parameters, [&](ExprId parameter) {
@@ -435,15 +460,13 @@ int Inference::MatchArguments(FunctionId id, bool is_bound, std::vector<Argument
                    syntax.NameOf(parameter) == argument.name;
           });
           if (is_own) continue;
-          entries += argument.name;
-          entries += ':';
-          entries += std::to_string(ValueOfArgument(argument).Packed());
-          entries += ';';
+          entries.emplace_back(argument.name, ValueOfArgument(argument));
         }
         const ClassId dict = ClassNamed("builtins", "dict");
         const TypeSetId args[] = {InstanceNamed("builtins", "str").set, given[i].Packed()};
-        given[i] =
-            dict == kNoId ? kUnknownValue : Just(types_.Add(TypeKind::kInstance, dict, LiteralNumber(entries), args));
+        given[i] = dict == kNoId
+                       ? kUnknownValue
+                       : Just(types_.Add(TypeKind::kInstance, dict, LiteralNumber(TextOfEntries(entries)), args));
       } else if (!is_given[i] && kind_of(i) == ParameterKind::kPlain && syntax.ChildOf(parameters[i], 1) != kNoExpr) {
         given[i] = ValueOf(info.file, syntax.ChildOf(parameters[i], 1));
       }
@@ -488,6 +511,15 @@ Value Inference::ResultOfFunctionCall(TypeId callee, std::vector<Argument>& argu
       }
     }
   }
+  // `object.__new__(cls)` gives an instance of what it is given.
+  if (!is_bound && (info.flags & kIsStatic) != 0 && info.cls != kNoId && info.lambda == kNoExpr && !arguments.empty() &&
+      FileOf(info.file)->syntax.NameOf(FileOf(info.file)->syntax.stmt(info.stmt)) == "__new__") {
+    TypeSetId made = kNoTypes;
+    for (const TypeId cls : types_.CopyOf(ValueOfArgument(arguments[0]).set))
+      if (types_[cls].kind == TypeKind::kClass) made = types_.Union(made, types_.SetOf(InstanceOf(types_[cls].a)));
+    if (made != kNoTypes)
+      solution.emplace_back(types_.Add(TypeKind::kSpecial, static_cast<uint32_t>(SpecialForm::kSelf)), made);
+  }
   const int score = MatchArguments(id, is_bound, arguments, solution, &values);
   if (is_bound && !values.empty()) values[0] = {receiver, 0};
   bool is_stated = false;
@@ -521,6 +553,7 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
   if (!info.parameters.empty() && t.args_count == 0) {
     Solution solution;
     bool is_solved = false;
+    Value made_otherwise;  // by a `__new__` that gives something else
     for (const Text name : {Text("__init__"), Text("__new__")}) {
       const auto constructor = FindMember(cls, name);
       if (!constructor || is_solved) continue;
@@ -533,6 +566,7 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
         Solution own;
         const int score = MatchArguments(types_[function].a, true, arguments, own, nullptr);
         if (score <= best) continue;
+        made_otherwise = kUnknownValue;
         // What the constructor says of `self` settles variables as well: `self: dict[str, V]`.
         const FunctionInfo made = functions_[types_[function].a];
         const auto parameters = ParametersOf(made);
@@ -542,7 +576,11 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
                             : parameters.empty() ? kNoExpr
                                                  : HintOfParameter(*FileOf(made.file), made, 0);
         if (hint != kNoExpr && syntax[hint].kind != ExprKind::kSignatureHint) {
-          for (const TypeId self : types_.CopyOf(ValueOfHint(made.file, hint).set)) {
+          const Value said = ValueOfHint(made.file, hint);
+          bool is_own = !said.IsKnown();
+          for (const TypeId self : types_.CopyOf(said.set)) {
+            is_own = is_own || types_[self].kind == TypeKind::kSpecial ||
+                     (types_[self].kind == TypeKind::kInstance && types_[self].a == cls);
             if (types_[self].kind != TypeKind::kInstance || types_[self].a != cls) continue;
             const std::vector<TypeId> variables = info.parameters;
             for (size_t i = 0; i < variables.size(); ++i) {
@@ -554,11 +592,13 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
               }
             }
           }
+          if (name == "__new__" && !is_own) made_otherwise = Substitute(said, own, true);
         }
         best = score;
         found = own;
       }
       if (best < 0) continue;
+      if (made_otherwise.IsKnown()) return made_otherwise;
       // In terms of the class's own variables, where the constructor is a base's.
       for (size_t i = 0; i < constructor->args.size(); ++i) {
         const ClassInfo& owner = InfoOf(constructor->owner);
@@ -569,6 +609,7 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
       solution = found;
       is_solved = !found.empty();
     }
+    if (!is_solved) SolveByFields(cls, arguments, solution);
     std::vector<TypeSetId> args;
     const std::vector<TypeId> variables = info.parameters;
     for (const TypeId variable : variables) {
@@ -598,6 +639,22 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
   return Just(InstanceOf(cls, args));
 }
 
+// What the fields of a dataclass or named tuple, which make its constructor, are given.
+void Inference::SolveByFields(ClassId cls, std::vector<Argument>& arguments, Solution& solution) {
+  const ClassInfo& info = MembersOf(cls);
+  if (!info.is_dataclass && !info.is_named_tuple) return;
+  const std::vector<MadeField> fields = info.fields;
+  const FileId file = info.file;
+  for (size_t i = 0; i < arguments.size(); ++i) {
+    const Argument::Kind kind = arguments[i].kind;
+    if (kind == Argument::kStar || kind == Argument::kDoubleStar) return;
+    auto field = kind == Argument::kPlain ? fields.begin() + static_cast<ptrdiff_t>(std::min(i, fields.size()))
+                                          : std::ranges::find(fields, arguments[i].name, &MadeField::name);
+    if (field == fields.end() || field->hint == kNoExpr) continue;
+    Solve(ValueOfHint(file, field->hint).set, ValueOfArgument(arguments[i]).Packed(), solution);
+  }
+}
+
 Value Inference::RawValueOfMember(const Member& member, Text) {
   if (member.symbol == kNoIndex) return kUnknownValue;
   const SourceFile* file = FileOf(classes_[member.owner].file);
@@ -622,10 +679,11 @@ Value Inference::ResultOfSpecialCall(TypeId callee, std::vector<Argument>& argum
     const SourceFile* file = FileOf(info.file);
     if (info.stmt == kModuleStmt || file == nullptr) return {};
     const Text name = info.name;
-    static constexpr Text kNames[] = {"super",       "type",         "property", "abstractproperty", "TypeVar",
-                                      "ParamSpec",   "TypeVarTuple", "NewType",  "NamedTuple",       "Enum",
-                                      "IntEnum",     "Flag",         "IntFlag",  "StrEnum",          "staticmethod",
-                                      "classmethod", "partial",      "tuple"};
+    static constexpr Text kNames[] = {"super",      "type",      "property",     "abstractproperty",
+                                      "TypeVar",    "ParamSpec", "TypeVarTuple", "NewType",
+                                      "NamedTuple", "Enum",      "IntEnum",      "Flag",
+                                      "IntFlag",    "StrEnum",   "staticmethod", "classmethod",
+                                      "partial",    "tuple",     "dict"};
     if (std::ranges::find(kNames, name) == std::end(kNames) || !file->is_stub) return {};
     if (name == "super") {
       if (arguments.size() >= 2) {
@@ -692,6 +750,31 @@ Value Inference::ResultOfSpecialCall(TypeId callee, std::vector<Argument>& argum
       rest.push_back(open);
       const Value result = ResultOf(at(0), rest);
       return answer(Just(types_.Add(TypeKind::kCallable, 0, 0, {result.Packed()})));
+    }
+    if (name == "dict" && !arguments.empty() && t.a == ClassNamed("builtins", "dict") && t.args_count == 0) {
+      // Each keyword is remembered with what it was given, and so is what a dictionary known by its keys had.
+      std::vector<std::pair<Text, Value>> entries;
+      bool is_whole = true;
+      const auto add = [&](Text key, Value value) {
+        std::erase_if(entries, [&](const auto& entry) { return entry.first == key; });
+        entries.emplace_back(key, value);
+      };
+      for (Argument& argument : arguments) {
+        if (argument.kind == Argument::kKeyword) {
+          add(argument.name, ValueOfArgument(argument));
+          continue;
+        }
+        const Value given = argument.kind == Argument::kPlain ? ValueOfArgument(argument) : kUnknownValue;
+        const auto known = types_.SizeOf(given.set) == 1 ? EntriesOf(types_.TypesOf(given.set)[0])
+                                                         : std::vector<std::pair<Text, Value>>();
+        is_whole = is_whole && !known.empty();
+        for (const auto& [key, value] : known) add(key, value);
+      }
+      if (!is_whole || entries.empty()) return {};
+      Value values;
+      for (const auto& [key, value] : entries) values = types_.Union(values, WithoutLiterals(value));
+      const TypeSetId args[] = {InstanceNamed("builtins", "str").set, values.Packed()};
+      return answer(Just(types_.Add(TypeKind::kInstance, t.a, LiteralNumber(TextOfEntries(entries)), args)));
     }
     if (name == "tuple" && arguments.size() == 1) {
       const Value given = at(0);
@@ -780,8 +863,8 @@ Value Inference::ResultOf(Value callee, std::vector<Argument>& arguments, ExprPl
   ++depth_;
   Value value{kNoTypes, callee.doubt};
   // Of overloads the first that fits best is called.
-  TypeId chosen = UINT32_MAX;
-  std::vector<TypeId> overloads;
+  std::vector<TypeId> overloads, fitting;
+  bool is_any = false;
   const TypeList callees = types_.CopyOf(callee.set);
   for (const TypeId id : callees)
     if (types_[id].kind == TypeKind::kFunction && (functions_[types_[id].a].flags & kIsOverload) != 0)
@@ -793,6 +876,7 @@ Value Inference::ResultOf(Value callee, std::vector<Argument>& arguments, ExprPl
     });
     int best = -1;
     for (const TypeId id : overloads) {
+      if (best == 2) break;
       Solution solution;
       const FunctionId function = types_[id].a;
       const bool is_bound = types_[id].args_count > 0;
@@ -808,19 +892,38 @@ Value Inference::ResultOf(Value callee, std::vector<Argument>& arguments, ExprPl
       }
       if (score > best) {
         best = score;
-        chosen = id;
+        fitting.clear();
       }
-      if (best == 2) break;
+      if (score == best) fitting.push_back(id);
     }
-    if (chosen == UINT32_MAX) chosen = overloads[0];
+    if (fitting.empty()) fitting.push_back(overloads[0]);
+    // None that fits is as good as another, but in stubs, whose first ones are the plain ones; and of those that may
+    // fit it is the first, perhaps.
+    static constexpr size_t kMostCompared = 3;
+    if (best > 0 && fitting.size() > kMostCompared) fitting.resize(kMostCompared);
+    if (best == 2 || best < 0) fitting.resize(1);
+    is_any = best == 0 && !FileOf(functions_[types_[overloads[0]].a].file)->is_stub;
+    if (best == 0 && !is_any) fitting.resize(1);
   }
   for (const TypeId id : callees) {
     const bool is_overload = overloads.size() > 1 && std::ranges::find(overloads, id) != overloads.end();
-    if (is_overload && id != chosen) continue;
+    if (is_overload || (types_[id].kind == TypeKind::kNone && callees.size() > 1)) continue;
     const Value one = ResultOfType(id, arguments, place);
     value.set = types_.Union(value.set, one.set);
     value.doubt |= one.doubt;
     if (IsInVain(value)) break;
+  }
+  const auto said_by = [&](TypeId id) {
+    const FunctionInfo info = functions_[types_[id].a];
+    const SourceFile* file = FileOf(info.file);
+    return info.stmt == kModuleStmt ? kUnknownValue : ValueOfHint(info.file, file->syntax.stmt(info.stmt).hint);
+  };
+  for (size_t i = 0; i < fitting.size() && !IsInVain(value); ++i) {
+    // Another that may be meant and says something else leaves a doubt.
+    if (i > 0 && (is_any || said_by(fitting[i]) != said_by(fitting[0]))) value.doubt |= Value::kGuessed;
+    if (i > 0 && !is_any) continue;
+    const Value one = ResultOfType(fitting[i], arguments, place);
+    value = {types_.Union(value.set, one.set), static_cast<uint8_t>(value.doubt | one.doubt)};
   }
   --depth_;
   return value;

@@ -252,6 +252,10 @@ void Inference::FindMembers(ClassId cls) {
         occurrence_of_name == kNoIndex ? kNoIndex : bindings.VariableOf(bindings.occurrences[occurrence_of_name]);
     if (variable == kNoIndex) return;
     for (const uint32_t i : file->occurrences().Of(variable)) {
+      // What it is given later is something else: `self = 3`.
+      if (bindings.occurrences[i].kind == NameKind::kVariable && bindings.occurrences[i].role == NameRole::kWrite &&
+          i != occurrence_of_name)
+        break;
       const uint32_t next = i + 1;
       if (next >= bindings.occurrences.size()) continue;
       const Occurrence& attribute = bindings.occurrences[next];
@@ -304,6 +308,7 @@ void Inference::FindMembers(ClassId cls) {
         add_written(file->OccurrenceBeginningAt(syntax[exprs[0]].begin), false);
     }
   }
+  FindOutsideWrites(cls);
   if (info.is_dataclass || info.is_named_tuple || info.is_typed_dict) {
     std::vector<MadeField> fields;
     for (size_t i = info.bases.size(); i-- > 0;) {
@@ -319,6 +324,55 @@ void Inference::FindMembers(ClassId cls) {
   } else {
     info.fields.clear();
   }
+}
+
+// Attributes that its file gives the class, or what a variable was made by calling it: `C.x = 1`, `c = C(); c.x = 1`.
+void Inference::FindOutsideWrites(ClassId cls) {
+  ClassInfo& info = classes_[cls];
+  const SourceFile* file = FileOf(info.file);
+  if (file->is_stub) return;
+  const FileSyntax& syntax = file->syntax;
+  const Bindings& bindings = file->bindings;
+  const auto variable_at = [&](ExprId expr) {
+    if (expr == kNoExpr || syntax[expr].kind != ExprKind::kName) return kNoIndex;
+    const uint32_t index = file->OccurrenceBeginningAt(syntax[expr].begin);
+    return index == kNoIndex ? kNoIndex : bindings.VariableOf(bindings.occurrences[index]);
+  };
+  const uint32_t own = file->OccurrenceBeginningAt(syntax.stmt(info.stmt).name_begin);
+  const uint32_t class_variable = own == kNoIndex ? kNoIndex : bindings.VariableOf(bindings.occurrences[own]);
+  if (class_variable == kNoIndex) return;
+  const auto add = [&](uint32_t variable, bool on_class) {
+    for (const uint32_t i : file->occurrences().Of(variable)) {
+      const ExprId named = syntax.NamedAt(bindings.occurrences[i].begin);
+      const ExprId attribute = named == kNoExpr ? kNoExpr : syntax[named].parent;
+      if (attribute == kNoExpr || syntax[attribute].kind != ExprKind::kAttribute ||
+          (syntax[attribute].flags & kIsTarget) == 0 || syntax.ChildOf(attribute, 0) != named)
+        continue;
+      const Text name = Kept(syntax.NameOf(attribute));
+      std::vector<uint32_t>& places = info.self_attributes[name];
+      if (std::ranges::find(places, syntax[attribute].name_begin) == places.end())
+        places.push_back(syntax[attribute].name_begin);
+      if (on_class) info.class_written.insert(name);
+    }
+  };
+  add(class_variable, true);
+  std::vector<uint32_t> made;
+  for (const uint32_t i : file->occurrences().Of(class_variable)) {
+    const ExprId named = syntax.NamedAt(bindings.occurrences[i].begin);
+    const ExprId call = named == kNoExpr ? kNoExpr : syntax[named].parent;
+    if (call == kNoExpr || syntax[call].kind != ExprKind::kCall || syntax.ChildOf(call, 0) != named) continue;
+    const Stmt& stmt = syntax.stmt(syntax.StatementOf(call));
+    const auto exprs = syntax.ExprsOf(stmt);
+    if (stmt.kind != StmtKind::kAssign || exprs.size() != 2 || exprs[1] != call) continue;
+    const uint32_t variable = variable_at(exprs[0]);
+    if (variable == kNoIndex || std::ranges::find(made, variable) != made.end()) continue;
+    // One that is given nothing else.
+    size_t count = 0;
+    for (const uint32_t other : file->occurrences().Of(variable))
+      count += bindings.occurrences[other].kind != NameKind::kNone;
+    if (count == 1) made.push_back(variable);
+  }
+  for (const uint32_t variable : made) add(variable, false);
 }
 
 bool Inference::IsSubclass(ClassId cls, ClassId base) {

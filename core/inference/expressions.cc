@@ -83,6 +83,11 @@ Value Inference::Evaluate(const SourceFile& file, ExprId expr, FrameId frame) {
       return EvaluateDict(file, expr, frame);
     case ExprKind::kUnary: {
       if (e.op == word::kNot) return InstanceNamed("builtins", "bool");
+      const ExprId number = syntax.ChildOf(expr, 0);
+      if (e.op == CodeOfText("-") && number != kNoExpr && syntax[number].kind == ExprKind::kNumber &&
+          static_cast<NumberType>(syntax[number].op) != NumberType::kFloat &&
+          static_cast<NumberType>(syntax[number].op) != NumberType::kComplex)
+        return LiteralValue("int", "-" + std::string(syntax.TextOf(syntax[number])));
       const Text method = e.op == CodeOfText("-") ? "__neg__" : e.op == CodeOfText("+") ? "__pos__" : "__invert__";
       const Value operand = WithoutLiterals(child(0));
       const Value result = CallMethod(operand, method, {});
@@ -135,7 +140,7 @@ Value Inference::Evaluate(const SourceFile& file, ExprId expr, FrameId frame) {
       for (const TypeId id : types_.CopyOf(child(0).set))
         if (types_[id].kind == TypeKind::kInstance && types_[id].a == generator)
           value = Value{types_.Union(value.set, types_.ArgOf(id, 2)), 0};
-      return value;
+      return value.IsKnown() || !IterationOf(child(0)).IsKnown() ? value : NoneValue();
     }
     case ExprKind::kNamed:
       return child(1);
@@ -376,11 +381,13 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
     const bool is_negative = syntax[index].kind == ExprKind::kUnary && syntax[index].op == CodeOfText("-");
     const ExprId digits = is_negative ? syntax.ChildOf(index, 0) : index;
     const auto read = [&](Text text) {
+      const bool is_below = is_negative || text.starts_with('-');
+      if (text.starts_with('-')) text.remove_prefix(1);
       if (text.empty() || text.size() > 6 || !std::ranges::all_of(text, [](char c) { return c >= '0' && c <= '9'; }))
         return;
       number = 0;
       for (const char c : text) number = number * 10 + (c - '0');
-      if (is_negative) number = -number;
+      if (is_below) number = -number;
     };
     if (digits != kNoExpr && syntax[digits].kind == ExprKind::kNumber) {
       read(syntax.TextOf(syntax[digits]));
@@ -485,6 +492,17 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
   return value;
 }
 
+std::string Inference::TextOfEntries(const std::vector<std::pair<Text, Value>>& entries) {
+  std::string text = "#";
+  for (const auto& [name, value] : entries) {
+    text += name;
+    text += ':';
+    text += std::to_string(value.Packed());
+    text += ';';
+  }
+  return text;
+}
+
 std::vector<std::pair<Text, Value>> Inference::EntriesOf(TypeId dict) {
   std::vector<std::pair<Text, Value>> entries;
   const Text literal = LiteralOf(types_[dict]);
@@ -518,6 +536,19 @@ std::vector<std::pair<Text, Value>> Inference::EntriesOf(TypeId dict) {
   return entries;
 }
 
+// Whether a class says by a `__class_getitem__` of its own what it gives. Bases are not looked at: a subscript may be
+// one of what they are found by.
+bool Inference::SaysItems(ClassId cls) {
+  const ClassInfo& info = classes_[cls];
+  const SourceFile* file = FileOf(info.file);
+  if (file == nullptr || file->is_stub || info.scope == kNoIndex) return false;
+  const Bindings& bindings = file->bindings;
+  for (uint32_t symbol = bindings.scopes[info.scope].first_symbol; symbol != kNoIndex;
+       symbol = bindings.symbols[symbol].next)
+    if (bindings.texts[bindings.symbols[symbol].name] == "__class_getitem__") return true;
+  return false;
+}
+
 Value Inference::EvaluateSubscript(const SourceFile& file, ExprId expr, FrameId frame) {
   const FileSyntax& syntax = file.syntax;
   const Value base = ValueOf(file.id, syntax.ChildOf(expr, 0), frame);
@@ -530,6 +561,15 @@ Value Inference::EvaluateSubscript(const SourceFile& file, ExprId expr, FrameId 
     if (t.kind == TypeKind::kClass) {
       if (InfoOf(t.a).is_enum) {
         value = types_.Union(value, Just(InstanceOf(t.a)));
+        continue;
+      }
+      if (SaysItems(t.a)) {
+        const Value given = items.empty() ? kUnknownValue : ValueOf(file.id, items[0], frame);
+        std::vector<Argument> arguments(1);
+        arguments[0].value = given;
+        arguments[0].is_evaluated = true;
+        const Value result = ResultOf(AttributeOfType(id, "__class_getitem__"), arguments);
+        value = types_.Union(value, result);
         continue;
       }
       is_type = true;
@@ -581,12 +621,14 @@ Value Inference::EvaluateCall(const SourceFile& file, ExprId expr, FrameId frame
 Value Inference::Operate(Value left, Value right, Text method, Text reflected) {
   Value value{kNoTypes, static_cast<uint8_t>(left.doubt | right.doubt)};
   if (IsInVain(value)) return kUnknownValue;
-  const Value plain_right = WithoutLiterals(right);
+  // What a power of integers is depends on the exponent.
+  const Value plain_right = method == "__pow__" ? right : WithoutLiterals(right);
   for (const TypeId id : types_.CopyOf(WithoutLiterals(left).set)) {
     if (types_[id].kind == TypeKind::kForeign) {
       value.doubt |= Value::kOpen;
       continue;
     }
+    if (types_[id].kind == TypeKind::kNone && types_.SizeOf(left.set) > 1) continue;
     const ClassId cls = ClassOfType(id);
     const auto member = FindMember(cls, method);
     Value result;
@@ -608,6 +650,13 @@ Value Inference::Operate(Value left, Value right, Text method, Text reflected) {
     if (!result.IsKnown()) result = CallMethod(plain_right, reflected, {Just(id)});
     value.set = types_.Union(value.set, result.set);
     value.doubt |= result.doubt;
+  }
+  // Stubs leave open what a power of numbers is whose sign is not known.
+  if (!value.IsKnown() && method == "__pow__") {
+    const TypeSetId integer = InstanceNamed("builtins", "int").set, real = InstanceNamed("builtins", "float").set;
+    const TypeSetId base = WithoutLiterals(left).set, exponent = WithoutLiterals(right).set;
+    if ((base == integer || base == real) && (exponent == integer || exponent == real))
+      return {base == integer && exponent == integer ? integer : real, Value::kOpen | Value::kGuessed};
   }
   if (!left.IsKnown() && right.IsKnown()) {
     const Value result = CallMethod(plain_right, reflected, {kUnknownValue});
@@ -662,7 +711,8 @@ Value Inference::WithoutDisplay(Value value) {
   std::vector<TypeId> plain;
   for (const TypeId id : types_.CopyOf(value.set)) {
     const std::vector<TypeSetId> args(types_.ArgsOf(id).begin(), types_.ArgsOf(id).end());
-    plain.push_back(LiteralOf(types_[id]).starts_with('@') ? InstanceOf(types_[id].a, args) : id);
+    const Text literal = LiteralOf(types_[id]);
+    plain.push_back(literal.starts_with('@') || literal.starts_with('#') ? InstanceOf(types_[id].a, args) : id);
   }
   return {types_.SetOf(plain), value.doubt};
 }
@@ -682,8 +732,9 @@ Value Inference::WithoutFalse(Value value, bool keeps_false) {
     bool is_surely_true = t.kind == TypeKind::kModule || t.kind == TypeKind::kClass || t.kind == TypeKind::kFunction;
     bool is_surely_false = t.kind == TypeKind::kNone;
     const Text literal = LiteralOf(t);
+    if (literal.starts_with('^')) is_surely_true = true;
     if (t.kind == TypeKind::kInstance && !literal.empty() && !literal.starts_with('@') && !literal.starts_with('#') &&
-        !classes_[t.a].is_enum) {
+        !literal.starts_with('^') && !classes_[t.a].is_enum) {
       const bool is_false = literal == "False" || literal == "0" || literal == "''" || literal == "\"\"";
       (is_false ? is_surely_false : is_surely_true) = true;
     }

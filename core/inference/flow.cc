@@ -37,6 +37,93 @@ bool BlockLeaves(const FileSyntax& syntax, StmtId owner, bool counts_jumps) {
   }
 }
 
+bool MayEnd(const FileSyntax& syntax, StmtId owner, const std::function<int(ExprId)>& truth,
+            const std::function<bool(ExprId)>& returns) {
+  const auto truth_of = [&](StmtId clause) {
+    const auto exprs = syntax.ExprsOf(syntax.stmt(clause));
+    return exprs.empty() ? -1 : truth(exprs[0]);
+  };
+  const auto ends = [&](StmtId clause) { return MayEnd(syntax, clause, truth, returns); };
+  const auto is_left_by_break = [&](StmtId loop) {
+    const Stmt& head = syntax.stmt(loop);
+    for (StmtId id = loop + 1; id < syntax.stmts.size() && syntax.stmt(id).begin < head.block_end; ++id) {
+      if (syntax.stmt(id).kind != StmtKind::kPass || syntax.stmt(id).op != word::kBreak) continue;
+      StmtId around = syntax.stmt(id).parent;
+      while (around != loop && syntax.stmt(around).kind != StmtKind::kFor &&
+             syntax.stmt(around).kind != StmtKind::kWhile && around != kModuleStmt)
+        around = syntax.stmt(around).parent;
+      if (around == loop) return true;
+    }
+    return false;
+  };
+  for (StmtId id = syntax.stmt(owner).first_child; id != kModuleStmt; id = syntax.stmt(id).next) {
+    const Stmt& stmt = syntax.stmt(id);
+    const auto clauses = [&](auto&& visit) {
+      for (StmtId at = stmt.next; at != kModuleStmt && ContinuesChain(syntax.stmt(at).kind); at = syntax.stmt(at).next)
+        visit(at, syntax.stmt(at).kind);
+    };
+    switch (stmt.kind) {
+      case StmtKind::kReturn:
+      case StmtKind::kRaise:
+        return false;
+      case StmtKind::kPass:
+        if (stmt.op == word::kBreak || stmt.op == word::kContinue) return false;
+        break;
+      case StmtKind::kAssert:
+        if (truth_of(id) == 0) return false;
+        break;
+      case StmtKind::kExpression: {
+        const auto exprs = syntax.ExprsOf(stmt);
+        if (!exprs.empty() && !returns(exprs[0])) return false;
+        break;
+      }
+      case StmtKind::kWith:
+        if (!ends(id)) return false;
+        break;
+      case StmtKind::kIf: {
+        bool is_decided = truth_of(id) == 1, may_end = truth_of(id) != 0 && ends(id);
+        clauses([&](StmtId at, StmtKind kind) {
+          const int holds = kind == StmtKind::kElse ? 1 : truth_of(at);
+          may_end = may_end || (!is_decided && holds != 0 && ends(at));
+          is_decided = is_decided || holds == 1;
+        });
+        if (is_decided && !may_end) return false;
+        break;
+      }
+      case StmtKind::kWhile:
+      case StmtKind::kFor: {
+        bool may_end = stmt.kind == StmtKind::kFor || truth_of(id) != 1;
+        clauses([&](StmtId at, StmtKind) { may_end = may_end && ends(at); });
+        if (!may_end && !is_left_by_break(id)) return false;
+        break;
+      }
+      case StmtKind::kTry: {
+        bool may_end = ends(id), is_caught = false, is_over = false;
+        clauses([&](StmtId at, StmtKind kind) {
+          if (kind == StmtKind::kElse) may_end = may_end && ends(at);
+          if (kind == StmtKind::kExcept) is_caught = is_caught || ends(at);
+          if (kind == StmtKind::kFinally) is_over = !ends(at);
+        });
+        if (is_over || (!may_end && !is_caught)) return false;
+        break;
+      }
+      case StmtKind::kMatch: {
+        bool may_end = false, is_exhaustive = false;
+        for (StmtId at = stmt.first_child; at != kModuleStmt; at = syntax.stmt(at).next) {
+          may_end = may_end || ends(at);
+          const auto exprs = syntax.ExprsOf(syntax.stmt(at));
+          is_exhaustive = exprs.size() == 1 && syntax[exprs[0]].kind == ExprKind::kPatternCapture;
+        }
+        if (is_exhaustive && !may_end) return false;
+        break;
+      }
+      default:
+        break;
+    }
+  }
+  return true;
+}
+
 Flow::Flow(const SourceFile& file, std::span<const uint32_t> bindings, const std::function<int(ExprId)>& truth)
     : file_(file), syntax_(file.syntax), bindings_(bindings), truth_(truth) {}
 

@@ -68,6 +68,10 @@ class Flow {
 
 // Whether a clause goes on with the statement in front of it: `elif`, `else`, `except`, `finally`.
 bool ContinuesChain(StmtKind kind);
+// Whether a run may come to the end of a block. `truth` says of a condition whether it holds, `returns` of an
+// expression that is a statement whether it is over one day.
+bool MayEnd(const FileSyntax& syntax, StmtId owner, const std::function<int(ExprId)>& truth,
+            const std::function<bool(ExprId)>& returns);
 // Whether whatever runs to the end of a block goes no further: it returns, raises, breaks or continues.
 bool BlockLeaves(const FileSyntax& syntax, StmtId owner, bool counts_jumps);
 

@@ -29,6 +29,7 @@ void Inference::Clear() {
   annotated_ = {};
   conditions_ = {};
   module_names_.clear();
+  writes_.clear();
   imports_of_foreign_.clear();
   kept_.clear();
   texts_ = TextArena();

@@ -388,6 +388,7 @@ class Inference {
   Value Evaluate(const SourceFile& file, ExprId expr, FrameId frame);
   Value EvaluateName(const SourceFile& file, ExprId expr, FrameId frame);
   Value EvaluateAttribute(const SourceFile& file, ExprId expr, FrameId frame);
+  bool SaysItems(ClassId cls);
   Value EvaluateSubscript(const SourceFile& file, ExprId expr, FrameId frame);
   Value EvaluateCall(const SourceFile& file, ExprId expr, FrameId frame);
   Value EvaluateBinary(const SourceFile& file, ExprId expr, FrameId frame);
@@ -409,6 +410,7 @@ class Inference {
   Text Kept(Text text);
   // What a display that a value came from, or the keywords of a call, have for each key: name, value.
   std::vector<std::pair<Text, Value>> EntriesOf(TypeId dict);
+  static std::string TextOfEntries(const std::vector<std::pair<Text, Value>>& entries);
   Value LiteralValue(Text cls, Text text);
 
   // ---- variables.cc ----
@@ -437,7 +439,10 @@ class Inference {
   Value Decorated(const SourceFile& file, StmtId stmt, Value value, FrameId frame, ExprId until = kNoExpr);
   const ModuleNames& NamesOfModule(const SourceFile& file);
   FrameId FrameFor(const SourceFile& file, uint32_t scope, FrameId frame);
-  Value ItemsPutInto(const SourceFile& file, ExprId target);
+  struct Puts;
+  void CollectPuts(const SourceFile& file, ExprId use, Puts& puts, int depth);
+  Value WithPuts(Value container, const Puts& puts);
+  Value WithItemsPutInto(const SourceFile& file, ExprId target, Value held);
 
   // ---- narrowing.cc ----
   class Narrowing;
@@ -448,16 +453,24 @@ class Inference {
   };
   std::vector<Condition> ConditionsOn(const SourceFile& file, ExprId expr);
   Value Narrowed(const SourceFile& file, ExprId expr, Value value, FrameId frame);
+  // An attribute, or an item by a literal key, behind an assignment to it.
+  Value Assigned(const SourceFile& file, ExprId expr, Value value, FrameId frame);
+  bool IsDescribed(Value receiver, Text name);
+  // Where a file writes attributes and items by literal keys, by the attribute's name or the key's text.
+  const std::vector<ExprId>& WritesOf(const SourceFile& file, Text name);
   // -1 where it is not known before the program runs.
   int StaticTruth(const SourceFile& file, ExprId condition);
   // The same by what parameters are in a frame.
   int TruthIn(const SourceFile& file, ExprId condition, FrameId frame);
+  int Compared(Value left, Value right, CompareOperator op);
+  static bool IsDefinition(const SourceFile& file, ExprId expr);
 
   // ---- classes.cc ----
   void FindBases(ClassId cls);
   void FindFields(ClassId cls);
   void FindOrder(ClassId cls);
   void FindMembers(ClassId cls);
+  void FindOutsideWrites(ClassId cls);
   ClassId MadeClass(const SourceFile& file, ExprId call, Text kind);
   void CollectTypeVars(TypeSetId set, std::vector<TypeId>& found, int depth = 0);
 
@@ -470,6 +483,7 @@ class Inference {
   Value ValueOfMember(const Member& member, Text name, TypeId receiver, bool on_class);
   Value Bound(Value value, TypeId receiver, bool on_class, ClassId owner);
   Value RawValueOfMember(const Member& member, Text name);
+  void SolveByFields(ClassId cls, std::vector<Argument>& arguments, Solution& solution);
   Solution SolutionFor(const Member& member, TypeId receiver);
 
   // ---- annotations.cc ----
@@ -487,8 +501,24 @@ class Inference {
   Value ReturnedIn(FunctionId function, FrameId frame);
   int IsReached(const SourceFile& file, StmtId stmt, StmtId function, FrameId frame);
   Value YieldedIn(FunctionId function, FrameId frame);
+  std::vector<ExprId> YieldsOf(const FunctionInfo& info);
+  // One after the other, where that is plain; empty where it is not.
+  std::vector<Value> YieldedInOrder(FunctionId function, FrameId frame, int depth = 0);
+  std::vector<Value> ItemsInOrder(TypeId generator, int depth);
+  bool IsLeftToOthers(FunctionId function);
+  std::vector<ClassId> ClassesBelow(ClassId cls);
+  Value ResultBelow(FunctionId function);
+  Value AttributeBelow(ClassId cls, Text name);
   Value GuessedParameter(FunctionId function, size_t index);
   Value GuessParameters(FunctionId function);
+  void FindCalls(FunctionId id, std::vector<ExprPlace>& calls, int depth);
+  void FindCallsOfName(const SourceFile& file, uint32_t occurrence, std::vector<ExprPlace>& calls, int depth);
+  void FindCallsOfUse(const SourceFile& file, ExprId use, std::vector<ExprPlace>& calls, int depth);
+  bool IsCalledBy(const SourceFile& file, ExprId decorator, FunctionId id);
+  std::vector<std::pair<FunctionId, bool>> CalledFunctions(const SourceFile& file, ExprId call, ExprId argument);
+  std::vector<Argument> ArgumentsBeside(const SourceFile& file, ExprId call, ExprId unknown);
+  size_t ParameterGiven(const FunctionInfo& info, bool is_bound, const SourceFile& file, ExprId call, ExprId argument);
+  Value ParameterOfArgument(const SourceFile& file, ExprId call, ExprId argument, size_t index);
   Value SelfOf(const FunctionInfo& info);
   // ---- docstrings.cc ----
   Value ValueInDocstring(const FunctionInfo& info, Text name);
@@ -558,6 +588,7 @@ class Inference {
   FoundOnce<std::vector<Binding>> annotated_;
   FoundOnce<std::vector<Condition>> conditions_;
   std::unordered_map<FileId, ModuleNames> module_names_;
+  std::unordered_map<FileId, std::unordered_map<Text, std::vector<ExprId>>> writes_;
   std::unordered_map<uint32_t, Binding> imports_of_foreign_;  // by the number of the name
   TextArena texts_;
   std::unordered_set<Text> kept_;  // of texts_

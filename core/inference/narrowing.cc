@@ -8,15 +8,29 @@ namespace quillet {
 
 namespace {
 
-// Names and attributes of names, whose value stays what a condition found until something is assigned.
+// The key of an item whose key is a literal; empty for others.
+Text KeyOf(const FileSyntax& syntax, ExprId expr) {
+  if (syntax[expr].kind != ExprKind::kSubscript || syntax[expr].children_count != 2) return {};
+  const ExprId key = syntax.ChildOf(expr, 1);
+  const bool is_literal =
+      key != kNoExpr && (syntax[key].kind == ExprKind::kNumber || syntax[key].kind == ExprKind::kString);
+  return is_literal ? syntax.TextOf(syntax[key]) : Text();
+}
+
+bool IsLink(const FileSyntax& syntax, ExprId expr) {
+  return syntax[expr].kind == ExprKind::kAttribute || !KeyOf(syntax, expr).empty();
+}
+
+// Names, and attributes and items by literal keys of such, whose value stays what a condition found until something is
+// assigned.
 bool IsChain(const FileSyntax& syntax, ExprId expr) {
-  while (syntax[expr].kind == ExprKind::kAttribute) expr = syntax.ChildOf(expr, 0);
+  while (IsLink(syntax, expr)) expr = syntax.ChildOf(expr, 0);
   return syntax[expr].kind == ExprKind::kName;
 }
 
 bool SameChain(const FileSyntax& syntax, ExprId a, ExprId b) {
-  while (syntax[a].kind == ExprKind::kAttribute && syntax[b].kind == ExprKind::kAttribute) {
-    if (syntax.NameOf(a) != syntax.NameOf(b)) return false;
+  while (syntax[a].kind == syntax[b].kind && IsLink(syntax, a)) {
+    if (syntax.NameOf(a) != syntax.NameOf(b) || KeyOf(syntax, a) != KeyOf(syntax, b)) return false;
     a = syntax.ChildOf(a, 0);
     b = syntax.ChildOf(b, 0);
   }
@@ -50,6 +64,7 @@ class Inference::Narrowing {
         return value;
       case ExprKind::kName:
       case ExprKind::kAttribute:
+      case ExprKind::kSubscript:
         return IsSubject(condition) ? Truth(value, holds) : value;
       case ExprKind::kCompare:
         return e.children_count == 2 ? Comparison(condition, holds, value) : value;
@@ -210,9 +225,99 @@ class Inference::Narrowing {
   FrameId frame_;
 };
 
+const std::vector<ExprId>& Inference::WritesOf(const SourceFile& file, Text name) {
+  const auto [at, is_new] = writes_.try_emplace(file.id);
+  if (is_new) {
+    const FileSyntax& syntax = file.syntax;
+    for (ExprId expr = 1; expr < syntax.exprs.size(); ++expr) {
+      if ((syntax[expr].flags & kIsTarget) == 0 || !IsLink(syntax, expr)) continue;
+      const bool is_attribute = syntax[expr].kind == ExprKind::kAttribute;
+      at->second[Kept(is_attribute ? syntax.NameOf(expr) : KeyOf(syntax, expr))].push_back(expr);
+    }
+  }
+  static const std::vector<ExprId> kNone;
+  const auto found = at->second.find(name);
+  return found == at->second.end() ? kNone : found->second;
+}
+
+// Whether what an attribute is given is not what it gives: of properties and the like.
+bool Inference::IsDescribed(Value receiver, Text name) {
+  uint8_t doubt = 0;
+  for (const Member& member : MembersOf(receiver, name, doubt)) {
+    if (member.symbol == kNoIndex) continue;
+    for (const TypeId id : types_.CopyOf(RawValueOfMember(member, name).set)) {
+      const Type t = types_[id];
+      if (t.kind == TypeKind::kFunction) return true;
+      if (t.kind == TypeKind::kInstance &&
+          (FindMember(t.a, "__get__") || IsSubclass(t.a, ClassNamed("builtins", "property"))))
+        return true;
+    }
+  }
+  return false;
+}
+
+Value Inference::Assigned(const SourceFile& file, ExprId expr, Value value, FrameId frame) {
+  const FileSyntax& syntax = file.syntax;
+  const bool is_attribute = syntax[expr].kind == ExprKind::kAttribute;
+  const std::vector<ExprId>& writes = WritesOf(file, is_attribute ? syntax.NameOf(expr) : KeyOf(syntax, expr));
+  if (writes.empty()) return value;
+  const auto root_of = [&](ExprId at) {
+    while (IsLink(syntax, at)) at = syntax.ChildOf(at, 0);
+    return at;
+  };
+  const uint32_t scope = file.ScopeAt(syntax[expr].begin);
+  const StmtId top = file.StmtOfScope(scope);
+  const uint32_t root = syntax[root_of(expr)].begin;
+  // Those of the same chain in the same scope; the offset of an assignment is that of its root.
+  std::vector<std::pair<uint32_t, ExprId>> same;
+  for (const ExprId write : writes)
+    if (SameChain(syntax, write, expr) && file.ScopeAt(syntax[write].begin) == scope)
+      same.emplace_back(syntax[root_of(write)].begin, write);
+  if (same.empty()) return value;
+  const uint32_t index = file.OccurrenceBeginningAt(root);
+  const uint32_t variable = index == kNoIndex ? kNoIndex : file.bindings.VariableOf(file.bindings.occurrences[index]);
+  if (variable == kNoIndex) return value;
+  std::vector<uint32_t> offsets;
+  for (const auto& [offset, write] : same) offsets.push_back(offset);
+  // What is assigned to the parts in front of it.
+  for (const uint32_t i : file.occurrences().Of(variable)) {
+    const Occurrence& other = file.bindings.occurrences[i];
+    if (other.kind != NameKind::kNone) {
+      if (other.kind != NameKind::kParameter) offsets.push_back(other.begin);
+      continue;
+    }
+    ExprId at = syntax.NamedAt(other.begin);
+    while (at != kNoExpr && syntax[at].parent != kNoExpr && IsLink(syntax, syntax[at].parent) &&
+           syntax.ChildOf(syntax[at].parent, 0) == at) {
+      at = syntax[at].parent;
+      if ((syntax[at].flags & kIsTarget) == 0 || SameChain(syntax, at, expr)) continue;
+      for (ExprId part = syntax.ChildOf(expr, 0); IsLink(syntax, part); part = syntax.ChildOf(part, 0))
+        if (SameChain(syntax, at, part)) offsets.push_back(other.begin);
+    }
+  }
+  std::ranges::sort(offsets);
+  offsets.erase(std::ranges::unique(offsets).begin(), offsets.end());
+  const std::function<int(ExprId)> truth = [&](ExprId condition) { return StaticTruth(file, condition); };
+  std::vector<uint32_t> reached;
+  if (!Flow(file, offsets, truth).Reach(syntax[expr].begin, top, reached) || reached.empty()) return value;
+  Value given;
+  for (const uint32_t offset : reached) {
+    const auto write = std::ranges::find(same, offset, &std::pair<uint32_t, ExprId>::first);
+    if (write == same.end()) return value;
+    given = types_.Union(given, is_attribute ? ValueOfBinding({file.id, syntax[write->second].name_begin}, frame)
+                                             : ValueOfTarget(file, write->second, frame));
+  }
+  // Nothing but None is what others fill in.
+  const bool is_none = given == NoneValue();
+  if (!given.IsKnown() || is_none || (given.doubt != 0 && value.IsKnown())) return value;
+  if (is_attribute && IsDescribed(ValueOf(file.id, syntax.ChildOf(expr, 0), frame), syntax.NameOf(expr))) return value;
+  return given;
+}
+
 // Conditions are applied from the outermost to the innermost.
 Value Inference::Narrowed(const SourceFile& file, ExprId expr, Value value, FrameId frame) {
   if (!IsChain(file.syntax, expr) || (file.syntax[expr].flags & kIsTarget) != 0) return value;
+  if (file.syntax[expr].kind != ExprKind::kName) value = Assigned(file, expr, value, frame);
   const std::vector<Condition>& conditions = conditions_.Get(file.id, expr, [&] { return ConditionsOn(file, expr); });
   Narrowing narrowing(*this, file, expr, frame);
   for (size_t i = conditions.size(); i-- > 0;) value = narrowing.Where(conditions[i].expr, conditions[i].holds, value);
@@ -224,7 +329,7 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
   const FileSyntax& syntax = file.syntax;
   std::vector<Condition> conditions;
   ExprId root = expr;
-  while (syntax[root].kind == ExprKind::kAttribute) root = syntax.ChildOf(root, 0);
+  while (IsLink(syntax, root)) root = syntax.ChildOf(root, 0);
   const Text name = syntax.TextOf(syntax[root]);
   const auto mentions = [&](uint32_t begin, uint32_t end) {
     return Text(syntax.source + begin, end - begin).find(name) != Text::npos;
@@ -321,7 +426,7 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
       if (root != expr) {  // the attribute itself
         const ExprId read = syntax.NamedAt(other.begin);
         ExprId chain = read == kNoExpr ? kNoExpr : syntax[read].parent;
-        while (chain != kNoExpr && syntax[chain].kind == ExprKind::kAttribute) {
+        while (chain != kNoExpr && IsLink(syntax, chain)) {
           if ((syntax[chain].flags & kIsTarget) != 0 && SameChain(syntax, chain, expr))
             last_bound = std::max(last_bound, other.begin);
           chain = syntax[chain].parent;
@@ -355,7 +460,9 @@ int Inference::TruthIn(const SourceFile& file, ExprId condition, FrameId frame) 
       const ExprId right = syntax.ChildOf(condition, 1);
       const bool is_none =
           syntax[right].kind == ExprKind::kConstant && syntax[right].op == static_cast<uint8_t>(ConstantValue::kNone);
-      if (!is_none || (op != CompareOperator::kIs && op != CompareOperator::kIsNot)) return -1;
+      if (!is_none)
+        return Compared(ValueOf(file.id, syntax.ChildOf(condition, 0), frame), ValueOf(file.id, right, frame), op);
+      if ((op != CompareOperator::kIs && op != CompareOperator::kIsNot)) return -1;
       const Value value = ValueOf(file.id, syntax.ChildOf(condition, 0), frame);
       if (!value.IsKnown() || value.doubt != 0) return -1;
       size_t nones = 0;
@@ -390,9 +497,57 @@ int Inference::TruthIn(const SourceFile& file, ExprId condition, FrameId frame) 
       }
       return are == types_.SizeOf(value.set) ? 1 : are == 0 ? 0 : -1;
     }
+    case ExprKind::kName: {
+      const Value value = ValueOf(file.id, condition, frame);
+      if (!value.IsKnown() || value.doubt != 0) return -1;
+      return !WithoutFalse(value, true).IsKnown() ? 1 : !WithoutFalse(value, false).IsKnown() ? 0 : -1;
+    }
     default:
       return -1;
   }
+}
+
+// How two literals compare: 1, 0, or -1 where they are none.
+int Inference::Compared(Value left, Value right, CompareOperator op) {
+  const bool is_identity = op == CompareOperator::kIs || op == CompareOperator::kIsNot;
+  const bool is_equality = op == CompareOperator::kEqual || op == CompareOperator::kNotEqual;
+  if ((!is_identity && !is_equality) || left.doubt != 0 || right.doubt != 0 || types_.SizeOf(left.set) != 1 ||
+      types_.SizeOf(right.set) != 1)
+    return -1;
+  const Type a = types_[types_.TypesOf(left.set)[0]], b = types_[types_.TypesOf(right.set)[0]];
+  const auto known_as = [&](const Type& t) -> Text {
+    const Text literal = LiteralOf(t);
+    const bool is_plain = t.kind == TypeKind::kInstance && !literal.empty() && !literal.starts_with('@') &&
+                          !literal.starts_with('#') && !literal.starts_with('^') && !classes_[t.a].is_enum;
+    if (!is_plain) return {};
+    return literal == "True" ? Text("1") : literal == "False" ? Text("0") : literal;
+  };
+  const Text first = known_as(a), second = known_as(b);
+  // Strings may be written in many ways.
+  const auto is_number = [](Text text) {
+    return !text.empty() && (text[0] == '-' || (text[0] >= '0' && text[0] <= '9'));
+  };
+  if (first.empty() || second.empty() ||
+      (first != second && (!is_number(first) || !is_number(second)) && first[0] != second[0]))
+    return -1;
+  const bool is_same = first == second && (is_equality || a.a == b.a);
+  return is_same == (op == CompareOperator::kEqual || op == CompareOperator::kIs) ? 1 : 0;
+}
+
+// Whether a name is bound once, by a definition: what such a one stands for is true.
+bool Inference::IsDefinition(const SourceFile& file, ExprId expr) {
+  const uint32_t index =
+      file.syntax[expr].kind == ExprKind::kName ? file.OccurrenceBeginningAt(file.syntax[expr].begin) : kNoIndex;
+  const uint32_t variable = index == kNoIndex ? kNoIndex : file.bindings.VariableOf(file.bindings.occurrences[index]);
+  if (variable == kNoIndex) return false;
+  size_t definitions = 0;
+  for (const uint32_t i : file.occurrences().Of(variable)) {
+    const NameKind kind = file.bindings.occurrences[i].kind;
+    if (kind == NameKind::kNone) continue;
+    if (kind != NameKind::kFunction && kind != NameKind::kClass) return false;
+    ++definitions;
+  }
+  return definitions == 1;
 }
 
 int Inference::StaticTruth(const SourceFile& file, ExprId condition) {
@@ -411,7 +566,7 @@ int Inference::StaticTruth(const SourceFile& file, ExprId condition) {
       if (text == "TYPE_CHECKING" || text == "typing.TYPE_CHECKING" || text == "t.TYPE_CHECKING") return 1;
       if (text.ends_with("PY2")) return version.AtLeast(3, 0) ? 0 : 1;
       if (text.ends_with("PY3")) return version.AtLeast(3, 0) ? 1 : 0;
-      return -1;
+      return IsDefinition(file, condition) ? 1 : -1;
     case ExprKind::kUnary: {
       if (e.op != word::kNot) return -1;
       const int inner = StaticTruth(file, syntax.ChildOf(condition, 0));
@@ -483,6 +638,16 @@ int Inference::StaticTruth(const SourceFile& file, ExprId condition) {
       if (subject == "sys.version_info[0]" || subject == "sys.version_info.major") {
         const int wanted = number(right);
         return wanted < 0 ? -1 : decide(version.parts[0] < wanted ? -1 : version.parts[0] > wanted ? 1 : 0);
+      }
+      const auto is_constant = [&](ExprId expr) {
+        const ExprKind kind = syntax[expr].kind;
+        return kind == ExprKind::kNumber || kind == ExprKind::kString ||
+               (kind == ExprKind::kConstant && syntax[expr].op != static_cast<uint8_t>(ConstantValue::kNone));
+      };
+      if (is_constant(left) && is_constant(right)) return Compared(ValueOf(file.id, left), ValueOf(file.id, right), op);
+      if (subject == syntax.TextOf(syntax[right]) && IsDefinition(file, left)) {
+        if (op == CompareOperator::kEqual || op == CompareOperator::kIs) return 1;
+        if (op == CompareOperator::kNotEqual || op == CompareOperator::kIsNot) return 0;
       }
       return -1;
     }

@@ -94,7 +94,7 @@ class TypeList {
 class TypeTable {
  public:
   // A set of more types than this is open instead.
-  static constexpr size_t kMaxSet = 24;
+  static constexpr size_t kMaxSet = 32;
 
   TypeTable() { Clear(); }
 

@@ -307,10 +307,15 @@ ExprId Workspace::Impl::ExpressionClosedAt(const SourceFile& file, uint32_t offs
   // Round brackets are no part of what they hold.
   uint32_t at = offset;
   while (at > 0 && (text[at] == ')' || text[at] == ' ')) --at;
-  expr = file.syntax.ExpressionAt(at + 1);
-  while (expr != kNoExpr && file.syntax[expr].end == at + 1 && (file.syntax[expr].flags & kParenthesized) == 0)
-    expr = file.syntax[expr].parent;
-  return expr != kNoExpr && file.syntax[expr].end == at + 1 ? expr : kNoExpr;
+  ExprId held = kNoExpr;
+  for (expr = file.syntax.ExpressionAt(at); expr != kNoExpr && file.syntax[expr].end <= at + 1;
+       expr = file.syntax[expr].parent) {
+    uint32_t before = file.syntax[expr].begin;
+    while (before > 0 && text[before - 1] == ' ') --before;
+    const bool is_opened = before > 0 && text[before - 1] == '(';
+    if (file.syntax[expr].end == at + 1 && (is_opened || (file.syntax[expr].flags & kParenthesized) != 0)) held = expr;
+  }
+  return held;
 }
 
 std::vector<std::string> Workspace::Types(FileId id, uint32_t offset) {

@@ -64,7 +64,7 @@ TEST(Inference, KnowsWhatOperatorsGive) {
 TEST(Inference, FollowsCallsToWhatTheyReturn) {
   Check({
       {"def f(): return 1\n$a = f()\n$b = f\n", {"int", "def () -> int"}},
-      {"def f(x):\n  if x: return 1\n  return 'a'\n$a = f(0)\n", {"int | str"}},
+      {"def f(x):\n  if x: return 1\n  return 'a'\n$a = f(z)\n$b = f(0)\n", {"int | str", "str"}},
       {"def f(): pass\n$a = f()\n", {"None"}},
       {"def f(): raise E\n$a = f()\n", {""}},
       {"def f(x): return x\n$a = f(1)\n$b = f('a')\n", {"int", "str"}},
@@ -259,7 +259,8 @@ TEST(Inference, KnowsDataclasses) {
       {"from dataclasses import dataclass, field\n@dataclass\nclass A:\n  x: int\n  y: str = 'a'\n"
        "  z: list[int] = field(default_factory=list)\na = A(1)\na.$x\na.$y\na.$z\n",
        {"int", "str", "list[int]"}},
-      {"import dataclasses\n@dataclasses.dataclass(frozen=True)\nclass A[T]:\n  x: T\n$a = A(1)\n", {"a.A"}},
+      {"import dataclasses\n@dataclasses.dataclass(frozen=True)\nclass A[T]:\n  x: T\n$a = A(1)\na.$x\n",
+       {"a.A[int]", "int"}},
   });
 }
 
@@ -426,4 +427,55 @@ TEST(Inference, KnowsTheLastOfManyCalls) {
 }
 
 }  // namespace
+TEST(Inference, KnowsWhatFunctionsAreCalledWithByWhatTheyAreGivenTo) {
+  Check({
+      {"a = sorted(['x'], key=lambda $k: k.upper())\n$b = list(map(lambda $x: x + 1, [1]))\n",
+       {"str", "list[int]", "int"}},
+      {"def apply(f, x):\n  return f(x)\napply(lambda $y: y, 3)\n", {"int"}},
+      {"def outer():\n  def inner($x):\n    return x\n  return inner\nouter()('a')\n", {"str"}},
+      {"def times(n):\n  def wrap(f):\n    def call($x):\n      return f(x)\n    return call\n  return wrap\n"
+       "@times(3)\ndef g(x):\n  return x\ng(1.5)\n",
+       {"float"}},
+  });
+}
+
+TEST(Inference, KnowsWhatIsPutIntoWhatAContainerHolds) {
+  Check({
+      {"a = {}\nfor n in [1]:\n  a.setdefault('k', []).append(n)\n$b = a\n", {"dict[str, list[int]]"}},
+      {"a = []\na += ['x']\n$b = a[0]\n", {"str"}},
+      {"import collections\na = collections.defaultdict(list)\na['k'].append(1)\n$b = a['k'][0]\n", {"int"}},
+      {"a = {}\na.update({'k': 1.5}, m=2)\n$b = a['k']\n", {"float | int"}},
+  });
+}
+
+TEST(Inference, KnowsWhatAnAttributeWasJustGiven) {
+  Check({
+      {"class A:\n  pass\na = A()\na.x = 1\na.$x\nA.y = 'y'\nA().$y\n", {"int", "str"}},
+      {"class N:\n  def __init__(self):\n    self.n = None\na = N()\na.n = N()\na.$n\n", {"a.N"}},
+      {"class A:\n  @property\n  def x(self):\n    return 'x'\n  @x.setter\n  def x(self, v):\n    pass\n"
+       "a = A()\na.x = 1\na.$x\n",
+       {"str"}},
+      {"d = {'a': 1, 'b': ''}\nd['a'] = 1.5\n$e = d['a']\n", {"float"}},
+      {"a = None\ndef f():\n  global a\n  a = 1\nf()\n$b = a\n", {"None | int"}},
+  });
+}
+
+TEST(Inference, KnowsThatTheEndOfAFunctionGivesNone) {
+  Check({
+      {"def f(x):\n  if x:\n    return 1\n$a = f(y)\n", {"None | int"}},
+      {"def f(x):\n  while True:\n    if x:\n      return 1\n$a = f(y)\n", {"int"}},
+      {"def f(x):\n  while True:\n    if x:\n      break\n    return 1\n$a = f(y)\n", {"None | int"}},
+      {"def f(x):\n  try:\n    return 1\n  except E:\n    raise\n  finally:\n    x()\n$a = f(y)\n", {"int"}},
+      {"def f(x):\n  match x:\n    case 1:\n      return 1\n    case _:\n      raise E\n$a = f(y)\n", {"int"}},
+      {"import sys\ndef f(x):\n  if x:\n    return 1\n  sys.exit(2)\n$a = f(y)\n", {"int"}},
+  });
+}
+
+TEST(Inference, KnowsKeywordsOfDictAndWhatClassesGiveForItems) {
+  Check({
+      {"a = dict(x=1, y='')\n$b = a['x']\n$c = dict(a, x=1.5)['x']\n", {"int", "float"}},
+      {"class A:\n  def __class_getitem__(cls, k):\n    return [k]\n$a = A[1]\n", {"list[int]"}},
+  });
+}
+
 }  // namespace quillet
