@@ -295,7 +295,7 @@ class Inference {
   // found surely for their sake, end much earlier.
   static constexpr uint32_t kMaxSteps = 20'000;
   static constexpr uint32_t kMaxGuessSteps = 3'000;
-  static constexpr uint32_t kMaxStepsOfAll = 4'000'000;  // of the parts of a question, some seconds
+  static constexpr uint32_t kMaxStepsOfAll = 2'000'000;  // of the parts of a question, some seconds
   static constexpr int kMaxDepth = 150;
   static constexpr size_t kMaxFrames = 500'000;  // a question begins with far fewer (ByteSize)
   static constexpr int kMaxFrameDepth = 10;
@@ -375,7 +375,7 @@ class Inference {
   }
   // Makes guesses pay for the files that were read for them.
   void CountReading() {
-    static constexpr uint64_t kBytesOfAStep = 512;
+    static constexpr uint64_t kBytesOfAStep = 1024;
     const uint64_t read = files_.bytes_read();
     if (read == read_) return;
     guess_steps_ -= static_cast<uint32_t>(std::min<uint64_t>(guess_steps_, (read - read_) / kBytesOfAStep));

@@ -1,6 +1,9 @@
 #include "workspace/questions.h"
 
 #include <algorithm>
+#if defined(__GLIBC__)
+#include <malloc.h>
+#endif
 
 #include "workspace/workspace_impl.h"
 
@@ -66,13 +69,18 @@ void Workspace::Impl::Begin() {
     last_look_ = last_refresh_ - now;
   }
   GiveBack();
-  if (inference.ByteSize() > kMaxRemembered) {
-    inference.Clear();
-    calls_by_name_.clear();
-  }
+  if (IsMuchRemembered()) ForgetFound();
   inference.Begin();
   ForgetPlaces();
   is_bounded = false;
+}
+
+void Workspace::Impl::ForgetFound() {
+  inference.Clear();
+  ForgetCalls();
+#if defined(__GLIBC__)
+  malloc_trim(0);  // small pieces between others that are in use, which the system does not get back otherwise
+#endif
 }
 
 void Workspace::Impl::GiveBack() {
@@ -115,7 +123,9 @@ std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
     if ((name != "__init__" && name != "__new__") || function.cls == kNoId) return {};
     name = inference.MembersOf(function.cls).name;
   }
-  const auto [at, is_new] = calls_by_name_.try_emplace(std::string(name));
+  // Its own file is looked through first, so functions of one name in other files have other calls.
+  const std::pair<std::string, FileId> key(name, function.file);
+  const auto [at, is_new] = calls_by_name_.try_emplace(key);
   if (!is_new) return at->second;
   std::vector<ExprPlace> calls;
   std::vector<FileId> candidates{function.file};
@@ -145,7 +155,7 @@ std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
         calls.push_back({id, call});
     }
   }
-  calls_by_name_[std::string(name)] = calls;
+  calls_by_name_[key] = calls;
   return calls;
 }
 

@@ -87,21 +87,26 @@ void Workspace::Impl::AddOtherSides(Entities& entities) {
   }
 }
 
+Entities Workspace::Impl::Meant(const SourceFile& file, uint32_t index) {
+  Entities meant = inference.EntitiesOf(file, index);
+  // The name behind `as` is one of this file.
+  const uint32_t variable = file.bindings.VariableOf(file.bindings.occurrences[index]);
+  if (variable != kNoIndex) {
+    for (const uint32_t i : file.occurrences().Of(variable)) {
+      const Occurrence& other = file.bindings.occurrences[i];
+      if (other.kind == NameKind::kImport && other.role == NameRole::kDefinition)
+        meant.found.push_back({Entity::kVariable, file.id, variable});
+    }
+  }
+  return meant;
+}
+
 std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, uint32_t index, bool everywhere) {
   std::vector<Hit> hits;
   const Occurrence occurrence = file.bindings.occurrences[index];
   const FileId own = file.id;
-  Entities wanted = inference.EntitiesOf(file, index);
   const std::string name(file.bindings.TextOf(occurrence));
-  // The name behind `as` is one of this file.
-  const uint32_t own_variable = file.bindings.VariableOf(occurrence);
-  if (own_variable != kNoIndex) {
-    for (const uint32_t i : file.occurrences().Of(own_variable)) {
-      const Occurrence& other = file.bindings.occurrences[i];
-      if (other.kind == NameKind::kImport && other.role == NameRole::kDefinition)
-        wanted.found.push_back({Entity::kVariable, file.id, own_variable});
-    }
-  }
+  Entities wanted = Meant(file, index);
   if (wanted.found.empty()) {
     // An attribute of what is not known: every one of its name.
     if (!occurrence.is_attribute) return hits;
@@ -153,6 +158,11 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
   std::vector<Hit> unknown;
   std::set<std::pair<FileId, uint32_t>> definers;
   for (const FileId id : candidates) {
+    if (IsMuchRemembered()) {
+      ForgetFound();
+      wanted = Meant(*Get(own), index);  // classes have other numbers now
+      AddOtherSides(wanted);
+    }
     const Visit visit(*this, id);
     const SourceFile* source = visit.file;
     if (source == nullptr) continue;

@@ -27,6 +27,10 @@ class Workspace::Impl final : public CallerSource {
   void Forget();
   // Where functions are called, by numbers of expressions: of no text but the one that they were found in.
   void ForgetCalls() { calls_by_name_.clear(); }
+  // What was found about values, which may take much memory. Numbers of classes, functions and types hold no more
+  // behind it.
+  bool IsMuchRemembered() const { return inference.ByteSize() > settings.most_remembered; }
+  void ForgetFound();
   const SourceFile* Get(FileId file) { return files.Get(file); }
   // The bytes of a line from 1, without its end; (0, 0) for one in front of the file, its end for one behind.
   std::pair<uint32_t, uint32_t> LineAt(const SourceFile& file, int line);
@@ -82,6 +86,8 @@ class Workspace::Impl final : public CallerSource {
     uint32_t occurrence;
   };
   std::vector<Hit> Uses(const SourceFile& file, uint32_t occurrence, bool everywhere);
+  // What the name of an occurrence stands for, for its uses.
+  Entities Meant(const SourceFile& file, uint32_t occurrence);
   // How a use's entities meet those asked for: nothing, or a certainty.
   bool Meets(const Entities& use, const std::vector<Entity>& targets, Certainty& certainty);
   bool IsCommonAttribute(Text name);
@@ -163,11 +169,9 @@ class Workspace::Impl final : public CallerSource {
   // Gives files back where more is held than may be.
   void GiveBack();
 
-  static constexpr size_t kMaxRemembered = size_t{64} << 20;
-
   std::chrono::steady_clock::time_point last_refresh_{};
   std::chrono::steady_clock::duration last_look_{};  // how long it took
-  std::unordered_map<std::string, std::vector<ExprPlace>> calls_by_name_;
+  std::map<std::pair<std::string, FileId>, std::vector<ExprPlace>> calls_by_name_;
   std::unordered_map<std::string, bool> common_;
 };
 

@@ -30,7 +30,7 @@ Workspace::Settings SettingsOf(const TemporaryFolder& folder, size_t most) {
   Workspace::Settings settings;
   settings.roots = {folder.path()};
   settings.version = Version::Of(3, 12);
-  settings.most_held = settings.most_visited = most;
+  settings.most_held = settings.most_visited = settings.most_remembered = most;
   return settings;
 }
 
