@@ -629,10 +629,14 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
             types_.Add(TypeKind::kFunction, types_[function].a, types_[function].b, {types_.SetOf(callee)}), arguments);
         made = types_.Union(made, result);
       }
-      bool is_instance = false;
-      for (const TypeId id : types_.CopyOf(made.set))
-        if (types_[id].kind == TypeKind::kInstance) is_instance = true;
-      if (is_instance && (made.doubt & Value::kOpen) == 0) return made;
+      // What makes one of the class, or says no more than that of a class above, makes what is called.
+      bool is_instance = false, is_own = false;
+      for (const TypeId id : types_.CopyOf(made.set)) {
+        if (types_[id].kind != TypeKind::kInstance) continue;
+        is_instance = true;
+        is_own = is_own || IsSubclass(cls, types_[id].a);
+      }
+      if (is_instance && !is_own && (made.doubt & Value::kOpen) == 0) return made;
     }
   }
   const std::vector<TypeSetId> args(types_.ArgsOf(callee).begin(), types_.ArgsOf(callee).end());

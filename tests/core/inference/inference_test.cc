@@ -460,6 +460,15 @@ TEST(Inference, KnowsWhatAnAttributeWasJustGiven) {
   });
 }
 
+TEST(Inference, KnowsWhatAClassMakesThatMayMakeSomethingElse) {
+  Check({
+      {"class P: pass\nclass E:\n  def __new__(cls, *a):\n    return object.__new__(cls)\n"
+       "class S(E):\n  def __new__(cls, p):\n    if z: return P()\n    return E.__new__(cls, p)\n$s = S(1)\n",
+       {"a.S"}},
+      {"class A:\n  @classmethod\n  def make(cls):\n    $self = cls.__new__(cls)\n    return self\n", {"a.A"}},
+  });
+}
+
 TEST(Inference, KnowsThatTheEndOfAFunctionGivesNone) {
   Check({
       {"def f(x):\n  if x:\n    return 1\n$a = f(y)\n", {"None | int"}},
