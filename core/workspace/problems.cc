@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <array>
 
+#include "foundations/console.h"
 #include "workspace/workspace_impl.h"
 
 namespace quillet {
@@ -23,6 +24,10 @@ std::vector<Problem> Workspace::Problems(FileId id) {
   if (file == nullptr) return problems;
   if (in.settings.analyzer != nullptr && !file->is_stub) {
     if (in.analyzer == nullptr) in.analyzer = std::make_unique<FileAnalyzer>(*in.settings.analyzer);
+    // What the analysis says of itself, such as that a statement is too deep to be walked whole, is no problem of the
+    // file.
+    Console silent{[](Text) {}, [](const std::exception_ptr&, bool) {}, TheConsole().describe_exception};
+    const ThreadConsole own_console(&silent);
     try {
       in.analyzer->Analyze(file->text());
       const auto& results = in.analyzer->results();

@@ -155,7 +155,7 @@ def test_none_is_the_running_interpreter() -> None:
         ("x = `y`", (2, 7), (3, 8)),
         ("raise E, 'text'", (2, 7), (3, 8)),
         ("def f(a, (b, c)): pass", (2, 7), (3, 8)),
-        ("def f():\n  def g(): nonlocal x", (3, 8), (2, 7)),
+        ("def f(x):\n  def g(): nonlocal x", (3, 8), (2, 7)),
         ("x: int = 1", (3, 8), (2, 7)),
         ("def f(*, a): pass", (3, 8), (2, 7)),
         ("async = 1", (3, 6), (3, 7)),

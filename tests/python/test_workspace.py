@@ -520,6 +520,16 @@ def test_errors_of_syntax_are_problems(
     assert [(*problem[:4], problem.message) for problem in found] == problems
 
 
+def test_a_statement_that_is_too_deep_to_be_read_whole_prints_nothing(
+    tmp_path: Path, capfd: pytest.CaptureFixture[str]
+) -> None:
+    workspace = Workspace(tmp_path, version=(3, 12))
+    depth = 1000
+    workspace.open(tmp_path / "a.py", f"y = 1\nz = {'f(' * depth}y{')' * depth}\ny = {'(' * depth}z{')' * depth}\n")
+    assert {problem.code for problem in workspace.problems(tmp_path / "a.py")} == {"unbound-name"}
+    assert capfd.readouterr() == ("", "")
+
+
 def test_what_the_stub_of_the_builtins_uses_is_no_builtin(tmp_path: Path) -> None:
     pytest.importorskip("typeshed_client")
     workspace = Workspace(tmp_path, version=(3, 12))
