@@ -5,7 +5,7 @@
 // are compressed by whoever asks for the file, with zstd. One column may have its bounds in each group, for readers
 // that skip groups by them.
 //
-// The format is laid down in the Apache Parquet specification; the footer is in Thrift's compact protocol.
+// The format is that of Apache Parquet; the footer is in Thrift's compact protocol.
 #pragma once
 
 #include <cstddef>

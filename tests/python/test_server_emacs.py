@@ -10,10 +10,11 @@ import re
 import shutil
 import subprocess
 import sys
-from pathlib import Path
 from typing import Any
 
 import pytest
+
+from editing import EDITORS, MAIN, SHOP
 
 pytest.importorskip("pygls")
 EMACS = shutil.which("emacs")
@@ -24,23 +25,6 @@ HAS_EGLOT = (
 if not HAS_EGLOT:
     pytest.skip("needs Emacs with Eglot (Debian: apt-get install emacs-nox elpa-eglot)", allow_module_level=True)
 
-ROOT = Path(__file__).resolve().parent.parent.parent
-SHOP = """\
-class Shop:
-    def total(self, tax=0):
-        return tax
-
-
-def pay(shop: Shop):
-    return shop.total(1)
-"""
-MAIN = """\
-from shop import Shop, pay
-
-corner = Shop()
-pay(corner)
-corner.total()
-"""
 SCRIPT = r"""
 (require 'json)
 (require 'flymake)
@@ -100,7 +84,7 @@ SCRIPT = r"""
 
 def set_up() -> str:
     """The Lisp of the document."""
-    text = (ROOT / "docs" / "editors.md").read_text(encoding="utf-8")
+    text = EDITORS.read_text(encoding="utf-8")
     [lisp] = re.findall(r"```elisp\n(.*?)```", text, re.DOTALL)
     command = " ".join(json.dumps(part) for part in (sys.executable, "-m", "quillet", "serve"))
     return str(lisp).replace('"quillet" "serve"', command)

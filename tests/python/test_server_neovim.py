@@ -16,33 +16,17 @@ from typing import Any
 
 import pytest
 
+from editing import EDITORS, MAIN, SHOP
+
 pytest.importorskip("pygls")
 NVIM = shutil.which("nvim")
 if NVIM is None:
     pytest.skip("needs Neovim (Debian: apt-get install neovim)", allow_module_level=True)
 
-ROOT = Path(__file__).resolve().parent.parent.parent
-SHOP = """\
-class Shop:
-    def total(self, tax=0):
-        return tax
-
-
-def pay(shop: Shop):
-    return shop.total(1)
-"""
-MAIN = """\
-from shop import Shop, pay
-
-corner = Shop()
-pay(corner)
-corner.total()
-"""
-
 
 def set_up() -> str:
     """The Lua of the document for this Neovim."""
-    text = (ROOT / "docs" / "editors.md").read_text(encoding="utf-8")
+    text = EDITORS.read_text(encoding="utf-8")
     new, old = re.findall(r"```lua\n(.*?)```", text, re.DOTALL)
     command = json.dumps([sys.executable, "-m", "quillet", "serve"])[1:-1]
     chosen = f"if vim.lsp.config then\n{new}\nelse\n{old}\nend\n"

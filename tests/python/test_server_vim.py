@@ -19,29 +19,14 @@ from typing import Any
 
 import pytest
 
+from editing import EDITORS, MAIN, SHOP
+
 pytest.importorskip("pygls")
 pty = pytest.importorskip("pty")
 VIM = shutil.which("vim")
 if VIM is None or "+channel" not in subprocess.run([VIM, "--version"], capture_output=True, text=True).stdout:
     pytest.skip("needs Vim with channels (Debian: apt-get install vim)", allow_module_level=True)
 
-ROOT = Path(__file__).resolve().parent.parent.parent
-SHOP = """\
-class Shop:
-    def total(self, tax=0):
-        return tax
-
-
-def pay(shop: Shop):
-    return shop.total(1)
-"""
-MAIN = """\
-from shop import Shop, pay
-
-corner = Shop()
-pay(corner)
-corner.total()
-"""
 # Where plugins are: those of Debian, those of the user's, or where the environment says.
 PLACES = {
     "vim-lsp": [os.environ.get("VIM_LSP", ""), *map(str, Path.home().glob(".vim/pack/*/*/vim-lsp"))],
@@ -56,7 +41,7 @@ PROBLEMS = {
 
 def set_up(plugin: str, place: str) -> str:
     """The Vim script of the document for a plugin."""
-    text = (ROOT / "docs" / "editors.md").read_text(encoding="utf-8")
+    text = EDITORS.read_text(encoding="utf-8")
     blocks = dict(re.findall(r"(vim-lsp|ALE)\]?\(http[^\n]*\n+```vim\n(.*?)```", text, re.DOTALL))
     script = blocks["vim-lsp" if plugin == "vim-lsp" else "ALE"]
     script = script.replace("'cmd': ['quillet', 'serve']", f"'cmd': {[sys.executable, '-m', 'quillet', 'serve']}")
