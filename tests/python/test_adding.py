@@ -51,6 +51,7 @@ def test_a_class_and_a_kind_that_the_page_adds_pass_all_checks(tmp_path: Path) -
     for tool in ("cmake", "ninja"):
         if shutil.which(tool) is None:
             pytest.skip(f"no {tool}")
+    pytest.importorskip("nanobind")
     copy = tmp_path / "copy"
     shutil.copytree(ROOT, copy, ignore=shutil.ignore_patterns(".*", "build", "dist", "__pycache__"))
     for path, before, after in steps():
