@@ -289,6 +289,8 @@ class Workshop:
             known = {"of": fingerprint, "times": self.time_tests(), "digest": self.ask_digest()}
             state.write_text(json.dumps(known))
         self.times, self.digest = known["times"], known["digest"]
+        if self.ask_digest() != self.digest:
+            sys.exit("mutate: the digest is another in each run, so that it says nothing about a change")
         if self.python:
             require([*base, "-B", self.extension, f"-DPython_EXECUTABLE={sys.executable}", "-DQUILLET_TESTS=OFF"])
             require(self.ninja(self.extension, []))

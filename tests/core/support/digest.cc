@@ -332,12 +332,20 @@ class Answers {
         digests.answers.Add(text);
     }
     const Rename rename = workspace_.RenameTo(file, offset, "another_name");
-    digests.answers.Add(rename.problem);
+    digests.answers.Add(WithoutFolders(rename.problem));
     for (const TextEdit& edit : rename.edits) AddNumbers({edit.file, edit.begin, edit.end});
     for (const Span& span : workspace_.Selections(file, offset)) AddNumbers({span.begin, span.end});
   }
 
-  testing::TemporaryFolder folder_;
+  // Whose names are others in each run.
+  std::string WithoutFolders(std::string text) const {
+    for (const std::string& folder : {folder_.path(), testing::SmallLibrary()})
+      for (size_t at; (at = text.find(folder)) != std::string::npos;) text.erase(at, folder.size());
+    return text;
+  }
+
+  // Before that of the library, since answers are in the order of paths.
+  testing::TemporaryFolder folder_{"answers-"};
   Workspace workspace_;
 };
 

@@ -14,8 +14,9 @@ namespace quillet::testing {
 
 class TemporaryFolder {
  public:
-  TemporaryFolder() {
-    std::string name = (std::filesystem::temp_directory_path() / "quillet-XXXXXX").string();
+  // Its name begins with `prefix`, which orders it before or behind the others.
+  explicit TemporaryFolder(const std::string& prefix = "quillet-") {
+    std::string name = (std::filesystem::temp_directory_path() / (prefix + "XXXXXX")).string();
     path_ = std::filesystem::canonical(mkdtemp(name.data())).string();
   }
   TemporaryFolder(std::initializer_list<std::pair<const char*, const char*>> files) : TemporaryFolder() {
