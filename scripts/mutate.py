@@ -530,7 +530,8 @@ def main() -> int:
     todo.sort(key=lambda change: change.file.endswith(".h"))
     if options.show:
         todo = []
-    signal.signal(signal.SIGTERM, lambda *_: sys.exit(143))
+    # At once, and not behind the trials under way: the next run puts their files right.
+    signal.signal(signal.SIGTERM, lambda *_: os._exit(143))
     if todo:
         workshops = [
             Workshop(options.work / str(i), folders=options.folder or FOLDERS, jobs=options.jobs, python=options.python)
