@@ -128,7 +128,9 @@ Value Inference::ValueInDocstring(const FunctionInfo& info, Text name) {
     const StmtId first = syntax.stmt(owner).first_child;
     if (first == kModuleStmt || syntax.stmt(first).kind != StmtKind::kExpression) return {};
     const auto exprs = syntax.ExprsOf(syntax.stmt(first));
-    return exprs.size() == 1 && syntax[exprs[0]].kind == ExprKind::kString ? syntax.TextOf(syntax[exprs[0]]) : Text();
+    if (exprs.size() != 1 || syntax[exprs[0]].kind != ExprKind::kString) return {};
+    const Text text = syntax.TextOf(syntax[exprs[0]]);
+    return text.substr(0, text.find_last_not_of("'\"") + 1);
   };
   Text text = docstring_of(info.stmt);
   // A class says in its own what its constructor takes.

@@ -268,6 +268,11 @@ TEST(GrammarText, WindowsLineEndsByteOrderMarkAndCommentsAreNoMatter) {
   EXPECT_EQ(grammar.labels[1].keyword, "x");
 }
 
+TEST(GrammarTables, AreMadeOfRulesThatGoRoundBehindTheirBeginning) {
+  const Grammar grammar = Grammar::Parse("a: ['y'] ('x' 'z')* 'c'\n", "g");
+  EXPECT_EQ(Parse(grammar, "a", {{"x", 1}, {"z", 1}, {"x", 1}, {"z", 1}, {"c", 1}}), "a(x z x z c)");
+}
+
 TEST(GrammarTables, SymbolsAreNumberedInTheOrderOfTheFile) {
   const Grammar grammar = Grammar::Parse("zeta: alpha\nalpha: NAME\n", "g");
   EXPECT_EQ(grammar.symbol2number.at("zeta"), 256);

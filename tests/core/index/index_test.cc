@@ -195,6 +195,9 @@ TEST(Questions, AreAnsweredByNameAndUse) {
             Found{"8:16 os.path.join"});
   EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kSuffix, "path", UseOfKind(RecordKind::kSet))), Found{"7:9 path"});
   EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kSuffix, ".path", UseOfKind(RecordKind::kSet))), Found{});
+  EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kSuffix, ".LIMIT", UseOfKind(RecordKind::kSet))), Found{});
+  EXPECT_EQ(AnswersIn("from . import shop\n", QuestionFor(Match::kSuffix, ".shop", UseOfKind(RecordKind::kFromImport))),
+            Found{});
   EXPECT_EQ(AnswersIn(kShop, QuestionFor(Match::kGlob, "self.?tems", UseOfKind(RecordKind::kGet))),
             (Found{"5:9 self.items", "6:16 self.items"}));
 }
@@ -316,6 +319,7 @@ TEST(AnswersAsLines, AreSafeAndCutWhereTheyAreLong) {
   const std::string wide = "a = '" + std::string(155, 'x') + "\xC3\xBC\xC3\xBC'";
   EXPECT_EQ(LinesIn(wide, question, {}), "1\nt.py:1:1: " + wide.substr(0, 159) + "\xE2\x80\xA6\n");
   EXPECT_EQ(LinesIn("a = '\x1b[0m'", question, {}), "1\nt.py:1:1: a = '\\x1b[0m'\n");
+  EXPECT_EQ(LinesIn("a = '\x7F~'", question, {}), "1\nt.py:1:1: a = '\\x7f~'\n");
   EXPECT_EQ(LinesIn("a = '\xC3\xBC'", question, {}), "1\nt.py:1:1: a = '\xC3\xBC'\n");
 }
 

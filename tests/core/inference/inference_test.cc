@@ -487,4 +487,35 @@ TEST(Inference, KnowsKeywordsOfDictAndWhatClassesGiveForItems) {
   });
 }
 
+TEST(Inference, KnowsWhichReturnACallComesTo) {
+  Check({
+      {"def f(x):\n  if isinstance(x, int): return 1\n  return 'a'\n$a = f(1)\n$b = f('')\n$c = f(z)\n",
+       {"int", "str", "int | str"}},
+      {"def f(x):\n  if isinstance(x, (int, bytes)): return 1\n  return 'a'\n$a = f(b'')\n$b = f('')\n",
+       {"int", "str"}},
+      {"def f(x=None):\n  if x is None: return 1\n  return 'a'\n$a = f()\n$b = f('')\n", {"int", "str"}},
+      {"def f(x=None):\n  if x is not None: return 1\n  return 'a'\n$a = f()\n$b = f('')\n", {"str", "int"}},
+  });
+}
+
+TEST(Inference, BelievesDocstrings) {
+  Check({
+      {"def f(x, y, z):\n  ''':type x: int\n  @type y: list of str\n  :param float z: much\n  :rtype: (int, str)\n  "
+       "'''\n"
+       "  $x, $y, $z\n$a = f(u, v, w)\n",
+       {"int", "list[str]", "float", "tuple[int, str]"}},
+      {"def f(x, y, z, u=None):\n  '''Does it.\n\n  Args:\n    x (str): a\n    y (int or None): b\n    z (dict[str]): "
+       "c\n"
+       "    u (int, optional): d\n  '''\n  $x, $y, $z, $u\n",
+       {"str", "None | int", "dict[str, str]", "int"}},
+      {"class C: pass\ndef f(x, y):\n  '''Does it.\n\n  Parameters\n  ----------\n  x : string\n  y : :class:`C`\n\n"
+       "  Returns\n  -------\n  n : integer\n  '''\n  $x, $y\n$a = f(u, v)\n",
+       {"str", "a.C", "int"}},
+      {"def f(x):\n  '''Does it.\n\n  Yields\n  -------\n  dictionary\n  '''\n  return x()\n$a = f(u)\n", {"dict"}},
+      {"class A:\n  ''':type x: int'''\n  def __init__(self, x, y):\n    ''':type y: str'''\n    $x, $y\n",
+       {"int", "str"}},
+      {"def f(x):\n  a = 1\n  ''':type x: int'''\n  $x\n", {""}},
+  });
+}
+
 }  // namespace quillet
