@@ -248,6 +248,8 @@ class Inference {
   static bool IsOfBuiltinsStub(Text name);
   // What an import binds, followed to where it is defined.
   Entities EntitiesOfImport(const SourceFile& file, uint32_t offset, int depth = 0);
+  // What `from ..module import name` means in a file, of which nothing else is looked at.
+  Entities EntitiesOfImport(FileId importer, int level, Text module, Text name, int depth = 0);
 
   // ---- what there is ----
   ClassId ClassOfStmt(FileId file, StmtId stmt);

@@ -264,7 +264,6 @@ Entities Inference::EntitiesOfImport(const SourceFile& file, uint32_t offset, in
   const auto add_module = [&](ExprId path, size_t parts) {
     const ModuleId module = modules_.FindFrom(file.id, syntax[path].op, syntax.DottedNameOf(path, parts));
     if (module != kNoModule) found.found.push_back({Entity::kModule, module, 0});
-    return module;
   };
   const auto whole = [&](ExprId path) { return syntax.ChildrenOf(path).size(); };
   if (parent != kNoExpr && syntax[parent].kind == ExprKind::kModulePath) {
@@ -280,17 +279,18 @@ Entities Inference::EntitiesOfImport(const SourceFile& file, uint32_t offset, in
   }
   const ExprId path = exprs[0];
   const Text name = syntax.NameOf(syntax.ChildOf(parent, 0));
-  const ModuleId module = add_module(path, whole(path));
-  found.found.clear();
-  if (module == kNoModule) return found;
+  return EntitiesOfImport(file.id, syntax[path].op, syntax.DottedNameOf(path, whole(path)), name, depth);
+}
+
+Entities Inference::EntitiesOfImport(FileId importer, int level, Text path, Text name, int depth) {
+  const ModuleId module = modules_.FindFrom(importer, level, path);
+  if (module == kNoModule) return {};
   // A module that imports from itself, as a package does for its submodule, means the submodule.
-  if (FileOfModule(module) == file.id) {
+  if (FileOfModule(module) == importer) {
     const ModuleId child = modules_.Child(module, name);
-    if (child != kNoModule) found.found.push_back({Entity::kModule, child, 0});
-    return found;
+    return child == kNoModule ? Entities() : Entities{{{Entity::kModule, child, 0}}, 0};
   }
-  found = EntitiesInModule(module, name, depth + 1);
-  return found;
+  return EntitiesInModule(module, name, depth + 1);
 }
 
 std::vector<Binding> Inference::BindingsOf(const Entity& entity) {

@@ -1,8 +1,9 @@
-// One binder and one reader for each version serve all files; what they give is copied, so that a file holds no more
-// memory than it needs. Tokens go back when a file was read.
+// A binder and a reader for each version and thread serve all files; what they give is copied, so that a file holds no
+// more memory than it needs. Tokens go back when a file was read.
 #include "program/files.h"
 
 #include <algorithm>
+#include <array>
 #include <atomic>
 #include <deque>
 #include <optional>
@@ -12,6 +13,7 @@
 #include "foundations/utf8.h"
 #include "lines/cutter.h"
 #include "names/binder.h"
+#include "program/two_threads.h"
 #include "project/file_system.h"
 #include "project/word_search.h"
 #include "syntax/reader.h"
@@ -63,7 +65,7 @@ bool ReadDecoded(const std::string& path, const FileStamp& stamp, std::string& b
 void SetSourceDecoder(SourceDecoder decoder) { decoder_of_all.store(decoder, std::memory_order_release); }
 
 class Files::Impl {
-  // What reads sources of a version.
+  // Reads sources of a version.
   class SourceReader {
    public:
     explicit SourceReader(Version version) : version_(version), binder_(version), syntax_reader_(version) {}
@@ -93,6 +95,12 @@ class Files::Impl {
     std::vector<Token> tokens_;
     std::vector<LineRow> rows_;
     FileSyntax syntax_;
+  };
+  // What a thread reads files with.
+  struct Reader {
+    std::optional<SourceReader> sources;
+    std::optional<SourceReader> stubs;
+    std::string memory;
   };
 
  public:
@@ -125,6 +133,34 @@ class Files::Impl {
     entry.asked = ++asked_;
     if (entry.file == nullptr && !entry.is_unreadable) Read(file, entry);
     return entry.file.get();
+  }
+
+  void ReadAhead(std::span<const FileId> files) {
+    struct Wanted {
+      FileId number;
+      FileStamp stamp;
+      std::unique_ptr<SourceFile> file;
+    };
+    std::vector<Wanted> wanted;
+    for (const FileId number : files) {
+      const Entry& entry = entries_[number];
+      if (entry.file == nullptr && !entry.is_unreadable && !entry.buffer) wanted.push_back({number, {}, nullptr});
+    }
+    ForEachByThreads(wanted.size(), 2, readers_, [&](size_t i, Reader& reader) {
+      Wanted& at = wanted[i];
+      const std::string& path = entries_[at.number].path;
+      at.stamp = StampOf(path);
+      if (ReadDecoded(path, at.stamp, reader.memory)) at.file = Made(at.number, reader.memory, reader);
+      if (reader.memory.capacity() > kMostMemoryKept) reader.memory = {};
+    });
+    for (Wanted& at : wanted) {
+      Entry& entry = entries_[at.number];
+      // Get says that it cannot be read, or that it has changed.
+      if (at.file == nullptr || (entry.is_given_back && !IsSame(entry, at.file->text()))) continue;
+      entry.is_given_back = false;
+      entry.stamp = at.stamp;
+      Hold(entry, std::move(at.file));
+    }
   }
 
   Text SourceOf(FileId file, std::string& memory) const {
@@ -290,22 +326,26 @@ class Files::Impl {
       if (entry.is_unreadable) return;
       text = memory_;
     }
-    auto file = std::make_unique<SourceFile>();
-    file->id = number;
-    file->path = entry.path;
-    file->is_stub = IsStub(number);
-    ReaderFor(file->is_stub).Read(text, *file);
-    entry.byte_size = file->ByteSize();
-    held_ += entry.byte_size;
-    bytes_read_ += text.size();
-    entry.file = std::move(file);
+    Hold(entry, Made(number, text, readers_[0]));
     if (memory_.capacity() > kMostMemoryKept) memory_ = {};
   }
 
-  SourceReader& ReaderFor(bool is_stub) {
-    std::optional<SourceReader>& reader = is_stub ? stub_reader_ : reader_;
-    if (!reader) reader.emplace(is_stub ? kStubVersion : version_);
-    return *reader;
+  std::unique_ptr<SourceFile> Made(FileId number, Text text, Reader& reader) const {
+    auto file = std::make_unique<SourceFile>();
+    file->id = number;
+    file->path = entries_[number].path;
+    file->is_stub = IsStub(number);
+    std::optional<SourceReader>& sources = file->is_stub ? reader.stubs : reader.sources;
+    if (!sources) sources.emplace(file->is_stub ? kStubVersion : version_);
+    sources->Read(text, *file);
+    return file;
+  }
+
+  void Hold(Entry& entry, std::unique_ptr<SourceFile> file) {
+    entry.byte_size = file->ByteSize();
+    held_ += entry.byte_size;
+    bytes_read_ += file->text().size();
+    entry.file = std::move(file);
   }
 
   static constexpr size_t kMostMemoryKept = size_t{4} << 20;
@@ -314,8 +354,7 @@ class Files::Impl {
   std::deque<Entry> entries_;
   std::unordered_map<Text, FileId> numbers_;  // by the paths of the entries
   std::vector<FileId> buffers_;
-  std::optional<SourceReader> reader_;
-  std::optional<SourceReader> stub_reader_;
+  std::array<Reader, 2> readers_;
   std::string memory_;
   FileId lines_of_ = kNoFile;
   std::vector<uint32_t> lines_;  // where they begin
@@ -331,6 +370,7 @@ FileId Files::NumberOf(Text path) { return impl_->NumberOf(path); }
 const std::string& Files::PathOf(FileId file) const { return impl_->PathOf(file); }
 bool Files::Exists(FileId file) { return impl_->Exists(file); }
 const SourceFile* Files::Get(FileId file) { return impl_->Get(file); }
+void Files::ReadAhead(std::span<const FileId> files) { impl_->ReadAhead(files); }
 Text Files::SourceOf(FileId file, std::string& memory) const { return impl_->SourceOf(file, memory); }
 
 Position Files::PlaceOf(FileId file, uint32_t offset) { return impl_->PlaceOf(file, offset); }

@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <exception>
 #include <memory>
+#include <span>
 #include <string>
 #include <unordered_map>
 #include <vector>
@@ -46,6 +47,8 @@ class Files {
   // something changed. Bytes are decoded by encoding lines as batches decode them; what cannot be decoded is
   // read as Latin-1.
   const SourceFile* Get(FileId file);
+  // Reads those that Get would have to read, by two threads. What cannot be read is left for Get to say.
+  void ReadAhead(std::span<const FileId> files);
   // The same without syntax: whether a word stands in it as a whole word. False where it cannot be read.
   bool Holds(FileId file, Text word);
   // The source itself: a view of what is held of it, otherwise read into `memory`. Empty where it cannot be

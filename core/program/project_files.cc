@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <array>
+#include <numeric>
 #include <unordered_map>
 #include <unordered_set>
 #include <utility>
@@ -398,10 +399,12 @@ class ProjectFiles::Impl {
   }
 
   // Those whose filters hold what is asked for; the bytes of buffers are searched, and of all that are left where
-  // these are few or filters do not know a word.
+  // these are few or filters do not know a word. To make all filters takes five times as long as to search all files,
+  // so the first question, whose answer somebody waits for, does without.
   template <class Question>
   std::vector<FileId> Candidates(const std::vector<Text>& words, Question&& may_be) {
     All();
+    if (!std::exchange(was_asked_, true)) return Searched(words);
     UpdateFilters();
     std::vector<uint32_t> candidates;
     for (uint32_t i = 0; i < all_.size(); ++i) {
@@ -424,10 +427,21 @@ class ProjectFiles::Impl {
     Search(words, searched);
     candidates.insert(candidates.end(), searched.begin(), searched.end());
     std::ranges::sort(candidates);
-    std::vector<FileId> found;
-    found.reserve(candidates.size());
-    for (const uint32_t i : candidates) found.push_back(all_[i]);
-    return found;
+    return FilesAt(candidates);
+  }
+
+  std::vector<FileId> Searched(const std::vector<Text>& words) const {
+    std::vector<uint32_t> searched(all_.size());
+    std::iota(searched.begin(), searched.end(), 0);
+    Search(words, searched);
+    return FilesAt(searched);
+  }
+
+  std::vector<FileId> FilesAt(const std::vector<uint32_t>& indexes) const {
+    std::vector<FileId> files;
+    files.reserve(indexes.size());
+    for (const uint32_t i : indexes) files.push_back(all_[i]);
+    return files;
   }
 
   // The indexes of the files that buffers hold, sorted.
@@ -467,6 +481,7 @@ class ProjectFiles::Impl {
   std::vector<FileId> buffers_;
   bool has_walked_ = false;
   bool is_doubtful_ = false;
+  bool was_asked_ = false;  // for words
   // Of each file, and whether they have been compared with the files.
   std::vector<Filter> filters_;
   std::vector<FileStamp> stamps_;

@@ -1,7 +1,7 @@
 // The Python files below the roots of a project, and which of them hold a word.
 //
-// The first question about words reads all files and keeps a filter of each one's words, about a byte a word; those
-// behind it ask the filters, and read again what has changed.
+// The first question about words searches all files; the second one makes a filter of each one's words, about a byte a
+// word. Those behind it ask the filters, and read again what has changed.
 #pragma once
 
 #include <memory>

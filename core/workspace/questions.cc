@@ -87,12 +87,26 @@ void Workspace::Impl::GiveBack() {
   if (files.ByteSize() > settings.most_held) files.Trim(settings.most_held / 4 * 3);
 }
 
-Workspace::Impl::Visit::Visit(Impl& at, FileId visited)
-    : in_(at), id_(visited), was_held_(at.files.IsHeld(visited)), file(at.Get(visited)) {}
+Workspace::Impl::Visit::Visit(Impl& at, FileId visited) : Visit(at, visited, at.files.IsHeld(visited)) {}
+
+Workspace::Impl::Visit::Visit(Impl& at, FileId visited, bool was_held)
+    : in_(at), id_(visited), was_held_(was_held), file(at.Get(visited)) {}
 
 Workspace::Impl::Visit::~Visit() {
   if (!was_held_ && in_.files.ByteSize() > in_.settings.most_visited) in_.files.GiveBack(id_);
   in_.GiveBack();
+}
+
+Workspace::Impl::Visit Workspace::Impl::VisitAll::At(size_t i) {
+  static constexpr size_t kFilesAhead = 16;
+  if (i == read_) {
+    const std::span<const FileId> next = files_.subspan(i, std::min(kFilesAhead, files_.size() - i));
+    not_held_.clear();
+    std::ranges::copy_if(next, std::back_inserter(not_held_), [&](FileId file) { return !in_.files.IsHeld(file); });
+    in_.files.ReadAhead(not_held_);
+    read_ += next.size();
+  }
+  return Visit(in_, files_[i], std::ranges::find(not_held_, files_[i]) == not_held_.end());
 }
 
 bool Workspace::Impl::IsProject(FileId file) {

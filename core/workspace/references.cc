@@ -4,6 +4,8 @@
 #include <optional>
 #include <unordered_map>
 
+#include "program/name_imports.h"
+#include "program/two_threads.h"
 #include "workspace/workspace_impl.h"
 
 namespace quillet {
@@ -101,6 +103,46 @@ Entities Workspace::Impl::Meant(const SourceFile& file, uint32_t index) {
   return meant;
 }
 
+// What a variable of a module is called by elsewhere was imported from there, or stands behind a dot. So where the text
+// of a file has no dot in front of the name, the file's imports alone say whether it can be meant.
+void Workspace::Impl::LeaveOutOtherImports(std::vector<FileId>& candidates, Text name,
+                                           const std::vector<Entity>& wanted) {
+  static constexpr size_t kFilesWorthIt = 32;
+  if (candidates.size() < kFilesWorthIt || wanted.empty() || name.starts_with("__")) return;
+  const ModuleId builtins = modules.Find("builtins");
+  for (const Entity& entity : wanted) {
+    if (entity.kind != Entity::kVariable) return;
+    const SourceFile* owner = Get(entity.a);
+    // Every file has the names of builtins without an import.
+    if (owner == nullptr || owner->bindings.symbols[entity.b].scope != 0 || modules.OfFile(entity.a) == builtins)
+      return;
+  }
+  std::vector<std::optional<std::vector<NameImport>>> imports(candidates.size());
+  std::array<std::string, 2> memories;
+  ForEachByThreads(candidates.size(), kFilesWorthIt, memories, [&](size_t i, std::string& memory) {
+    imports[i] = ImportsOfName(files.SourceOf(candidates[i], memory), name);
+  });
+  const auto is_wanted = [&](const Entity& entity) { return std::ranges::find(wanted, entity) != wanted.end(); };
+  size_t kept = 0;
+  for (size_t i = 0; i < candidates.size(); ++i) {
+    const FileId file = candidates[i];
+    const ModuleId module = modules.OfFile(file);
+    // What a stub says of a module holds in its source as well.
+    const bool has_two_files =
+        module != kNoModule && modules[module].stub != kNoFile && modules[module].file != kNoFile;
+    const auto is_import_wanted = [&](const NameImport& import) {
+      const Text imported = import.name.empty() ? name : Text(import.name);
+      const Entities meant = inference.EntitiesOfImport(file, import.level, import.module, imported);
+      return std::ranges::any_of(meant.found, is_wanted);
+    };
+    if (has_two_files || !imports[i] ||
+        std::ranges::any_of(wanted, [&](const Entity& entity) { return entity.a == file; }) ||
+        std::ranges::any_of(*imports[i], is_import_wanted))
+      candidates[kept++] = file;
+  }
+  candidates.resize(kept);
+}
+
 std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, uint32_t index, bool everywhere) {
   std::vector<Hit> hits;
   const Occurrence occurrence = file.bindings.occurrences[index];
@@ -146,6 +188,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
       if (owner != kNoFile && std::ranges::find(candidates, owner) == candidates.end()) candidates.push_back(owner);
     }
     if (std::ranges::find(candidates, file.id) == candidates.end()) candidates.push_back(file.id);
+    LeaveOutOtherImports(candidates, name, wanted.found);
   }
   for (const Entity& entity : wanted.found) {
     if (entity.kind != Entity::kModule) continue;
@@ -157,13 +200,15 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
   // How many classes define an attribute of this name: what is used of an unknown receiver is likely the only one.
   std::vector<Hit> unknown;
   std::set<std::pair<FileId, uint32_t>> definers;
-  for (const FileId id : candidates) {
+  VisitAll visits(*this, candidates);
+  for (size_t next = 0; next < candidates.size(); ++next) {
+    const FileId id = candidates[next];
     if (IsMuchRemembered()) {
       ForgetFound();
       wanted = Meant(*Get(own), index);  // classes have other numbers now
       AddOtherSides(wanted);
     }
-    const Visit visit(*this, id);
+    const Visit visit = visits.At(next);
     const SourceFile* source = visit.file;
     if (source == nullptr) continue;
     const Bindings& bindings = source->bindings;

@@ -5,6 +5,7 @@
 #include <functional>
 #include <map>
 #include <set>
+#include <span>
 #include <string>
 #include <unordered_set>
 #include <vector>
@@ -37,6 +38,7 @@ class Workspace::Impl final : public CallerSource {
   // One of many files that a question goes over. While it lasts nothing is given back; behind it this one is, where
   // much is held and it was not before, and whatever was not asked for lately, where very much is: so no other file may
   // be in use then.
+  class VisitAll;
   class Visit {
    public:
     Visit(Impl& in, FileId file);
@@ -45,12 +47,28 @@ class Workspace::Impl final : public CallerSource {
     Visit& operator=(const Visit&) = delete;
 
    private:
+    friend class VisitAll;
+    Visit(Impl& in, FileId file, bool was_held);
+
     Impl& in_;
     const FileId id_;
     const bool was_held_;
 
    public:
     const SourceFile* const file;  // nullptr where it cannot be read
+  };
+  // Visits one file after another, and has some of them read ahead.
+  class VisitAll {
+   public:
+    VisitAll(Impl& in, std::span<const FileId> files) : in_(in), files_(files) {}
+    // Of the file at an index, which is the one behind the last.
+    Visit At(size_t i);
+
+   private:
+    Impl& in_;
+    const std::span<const FileId> files_;
+    size_t read_ = 0;               // so many were read ahead
+    std::vector<FileId> not_held_;  // of these, before
   };
   Text SourceForPlaces(FileId file);
   void ForgetPlaces() {
@@ -94,6 +112,8 @@ class Workspace::Impl final : public CallerSource {
   void AddOtherSides(Entities& entities);
   Binding CallWithUnseenKeywords(const Entity& entity);
   bool IsReceiverKnown(const SourceFile& file, const Occurrence& occurrence);
+  // Leaves out files which import something else under the name of variables of modules.
+  void LeaveOutOtherImports(std::vector<FileId>& candidates, Text name, const std::vector<Entity>& wanted);
 
   // ---- describe.cc ----
   std::string TextOfType(TypeId type, bool is_short = false, int depth = 0);

@@ -124,7 +124,12 @@ TEST(ProjectFiles, AreFoundByWholeWords) {
   folder.Write("many/m77.py", "total\n");
   Files files(Version::Of(3, 12));
   ProjectFiles project(files, {folder.path()});
-  EXPECT_EQ(Below(folder, files, project.WithWords({"total"})), (Paths{"a.py", "c.py", "d.py", "many/m77.py"}));
+  EXPECT_EQ(project.ByteSize(), 0u);
+  for (const char* how : {"searched", "by filters"}) {
+    EXPECT_EQ(Below(folder, files, project.WithWords({"total"})), (Paths{"a.py", "c.py", "d.py", "many/m77.py"}))
+        << how;
+  }
+  EXPECT_GT(project.ByteSize(), 0u);
   EXPECT_EQ(Below(folder, files, project.WithWords({"total", "cart"})), (Paths{"a.py"}));
   EXPECT_TRUE(project.WithWords({"total", "nothing"}).empty());
 }
@@ -135,7 +140,10 @@ struct Changing {
   Files files{Version::Of(3, 12)};
   ProjectFiles project{files, {folder.path()}};
 
-  Changing() { EXPECT_EQ(With("total"), (Paths{"a.py", "sub/c.py"})); }
+  Changing() {
+    EXPECT_EQ(With("total"), (Paths{"a.py", "sub/c.py"}));
+    EXPECT_EQ(With("total"), (Paths{"a.py", "sub/c.py"})) << "by filters";
+  }
   Paths All() { return Below(folder, files, project.All()); }
   Paths With(Text word) { return Below(folder, files, project.WithWords({word})); }
   Paths Defining(Text name) { return Below(folder, files, project.Defining(name)); }

@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -213,6 +214,54 @@ TEST(References, SayHowSureTheyAre) {
   });
   EXPECT_EQ(program.References(0), (Words{"a.py:2:7", "b.py:3:5 likely", "b.py:5:5"}));
   EXPECT_EQ(program.References(1), (Words{"a.py:4:7", "b.py:4:5 by name", "b.py:6:5"}));
+}
+
+TEST(References, AreThoseOfEachFileWhereManyHaveTheName) {
+  // Ways of saying and of not saying what `a.total` is. Asked alone, each is read whole.
+  const Words ways = {
+      "from a import total\ntotal()\n",
+      "from b import total\ntotal()\n",
+      "from c import total\ntotal()\n",
+      "from star import *\ntotal()\n",
+      "from star import *\ndef total(): pass\ntotal()\n",
+      "from b import *\ntotal()\n",
+      "import a\na.total()\nimport b\nb.total()\n",
+      "import a as m\n(m.  # here\n  total())\n",
+      "from a import (x,\n  # the sum\n  total as t)\nt()\n",
+      "from c import other as total\ntotal()\n",
+      "from b import x as total\ntotal()\n",
+      "def total(): pass\ntotal()\nf(total=1)\n",
+      "def f():\n  from a import total\n  return total\ntotal\n",
+      "try:\n  from b import total\nexcept ImportError:\n  from a import total\ntotal\n",
+      "from .a import total\ntotal\n",
+      "from a import total\n__all__ = ['total']\n",
+      "import total\ntotal\nfrom total import total\n",
+      "def f(x: 'a.total'): pass\nimport a\n",
+      "from a import total; total\n",
+      "from a import (total\nx = total\n",
+      "class C:\n  def total(self): return self.total\n",
+  };
+  const auto program_of = [&](size_t first, size_t last) {
+    auto program = std::make_unique<Program>(std::initializer_list<std::pair<std::string_view, std::string_view>>{
+        {"a.py", "def $total(): pass\n"},
+        {"b.py", "def total(): pass\nx = 1\n"},
+        {"c.py", "from a import total\nother = total\n"},
+        {"star.py", "from c import *\n"},
+        {"total.py", "from a import total\n"}});
+    for (size_t i = first; i < last; ++i) program->Open("way" + std::to_string(i) + ".py", ways[i % ways.size()]);
+    return program;
+  };
+  const size_t count = 2 * ways.size();
+  Words apart;
+  for (size_t i = 0; i < count; ++i) {
+    for (std::string& said : program_of(i, i + 1)->References())
+      if (std::ranges::find(apart, said) == apart.end()) apart.push_back(std::move(said));
+  }
+  Words together = program_of(0, count)->References();
+  std::ranges::sort(apart);
+  std::ranges::sort(together);
+  EXPECT_EQ(together, apart);
+  EXPECT_GT(together.size(), count);
 }
 
 TEST(References, OfOtherClassesAreNeverCertain) {
