@@ -136,7 +136,8 @@ void CheckLine(Analyzers& analyzers, LogicalLine& line, Place place) {
   const TypingNames typing;
   const auto analyze_completely = [&](CPGenAnalyzerImpl& analyzer) {
     line.parsed = false;
-    const auto error = analyzer.AnalyzeCompletely(line, complete_place, typing);
+    const auto error =
+        analyzer.AnalyzeCompletely(line, complete_place, typing, analyzer.IsDoubtful(line, complete_place));
     return ShowResult(line, error, /*may_have_both=*/true);
   };
   const std::string once = analyze_completely(*analyzers.complete);

@@ -153,10 +153,6 @@ bool CPGenAnalyzerImpl::WalkWithoutDoubt(LogicalLine& logical, bool in_async_def
   return closer_look_ == nullptr || (!node_walker_->met_doubtful() && !type_hint_walker_->hint_error());
 }
 
-uint8_t CPGenAnalyzerImpl::DoubtOf(const LogicalLine& logical) const {
-  return closer_look_ != nullptr ? closer_look_->DoubtOf(logical) : uint8_t{CloserLook::kNowhere};
-}
-
 bool CPGenAnalyzerImpl::InspectSingleLogical(LogicalLine& logical, bool in_async_def, bool in_embedded_expression,
                                              bool first_in_def) {
   CNode* node = nullptr;

@@ -51,7 +51,11 @@ class CPGenAnalyzerImpl {
   // tables do not take, or may take in error, is read by the parser that knows every rule, and its error is in
   // the language's own words. A hint that cannot be read is an error that leaves the statement its records.
   // Of an analyzer that was made for it.
-  std::optional<SyntaxError> AnalyzeCompletely(LogicalLine& logical, const LinePlace& place, const TypingNames& typing);
+  std::optional<SyntaxError> AnalyzeCompletely(LogicalLine& logical, const LinePlace& place, const TypingNames& typing,
+                                               bool is_doubtful);
+  // Whether such a line may be in error, for what its own tokens are, though the tables take it. Of a line that was
+  // cut completely, what the cutter says of it comes first (LineRow::unusual).
+  bool IsDoubtful(const LogicalLine& logical, const LinePlace& place) const;
 
   // True; throws ParseError, SyntaxError, or ValueError for anything else that went wrong.
   bool InspectSingleLogical(LogicalLine& logical, bool in_async_def, bool in_embedded_expression = false,
@@ -66,8 +70,6 @@ class CPGenAnalyzerImpl {
   // Walks a line without embedded expressions, which nobody asked for and of which nothing is reported. False
   // where its analysis would fail, or would not end with the walks.
   bool WalkWithoutDoubt(LogicalLine& logical, bool in_async_def);
-  // In which places the analysis of a line would not end with the walks, for what its own tokens are.
-  uint8_t DoubtOf(const LogicalLine& logical) const;
   // What was told is as if it had been read.
   void CountAsRead() { was_rejected_ = false; }
 
@@ -90,7 +92,7 @@ class CPGenAnalyzerImpl {
 
  private:
   // Throws what the statement is rejected with.
-  void InspectCompletely(LogicalLine& logical, const LinePlace& place);
+  void InspectCompletely(LogicalLine& logical, const LinePlace& place, bool is_doubtful);
   // The walks of a tree, which is given back; null for a line of comments.
   void WalkCompletely(CNode* tree, LogicalLine& logical, const LinePlace& place);
   void InspectEmbeddedCompletely(LogicalLine& logical, const LinePlace& place);

@@ -1,8 +1,7 @@
-// One table lookup a token; what is unusual is looked at in its place.
+// What is unusual is looked at in its place.
 #include "analysis/closer_look.h"
 
 #include <algorithm>
-#include <cstring>
 
 #include "lines/token_search.h"
 #include "parser/string_escapes.h"
@@ -14,7 +13,6 @@ namespace quillet {
 namespace {
 
 constexpr Text kDebugName = "__debug__";
-constexpr uint32_t kAnyLength = UINT32_MAX;
 
 // `*args, name`, where a parameter or an argument may begin.
 bool IsStarredWithNameBehind(TokenSpan toks, size_t star) {
@@ -39,30 +37,13 @@ bool IsDefinitionHead(const LogicalLine& line) {
   return line.toks[first].code == word::kAsync && next < count && line.toks[next].code == word::kDef;
 }
 
-// Whether an escape may be wrong: most are a letter for a line end or a quote.
-bool MayHoldWrongEscape(const Token& string) {
-  const char* const end = string.end();
-  for (const char* at = string.text; at < end; at += 2) {
-    at = static_cast<const char*>(std::memchr(at, '\\', static_cast<size_t>(end - at)));
-    if (at == nullptr) return false;
-    if (at[1] == 'x' || at[1] == 'N' || (at[1] | 0x20) == 'u') return true;
-  }
-  return false;
-}
-
 // Nearly all of what is looked at.
 bool IsUsual(const Token& token) {
   switch (token.code) {
     case tok::NAME:
-      return token.text[2] != kDebugName[2];
-    case tok::NUMBER: {
-      const char* at = token.text;
-      if (token.length > 1 && *at == '0') return false;
-      while (at < token.end() && IsAsciiDigit(*at)) ++at;
-      return at == token.end() && !IsAsciiIdentifierByte(*at);
-    }
+      return token.length != kDebugName.size();
     case tok::STRING:
-      return IsQuote(*token.text) && !MayHoldWrongEscape(token);
+      return IsQuote(*token.text) && UnusualTokens::IsPlainString(token.view());
     default:
       return false;
   }
@@ -110,10 +91,10 @@ bool IsUnusualString(TokenSpan toks, size_t i, bool python3, bool formatted_are_
 
 CloserLook::CloserLook(Version version)
     : python3_(version.AtLeast(3, 0)), minor_(version.parts[1]), is_old_(python3_ && minor_ < 6) {
-  const auto set = [this](TokenCode code, bool is_unusual) { unusual_[code] = is_unusual ? kAnyLength : 0; };
+  const auto set = [this](TokenCode code, bool is_unusual) { is_unusual_[code] = is_unusual; };
   for (const TokenCode code :
        {TokenCode{tok::COLONEQUAL}, TokenCode{word::kYield}, TokenCode{tok::NOTEQUAL}, TokenCode{tok::RARROW},
-        TokenCode{tok::NUMBER}, TokenCode{tok::STRING}, TokenCode{word::kReturn}})
+        TokenCode{tok::NAME}, TokenCode{tok::NUMBER}, TokenCode{tok::STRING}, TokenCode{word::kReturn}})
     set(code, true);
   for (const TokenCode code : {word::kAwait, word::kAsync, word::kNonlocal}) set(code, python3_);
   set(tok::SLASH, python3_ && minor_ < 8);
@@ -122,7 +103,6 @@ CloserLook::CloserLook(Version version)
   set(tok::STAR, !python3_);
   set(word::kNone, !python3_);
   if (!python3_) set(tok::NOTEQUAL, false);
-  unusual_[tok::NAME] = uint32_t{1} << kDebugName.size();
 }
 
 bool CloserLook::NeedsCompleteParser(const LogicalLine& line) const {
@@ -178,13 +158,8 @@ uint8_t CloserLook::DoubtOf(const LogicalLine& line) const {
     }
     if (last == tok::COMMA) return kEverywhere;
   }
-  const Token* const begin = line.toks.data();
-  const Token* const end = begin + line.toks.size();
-  for (const Token* token = begin; token < end; ++token) {
-    if ((unusual_[token->code] >> (token->length & 31) & 1) == 0 || IsUsual(*token)) [[likely]]
-      continue;
-    doubt |= DoubtOfToken(line, static_cast<size_t>(token - begin));
-  }
+  for (size_t i = 0; i < line.toks.size(); ++i)
+    if (is_unusual_[line.toks[i].code] && !IsUsual(line.toks[i])) doubt |= DoubtOfToken(line, i);
   return doubt;
 }
 

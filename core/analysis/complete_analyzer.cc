@@ -44,7 +44,7 @@ bool HoldsHash(TokenSpan toks) {
 }  // namespace
 
 std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeCompletely(LogicalLine& logical, const LinePlace& place,
-                                                                const TypingNames& typing) {
+                                                                const TypingNames& typing, bool is_doubtful) {
   if (logical.parsed) return std::nullopt;
   logical.SetParsed(true);
   typing_ = &typing;
@@ -54,7 +54,7 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeCompletely(LogicalLine& log
   was_rejected_ = true;
   try {
     logical.ClearDerivedInfo();
-    InspectCompletely(logical, place);
+    InspectCompletely(logical, place, is_doubtful);
     if (rejection_) [[unlikely]] {
       logical.ClearDerivedInfo();
       return std::move(rejection_);
@@ -95,7 +95,11 @@ SyntaxError CPGenAnalyzerImpl::ErrorAt(const std::string& message, const Logical
                              : CreateTextlessSyntaxError(message, logical, context);
 }
 
-void CPGenAnalyzerImpl::InspectCompletely(LogicalLine& logical, const LinePlace& place) {
+bool CPGenAnalyzerImpl::IsDoubtful(const LogicalLine& logical, const LinePlace& place) const {
+  return closer_look_->IsDoubtful(logical, place);
+}
+
+void CPGenAnalyzerImpl::InspectCompletely(LogicalLine& logical, const LinePlace& place, bool is_doubtful) {
   if (logical.kind == LineKind::kComment) return WalkCompletely(nullptr, logical, place);
   const auto parse_completely = [&] {
     CNode* const parsed = complete_parser_->ParseStatement(logical, PlaceOfStatement(place));
@@ -122,7 +126,7 @@ void CPGenAnalyzerImpl::InspectCompletely(LogicalLine& logical, const LinePlace&
   }
   try {
     WalkCompletely(tree, logical, place);
-    if (!node_walker_->met_doubtful() && !closer_look_->IsDoubtful(logical, place)) [[likely]]
+    if (!node_walker_->met_doubtful() && !is_doubtful) [[likely]]
       return;
   } catch (const Error&) {
     // A shape that a walk does not take. The other tree has another, or there is none.

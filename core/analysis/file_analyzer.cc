@@ -2,9 +2,11 @@
 #include "analysis/file_analyzer.h"
 
 #include <algorithm>
+#include <cassert>
 #include <cstring>
 #include <utility>
 
+#include "analysis/closer_look.h"
 #include "lines/future_imports.h"
 #include "parser/complete_parser.h"
 #include "tokens/byte_scan.h"
@@ -145,19 +147,22 @@ void FileAnalyzer::AnalyzeRow(Analyzer& analyzer, const LineRow& row, bool is_wa
     SetFromRow(line, found_.source, row);
     line.parsed = false;
     line.WriteTo(&found_.store);
-    if (const auto error = AnalyzeLine(analyzer, line, place)) {
-      result.error = AddError(*error);
-    }
+    const bool is_doubtful = CloserLook::MayBeDoubtful(row.unusual, place) && analyzer.analyzer.IsDoubtful(line, place);
+    assert(is_doubtful || !options_.reads_completely || !analyzer.analyzer.IsDoubtful(line, place));
+    if (is_doubtful || !analyzer.shapes.Tell(line, place, typing_))
+      result.error = AnalyzeLine(analyzer.analyzer, line, place, is_doubtful);
   }
   result.record_end = static_cast<uint32_t>(found_.store.rows.size());
   result.arg_record_end = static_cast<uint32_t>(found_.store.arg_rows.size());
   found_.results.push_back(result);
 }
 
-std::optional<SyntaxError> FileAnalyzer::AnalyzeLine(Analyzer& analyzer, LogicalLine& line, const LinePlace& place) {
-  if (analyzer.shapes.Tell(line, place, typing_)) return std::nullopt;
-  if (options_.reads_completely) return analyzer.analyzer.AnalyzeCompletely(line, place, typing_);
-  return analyzer.analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def);
+int32_t FileAnalyzer::AnalyzeLine(CPGenAnalyzerImpl& analyzer, LogicalLine& line, const LinePlace& place,
+                                  bool is_doubtful) {
+  const auto error = options_.reads_completely
+                         ? analyzer.AnalyzeCompletely(line, place, typing_, is_doubtful)
+                         : analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def);
+  return error ? AddError(*error) : -1;
 }
 
 void FileAnalyzer::ApplyBlockRules(CPGenAnalyzerImpl& analyzer, size_t index) {

@@ -122,7 +122,8 @@ class FileAnalyzer {
   void Reset(Text bytes);
   void Cut();
   void AnalyzeRow(Analyzer& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line);
-  std::optional<SyntaxError> AnalyzeLine(Analyzer& analyzer, LogicalLine& line, const LinePlace& place);
+  // The index of its error, or -1.
+  int32_t AnalyzeLine(CPGenAnalyzerImpl& analyzer, LogicalLine& line, const LinePlace& place, bool is_doubtful);
   // Returns its index.
   int32_t AddError(const SyntaxError& error);
   // What the row has to say to those around it.

@@ -6,7 +6,6 @@
 #include <cstring>
 #include <utility>
 
-#include "analysis/closer_look.h"
 #include "foundations/stop.h"
 #include "text/node_to_text.h"
 #include "tokens/token_ends.h"
@@ -68,19 +67,12 @@ uint64_t Load64(const void* at) {
   return value;
 }
 
-// The names that a walker knows by their text.
-bool IsKnownName(Text name) { return name == "isinstance" || name == "__debug__"; }
+// The name that a walker knows by its text.
+bool IsKnownName(Text name) { return name == "isinstance"; }
 
 // That reads as such in every version.
 bool IsAllDigits(Text text) {
   return (text.size() == 1 || text[0] != '0') && std::all_of(text.begin(), text.end(), IsAsciiDigit);
-}
-
-// What a string may not hold in some places: what is told of others of its shape does not tell that.
-bool MayHoldWrongText(Text string, bool has_prefix) {
-  return string.find('\\') != Text::npos || (has_prefix && std::any_of(string.begin(), string.end(), [](char c) {
-                                               return static_cast<unsigned char>(c) >= 0x80;
-                                             }));
 }
 
 size_t PrefixLengthOf(const Token& string) {
@@ -144,8 +136,6 @@ class StatementShapes::Key {
   size_t first_equal(size_t i) const { return bytes_[kHead + 2 * i + 1] & ((1 << kGapShift) - 1); }
   // No text that the statement's tokens are joined to is longer.
   size_t MostJoined() const { return text_size_ + count_ + 2; }
-  // Whether there is something in it that makes it doubtful or not, and that is not part of its shape.
-  bool needs_look() const { return needs_look_; }
 
  private:
   static constexpr size_t kHead = 2;
@@ -158,7 +148,7 @@ class StatementShapes::Key {
     switch (token.code) {
       case tok::NAME:
         bytes_[kHead + 2 * i + 1] |= FirstEqual(i);
-        if ((token.length == 9 || token.length == 10) && IsKnownName(token.view())) [[unlikely]]
+        if (token.length == 10 && IsKnownName(token.view())) [[unlikely]]
           what = WithOwnText(token.view());
         break;
       case tok::NUMBER:
@@ -185,7 +175,6 @@ class StatementShapes::Key {
     // An empty one reads like one whose contents are not shown.
     if (token.length == prefix_length + 2) return WithOwnText(token.view());
     const bool is_shown = CNodeToTextConverter::ShowsContentsOf(token.view());
-    needs_look_ |= (!is_shown || prefix_length != 0) && MayHoldWrongText(token.view(), prefix_length != 0);
     if (prefix_length == 0) return is_shown ? kShownString : kUnshownString;
     if (WithOwnText({token.text, prefix_length}) == kNever) return kNever;
     return is_shown ? kShownPrefixed : kUnshownPrefixed;
@@ -225,7 +214,6 @@ class StatementShapes::Key {
   size_t count_ = 0;
   size_t size_ = 0;
   size_t text_size_ = 0;
-  bool needs_look_ = false;
   // The tokens that equal none in front of them.
   uint64_t seen_ = 0;  // a bit for the front of each
   size_t known_count_ = 0;
@@ -343,7 +331,6 @@ class StatementShapes::Plan {
     std::vector<Piece> pieces;
     std::string fixed;
     bool is_bounded = false;
-    uint8_t doubt = 0;
   };
 
   // That of a shape which has to be analysed each time.
@@ -351,7 +338,6 @@ class StatementShapes::Plan {
 
   Plan(const Key& key, const Parts& parts)
       : is_bounded_(parts.is_bounded),
-        doubt_(parts.doubt),
         key_size_(static_cast<uint8_t>(key.size())),
         row_count_(static_cast<uint8_t>(parts.row_count)),
         record_count_(static_cast<uint8_t>(parts.records.size())),
@@ -371,8 +357,6 @@ class StatementShapes::Plan {
   bool is_whole() const { return is_whole_; }
   // Whether the statement holds operator expressions, whose text may be too long.
   bool is_bounded() const { return is_bounded_; }
-  // Where it has to be read as a whole, see CloserLook.
-  uint8_t doubt() const { return doubt_; }
 
   // Appends the records of a statement of the shape.
   void Tell(LogicalLine& line, std::string& scratch) const {
@@ -485,7 +469,6 @@ class StatementShapes::Plan {
 
   bool is_whole_ = true;
   bool is_bounded_;
-  uint8_t doubt_;
   uint8_t key_size_;
   uint8_t row_count_;
   uint8_t record_count_;
@@ -616,9 +599,7 @@ bool StatementShapes::Tell(LogicalLine& line, const LinePlace& place, const Typi
   }
   slot.uses += slot.uses < kMostUses;
   const Plan& plan = *slot.plan;
-  if (!plan.is_whole() || (plan.is_bounded() && key.MostJoined() > CNodeWalker::kMaxOperatorText) ||
-      CloserLook::IsDoubtAt(key.needs_look() ? analyzer_.DoubtOf(line) : plan.doubt(), place))
-    return false;
+  if (!plan.is_whole() || (plan.is_bounded() && key.MostJoined() > CNodeWalker::kMaxOperatorText)) return false;
   plan.Tell(line, scratch_);
   analyzer_.CountAsRead();
   // Comes last: a host that is asked whether to stop may have other lines analysed, and plans replaced.
@@ -680,7 +661,6 @@ std::unique_ptr<const StatementShapes::Plan> StatementShapes::Learn(const Key& k
   PlanReader reader(statement);
   if (!reader.Read(made_up)) return std::make_unique<Plan>(key);
   reader.parts().is_bounded = is_bounded;
-  reader.parts().doubt = analyzer_.DoubtOf(made_up);
   return std::make_unique<Plan>(key, reader.parts());
 }
 

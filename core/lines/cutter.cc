@@ -9,6 +9,7 @@
 #include <algorithm>
 
 #include "lines/token_search.h"
+#include "lines/unusual_tokens.h"
 #include "tokens/scanner.h"
 
 namespace quillet {
@@ -80,7 +81,7 @@ class Statement {
     return NextSignificant(toks_, body, end_) < end_ ? static_cast<uint32_t>(body) : end_;
   }
 
-  LineKind Kind() const {
+  [[gnu::always_inline]] inline LineKind Kind() const {
     switch (lead_) {
       case word::kAssert:
         return LineKind::kAssert;
@@ -212,20 +213,23 @@ class Statement {
   TokenCode lead_;  // its code, or that of the word behind `async`
 };
 
+// `Unusual`: what looks at each token.
+template <class Unusual>
 class Cutter {
  public:
   Cutter(Version version, std::vector<LineRow>& rows, size_t most_memory)
-      : python2_(!version.AtLeast(3, 0)), rows_(rows), most_memory_(most_memory) {}
+      : python2_(!version.AtLeast(3, 0)), rows_(rows), most_memory_(most_memory), unusual_(version) {}
 
   // ---- what the scanner calls ----
 
   void BlankLine(uint32_t indent, const ScanOutput& out) {
-    Add({out.token_count(), 0, out.line(), out.line(), indent, LineKind::kBlankLine, false, false, false, true}, out);
+    Add({out.token_count(), 0, out.line(), out.line(), indent, LineKind::kBlankLine, false, false, false, true, 0},
+        out);
   }
 
   void CommentLine(uint32_t indent, const ScanOutput& out) {
     Add({out.token_count() - 1, 1, out.line(), out.line(), indent, LineKind::kComment, false, false, false,
-         !facts_.has_type_comment},
+         !facts_.has_type_comment, 0},
         out);
     facts_ = {};
   }
@@ -261,6 +265,7 @@ class Cutter {
       }
     }
     facts_ = {};
+    unusual_.Reset();
   }
 
   // Broken code: brackets that were never closed end in front of a line that is indented no deeper
@@ -281,6 +286,12 @@ class Cutter {
   void Colon(uint32_t index) { facts_.Colon(index); }
   void String(uint32_t index, bool formatted) { facts_.String(index, formatted); }
   void Comment(Text comment) { facts_.Comment(comment); }
+  void SeeName(TokenCode code) { unusual_.SeeName(code); }
+  void SeeUnderscore(const char* name) { unusual_.SeeUnderscore(name); }
+  void SeeOperator(char first, TokenCode code) { unusual_.SeeOperator(first, code); }
+  void SeeWalrus() { unusual_.SeeWalrus(); }
+  void SeeNumber(Text number) { unusual_.SeeNumber(number); }
+  void SeeString(Text string) { unusual_.SeeString(string); }
 
  private:
   void BeginPiece(bool continues, const ScanOutput& out) {
@@ -328,8 +339,9 @@ class Cutter {
 
   void AddRow(const Statement& statement, TokenSpan toks, uint32_t end, bool has_inline_body, const ScanOutput& out) {
     const LineKind kind = statement.Kind();
+    if (kind == LineKind::kFromImport) unusual_.SeeEndOfImport(toks[end - 1]);
     Add({first_, end - first_, first_line_, LastLine(toks, end, out), indent_, kind, continues_, has_inline_body,
-         statement.is_async(), statement.HasNoEmbedded(kind)},
+         statement.is_async(), statement.HasNoEmbedded(kind), unusual_.reasons()},
         out);
   }
 
@@ -351,6 +363,7 @@ class Cutter {
   std::vector<LineRow>& rows_;
   const size_t most_memory_;
   StatementFacts facts_;     // of the tokens since first_
+  Unusual unusual_;          // likewise
   uint32_t first_ = 0;       // the first token of the statement under way
   uint32_t first_line_ = 0;  // its line
   uint32_t indent_ = 0;
@@ -367,12 +380,12 @@ void Scan(SourceText& source, Version version, size_t most_memory, Client& clien
 }  // namespace
 
 void CutLines(SourceText& source, Version version, std::vector<LineRow>& rows, size_t most_memory) {
-  Cutter cutter(version, rows, most_memory);
+  Cutter<NoUnusualTokens> cutter(version, rows, most_memory);
   Scan(source, version, most_memory, cutter);
 }
 
 void CutLinesCompletely(SourceText& source, Version version, std::vector<LineRow>& rows, size_t most_memory) {
-  Cutter cutter(version, rows, most_memory);
+  Cutter<UnusualTokens> cutter(version, rows, most_memory);
   Scan(source, version, most_memory, cutter, version.AtLeast(3, 14));
 }
 

@@ -30,13 +30,15 @@ struct LineRow {
   bool has_inline_body : 1;
   bool is_async : 1;     // begins with `async def`, `async for` or `async with`
   bool no_embedded : 1;  // see LogicalLine::no_embedded
+  uint8_t unusual;       // the reasons of UnusualTokens; 0 where the source was not cut completely
 };
 static_assert(sizeof(LineRow) == 24);
 
 // Fills source.tokens and source.line_starts and appends the rows. `version` settles how f-strings
 // end (from 3.12 on they nest). OverflowError where tokens and rows would take more than `most_memory`.
 void CutLines(SourceText& source, Version version, std::vector<LineRow>& rows, size_t most_memory = SIZE_MAX);
-// The same where template strings (3.14) end as they do, and not at their first own quote.
+// The same where template strings (3.14) end as they do, and not at their first own quote; and rows say what is
+// unusual in them.
 void CutLinesCompletely(SourceText& source, Version version, std::vector<LineRow>& rows, size_t most_memory = SIZE_MAX);
 
 // Only the tokens, for measuring and for checks; NEWLINE is not among them.

@@ -20,6 +20,8 @@
 //   bool ClosesBrackets(const char* line)      at a line begun within brackets; true: they end here
 //   void Assign(uint32_t index), Colon(uint32_t index)            of a token outside brackets
 //   void String(uint32_t index, bool formatted), Comment(Text comment)
+//   void SeeName(TokenCode code), SeeUnderscore(const char* name), SeeOperator(char first, TokenCode code),
+//   SeeWalrus(), SeeNumber(Text number), SeeString(Text string)
 #pragma once
 
 #include <algorithm>
@@ -40,7 +42,8 @@ namespace quillet {
 namespace scanner {
 
 enum ByteClass : uint8_t {
-  kName,    // a letter or "_"
+  kName,  // a letter
+  kUnderscore,
   kBlank,   // blank, tab, form feed
   kSingle,  // an operator of its own: brackets, comma, "~", backquote
   kDot,
@@ -70,7 +73,7 @@ constexpr ByteTables MakeByteTables() {
   };
   for (int c = 0x80; c < 0x100; ++c) tables.classes[c] = kHigh;
   for (int c = 'a'; c <= 'z'; ++c) tables.classes[c] = tables.classes[c - 'a' + 'A'] = kName;
-  set("_", kName);
+  set("_", kUnderscore);
   set(" \t\f", kBlank);
   set("()[]{},~`", kSingle);
   set(".", kDot);
@@ -179,6 +182,12 @@ struct TokensOnly {
   void Colon(uint32_t) {}
   void String(uint32_t, bool) {}
   void Comment(Text) {}
+  void SeeName(TokenCode) {}
+  void SeeUnderscore(const char*) {}
+  void SeeOperator(char, TokenCode) {}
+  void SeeWalrus() {}
+  void SeeNumber(Text) {}
+  void SeeString(Text) {}
 };
 
 template <class Client>
@@ -221,7 +230,14 @@ class Scanner : private ScanOutput {
     while ((at = FindAny<'\n', '\r'>(at, token_end)) < token_end) at = StepLineEnd(at);
   }
 
+  // Of a code that is known here.
   const char* Emit(const char* at, const char* token_end, TokenCode code) {
+    if (code == tok::NUMBER) client_.SeeNumber(Text(at, static_cast<size_t>(token_end - at)));
+    if (code == tok::STRING) client_.SeeString(Text(at, static_cast<size_t>(token_end - at)));
+    return Keep(at, token_end, code);
+  }
+
+  const char* Keep(const char* at, const char* token_end, TokenCode code) {
     Token& token = tokens_.next();
     token.text = at;
     token.length = static_cast<uint32_t>(token_end - at);
@@ -263,6 +279,9 @@ class Scanner : private ScanOutput {
     for (;;) {
       const char c = *at;
       switch (ClassOf(c)) {
+        case ByteClass::kUnderscore:
+          client_.SeeUnderscore(at);
+          [[fallthrough]];
         case ByteClass::kName:
           at = ScanName(at);
           break;
@@ -283,6 +302,7 @@ class Scanner : private ScanOutput {
           break;
         case ByteClass::kColon:
           if (at[1] == '=') {
+            client_.SeeWalrus();
             at = Emit(at, at + 2, tok::COLONEQUAL);
             break;
           }
@@ -294,7 +314,8 @@ class Scanner : private ScanOutput {
           if (depth == 0 && IsAssignment(op.code) && (op.code != tok::ATEQUAL || c == '@')) {
             client_.Assign(token_count());
           }
-          at = Emit(at, at + op.length, op.code);
+          client_.SeeOperator(c, op.code);
+          at = Keep(at, at + op.length, op.code);
           break;
         }
         case ByteClass::kDigit:
@@ -364,7 +385,9 @@ class Scanner : private ScanOutput {
       const char* whole_end = UnicodeNameEnd(name_end, end_, false);
       if (whole_end != name_end) return Emit(at, whole_end, tok::NAME);
     }
-    return Emit(at, name_end, CodeOfPaddedName(at, length));
+    const TokenCode code = CodeOfPaddedName(at, length);
+    client_.SeeName(code);
+    return Keep(at, name_end, code);
   }
 
   const char* ScanHigh(const char* at) {

@@ -12,6 +12,7 @@
 
 #include "lines/future_imports.h"
 #include "lines/scopes.h"
+#include "lines/unusual_tokens.h"
 #include "tests/core/support/verify_tokens.h"
 
 namespace quillet {
@@ -700,6 +701,44 @@ TEST(SourceTexts, TakeFileAfterFile) {
   EXPECT_EQ(source->tokens.size(), 1u);
   EXPECT_EQ(source->PositionOf(source->tokens[0].text), (Position{0, 0}));
 }
+
+// ---- what is unusual in a row ----
+
+uint8_t UnusualIn(Text statement, Version version = Version::Of(3, 12)) {
+  const Ref<SourceText> source = SourceText::Copy(statement);
+  std::vector<LineRow> rows;
+  CutLinesCompletely(*source, version, rows);
+  EXPECT_EQ(rows.size(), 1u) << statement;
+  return rows[0].unusual;
+}
+
+TEST(Unusual, IsWhatOnlySomeVersionsTake) {
+  for (const char* statement :
+       {"a.b = c[1] + 0.5, 0x1F, 1e5, None", R"(f('x\n', "'\\x", r'\x', *a, **b))", "x != y / z - 1 | w",
+        "from a import (b, c,)", "import a.b as __name__", "debug = __debug"})
+    EXPECT_EQ(UnusualIn(statement), 0) << statement;
+  for (const char* statement :
+       {"x = 0777", "x = 1L", "x = 1if y else z", R"(x = '\xZ')", R"(x = """\N{a}""")", "x = b'a'", "x = f'{a}'",
+        "x <> y", "f(a := b)", "def f() -> x:", "a @= b", "a |= b", "x = yield", "await x",
+        "async def f():", "nonlocal x", "x = __debug__", "from a import *", "from a import b,"})
+    EXPECT_EQ(UnusualIn(statement) & UnusualTokens::kOther, UnusualTokens::kOther) << statement;
+  EXPECT_EQ(UnusualIn("if a: return b"), UnusualTokens::kReturn);
+}
+
+TEST(Unusual, DependsOnTheVersion) {
+  const Version python2 = Version::Of(2, 7);
+  for (const char* statement : {"def f(a, /, b):", "f(a / b)"}) {
+    EXPECT_NE(UnusualIn(statement, Version::Of(3, 7)), 0) << statement;
+    EXPECT_EQ(UnusualIn(statement, Version::Of(3, 8)), 0) << statement;
+    EXPECT_EQ(UnusualIn(statement, python2), 0) << statement;
+  }
+  for (const char* statement : {"None.x", "f(*a, b)", "x = 1_0"})
+    EXPECT_NE(UnusualIn(statement, python2), 0) << statement;
+  EXPECT_EQ(UnusualIn("x <> y", python2), 0);
+  EXPECT_NE(UnusualIn("x", Version::Of(3, 5)), 0);
+}
+
+TEST(Unusual, IsNotAskedOfAnExactCut) { EXPECT_EQ(Cut("x = yield <> 0777\n").rows[0].unusual, 0); }
 
 // ---- what the fuzzer started from ----
 

@@ -1,0 +1,122 @@
+// Which tokens give reason to look at a statement more closely: those that only some versions take, or some places.
+//
+// A cutter asks this while it has each token in hand anyway, so that what looks closely (closer_look.h) knows of most
+// statements that nothing is to be found in them. Names and operators cost a comparison, brackets and the like nothing.
+#pragma once
+
+#include <cstdint>
+#include <cstring>
+
+#include "tokens/byte_scan.h"
+#include "tokens/token.h"
+#include "tokens/token_ends.h"
+
+namespace quillet {
+
+class UnusualTokens {
+ public:
+  enum Reason : uint8_t {
+    kReturn = 1,  // that matters outside of functions
+    kOther = 2,
+  };
+
+  explicit UnusualTokens(Version version)
+      : python3_(version.AtLeast(3, 0)),
+        is_old_(python3_ && !version.AtLeast(3, 6)),
+        has_slash_(!python3_ || version.AtLeast(3, 8)) {
+    Reset();
+  }
+
+  // ---- the tokens of a statement ----
+
+  void SeeName(TokenCode code) {
+    static_assert(word::kNone < word::kAsync && word::kAsync < word::kAwait && word::kAwait < word::kNonlocal &&
+                  word::kNonlocal < word::kReturn && word::kReturn < word::kYield && word::kYield + 1 == word::kEnd);
+    if (code >= word::kNone) [[unlikely]]
+      reasons_ |= code == word::kReturn ? kReturn : code != word::kNone || !python3_ ? kOther : 0;
+  }
+  // In front of the name itself.
+  void SeeUnderscore(const char* name) {
+    if (std::memcmp(name, kDebug.data(), kDebug.size()) == 0) [[unlikely]]
+      reasons_ |= kOther;
+  }
+  void SeeOperator(char first, TokenCode code) {
+    switch (first) {
+      case '<':
+        if (code == tok::NOTEQUAL && python3_) reasons_ |= kOther;
+        break;
+      case '|':
+        if (code == tok::VBAREQUAL) reasons_ |= kOther;
+        break;
+      case '-':
+      case '@':
+        if (code == tok::RARROW) reasons_ |= kOther;
+        break;
+      case '*':
+        if (code == tok::STAR && !python3_) reasons_ |= kOther;
+        break;
+      case '/':
+        if (code == tok::SLASH && !has_slash_) reasons_ |= kOther;
+        break;
+      default:
+        break;
+    }
+  }
+  void SeeWalrus() { reasons_ |= kOther; }
+  void SeeNumber(Text number) {
+    if (!IsPlainNumber(number)) reasons_ |= kOther;
+  }
+  void SeeString(Text string) {
+    if (!IsPlainString(string)) reasons_ |= kOther;
+  }
+  // How the statement ends counts where it imports.
+  void SeeEndOfImport(const Token& last) {
+    if (!IsNameCode(last.code) && last.code != tok::RPAR) reasons_ |= kOther;
+  }
+
+  uint8_t reasons() const { return reasons_; }
+  void Reset() { reasons_ = is_old_ ? kOther : 0; }
+
+  // Without a prefix, and without an escape that may be wrong: most are a letter for a line end or a quote.
+  static bool IsPlainString(Text string) {
+    const char* at = string.data();
+    const char* const end = at + string.size();
+    if (!IsQuote(*at)) return (*at | 0x20) == 'r' && IsQuote(at[1]);
+    for (; (at = FindAny<'\\'>(at, end)) < end; at += 2)
+      if (at[1] == 'x' || at[1] == 'N' || (at[1] | 0x20) == 'u') return false;
+    return true;
+  }
+
+ private:
+  static constexpr Text kDebug = "__debug__";
+
+  // One that means the same in every version.
+  bool IsPlainNumber(Text number) const {
+    const char next = *(number.data() + number.size());
+    if (IsAsciiIdentifierByte(next) || static_cast<unsigned char>(next) >= 0x80) return false;
+    if (number.size() == 1) return true;
+    if ((number.back() | 0x20) == 'l' || (number[0] == '0' && IsAsciiDigit(number[1]))) return false;
+    return python3_ || number.find('_') == Text::npos;
+  }
+
+  const bool python3_;
+  const bool is_old_;  // of versions that lack so much that each statement is looked at
+  const bool has_slash_;
+  uint8_t reasons_;
+};
+
+// In its place for who does not want to know.
+struct NoUnusualTokens {
+  explicit NoUnusualTokens(Version) {}
+  void SeeName(TokenCode) {}
+  void SeeUnderscore(const char*) {}
+  void SeeOperator(char, TokenCode) {}
+  void SeeWalrus() {}
+  void SeeNumber(Text) {}
+  void SeeString(Text) {}
+  void SeeEndOfImport(const Token&) {}
+  uint8_t reasons() const { return 0; }
+  void Reset() {}
+};
+
+}  // namespace quillet
