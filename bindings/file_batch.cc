@@ -112,6 +112,7 @@ BatchAnalyzer::Options FileBatch::OptionsOf(const Language& language, unsigned j
   BatchAnalyzer::Options options;
   options.analyzer = language.options();
   options.jobs = jobs;
+  options.make_thread_state = [] { return std::make_shared<KeptThreadState>(); };
   options.decode = [this](Text bytes, std::string& utf8) { return decoder_.Decode(bytes, utf8); };
   const Version version = options.analyzer.version;
   if (bindings) options.make_binder = [version] { return MakeFileBinder(version); };

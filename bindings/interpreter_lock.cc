@@ -43,30 +43,8 @@ template <class Take>
   taking.taken = true;
 }
 
-// The calling thread's state in the interpreter, where `Locked` made it: kept to the end of the thread, since making
-// one is slow, and up to 3.11 a fork in the middle of it may leave the child with a lock that nobody gives back.
-class KeptThreadState {
- public:
-  KeptThreadState() = default;
-  ~KeptThreadState() {
-    if (!is_kept_) return;
-    const Locked lock;
-    PyGILState_Release(PyGILState_LOCKED);
-  }
-  KeptThreadState(const KeptThreadState&) = delete;
-  KeptThreadState& operator=(const KeptThreadState&) = delete;
-
-  // With the lock, behind the call that made the state.
-  void Keep() {
-    PyGILState_Ensure();
-    is_kept_ = true;
-  }
-
- private:
-  bool is_kept_ = false;
-};
-
-thread_local KeptThreadState kept_thread_state;
+// Of the calling thread.
+thread_local KeptThreadState* kept_thread_state = nullptr;
 
 }  // namespace
 
@@ -90,13 +68,27 @@ Locked::Locked() : takes_(!HasInterpreterLock()) {
   if (!Py_IsInitialized()) WaitForEndOfProcess();
   const bool is_new = PyGILState_GetThisThreadState() == nullptr;
   TakeLock([this] { state_ = PyGILState_Ensure(); });
-  if (is_new) kept_thread_state.Keep();
+  if (is_new && kept_thread_state != nullptr) kept_thread_state->Keep();
 }
 
 Locked::~Locked() {
   WaitIfThreadWasEnded();
   if (!takes_) return;
   TakeLock([this] { PyGILState_Release(state_); });
+}
+
+KeptThreadState::KeptThreadState() { kept_thread_state = this; }
+
+KeptThreadState::~KeptThreadState() {
+  kept_thread_state = nullptr;
+  if (!is_kept_) return;
+  const Locked lock;
+  PyGILState_Release(PyGILState_LOCKED);
+}
+
+void KeptThreadState::Keep() {
+  PyGILState_Ensure();
+  is_kept_ = true;
 }
 
 Unlocked::~Unlocked() {

@@ -43,4 +43,22 @@ class Unlocked {
   PyThreadState* state_;
 };
 
+// While this lives, the state that `Locked` makes for the calling thread stays: making one is slow, and up to 3.11 a
+// fork in the middle of it may leave the child with a lock that nobody gives back. One a thread, and for threads of our
+// own alone: it takes the lock at its end, and others wait with the lock held for the end of theirs.
+class KeptThreadState {
+ public:
+  KeptThreadState();
+  ~KeptThreadState();
+  KeptThreadState(const KeptThreadState&) = delete;
+  KeptThreadState& operator=(const KeptThreadState&) = delete;
+
+ private:
+  friend class Locked;
+  // With the lock, behind the call that made the state.
+  void Keep();
+
+  bool is_kept_ = false;
+};
+
 }  // namespace quillet::host

@@ -124,6 +124,7 @@ StopQuestion BatchAnalyzer::Ring::IsWanted() const {
 
 void BatchAnalyzer::Ring::Work() {
   const ThreadStopQuestion is_wanted(IsWanted());
+  const std::shared_ptr<void> state = batch_.options_.make_thread_state ? batch_.options_.make_thread_state() : nullptr;
   std::unique_ptr<FileWorker> worker;
   try {
     while (const std::optional<size_t> index = Take())

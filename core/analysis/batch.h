@@ -31,6 +31,8 @@ class BatchAnalyzer {
     // Results that may wait for the reader, and the bytes that they may hold.
     size_t most_waiting = 64;
     size_t most_waiting_bytes = size_t{256} << 20;
+    // Made by each thread of the batch in front of its work, and let go of by it at the end.
+    std::function<std::shared_ptr<void>()> make_thread_state;
   };
 
   BatchAnalyzer(Options options, std::vector<BatchInput> inputs);

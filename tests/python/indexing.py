@@ -6,6 +6,7 @@ import json
 import os
 import subprocess
 import sys
+from collections.abc import Sequence
 from pathlib import Path
 
 from quillet.index.questions import Index
@@ -47,9 +48,9 @@ def main():
 ODD_NAMES = ["new\nline.py", "quote\"'.py", "..py.py", "<script>a(1)<.py", "tab\there.py", "back\\slash.py", b"\xff.py"]
 
 
-def run(*arguments: str | Path, cwd: Path) -> subprocess.CompletedProcess[str]:
+def run(*arguments: str | Path, cwd: Path, front: Sequence[str] = ()) -> subprocess.CompletedProcess[str]:
     return subprocess.run(
-        [*COMMAND, *map(str, arguments)],
+        [*front, *COMMAND, *map(str, arguments)],
         capture_output=True,
         cwd=cwd,
         env=ENVIRONMENT,

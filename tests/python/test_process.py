@@ -90,6 +90,19 @@ def test_a_batch_may_be_left_open() -> None:
     assert output_of(script) == ""
 
 
+def test_a_reader_with_threads_ends_with_its_process() -> None:
+    """Its threads, which took results, end while the interpreter does, and with its lock held."""
+    pytest.importorskip("duckdb")
+    script = """
+        import duckdb, quillet
+        source = b"class A:\\n def f(self): return g(1)\\n" * 20
+        records = quillet.analyze_files([(f"{i}.py", source) for i in range(500)])
+        print(duckdb.sql("select count(*) from records where kind = 'called'").fetchall())
+    """
+    for _ in range(4):
+        assert output_of(script) == "[(10000,)]\n"
+
+
 # ---- forks ----
 
 
