@@ -487,6 +487,29 @@ TEST(Inference, KnowsKeywordsOfDictAndWhatClassesGiveForItems) {
   });
 }
 
+TEST(Inference, GivesEachTargetItsItem) {
+  Check({
+      {"$a, $b = [1, '']\n[$c, ($d, $e)] = 1.5, [b'', 2]\n", {"int", "str", "float", "bytes", "int"}},
+      {"a, b, $c = 1, ''\n$d, $e = 1, '', 2.5\n", {"", "int", "str"}},
+      {"$a, *$b, $c = [1, '', 2.5, b'']\n*$d, $e = [1, '']\n",
+       {"int", "list[float | str]", "bytes", "list[int]", "str"}},
+      {"$a, *$b, $c = 1, '', 2.5, b''\n", {"int", "list[float | str]", "bytes"}},
+  });
+}
+
+TEST(Inference, KnowsWhatEveryModuleHas) {
+  Check({{"import types\n$a = types.__name__\n$b = types.__spec__\n$c = types.shown\n$d = types.__file__\n",
+          {"str", "None | str", "", "str"}}});
+}
+
+TEST(Inference, GuessesPowersOfNumbers) {
+  Check({
+      {"def f(a: int, b: float, c: str):\n  $x = a ** a\n  $y = a ** b\n  $z = b ** a\n  $u = b ** b\n  $v = c ** a\n"
+       "  $w = a ** c\n",
+       {"int", "float", "float", "float", "", ""}},
+  });
+}
+
 TEST(Inference, KnowsWhichReturnACallComesTo) {
   Check({
       {"def f(x):\n  if isinstance(x, int): return 1\n  return 'a'\n$a = f(1)\n$b = f('')\n$c = f(z)\n",

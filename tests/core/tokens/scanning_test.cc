@@ -50,7 +50,11 @@ TEST(FindNextNonNested, PassesOverStrings) {
   EXPECT_EQ(Find("'', c", ","), (Offsets{2}));
 }
 
-TEST(FindNextNonNested, FindsNothingForAnEmptyPattern) { EXPECT_EQ(Find("a, b", ""), Offsets{}); }
+TEST(FindNextNonNested, FindsNothingForAnEmptyPatternOrInNoText) {
+  EXPECT_EQ(Find("a, b", ""), Offsets{});
+  EXPECT_EQ(Find("", ","), Offsets{});
+  EXPECT_EQ(Find(",", ",", 0, 0), Offsets{});
+}
 
 TEST(FindNextNonNested, FindsNoPatternThatTheEndCutsOff) {
   EXPECT_EQ(Find("a -", "->"), Offsets{});
