@@ -279,7 +279,7 @@ TEST(Environments, ReadTheSettingsOfAVirtualOne) {
   };
   const auto settings = [&](const std::string& system) {
     folder.Write("venv/pyvenv.cfg", "home = " + folder / "base/bin" + "\nInclude-System-Site-Packages = " + system +
-                                        "\nversion = 3.11.7\n");
+                                        "\nprompt = 2.7 of old\nversion = 3.11.7\nversion_info = 3.9.1\n");
   };
   settings("false");
   folder.Link(folder / "base/bin/python3.11", "venv/bin/python");
