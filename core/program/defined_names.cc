@@ -12,6 +12,7 @@
 #include "foundations/stop.h"
 #include "names/binder.h"
 #include "names/text_table.h"
+#include "program/possible_symbols.h"
 #include "program/two_threads.h"
 #include "project/file_system.h"
 #include "project/word_search.h"
@@ -25,6 +26,7 @@ constexpr size_t kFilesWorthABinder = 16;
 constexpr size_t kBytesOfAStepOfBinding = 16;
 
 using Definition = DefinedNames::Definition;
+using PossibleSymbol = DefinedNames::PossibleSymbol;
 
 // Binds one file after another, and takes what is defined from each.
 class DefinitionsMaker {
@@ -32,13 +34,31 @@ class DefinitionsMaker {
   struct Made {
     size_t index;
     FileStamp stamp;
-    size_t begin, count;  // among the definitions
+    size_t begin, count;  // among the definitions or the possible symbols
+    bool is_possible = false;
   };
 
   void Begin() {
     made.clear();
     definitions.clear();
+    possible.clear();
+    last_file_.clear();
     texts.Begin(kExpectedTexts);
+  }
+
+  // False where the text does not tell. `source` is as it was behind it.
+  bool MakePossible(size_t index, const FileStamp& stamp, Version version, std::string& source) {
+    if (!lines_.Read(source, version)) return false;
+    const size_t begin = possible.size();
+    for (const auto& [name, is_variable] : lines_.symbols()) {
+      const uint32_t number = 2 * texts.NumberOfCopy(name) + (is_variable ? 1 : 0);
+      if (number >= last_file_.size()) last_file_.resize(2 * texts.size(), kNoIndex);
+      if (last_file_[number] == index) continue;
+      last_file_[number] = static_cast<uint32_t>(index);
+      possible.push_back({number / 2, number % 2});
+    }
+    made.push_back({index, stamp, begin, possible.size() - begin, true});
+    return true;
   }
 
   void Make(size_t index, const FileStamp& stamp, bool is_stub, Version version, Text source) {
@@ -51,6 +71,7 @@ class DefinitionsMaker {
 
   std::vector<Made> made;
   std::vector<Definition> definitions;
+  std::vector<PossibleSymbol> possible;
   TextTable texts;
   std::string memory;
 
@@ -116,6 +137,8 @@ class DefinitionsMaker {
 
   std::optional<NameBinder> binder_;
   std::optional<NameBinder> stub_binder_;
+  PossibleSymbols lines_;
+  std::vector<uint32_t> last_file_;  // that has a possible symbol, by its numbers
   // Of the file: numbers of texts and of scopes, and whether a variable was bound before.
   std::vector<uint32_t> texts_;
   std::vector<uint32_t> scopes_;
@@ -248,42 +271,13 @@ class DefinedNames::Impl {
  public:
   explicit Impl(const Files& files) : files_(files) { texts_.Begin(1024); }
 
-  void Read(std::span<const FileId> files, Text member) {
-    std::vector<FileId> unsure;
-    for (const FileId file : files) {
-      if (file >= tables_.size()) tables_.resize(file + 1);
-      if (tables_[file].round != round_ || files_.IsOpen(file)) unsure.push_back(file);
-    }
-    if (unsure.empty()) return;
-    std::array<DefinitionsMaker, 2> makers;
-    for (DefinitionsMaker& maker : makers) maker.Begin();
-    std::vector<char> is_left_out(unsure.size());
-    ForEachByThreads(unsure.size(), kFilesWorthABinder, makers, [&](size_t i, DefinitionsMaker& maker) {
-      const FileId file = unsure[i];
-      const bool is_open = files_.IsOpen(file);
-      Text source;
-      FileStamp stamp;
-      if (is_open) {
-        source = files_.SourceOf(file, maker.memory);
-        stamp = {FileStamp::Kind::kOther, source.size(), 0, std::hash<Text>()(source)};
-      } else {
-        stamp = StampOf(files_.PathOf(file));
-      }
-      if (stamp == tables_[file].stamp) return;
-      if (!is_open) {
-        files_.ReadSource(file, stamp, maker.memory);
-        source = maker.memory;
-      }
-      if (!IsNone(member) && tables_[file].round == 0 && !MayDefineMember(source, member)) {
-        is_left_out[i] = 1;
-        return;
-      }
-      CountSteps(static_cast<int64_t>(source.size() / kBytesOfAStepOfBinding));
-      maker.Make(i, SettledStamp(stamp), files_.IsStub(file), files_.VersionOf(file), source);
-    });
-    for (const DefinitionsMaker& maker : makers) Add(unsure, maker);
-    for (size_t i = 0; i < unsure.size(); ++i)
-      if (is_left_out[i] == 0) tables_[unsure[i]].round = round_;
+  void Read(std::span<const FileId> files, Text member) { Update(files, member, false); }
+  void ReadPossible(std::span<const FileId> files) { Update(files, kNoText, true); }
+
+  bool IsRead(FileId file) const { return file < tables_.size() && tables_[file].round == round_; }
+  std::span<const PossibleSymbol> PossibleOf(FileId file) const {
+    return file < tables_.size() ? std::span<const PossibleSymbol>(tables_[file].possible)
+                                 : std::span<const PossibleSymbol>();
   }
 
   std::span<const Definition> Of(FileId file) const {
@@ -297,7 +291,8 @@ class DefinedNames::Impl {
 
   size_t ByteSize() const {
     size_t size = tables_.capacity() * sizeof(Table) + texts_.size() * (sizeof(TextTable::Entry) + 32);
-    for (const Table& table : tables_) size += table.definitions.capacity() * sizeof(Definition);
+    for (const Table& table : tables_)
+      size += table.definitions.capacity() * sizeof(Definition) + table.possible.capacity() * sizeof(PossibleSymbol);
     return size;
   }
 
@@ -306,14 +301,73 @@ class DefinedNames::Impl {
     FileStamp stamp;     // of a buffer what its text is known by
     uint64_t round = 0;  // when it was compared with the file
     std::vector<Definition> definitions;
+    // The same of what it may define.
+    FileStamp possible_stamp;
+    uint64_t possible_round = 0;
+    std::vector<PossibleSymbol> possible;
   };
+
+  void Update(std::span<const FileId> files, Text member, bool may_be_possible) {
+    std::vector<FileId> unsure;
+    for (const FileId file : files) {
+      if (file >= tables_.size()) tables_.resize(file + 1);
+      const Table& table = tables_[file];
+      const bool is_known = table.round == round_ || (may_be_possible && table.possible_round == round_);
+      if (!is_known || files_.IsOpen(file)) unsure.push_back(file);
+    }
+    if (unsure.empty()) return;
+    std::array<DefinitionsMaker, 2> makers;
+    for (DefinitionsMaker& maker : makers) maker.Begin();
+    enum class Found : uint8_t { kDefinitions, kPossible, kNothing };
+    std::vector<Found> found(unsure.size());
+    ForEachByThreads(unsure.size(), kFilesWorthABinder, makers, [&](size_t i, DefinitionsMaker& maker) {
+      const FileId file = unsure[i];
+      const Table& table = tables_[file];
+      const bool is_open = files_.IsOpen(file);
+      Text source;
+      FileStamp stamp;
+      if (is_open) {
+        source = files_.SourceOf(file, maker.memory);
+        stamp = {FileStamp::Kind::kOther, source.size(), 0, std::hash<Text>()(source)};
+      } else {
+        stamp = StampOf(files_.PathOf(file));
+      }
+      if (stamp == table.stamp) return;
+      found[i] = Found::kPossible;
+      if (may_be_possible && !is_open && stamp == table.possible_stamp) return;
+      if (!is_open) {
+        files_.ReadSource(file, stamp, maker.memory);
+        if (may_be_possible && maker.MakePossible(i, SettledStamp(stamp), files_.VersionOf(file), maker.memory)) return;
+        source = maker.memory;
+      }
+      found[i] = Found::kNothing;
+      if (!IsNone(member) && table.round == 0 && !MayDefineMember(source, member)) return;
+      found[i] = Found::kDefinitions;
+      CountSteps(static_cast<int64_t>(source.size() / kBytesOfAStepOfBinding));
+      maker.Make(i, SettledStamp(stamp), files_.IsStub(file), files_.VersionOf(file), source);
+    });
+    for (const DefinitionsMaker& maker : makers) Add(unsure, maker);
+    for (size_t i = 0; i < unsure.size(); ++i) {
+      if (found[i] == Found::kDefinitions) tables_[unsure[i]].round = round_;
+      if (found[i] == Found::kPossible) tables_[unsure[i]].possible_round = round_;
+    }
+  }
 
   void Add(const std::vector<FileId>& files, const DefinitionsMaker& maker) {
     std::vector<uint32_t> numbers(maker.texts.size());
     for (uint32_t i = 0; i < numbers.size(); ++i) numbers[i] = texts_.NumberOfCopy(maker.texts.TextOf(i));
     for (const DefinitionsMaker::Made& made : maker.made) {
       Table& table = tables_[files[made.index]];
+      if (made.is_possible) {
+        const auto first = maker.possible.begin() + static_cast<ptrdiff_t>(made.begin);
+        table.possible_stamp = made.stamp;
+        table.possible = std::vector<PossibleSymbol>(first, first + static_cast<ptrdiff_t>(made.count));
+        for (PossibleSymbol& symbol : table.possible) symbol.name = numbers[symbol.name] & kMostNames;
+        continue;
+      }
       table.stamp = made.stamp;
+      table.possible = {};
+      table.possible_stamp = {};
       const auto from = maker.definitions.begin() + static_cast<ptrdiff_t>(made.begin);
       table.definitions = std::vector<Definition>(from, from + static_cast<ptrdiff_t>(made.count));
       for (Definition& definition : table.definitions) {
@@ -322,6 +376,8 @@ class DefinedNames::Impl {
       }
     }
   }
+
+  static constexpr uint32_t kMostNames = UINT32_MAX >> 1;
 
   const Files& files_;
   std::vector<Table> tables_;  // by the numbers of files
@@ -334,7 +390,12 @@ DefinedNames::~DefinedNames() = default;
 
 void DefinedNames::Read(std::span<const FileId> files) { impl_->Read(files, kNoText); }
 void DefinedNames::ReadForMember(std::span<const FileId> files, Text name) { impl_->Read(files, name); }
+void DefinedNames::ReadPossible(std::span<const FileId> files) { impl_->ReadPossible(files); }
 std::span<const Definition> DefinedNames::Of(FileId file) const { return impl_->Of(file); }
+std::span<const DefinedNames::PossibleSymbol> DefinedNames::PossibleOf(FileId file) const {
+  return impl_->PossibleOf(file);
+}
+bool DefinedNames::IsRead(FileId file) const { return impl_->IsRead(file); }
 uint32_t DefinedNames::text_count() const { return impl_->text_count(); }
 Text DefinedNames::TextOf(uint32_t number) const { return impl_->TextOf(number); }
 uint32_t DefinedNames::Find(Text name) const { return impl_->Find(name); }

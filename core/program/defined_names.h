@@ -1,6 +1,7 @@
 // What the files of a project define, by name: enough to say where a name is defined without holding the files.
 //
-// A file is bound once, and its definitions are kept, 16 bytes each, until it changes.
+// A file is bound once, and its definitions are kept, 16 bytes each, until it changes. What it may define at all is
+// told by its text in a third of the time.
 #pragma once
 
 #include <cstdint>
@@ -40,6 +41,19 @@ class DefinedNames {
   void ReadForMember(std::span<const FileId> files, Text name);
   // Of a file that was read, in the order of the source; until the next Read.
   std::span<const Definition> Of(FileId file) const;
+
+  // A name that may be a symbol of a file.
+  struct PossibleSymbol {
+    uint32_t name : 31;
+    uint32_t is_variable : 1;  // otherwise a class or a function
+  };
+  // Finds which symbols files may define that were not read, or have changed, by their text; reads those whose text
+  // does not tell.
+  void ReadPossible(std::span<const FileId> files);
+  // All symbols of such a file and some more, each once in no order.
+  std::span<const PossibleSymbol> PossibleOf(FileId file) const;
+  // Whether Of says what there is.
+  bool IsRead(FileId file) const;
 
   // How many texts there are, and a number's text.
   uint32_t text_count() const;

@@ -435,9 +435,9 @@ std::vector<SymbolInfo> Workspace::Symbols(Text query, size_t most) {
   in.Begin();
   struct Ranked {
     int rank;
-    size_t size;    // of the name
-    uint32_t file;  // its place among all
-    const DefinedNames::Definition* definition;
+    size_t size;                                 // of the name
+    uint32_t file;                               // its place among all
+    const DefinedNames::Definition* definition;  // nullptr where that is not known yet
   };
   std::vector<Ranked> found;
   const auto lower = [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c; };
@@ -454,27 +454,58 @@ std::vector<SymbolInfo> Workspace::Symbols(Text query, size_t most) {
     return at == query.size() ? 4 : -1;
   };
   const std::vector<FileId>& files = in.project.All();
-  in.defined.Read(files);
+  in.defined.ReadPossible(files);
   // A name is compared once, wherever it is defined.
   static constexpr int kNotAsked = -2;
-  std::vector<int8_t> ranks(in.defined.text_count(), kNotAsked);
+  std::vector<int8_t> ranks;
+  const auto rank_of = [&](uint32_t name) {
+    if (name >= ranks.size()) ranks.resize(in.defined.text_count(), kNotAsked);
+    int8_t& rank = ranks[name];
+    if (rank == kNotAsked) rank = static_cast<int8_t>(match(in.defined.TextOf(name)));
+    return rank;
+  };
+  const auto add = [&](uint32_t file, uint32_t name, bool is_variable, const DefinedNames::Definition* definition) {
+    const int rank = rank_of(name);
+    if (rank < 0) return;
+    found.push_back({rank * 2 + (is_variable ? 1 : 0), in.defined.TextOf(name).size(), file, definition});
+  };
+  const auto add_defined = [&](uint32_t file) {
+    for (const DefinedNames::Definition& definition : in.defined.Of(files[file])) {
+      if (definition.is_symbol && IsSymbol(definition.kind))
+        add(file, definition.name, definition.kind == NameKind::kVariable, &definition);
+    }
+  };
   for (uint32_t i = 0; i < files.size(); ++i) {
-    for (const DefinedNames::Definition& definition : in.defined.Of(files[i])) {
-      if (!definition.is_symbol || !IsSymbol(definition.kind)) continue;
-      int8_t& rank = ranks[definition.name];
-      if (rank == kNotAsked) rank = static_cast<int8_t>(match(in.defined.TextOf(definition.name)));
-      if (rank < 0) continue;
-      const int is_variable = definition.kind == NameKind::kVariable ? 1 : 0;
-      found.push_back({rank * 2 + is_variable, in.defined.TextOf(definition.name).size(), i, &definition});
+    if (in.defined.IsRead(files[i])) {
+      add_defined(i);
+    } else {
+      for (const auto& symbol : in.defined.PossibleOf(files[i])) add(i, symbol.name, symbol.is_variable != 0, nullptr);
     }
   }
-  // Those that are alike in the order of files.
+  // Those that are alike in the order of files, and what may be there in front of what is.
   const auto order = [](const Ranked& a, const Ranked& b) {
-    return std::tuple(a.rank, a.size, a.file, a.definition->begin) <
-           std::tuple(b.rank, b.size, b.file, b.definition->begin);
+    const auto begin_of = [](const Ranked& at) {
+      return at.definition == nullptr ? 0 : int64_t{at.definition->begin} + 1;
+    };
+    return std::tuple(a.rank, a.size, a.file, begin_of(a)) < std::tuple(b.rank, b.size, b.file, begin_of(b));
   };
-  const size_t count = std::min(most, found.size());
-  std::ranges::partial_sort(found, found.begin() + static_cast<ptrdiff_t>(count), order);
+  // Files are read as long as what they may define would be among the first ones.
+  size_t count = 0;
+  while (true) {
+    count = std::min(most, found.size());
+    std::ranges::partial_sort(found, found.begin() + static_cast<ptrdiff_t>(count), order);
+    std::vector<uint32_t> unread;
+    for (const Ranked& ranked : std::span(found).first(count))
+      if (ranked.definition == nullptr) unread.push_back(ranked.file);
+    if (unread.empty()) break;
+    std::ranges::sort(unread);
+    unread.erase(std::unique(unread.begin(), unread.end()), unread.end());
+    std::vector<FileId> read;
+    for (const uint32_t file : unread) read.push_back(files[file]);
+    in.defined.Read(read);
+    std::erase_if(found, [&](const Ranked& ranked) { return std::ranges::binary_search(unread, ranked.file); });
+    for (const uint32_t file : unread) add_defined(file);
+  }
   std::vector<SymbolInfo> symbols;
   for (const Ranked& ranked : std::span(found).first(count)) {
     const DefinedNames::Definition& definition = *ranked.definition;
