@@ -70,8 +70,6 @@ class CPGenAnalyzerImpl {
   // Walks a line without embedded expressions, which nobody asked for and of which nothing is reported. False
   // where its analysis would fail, or would not end with the walks.
   bool WalkWithoutDoubt(LogicalLine& logical, bool in_async_def);
-  // What was told is as if it had been read.
-  void CountAsRead() { was_rejected_ = false; }
 
   // Whether returned errors carry the text of their line, which costs more than the analysis of a short
   // one: true unless nobody is going to show it.

@@ -2,11 +2,13 @@
 // last one may be a jump.
 #include "analysis/block_rules.h"
 
+#include <algorithm>
 #include <array>
 #include <initializer_list>
 #include <utility>
 
 #include "lines/token_search.h"
+#include "tokens/token_ends.h"
 
 namespace quillet {
 
@@ -14,17 +16,10 @@ namespace {
 
 // So many blocks need no look at how deep the language lets some of them nest.
 constexpr size_t kDeepBlocks = 10;
+constexpr Text kFuture = "__future__";
 constexpr size_t kMostBlocks = 100;  // as deep as the language lets blocks nest, the file itself with them
 
-// What a kind of row is to the blocks.
-enum class Role : uint8_t {
-  kNothing,
-  kOther,  // clauses and jumps
-  kPlain,  // a statement that holds no others
-  kMaybePlain,
-  kHead,
-  kPlainHead,  // of a statement, and what stands inside does not depend on it
-};
+using Role = BlockRules::Role;
 
 constexpr auto kRoles = [] {
   std::array<Role, static_cast<size_t>(LineKind::kOther) + 1> table{};
@@ -33,14 +28,17 @@ constexpr auto kRoles = [] {
     for (const LineKind kind : kinds) table[static_cast<size_t>(kind)] = role;
   };
   set(Role::kNothing, {LineKind::kBlankLine, LineKind::kComment});
-  set(Role::kPlain, {LineKind::kStringExpression, LineKind::kAssignment, LineKind::kPass, LineKind::kRaise,
-                     LineKind::kAssert, LineKind::kReturn, LineKind::kImport, LineKind::kFromImport, LineKind::kPrint,
-                     LineKind::kDelete, LineKind::kTypeStatement});
+  set(Role::kPlain,
+      {LineKind::kStringExpression, LineKind::kAssignment, LineKind::kPass, LineKind::kRaise, LineKind::kAssert,
+       LineKind::kReturn, LineKind::kImport, LineKind::kPrint, LineKind::kDelete, LineKind::kTypeStatement});
   set(Role::kMaybePlain, {LineKind::kUnknown});
-  set(Role::kPlainHead, {LineKind::kIfBeginning, LineKind::kWith, LineKind::kFunctionDef, LineKind::kClassDef,
-                         LineKind::kForBeginning, LineKind::kWhileBeginning});
-  set(Role::kHead, {LineKind::kElifBeginning, LineKind::kElseBeginning, LineKind::kTry, LineKind::kExcept,
-                    LineKind::kFinally, LineKind::kMatch, LineKind::kCase});
+  set(Role::kImport, {LineKind::kFromImport});
+  set(Role::kHead,
+      {LineKind::kIfBeginning, LineKind::kWith, LineKind::kForBeginning, LineKind::kWhileBeginning, LineKind::kTry});
+  set(Role::kDefinitionHead, {LineKind::kFunctionDef, LineKind::kClassDef});
+  set(Role::kClause, {LineKind::kElifBeginning, LineKind::kElseBeginning, LineKind::kFinally});
+  set(Role::kExcept, {LineKind::kExcept});
+  set(Role::kMatch, {LineKind::kMatch, LineKind::kCase});
   return table;
 }();
 
@@ -59,7 +57,7 @@ size_t LastSignificant(TokenSpan toks) {
 // The "from" of `from __future__ import`, by itself or behind a head, or the size.
 size_t FutureImportIn(TokenSpan toks) {
   for (size_t i = 0; i + 1 < toks.size(); ++i)
-    if (toks[i].code == word::kFrom && toks[i + 1].view() == "__future__" && (i == 0 || toks[i - 1].code == tok::COLON))
+    if (toks[i].code == word::kFrom && toks[i + 1].view() == kFuture && (i == 0 || toks[i - 1].code == tok::COLON))
       return i;
   return toks.size();
 }
@@ -74,18 +72,39 @@ bool IsFutureFeature(Text name, Version version) {
 
 }  // namespace
 
-void BlockRules::Reset(const SourceText& source, std::span<const LineRow> rows, Version version) {
+void BlockRules::Check(const SourceText& source, std::span<const LineRow> rows, Version version,
+                       const Readings& readings) {
   source_ = &source;
   rows_ = rows;
   version_ = version;
+  readings_ = &readings;
+  next_rejected_ = next_irrefutable_ = 0;
   blocks_.clear();
   blocks_.push_back({0, 0, Head::kFile});
   inline_.clear();
-  irrefutables_.clear();
   head_index_ = last_index_ = told_row_ = kNoRow;
   watch_ = kFutureImports;
-  may_misuse_names_ = false;
+  has_async_definitions_ = false;
+  declarations_.clear();
   findings_.clear();
+  for (size_t i = GoOn(0); i < rows.size(); i = GoOn(i + 1)) {
+    if (RoleOf(rows[i].kind) != Role::kNothing) Next(i);
+  }
+  End();
+}
+
+size_t BlockRules::NextRejected(size_t index) {
+  const auto& rejected = readings_->rejected;
+  while (next_rejected_ < rejected.size() && rejected[next_rejected_] < index) ++next_rejected_;
+  return next_rejected_ < rejected.size() ? rejected[next_rejected_] : rows_.size();
+}
+
+const BlockRules::Irrefutable* BlockRules::IrrefutableAt(size_t index) {
+  const auto& irrefutable = readings_->irrefutable;
+  while (next_irrefutable_ < irrefutable.size() && irrefutable[next_irrefutable_].row < index) ++next_irrefutable_;
+  return next_irrefutable_ < irrefutable.size() && irrefutable[next_irrefutable_].row == index
+             ? &irrefutable[next_irrefutable_]
+             : nullptr;
 }
 
 inline BlockRules::Clauses BlockRules::ClausesBehind(LineKind kind) {
@@ -95,6 +114,8 @@ inline BlockRules::Clauses BlockRules::ClausesBehind(LineKind kind) {
     case LineKind::kForBeginning:
     case LineKind::kWhileBeginning:
       return Clauses::kElse;
+    case LineKind::kTry:
+      return Clauses::kTry;
     default:
       return Clauses::kNone;
   }
@@ -108,71 +129,129 @@ inline BlockRules::Head BlockRules::HeadOfPlain(LineKind kind) {
     case LineKind::kFunctionDef:
     case LineKind::kClassDef:
       return Head::kDefinition;
+    case LineKind::kFinally:
+      return Head::kFinally;
     default:
       return Head::kPlain;
   }
 }
 
-inline bool BlockRules::Begin(size_t index, Block& block) {
-  const LineKind kind = rows_[index].kind;
-  if (block.clauses >= Clauses::kTry && (block.clauses != Clauses::kDecorated || !IsDefinitionKind(kind))) return false;
-  block.clauses = ClausesBehind(kind);
-  const bool is_head = RoleOf(kind) == Role::kPlainHead;
-  if (is_head) {
-    head_index_ = index;
-    head_ = HeadOfPlain(kind);
-  } else {
-    head_index_ = kNoRow;
+// What is known of the rows so far is kept at hand here, and is that of the object again at the end. Nothing of a row
+// counts until it is certain.
+size_t BlockRules::GoOn(size_t index) {
+  if ((watch_ & ~kHead) != 0) return index;
+  const std::span<const LineRow> rows = rows_;
+  const Token* const tokens = source_->tokens.data();
+  const uint32_t* const line_starts = source_->line_starts.data();
+  const char* const begin = source_->begin();
+  const size_t end = NextRejected(index);
+  blocks_.resize(blocks_.size() + kDeepBlocks);
+  Block* top = &blocks_.back() - kDeepBlocks;
+  const Block* const deepest = blocks_.data() + kDeepBlocks - 1;
+  size_t last = last_index_, head_index = head_index_;
+  Head head = head_;
+  size_t i = index;
+  for (; i < end; ++i) {
+    const LineRow& row = rows[i];
+    const Role role = RoleOf(row.kind);
+    if (role == Role::kNothing) continue;
+    if (row.continues_physical_line || row.has_inline_body || row.is_async) break;
+    const Token* const toks = tokens + row.first_token;
+    const uint32_t column = row.indent;
+    const auto narrow = static_cast<uint32_t>(toks->text - (begin + line_starts[row.first_line]));
+    if (narrow != column) break;
+    bool is_decorator = false;
+    switch (role) {
+      case Role::kPlain:
+        break;
+      case Role::kMaybePlain: {
+        const TokenCode first = toks->code;
+        is_decorator = first == tok::AT;
+        if (!is_decorator && first != word::kGlobal && first != word::kNonlocal && !IsSkipCode(first)) break;
+        // What stands behind a decorator on its line is in no row.
+        if (is_decorator && IsLineEnd(*toks[row.token_count - 1].end())) break;
+        goto done;
+      }
+      case Role::kImport:
+        if (row.token_count < 2 || toks[1].length == kFuture.size()) goto done;
+        break;
+      case Role::kHead:
+      case Role::kDefinitionHead:
+      case Role::kClause:
+      case Role::kExcept:
+        if (toks[row.token_count - 1].code != tok::COLON) goto done;
+        break;
+      default:
+        goto done;
+    }
+
+    Block* block = top;
+    if (head_index != kNoRow) {
+      if (role >= Role::kClause || column <= top->column || narrow <= top->narrow_column || top >= deepest ||
+          head == Head::kMatch)
+        break;
+      *++block = {column, narrow, head, Clauses::kNone, head_index};
+    } else if (column != top->column) {
+      // The first one stands at the margin.
+      while (column < block->column && block->clauses < Clauses::kTry) --block;
+      if (column != block->column) break;
+    }
+    if (narrow != block->narrow_column) break;
+    const Clauses before = block->clauses;
+    if (role < Role::kHead) {
+      if (before >= Clauses::kTry && (before != Clauses::kDecorated || !is_decorator)) break;
+      block->clauses = is_decorator ? Clauses::kDecorated : Clauses::kNone;
+      head_index = kNoRow;
+    } else {
+      if (!TakesHead(row, role, toks, *block)) break;
+      head_index = i;
+      head = HeadOfPlain(row.kind);
+    }
+    top = block;
+    last = i;
   }
-  watch_ = is_head ? kHead : 0;
-  inline_.clear();
-  last_index_ = index;
+done:
+  blocks_.resize(static_cast<size_t>(top - blocks_.data()) + 1);
+  if (last != last_index_) inline_.clear();
+  last_index_ = last;
+  head_index_ = head_index;
+  head_ = head;
+  watch_ = head_index != kNoRow ? kHead : 0;
+  return i;
+}
+
+// The head of a statement or of one of its clauses, in its block: whether it is in its place there.
+inline bool BlockRules::TakesHead(const LineRow& row, Role role, const Token* toks, Block& block) {
+  const Clauses before = block.clauses;
+  Clauses next = ClausesBehind(row.kind);
+  if (role < Role::kClause) {
+    if (before >= Clauses::kTry && (before != Clauses::kDecorated || role != Role::kDefinitionHead)) return false;
+    if (next == Clauses::kTry) {
+      block.has_except = block.has_except_star = false;
+      block.bare_except = kNoRow;
+    }
+  } else if (role == Role::kExcept) {
+    if ((before != Clauses::kTry && before != Clauses::kExcept) || block.has_except_star ||
+        block.bare_except != kNoRow || row.token_count < 3 || !IsNameCode(toks[1].code))
+      return false;
+    block.has_except = true;
+    next = Clauses::kExcept;
+  } else if (row.kind == LineKind::kElifBeginning) {
+    if (before != Clauses::kElif) return false;
+    next = Clauses::kElif;
+  } else if (row.kind == LineKind::kElseBeginning) {
+    if (before != Clauses::kElif && before != Clauses::kElse && before != Clauses::kExcept) return false;
+    if (before == Clauses::kExcept) next = Clauses::kTryElse;
+  } else if (before != Clauses::kTry && before != Clauses::kExcept && before != Clauses::kTryElse) {
+    return false;
+  }
+  block.clauses = next;
   return true;
 }
 
-bool BlockRules::GoesOn(size_t index, bool was_rejected) {
+void BlockRules::Next(size_t index) {
   const LineRow& row = rows_[index];
-  const Role role = RoleOf(row.kind);
-  if (role == Role::kNothing) return true;
-  if (role == Role::kOther || role == Role::kHead || row.continues_physical_line || was_rejected ||
-      (watch_ & ~kHead) != 0)
-    return false;
-  const Token* const toks = source_->tokens.data() + row.first_token;
-  const TokenCode first = toks->code;
-  if (role == Role::kMaybePlain && (first == tok::AT || first == word::kBreak || first == word::kContinue ||
-                                    first == word::kGlobal || first == word::kNonlocal || IsSkipCode(first)))
-    return false;
-  if (row.kind == LineKind::kFromImport && (row.token_count < 2 || toks[1].length == Text("__future__").size()))
-    return false;
-  if (role == Role::kPlainHead && (toks[row.token_count - 1].code != tok::COLON || row.has_inline_body || row.is_async))
-    return false;
-  const auto narrow = static_cast<uint32_t>(toks->text - (source_->begin() + source_->line_starts[row.first_line]));
-  if (narrow != row.indent) return false;
-  if (watch_ != 0) return Enter(index, narrow);
-  Block* block = &blocks_.back();
-  if (row.indent < block->column) [[unlikely]] {
-    // The first one stands at the margin.
-    while (row.indent < block->column && block->clauses < Clauses::kTry) --block;
-    if (row.indent != block->column || narrow != block->narrow_column) return false;
-    while (&blocks_.back() != block) blocks_.pop_back();
-  }
-  return row.indent == block->column && narrow == block->narrow_column && Begin(index, *block);
-}
-
-// The first row behind a head.
-bool BlockRules::Enter(size_t index, uint32_t narrow_column) {
-  const Block& around = blocks_.back();
-  const uint32_t column = rows_[index].indent;
-  if (column <= around.column || narrow_column <= around.narrow_column || blocks_.size() >= kDeepBlocks ||
-      head_ == Head::kMatch)
-    return false;
-  blocks_.push_back({column, narrow_column, head_, Clauses::kNone, head_index_});
-  return Begin(index, blocks_.back());
-}
-
-void BlockRules::Next(size_t index, const Reading& reading) {
-  const LineRow& row = rows_[index];
-  if (row.kind == LineKind::kBlankLine || row.kind == LineKind::kComment) return;
+  const bool was_rejected = NextRejected(index) == index;
   const TokenSpan toks = TokensOf(row);
   const size_t last = LastSignificant(toks);
   if (last == toks.size()) return;
@@ -181,7 +260,7 @@ void BlockRules::Next(size_t index, const Reading& reading) {
   } else {
     inline_.clear();
     Indent(index, row);
-    Clause(index, row, reading);
+    Clause(index, row, was_rejected);
   }
   const TokenCode code = toks[last].code;
   if (code == word::kBreak || code == word::kContinue) Jump(index, row, last);
@@ -203,12 +282,15 @@ void BlockRules::Next(size_t index, const Reading& reading) {
       inline_.push_back(head);
     }
   }
-  may_misuse_names_ |= row.is_async && row.kind == LineKind::kFunctionDef;
+  has_async_definitions_ |= row.is_async && row.kind == LineKind::kFunctionDef;
   if (!is_head || is_on_line_of_head) {
-    for (const Token& token : toks) may_misuse_names_ |= token.code == word::kGlobal || token.code == word::kNonlocal;
+    const auto declares = [](const Token& token) {
+      return token.code == word::kGlobal || token.code == word::kNonlocal;
+    };
+    if (std::ranges::any_of(toks, declares)) declarations_.push_back(static_cast<uint32_t>(index));
   }
   SetWatch(kHead, head_index_ != kNoRow);
-  SetWatch(kRejection, reading.was_rejected);
+  SetWatch(kRejection, was_rejected);
   last_index_ = index;
 }
 
@@ -318,15 +400,15 @@ void BlockRules::ContinueLine(size_t index, const LineRow& row) {
   }
 }
 
-void BlockRules::Clause(size_t index, const LineRow& row, const Reading& reading) {
+void BlockRules::Clause(size_t index, const LineRow& row, bool was_rejected) {
   Block& block = blocks_.back();
   const Clauses before = block.clauses;
   const auto begin = [&](Clauses next) {
-    if (before == Clauses::kTry && !reading.was_rejected)
+    if (before == Clauses::kTry && !was_rejected)
       Add(index, FirstToken(row), "expected 'except' or 'finally' block");
     else if (before == Clauses::kDecorated && next != Clauses::kDecorated && !IsDefinitionKind(row.kind))
       Add(index, FirstToken(row), "invalid syntax");
-    block.clauses = reading.was_rejected ? Clauses::kUnknown : next;
+    block.clauses = was_rejected ? Clauses::kUnknown : next;
   };
   const auto go_on = [&](bool is_allowed, Clauses next) {
     if (is_allowed || before == Clauses::kUnknown) {
@@ -339,8 +421,8 @@ void BlockRules::Clause(size_t index, const LineRow& row, const Reading& reading
   };
   if (before == Clauses::kCase) {
     if (row.kind == LineKind::kCase)
-      Case(index, reading, block);
-    else if (!reading.was_rejected)
+      Case(index, was_rejected, block);
+    else if (!was_rejected)
       Add(index, FirstToken(row), "invalid syntax");
     return;
   }
@@ -374,7 +456,7 @@ void BlockRules::Clause(size_t index, const LineRow& row, const Reading& reading
       break;
     case LineKind::kCase:
       begin(Clauses::kNone);
-      Case(index, reading, block);
+      Case(index, was_rejected, block);
       break;
     default: {
       const TokenSpan toks = TokensOf(row);
@@ -412,20 +494,19 @@ void BlockRules::Except(size_t index, const LineRow& row, Block& block) {
   block.bare_except = next < toks.size() && toks[next].code == tok::COLON ? index : kNoRow;
 }
 
-void BlockRules::Case(size_t index, const Reading& reading, Block& block) {
+void BlockRules::Case(size_t index, bool was_rejected, Block& block) {
   if (block.head != Head::kMatch) {
     // Without a match the word is a name, and what follows is too much.
-    if (block.head != Head::kUnknown && !reading.was_rejected) Add(index, Context::Index(1), "invalid syntax");
+    if (block.head != Head::kUnknown && !was_rejected) Add(index, Context::Index(1), "invalid syntax");
     return;
   }
   if (block.irrefutable != kNoRow) {
-    Irrefutable& found = irrefutables_[block.irrefutable];
-    Add(found.row, Context::Index(found.at), std::move(found.words), /*comes_first=*/false);
+    const Irrefutable& found = readings_->irrefutable[block.irrefutable];
+    Add(found.row, Context::Index(found.at), found.words, /*comes_first=*/false);
     block.irrefutable = kNoRow;
   }
-  if (reading.irrefutable == nullptr) return;
-  block.irrefutable = irrefutables_.size();
-  irrefutables_.push_back({index, reading.irrefutable_at, *reading.irrefutable});
+  if (const Irrefutable* found = IrrefutableAt(index))
+    block.irrefutable = static_cast<size_t>(found - readings_->irrefutable.data());
 }
 
 // ---- statements in their place ----

@@ -1,9 +1,9 @@
 // What the statements of a file may not say to each other: indentation, blocks that are missing, clauses without
 // what they are clauses of, and statements in a place where they mean nothing.
 //
-// Rows are fed in order, each behind its own reading. A stack holds the open blocks, by their indentation; each
-// knows what heads it and which clauses may come next in it. A statement that its own reading rejected says little
-// about what was meant: nothing is concluded from it, so that one fault is told once.
+// One pass over the rows, when all of them are read. A stack holds the open blocks, by their indentation; each knows
+// what heads it and which clauses may come next in it. A statement that its own reading rejected says little about
+// what was meant: nothing is concluded from it, so that one fault is told once.
 #pragma once
 
 #include <cstdint>
@@ -25,26 +25,44 @@ class BlockRules {
     Context place;     // a token of the row, or a position that counts lines from its first one
     bool comes_first;  // also where the row's own reading found something
   };
-  // What the reading of a row tells.
-  struct Reading {
-    bool was_rejected = false;  // by the grammar
-    // Of a case without a guard that matches everything: what that makes of the cases behind it, and at which token.
-    const std::string* irrefutable = nullptr;
-    int32_t irrefutable_at = 0;
+  // A case without a guard that matches everything: what that makes of the cases behind it, and at which token.
+  struct Irrefutable {
+    size_t row;
+    int32_t at;
+    std::string words;
+  };
+  // What the readings of the rows told, in their order.
+  struct Readings {
+    std::vector<size_t> rejected;  // by the grammar
+    std::vector<Irrefutable> irrefutable;
+
+    void Clear() {
+      rejected.clear();
+      irrefutable.clear();
+    }
   };
 
-  // For another source, whose rows stay where they are; keeps its memory.
-  void Reset(const SourceText& source, std::span<const LineRow> rows, Version version);
-  // Whether the next row is one more plain statement, head or body of a head in its place, as most are: then that is
-  // all there is to it. All others go to Next.
-  bool GoesOn(size_t index, bool was_rejected);
-  // What is wrong is in findings(), for rows up to this one.
-  void Next(size_t index, const Reading& reading);
-  void End();
+  // What a kind of row is to the blocks.
+  enum class Role : uint8_t {
+    kNothing,
+    kOther,  // jumps
+    kPlain,  // a statement that holds no others
+    kMaybePlain,
+    kImport,
+    kHead,
+    kDefinitionHead,
+    kClause,
+    kExcept,
+    kMatch,
+  };
+
+  // What is wrong is in findings().
+  void Check(const SourceText& source, std::span<const LineRow> rows, Version version, const Readings& readings);
 
   std::vector<Finding>& findings() { return findings_; }
-  // Whether a row gives reason to look at the names of the source (name_rules.h).
-  bool may_misuse_names() const { return may_misuse_names_; }
+  // What gives reason to look at the names of the source (name_rules.h): the rows that hold `global` or `nonlocal`.
+  const std::vector<uint32_t>& declarations() const { return declarations_; }
+  bool has_async_definitions() const { return has_async_definitions_; }
 
  private:
   static constexpr size_t kNoRow = SIZE_MAX;
@@ -69,24 +87,26 @@ class BlockRules {
     // Of a match: the number of the case that leaves nothing to those behind it.
     size_t irrefutable = kNoRow;
   };
-  struct Irrefutable {
-    size_t row;
-    int32_t at;
-    std::string words;
-  };
 
-  bool Begin(size_t index, Block& block);
-  bool Enter(size_t index, uint32_t narrow_column);
+  // Goes over rows that are one more plain statement, head, clause or decorator in its place, as most are, and gives
+  // the first one from `index` on that is not: it goes to Next.
+  size_t GoOn(size_t index);
+  static bool TakesHead(const LineRow& row, Role role, const Token* toks, Block& block);
+  void Next(size_t index);
+  void End();
+  // The first row from `index` on that the grammar rejected, or how many rows there are; asked in order, as the other.
+  size_t NextRejected(size_t index);
+  const Irrefutable* IrrefutableAt(size_t index);
   void Indent(size_t index, const LineRow& row);
   void Dedent(size_t index, const LineRow& row, uint32_t column, uint32_t narrow_column);
   void Push(size_t index, uint32_t column, uint32_t narrow_column, Head head, Clauses clauses);
   void ContinueLine(size_t index, const LineRow& row);
-  void Clause(size_t index, const LineRow& row, const Reading& reading);
+  void Clause(size_t index, const LineRow& row, bool was_rejected);
   // Of a statement that holds no others, or of the head of one.
   static Clauses ClausesBehind(LineKind kind);
   static Head HeadOfPlain(LineKind kind);
   void Except(size_t index, const LineRow& row, Block& block);
-  void Case(size_t index, const Reading& reading, Block& block);
+  void Case(size_t index, bool was_rejected, Block& block);
   void Decorator(size_t index, const LineRow& row);
   void Jump(size_t index, const LineRow& row, size_t token);
   // Of a head, with the blocks around it.
@@ -120,8 +140,11 @@ class BlockRules {
   size_t last_index_ = kNoRow;  // the statement before
   size_t told_row_ = kNoRow;    // the last one of which something was told
   uint8_t watch_ = 0;
-  bool may_misuse_names_ = false;
-  std::vector<Irrefutable> irrefutables_;
+  bool has_async_definitions_ = false;
+  std::vector<uint32_t> declarations_;
+  const Readings* readings_ = nullptr;
+  size_t next_rejected_ = 0;     // of readings_
+  size_t next_irrefutable_ = 0;  // likewise
   std::vector<Finding> findings_;
 };
 

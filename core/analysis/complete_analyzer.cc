@@ -60,6 +60,8 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeCompletely(LogicalLine& log
       return std::move(rejection_);
     }
     was_rejected_ = false;
+    if (!compile_error_ && !hint_error_) [[likely]]
+      return std::nullopt;
     return compile_error_ ? std::move(compile_error_) : std::move(hint_error_);
   } catch (const ParseError& error) {
     logical.ClearDerivedInfo();

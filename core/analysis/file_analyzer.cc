@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "analysis/closer_look.h"
+#include "analysis/name_doubts.h"
 #include "lines/future_imports.h"
 #include "parser/complete_parser.h"
 #include "tokens/byte_scan.h"
@@ -88,18 +89,15 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   wanted_.assign(filter != nullptr ? found_.rows.size() : 0, false);
   const bool is_filtered = filter != nullptr && filter->Choose(*found_.source, found_.rows, wanted_);
   const bool has_rules = options_.reads_completely && !is_filtered;
-  if (has_rules) block_rules_.Reset(*found_.source, found_.rows, options_.version);
   LogicalLine line;
   for (size_t i = 0; i < found_.rows.size(); ++i) {
     const LineRow& row = found_.rows[i];
     CheckMemory(std::max(MostMemoryOf(row), sizeof(CNode) * (node_count() - nodes_before)));
     AnalyzeRow(analyzer_and_shapes, row, !is_filtered || wanted_[i], line);
-    if (has_rules && row.token_count != 0 && !block_rules_.GoesOn(i, analyzer.was_rejected()))
-      ApplyBlockRules(analyzer, i);
     CountMemory();
   }
   if (has_rules) {
-    block_rules_.End();
+    block_rules_.Check(*found_.source, found_.rows, options_.version, readings_);
     AddFindings(analyzer);
     ApplyNameRules();
     AddFindings(analyzer);
@@ -119,6 +117,7 @@ void FileAnalyzer::Reset(Text bytes) {
   if (found_.store.texts.byte_size() > kKeptMemory) found_.store.texts = TextArena();
   found_.store.Reset();
   scopes_.Reset();
+  readings_.Clear();
   found_.source->Assign(bytes);
   memory_limit_ = std::max(options_.least_memory_limit, kMemoryPerSourceByte * bytes.size());
   held_ = 0;
@@ -148,7 +147,8 @@ void FileAnalyzer::AnalyzeRow(Analyzer& analyzer, const LineRow& row, bool is_wa
     line.parsed = false;
     line.WriteTo(&found_.store);
     const bool is_doubtful = CloserLook::MayBeDoubtful(row.unusual, place) && analyzer.analyzer.IsDoubtful(line, place);
-    assert(is_doubtful || !options_.reads_completely || !analyzer.analyzer.IsDoubtful(line, place));
+    assert(is_doubtful || !options_.reads_completely || row.kind == LineKind::kComment ||
+           !analyzer.analyzer.IsDoubtful(line, place));
     if (is_doubtful || !analyzer.shapes.Tell(line, place, typing_))
       result.error = AnalyzeLine(analyzer.analyzer, line, place, is_doubtful);
   }
@@ -159,25 +159,22 @@ void FileAnalyzer::AnalyzeRow(Analyzer& analyzer, const LineRow& row, bool is_wa
 
 int32_t FileAnalyzer::AnalyzeLine(CPGenAnalyzerImpl& analyzer, LogicalLine& line, const LinePlace& place,
                                   bool is_doubtful) {
-  const auto error = options_.reads_completely
-                         ? analyzer.AnalyzeCompletely(line, place, typing_, is_doubtful)
-                         : analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def);
+  if (!options_.reads_completely) {
+    const auto error = analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def);
+    return error ? AddError(*error) : -1;
+  }
+  const auto error = analyzer.AnalyzeCompletely(line, place, typing_, is_doubtful);
+  if (analyzer.was_rejected() || line.kind == LineKind::kCase) [[unlikely]]
+    Note(analyzer, line);
   return error ? AddError(*error) : -1;
 }
 
-void FileAnalyzer::ApplyBlockRules(CPGenAnalyzerImpl& analyzer, size_t index) {
-  BlockRules::Reading reading;
-  reading.was_rejected = analyzer.was_rejected();
-  if (found_.rows[index].kind == LineKind::kCase && !reading.was_rejected) {
-    const CompleteParser& parser = analyzer.complete_parser();
-    if (!parser.irrefutable().empty()) {
-      reading.irrefutable = &parser.irrefutable();
-      reading.irrefutable_at = parser.irrefutable_at();
-    }
-  }
-  block_rules_.Next(index, reading);
-  if (!block_rules_.findings().empty()) [[unlikely]]
-    AddFindings(analyzer);
+void FileAnalyzer::Note(const CPGenAnalyzerImpl& analyzer, const LogicalLine& line) {
+  const size_t row = found_.results.size();
+  if (analyzer.was_rejected()) return readings_.rejected.push_back(row);
+  const CompleteParser& parser = analyzer.complete_parser();
+  if (line.kind == LineKind::kCase && !parser.irrefutable().empty())
+    readings_.irrefutable.push_back({row, parser.irrefutable_at(), parser.irrefutable()});
 }
 
 void FileAnalyzer::AddFindings(CPGenAnalyzerImpl& analyzer) {
@@ -205,30 +202,12 @@ void FileAnalyzer::AddFindings(CPGenAnalyzerImpl& analyzer) {
 
 void FileAnalyzer::ApplyNameRules() {
   if (options_.make_name_rules == nullptr) return;
-  if (!block_rules_.may_misuse_names() && (options_.version.AtLeast(3, 0) || !MayMisuseNamesOf2())) return;
+  const auto& declarations = block_rules_.declarations();
+  const bool has_async_definitions = block_rules_.has_async_definitions();
+  if (declarations.empty() && !has_async_definitions && options_.version.AtLeast(3, 0)) return;
+  if (!MayMisuseNames(*this, options_.version, declarations, has_async_definitions)) return;
   if (name_rules_ == nullptr) name_rules_ = options_.make_name_rules(options_.version);
   name_rules_->Check(*found_.source, found_.rows, block_rules_.findings());
-}
-
-bool FileAnalyzer::MayMisuseNamesOf2() const {
-  const auto begins = [&](const LineRow& row, TokenCode code) {
-    const TokenSpan toks = TokenSpan(found_.source->tokens).subspan(row.first_token, std::min(row.token_count, 4u));
-    return std::ranges::any_of(toks, [code](const Token& token) { return token.code == code; });
-  };
-  return std::ranges::any_of(found_.rows, [&](const LineRow& row) {
-    switch (row.kind) {
-      case LineKind::kDelete:
-        return true;
-      case LineKind::kFromImport:
-        return row.indent > 0;
-      case LineKind::kUnknown:
-        return begins(row, word::kYield) || begins(row, word::kExec);
-      case LineKind::kAssignment:
-        return begins(row, word::kYield);
-      default:
-        return false;
-    }
-  });
 }
 
 int32_t FileAnalyzer::AddError(const SyntaxError& error) {

@@ -126,12 +126,10 @@ class FileAnalyzer {
   int32_t AnalyzeLine(CPGenAnalyzerImpl& analyzer, LogicalLine& line, const LinePlace& place, bool is_doubtful);
   // Returns its index.
   int32_t AddError(const SyntaxError& error);
-  // What the row has to say to those around it.
-  void ApplyBlockRules(CPGenAnalyzerImpl& analyzer, size_t index);
+  // What the line that was just read has to say to those around it.
+  void Note(const CPGenAnalyzerImpl& analyzer, const LogicalLine& line);
   void AddFindings(CPGenAnalyzerImpl& analyzer);
   void ApplyNameRules();
-  // What the names of a function may not be used for in 2.7: whether a row may do so.
-  bool MayMisuseNamesOf2() const;
   // What the analysis of a row may take beside its results, at most.
   size_t MostMemoryOf(const LineRow& row) const;
   // Counts what the results hold by now.
@@ -144,6 +142,7 @@ class FileAnalyzer {
   Found found_;
   std::vector<bool> wanted_;  // of the rows, where there is a filter
   ScopeTracker scopes_;
+  BlockRules::Readings readings_;
   BlockRules block_rules_;
   std::unique_ptr<NameRules> name_rules_;  // built at first need
   TypingNames typing_;

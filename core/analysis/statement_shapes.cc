@@ -601,7 +601,6 @@ bool StatementShapes::Tell(LogicalLine& line, const LinePlace& place, const Typi
   const Plan& plan = *slot.plan;
   if (!plan.is_whole() || (plan.is_bounded() && key.MostJoined() > CNodeWalker::kMaxOperatorText)) return false;
   plan.Tell(line, scratch_);
-  analyzer_.CountAsRead();
   // Comes last: a host that is asked whether to stop may have other lines analysed, and plans replaced.
   CountSteps(static_cast<int64_t>(line.toks.size()));
   return true;

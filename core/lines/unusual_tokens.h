@@ -77,13 +77,19 @@ class UnusualTokens {
   uint8_t reasons() const { return reasons_; }
   void Reset() { reasons_ = is_old_ ? kOther : 0; }
 
+  static bool IsHexDigit(char c) { return IsAsciiDigit(c) || ((c | 0x20) >= 'a' && (c | 0x20) <= 'f'); }
+
   // Without a prefix, and without an escape that may be wrong: most are a letter for a line end or a quote.
   static bool IsPlainString(Text string) {
     const char* at = string.data();
     const char* const end = at + string.size();
     if (!IsQuote(*at)) return (*at | 0x20) == 'r' && IsQuote(at[1]);
-    for (; (at = FindAny<'\\'>(at, end)) < end; at += 2)
-      if (at[1] == 'x' || at[1] == 'N' || (at[1] | 0x20) == 'u') return false;
+    for (; (at = FindAny<'\\'>(at, end)) < end; at += 2) {
+      if (at[1] == 'N' || at[1] == 'U') return false;
+      const int digits = at[1] == 'x' ? 2 : at[1] == 'u' ? 4 : 0;
+      for (int i = 0; i < digits; ++i)
+        if (!IsHexDigit(at[2 + i])) return false;
+    }
     return true;
   }
 

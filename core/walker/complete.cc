@@ -60,15 +60,16 @@ void CNodeWalker::DoubtTarget(const CNode* target) {
 }
 
 void CNodeWalker::DoubtArguments(const UsedArgList& arg_list) {
+  const auto is_plain = [](const CArgInfo& arg) { return arg.name == nullptr && IsNone(arg.prefix); };
+  size_t i = 0;
+  while (i < arg_list.size() && is_plain(arg_list[i])) ++i;
   bool has_keyword = false;
   bool has_star = false;
-  for (size_t i = 0; i < arg_list.size(); ++i) {
+  for (; i < arg_list.size(); ++i) {
     const CArgInfo& arg = arg_list[i];
-    if (arg.name == nullptr && IsNone(arg.prefix)) {
+    if (is_plain(arg)) {
       // In front of Python 3 a star comes last.
       met_doubtful_ |= has_keyword || (has_star && !fPy3);
-      if (isa<CSingleUsedArgumentNode>(arg.value) && arg_list.size() == 1)
-        met_doubtful_ |= arg.value->ChildIs(1, tok::COLONEQUAL);
       continue;
     }
     if (arg.prefix == "*" && has_keyword) met_doubtful_ = true;

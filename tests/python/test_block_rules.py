@@ -5,6 +5,7 @@ Places and words are those of the newest interpreter; whether there is an error 
 
 from __future__ import annotations
 
+import random
 import sys
 
 import pytest
@@ -235,6 +236,51 @@ def test_names_are_used_as_each_interpreter_allows(library: Library) -> None:
         assert (found is None) == (answer is None), source
         if answer is not None and library.version == LIBRARY and "with" not in source:
             assert found == f"{answer[0]} {answer[2]}:{answer[3]} {answer[1]}", source
+
+
+#: Heads and statements that bind, use and declare `x` and `y`.
+HEADS_OF_SCOPES = [
+    "def f():",
+    "def f(x):",
+    "def x():",
+    "def f(y, *x):",
+    "def f(y=x):",
+    "async def f():",
+    "class C:",
+    "class x:",
+]
+USES = (
+    "x = 1|y = x|y = x = 2|global x|global y, x|nonlocal x|nonlocal y|import x|x: int = 1|x: int|a.x = 1|f(x=1)|f'{x}'|"
+    "z = lambda: x|z = [x for y in z]|for x in y: pass|with y as x: pass|if y: global x|del x|x += 1|x, y = z|yield 1|"
+    "return|return 2|await y|pass"
+).split("|")
+
+
+def scopes(draw: random.Random, depth: int = 0) -> list[str]:
+    """Functions and classes in each other, at random."""
+    rows = list[str]()
+    for _ in range(draw.randint(1, 4)):
+        if depth < 4 and draw.random() < 0.35:
+            rows.append(" " * depth + draw.choice(HEADS_OF_SCOPES))
+            rows += scopes(draw, depth + 1)
+        else:
+            rows.append(" " * depth + draw.choice(USES))
+    return rows
+
+
+@pytest.mark.skipif(sys.version_info < (3, 8), reason="what 3.6 and 3.7 do not see is not seen")
+def test_names_in_random_scopes_are_used_as_the_interpreter_allows() -> None:
+    verdicts = set[bool]()
+    for seed in range(2000):
+        source = "\n".join(scopes(random.Random(seed))) + "\n"
+        try:
+            compile(source, "scopes.py", "exec")
+            is_valid = True
+        except SyntaxError:
+            is_valid = False
+        assert (first_error(source, sys.version_info[:2]) is None) == is_valid, source
+        verdicts.add(is_valid)
+    assert len(verdicts) == 2
 
 
 def test_what_is_wrong_with_a_name_leaves_the_records() -> None:
