@@ -325,7 +325,7 @@ Value Inference::GuessParameters(FunctionId id) {
   FindCalls(id, calls, 0);
   std::ranges::sort(calls, {}, [](const ExprPlace& place) { return std::pair(place.file, place.expr); });
   const auto is_same = [](const ExprPlace& a, const ExprPlace& b) { return a.file == b.file && a.expr == b.expr; };
-  calls.erase(std::ranges::unique(calls, is_same).begin(), calls.end());
+  calls.erase(std::unique(calls.begin(), calls.end(), is_same), calls.end());
   std::vector<Value> parameters(ParametersOf(info).size());
   for (const ExprPlace& call : calls) {
     const SourceFile* file = FileOf(call.file);

@@ -296,7 +296,7 @@ Value Inference::Assigned(const SourceFile& file, ExprId expr, Value value, Fram
     }
   }
   std::ranges::sort(offsets);
-  offsets.erase(std::ranges::unique(offsets).begin(), offsets.end());
+  offsets.erase(std::unique(offsets.begin(), offsets.end()), offsets.end());
   const std::function<int(ExprId)> truth = [&](ExprId condition) { return StaticTruth(file, condition); };
   std::vector<uint32_t> reached;
   if (!Flow(file, offsets, truth).Reach(syntax[expr].begin, top, reached) || reached.empty()) return value;

@@ -63,8 +63,9 @@ void Workspace::Impl::Begin() {
   if (now - last_refresh_ > std::max(kBreath, last_look_ * kBreathOfLooks)) {
     defined.Forget();
     const bool has_changed = files.Refresh();
-    const bool has_come_or_gone = project.Refresh() | modules.Refresh();
-    if (has_changed || has_come_or_gone) Forget();
+    const bool has_come_or_gone = project.Refresh();
+    const bool leads_elsewhere = modules.Refresh();
+    if (has_changed || has_come_or_gone || leads_elsewhere) Forget();
     last_refresh_ = std::chrono::steady_clock::now();
     last_look_ = last_refresh_ - now;
   }

@@ -303,6 +303,7 @@ TEST(Inference, NarrowsByConditions) {
       {"class A:\n  x: 'int | None'\n  def m(self):\n    if self.x is not None:\n      self.$x\n    self.$x\n",
        {"int", "None | int"}},
       {"def f(x):\n  if isinstance(x, str):\n    $x\n", {"str"}},
+      {"def f(x: int | str):\n  if type(x) is int:\n    $x\n  else:\n    $x\n", {"int", "int | str"}},
       {"class A: pass\nclass B(A): pass\ndef f(x: A):\n  if isinstance(x, B):\n    $x\n  else:\n    $x\n",
        {"a.B", "a.A"}},
       {"def f(x: type[int] | None):\n  if x is None: return\n  $x\n", {"type[int]"}},

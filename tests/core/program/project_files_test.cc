@@ -210,6 +210,27 @@ TEST(ProjectFiles, SeeWhatChanges) {
   EXPECT_EQ(at.With("total"), (Paths{"a.py", "sub/c.py"}));
 }
 
+TEST(ProjectFiles, KeepNoFiltersOfTextsThatAreGone) {
+  Changing at;
+  std::string words[2];
+  for (int i = 0; i < 2000; ++i) words[i % 2] += "name_" + std::to_string(i) + " = total\n";
+  at.folder.Write("b.py", words[0] + words[1]);
+  at.project.Refresh();
+  at.With("total");
+  at.With("total");
+  const size_t at_first = at.project.ByteSize();
+  for (int round = 0; round < 30; ++round) {
+    at.folder.Write("new" + std::to_string(round) + ".py", "x = 1\n");
+    at.folder.Write("b.py", "");
+    at.project.Refresh();
+    at.With("total");
+    at.folder.Write("b.py", words[0] + words[1] + words[round % 2]);
+    at.project.Refresh();
+    EXPECT_EQ(at.With("total"), (Paths{"a.py", "b.py", "sub/c.py"}));
+  }
+  EXPECT_LT(at.project.ByteSize(), 5 * at_first);
+}
+
 TEST(ProjectFiles, TakeTheTextOfBuffers) {
   Changing at;
   const FileId b = at.files.NumberOf(at.folder / "b.py");

@@ -169,6 +169,21 @@ TEST(Pages, AFileIsShownUpToALimit) {
   EXPECT_EQ(site.index->definition_count(), 0u);
 }
 
+TEST(Pages, WhatIsOpenedIsClosed) {
+  for (const char* source : {"", "\n", "x = 1\n", "x = 1\r\ry\n\r\nz\r", "\r\r\n\n\r"}) {
+    const std::string page = Site({source}).Page();
+    const auto count = [&](const std::string& text) {
+      size_t found = 0;
+      for (size_t at = page.find(text); at != std::string::npos; at = page.find(text, at + 1)) ++found;
+      return found;
+    };
+    for (const char* name : {"div", "main", "p", "b", "em", "ol", "ul", "nav"})
+      EXPECT_EQ(count("<" + std::string(name) + ">") + count("<" + std::string(name) + " "),
+                count("</" + std::string(name) + ">"))
+          << name << " in the page of " << source;
+  }
+}
+
 TEST(Pages, AnErrorStandsBelowItsLineWithItsColumn) {
   EXPECT_NE(Site({"x = 1\n\u00E9\t= = 2\n"}).Page().find("</p>\n<p class=\"error\"> \t  ^ invalid syntax</p>"),
             std::string::npos);

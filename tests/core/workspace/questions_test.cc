@@ -32,6 +32,13 @@ TEST(Definitions, OfAttributesThatAMakerOfInstancesSets) {
     EXPECT_EQ(place.certainty, Certainty::kByName);
 }
 
+TEST(Definitions, OfWhatAClassHasBeforeItsMetaclass) {
+  Program program(
+      "class M(type):\n  def x(cls): pass\n  def y(cls): pass\nclass A(metaclass=M):\n  x = 1\nA.$x\nA.$y\n");
+  EXPECT_EQ(program.Definitions(0), Words{"a.py:5:3"});
+  EXPECT_EQ(program.Definitions(1), Words{"a.py:3:7"});
+}
+
 TEST(Definitions, OfWhatAModuleImportsFromItself) {
   Program program({
       {"p/__init__.py", ""},
@@ -571,6 +578,22 @@ TEST(Hovers, ShowDeclarationsAndDocumentation) {
   EXPECT_EQ(at(3).text, "");
 }
 
+TEST(Hovers, TakeWordsFromTheSourceWhereAStubHasNone) {
+  Program program({
+      {"a.py", "import lib\nlib.$told\nlib.$silent\n"},
+      {"lib.pyi", "def told():\n  '''Of the stub.'''\ndef silent(): ...\n"},
+      {"lib.py", "def told():\n  '''Of the source.'''\ndef silent():\n  '''Of the source.'''\n"},
+  });
+  const auto at = [&](size_t i) { return program->HoverAt(program[i].file, program[i].offset).documentation; };
+  EXPECT_EQ(at(0), "Of the stub.");
+  EXPECT_EQ(at(1), "Of the source.");
+}
+
+TEST(Types, AtAClosingBracketAreThoseOfWhatItCloses) {
+  EXPECT_EQ(Program("class B: pass\nclass A(B$): pass\nx = (1 + 1$)\ny = str(1$)\n").AllTypes(),
+            (Words{"type[a.B]", "builtins.int", "builtins.str"}));
+}
+
 TEST(Types, OfFunctionsAreTheirSignatures) {
   Program program(
       "class B: pass\ndef $f(x: int, b: B) -> list[str]: ...\ndef $g(self, x, *y):\n  # type: (int, *str) -> B\n  "
@@ -669,6 +692,9 @@ TEST(Classes, KnowTheirBasesAndWhatDerivesFromThem) {
   EXPECT_EQ(up(2), Words{"a.py:1:7"});
   EXPECT_EQ(down(2), Words{"b.py:4:7"});
   EXPECT_EQ(up(3), Words{"a.py:2:7"});
+  Program plain("def $f(): pass\n");
+  EXPECT_TRUE(plain->Supertypes(plain[0].file, plain[0].offset).empty());
+  EXPECT_TRUE(plain->Subtypes(plain[0].file, plain[0].offset).empty());
 }
 
 // ---- problems ----
