@@ -323,7 +323,8 @@ Value Inference::GuessParameters(FunctionId id) {
   const FunctionInfo info = functions_[id];
   std::vector<ExprPlace> calls;
   FindCalls(id, calls, 0);
-  std::ranges::sort(calls, {}, [](const ExprPlace& place) { return std::pair(place.file, place.expr); });
+  // By paths: numbers of files are in the order in which they were met.
+  std::ranges::sort(calls, {}, [&](const ExprPlace& at) { return std::pair(Text(files_.PathOf(at.file)), at.expr); });
   const auto is_same = [](const ExprPlace& a, const ExprPlace& b) { return a.file == b.file && a.expr == b.expr; };
   calls.erase(std::unique(calls.begin(), calls.end(), is_same), calls.end());
   std::vector<Value> parameters(ParametersOf(info).size());

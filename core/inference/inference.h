@@ -184,6 +184,7 @@ class Inference {
   void Clear();
   // Begins a question: steps are counted anew.
   void Begin() {
+    ++question_;
     steps_of_all_ = kMaxStepsOfAll;
     has_met_bound_ = false;
     CountAnew();
@@ -269,7 +270,18 @@ class Inference {
   TypeTable& types() { return types_; }
   Files& files() { return files_; }
   Modules& modules() { return modules_; }
-  const SourceFile* FileOf(FileId file) { return files_.Get(file); }
+  // A file that is read for a question, once: whether it was read for an earlier one, too, makes no difference to it.
+  const SourceFile* FileOf(FileId file) {
+    const SourceFile* source = files_.Get(file);
+    if (file >= read_for_.size()) read_for_.resize(file + 1);
+    if (std::exchange(read_for_[file], question_) != question_ && source != nullptr) unpaid_ += source->text().size();
+    return source;
+  }
+  // One that a question is about: guesses do not pay for it.
+  void KnowFile(FileId file) {
+    if (file >= read_for_.size()) read_for_.resize(file + 1);
+    read_for_[file] = question_;
+  }
   // The file that says what a module holds: its stub, or its source.
   FileId FileOfModule(ModuleId module) const;
   uint32_t NumberOfName(Text name);
@@ -372,16 +384,15 @@ class Inference {
   void CountAnew() {
     steps_ = first_steps_ = std::min(kMaxSteps, steps_of_all_);
     guess_steps_ = first_guess_steps_ = std::min(kMaxGuessSteps, steps_of_all_);
-    read_ = files_.bytes_read();
+    unpaid_ = 0;
     cut_rounds_ = 0;
   }
   // Makes guesses pay for the files that were read for them.
   void CountReading() {
     static constexpr uint64_t kBytesOfAStep = 1024;
-    const uint64_t read = files_.bytes_read();
-    if (read == read_) return;
-    guess_steps_ -= static_cast<uint32_t>(std::min<uint64_t>(guess_steps_, (read - read_) / kBytesOfAStep));
-    read_ = read;
+    if (unpaid_ == 0) return;
+    guess_steps_ -= static_cast<uint32_t>(std::min<uint64_t>(guess_steps_, unpaid_ / kBytesOfAStep));
+    unpaid_ = 0;
   }
   // What is found while this lives is found as if nothing else were being found.
   class Afresh;
@@ -600,7 +611,9 @@ class Inference {
   uint32_t first_guess_steps_ = kMaxGuessSteps;
   uint32_t steps_of_all_ = kMaxStepsOfAll;
   bool has_met_bound_ = false;
-  uint64_t read_ = 0;  // bytes of files, as far as guesses have paid for them
+  uint32_t question_ = 1;           // its number
+  std::vector<uint32_t> read_for_;  // by files: the last question
+  uint64_t unpaid_ = 0;             // bytes of files that guesses have not paid for
   int depth_ = 0;
   int max_depth_ = kMaxDepth;
   int guess_level_ = 0;           // how many guesses are being made

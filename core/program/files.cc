@@ -263,7 +263,6 @@ class Files::Impl {
     if (IsHeld(file) && !IsOpen(file)) GiveBack(entries_[file]);
   }
   bool IsHeld(FileId file) const { return entries_[file].file != nullptr; }
-  uint64_t bytes_read() const { return bytes_read_; }
 
  private:
   struct Entry {
@@ -344,7 +343,6 @@ class Files::Impl {
   void Hold(Entry& entry, std::unique_ptr<SourceFile> file) {
     entry.byte_size = file->ByteSize();
     held_ += entry.byte_size;
-    bytes_read_ += file->text().size();
     entry.file = std::move(file);
   }
 
@@ -359,7 +357,6 @@ class Files::Impl {
   FileId lines_of_ = kNoFile;
   std::vector<uint32_t> lines_;  // where they begin
   size_t held_ = 0;
-  uint64_t bytes_read_ = 0;
   uint64_t asked_ = 0;
 };
 
@@ -396,6 +393,5 @@ void Files::Trim(size_t bytes) { impl_->Trim(bytes); }
 void Files::GiveBack(FileId file) { impl_->GiveBack(file); }
 bool Files::IsHeld(FileId file) const { return impl_->IsHeld(file); }
 size_t Files::ByteSize() const { return impl_->ByteSize(); }
-uint64_t Files::bytes_read() const { return impl_->bytes_read(); }
 
 }  // namespace quillet

@@ -82,8 +82,6 @@ class Files {
   void GiveBack(FileId file);
   bool IsHeld(FileId file) const;
   size_t ByteSize() const;
-  // Of all sources that Get has read so far.
-  uint64_t bytes_read() const;
 
   Version version() const { return version_; }
   // What a file is read as: stubs are written in the newest language, whatever the version that they describe.

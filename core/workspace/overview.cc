@@ -282,7 +282,7 @@ std::vector<Call> Workspace::Callees(FileId id, uint32_t offset) {
 
 std::vector<Call> Workspace::Callers(FileId id, uint32_t offset) {
   Impl& in = *impl_;
-  in.Begin();
+  in.BeginAnew();
   std::vector<Call> found;
   const SourceFile* file = in.Get(id);
   const uint32_t index = file == nullptr ? kNoIndex : in.OccurrenceAt(*file, offset);

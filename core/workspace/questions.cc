@@ -76,6 +76,12 @@ void Workspace::Impl::Begin() {
   is_bounded = false;
 }
 
+void Workspace::Impl::BeginAnew() {
+  Begin();
+  inference.Clear();
+  ForgetCalls();
+}
+
 void Workspace::Impl::ForgetFound() {
   inference.Clear();
   ForgetCalls();
@@ -143,18 +149,17 @@ std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
   const auto [at, is_new] = calls_by_name_.try_emplace(key);
   if (!is_new) return at->second;
   std::vector<ExprPlace> calls;
-  std::vector<FileId> candidates{function.file};
-  if (IsProject(function.file)) {
-    for (const FileId file : project.WithWords({name})) {
-      if (candidates.size() >= kMaxFiles) break;
-      if (file != function.file) candidates.push_back(file);
-    }
-  }
+  std::vector<FileId> candidates;
+  if (IsProject(function.file)) candidates = project.WithWords({name});
+  std::erase(candidates, function.file);
+  candidates.insert(candidates.begin(), function.file);
+  size_t count = 0;  // of files that have the name
   for (const FileId id : candidates) {
-    if (calls.size() >= kMaxCalls) break;
-    const SourceFile* file = Get(id);
+    if (calls.size() >= kMaxCalls || count >= kMaxFiles) break;
+    const SourceFile* file = inference.FileOf(id);
     const uint32_t number = file == nullptr ? kNoIndex : NumberOfText(file->bindings, name);
     if (number == kNoIndex) continue;
+    ++count;
     for (const Occurrence& occurrence : file->bindings.occurrences) {
       if (occurrence.text != number) continue;
       if (calls.size() >= kMaxCalls) break;

@@ -332,7 +332,11 @@ Binding Workspace::Impl::CallWithUnseenKeywords(const Entity& entity) {
 
 std::vector<Location> Workspace::References(FileId id, uint32_t offset, bool everywhere) {
   Impl& in = *impl_;
-  in.Begin();
+  if (everywhere) {
+    in.BeginAnew();
+  } else {
+    in.Begin();
+  }
   const SourceFile* file = in.Get(id);
   if (file == nullptr) return {};
   const uint32_t index = in.OccurrenceAt(*file, offset);
@@ -345,7 +349,7 @@ std::vector<Location> Workspace::References(FileId id, uint32_t offset, bool eve
 
 Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_certain) {
   Impl& in = *impl_;
-  in.Begin();
+  in.BeginAnew();
   Rename rename;
   const SourceFile* file = in.Get(id);
   const uint32_t index = file == nullptr ? kNoIndex : in.OccurrenceAt(*file, offset);

@@ -25,6 +25,9 @@ class Workspace::Impl final : public CallerSource {
 
   // Begins a question: files that changed are read again.
   void Begin();
+  // Begins one about many places. How much of what is likely is found in each depends on what is known, so nothing is:
+  // the answer is the same whatever was asked before.
+  void BeginAnew();
   void Forget();
   // Where functions are called, by numbers of expressions: of no text but the one that they were found in.
   void ForgetCalls() { calls_by_name_.clear(); }
@@ -32,7 +35,11 @@ class Workspace::Impl final : public CallerSource {
   // behind it.
   bool IsMuchRemembered() const { return inference.ByteSize() > settings.most_remembered; }
   void ForgetFound();
-  const SourceFile* Get(FileId file) { return files.Get(file); }
+  // A file that a question is about.
+  const SourceFile* Get(FileId file) {
+    inference.KnowFile(file);
+    return files.Get(file);
+  }
   // The bytes of a line from 1, without its end; (0, 0) for one in front of the file, its end for one behind.
   std::pair<uint32_t, uint32_t> LineAt(const SourceFile& file, int line);
   // One of many files that a question goes over. While it lasts nothing is given back; behind it this one is, where

@@ -340,6 +340,22 @@ TEST(Definitions, AreAsSureWhateverWasAskedBefore) {
   EXPECT_EQ(first, std::vector<std::string>(6, "a.py:4:7"));
 }
 
+TEST(References, AreTheSameWhateverWasAskedBefore) {
+  // What is given to `f` leads through a file that is too long to be read for a guess, first or later.
+  const std::string way = "# " + std::string(size_t{4} << 20, '-') +
+                          "\nfrom a import A\nfrom b import f\ndef g(y): f(y)\ng(A())\nA().m()\n";
+  Program program({{"a.py", "class A:\n  def $m(self): pass\nclass B:\n  def m(self): pass\n"},
+                   {"b.py", "def f(x):\n  x.$m()\n"},
+                   {"c.py", way}});
+  const Words references = {"a.py:2:7", "b.py:2:5 by name", "c.py:6:5"};
+  const Words definitions = {"a.py:2:7 by name", "a.py:4:7 by name"};
+  for (int i = 0; i < 2; ++i) {
+    EXPECT_EQ(program.References(), references) << i;
+    EXPECT_TRUE(program->was_bounded());
+    EXPECT_EQ(program.Definitions(1), definitions) << i;
+  }
+}
+
 TEST(References, OfKeywordsAreThoseOfTheFunctionThatIsCalled) {
   EXPECT_EQ(Program("def f($x): pass\ndef g(x): pass\nf(x=1)\ng(x=1)\n").References(), (Words{"a.py:1:7", "a.py:3:3"}));
   EXPECT_EQ(Program("class A:\n  def __init__(self, $x): self.x = x\nA(x=1).x\n").References(),
