@@ -20,9 +20,11 @@ TEST(Syntax, OperatorsBind) {
   EXPECT_EQ(SyntaxText("a < b + c is not d not in e\n"), "Expression (Compare#2 a (Binary#14 b c) d e)\n");
   EXPECT_EQ(SyntaxText("a is not b\n"), "Expression (Compare#7 a b)\n");
   EXPECT_EQ(SyntaxText("a not in b\n"), "Expression (Compare#9 a b)\n");
-  EXPECT_EQ(SyntaxText("not a == b\n"), "Expression (Unary#157 (Compare a b))\n");
+  const std::string is_not = "Unary#" + std::to_string(word::kNot), is_or = "Boolean#" + std::to_string(word::kOr),
+                    is_and = "Boolean#" + std::to_string(word::kAnd);
+  EXPECT_EQ(SyntaxText("not a == b\n"), "Expression (" + is_not + " (Compare a b))\n");
   EXPECT_EQ(SyntaxText("a or b and not c or d\n"),
-            "Expression (Boolean#158 (Boolean#158 a (Boolean#128 b (Unary#157 c))) d)\n");
+            "Expression (" + is_or + " (" + is_or + " a (" + is_and + " b (" + is_not + " c))) d)\n");
   EXPECT_EQ(SyntaxText("a | b ^ c & d << e\n"),
             "Expression (Binary#18 a (Binary#33 b (Binary#19 c (Binary#34 d e))))\n");
   EXPECT_EQ(SyntaxText("await a ** b\n"), "Expression (Binary#36 (Await a) b)\n");
@@ -86,7 +88,7 @@ TEST(Syntax, Assignments) {
 }
 
 TEST(Syntax, SimpleStatements) {
-  EXPECT_EQ(SyntaxText("pass; break; return\n"), "Pass\nPass\nReturn\n");
+  EXPECT_EQ(SyntaxText("pass; break; return; raise\n"), "Pass\nPass\nReturn\nRaise\n");
   EXPECT_EQ(SyntaxText("del a, (b, c), d[0]\n"), "Delete a= (Tuple b= c=)() (Subscript d 0)=\n");
   EXPECT_EQ(SyntaxText("assert a, b\nraise a from b\nglobal a, b\nnonlocal c\n"),
             "Assert a b\nRaise a b\nGlobal a b\nNonlocal c\n");
