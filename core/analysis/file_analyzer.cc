@@ -85,6 +85,9 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   const auto node_count = [&] { return pool.node_count() + other_pool.node_count(); };
   const size_t nodes_before = node_count();
   found_.results.reserve(found_.rows.size());
+  // The text, and the copy of it that the caller has.
+  held_before_ = 2 * found_.source->size() + SizeOf(found_.source->tokens) + SizeOf(found_.source->line_starts) +
+                 SizeOf(found_.rows);
   CountMemory();
   wanted_.assign(filter != nullptr ? found_.rows.size() : 0, false);
   const bool is_filtered = filter != nullptr && filter->Choose(*found_.source, found_.rows, wanted_);
@@ -231,9 +234,7 @@ size_t FileAnalyzer::MostMemoryOf(const LineRow& row) const {
 }
 
 void FileAnalyzer::CountMemory() {
-  // The text, and the copy of it that the caller has.
-  held_ = 2 * found_.source->size() + SizeOf(found_.source->tokens) + SizeOf(found_.source->line_starts) +
-          SizeOf(found_.rows) + SizeOf(found_.results) + SizeOf(found_.errors) + SizeOf(found_.store.rows) +
+  held_ = held_before_ + SizeOf(found_.results) + SizeOf(found_.errors) + SizeOf(found_.store.rows) +
           SizeOf(found_.store.arg_rows) + found_.store.texts.byte_size();
 }
 

@@ -133,7 +133,7 @@ class FileAnalyzer {
   // What the analysis of a row may take beside its results, at most.
   size_t MostMemoryOf(const LineRow& row) const;
   // Counts what the results hold by now.
-  void CountMemory();
+  inline void CountMemory();
   [[noreturn]] void ThrowTooLarge() const;
 
   Options options_;
@@ -147,6 +147,7 @@ class FileAnalyzer {
   std::unique_ptr<NameRules> name_rules_;  // built at first need
   TypingNames typing_;
   size_t memory_limit_ = kLeastMemoryLimit;
+  size_t held_before_ = 0;  // by what was cut, before the first line was analysed
   size_t held_ = 0;
 };
 

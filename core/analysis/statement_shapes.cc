@@ -3,6 +3,8 @@
 #include "analysis/statement_shapes.h"
 
 #include <algorithm>
+#include <array>
+#include <bit>
 #include <cstring>
 #include <utility>
 
@@ -17,6 +19,8 @@ namespace {
 
 // Longer statements are rarely like an earlier one.
 constexpr size_t kMaxTokens = 32;
+// What a copy of a short text reads and writes, whatever its size.
+constexpr size_t kCopySlack = TextArena::kSlack;
 // Of the texts that are part of a key.
 constexpr size_t kMaxOwnTexts = 64;
 // A plan costs as much as some analyses: it stays for a while, and goes when others are met more often.
@@ -69,6 +73,7 @@ uint64_t Load64(const void* at) {
 
 // The name that a walker knows by its text.
 bool IsKnownName(Text name) { return name == "isinstance"; }
+constexpr auto kFrontOfKnownName = std::bit_cast<uint64_t>(std::array{'i', 's', 'i', 'n', 's', 't', 'a', 'n'});
 
 // That reads as such in every version.
 bool IsAllDigits(Text text) {
@@ -86,7 +91,8 @@ size_t PrefixLengthOf(const Token& string) {
 // ---- keys ----
 
 // What a statement has in common with others of its shape, as bytes: its kind and place, then two bytes a token
-// (what it is; its gap and the first token that it equals), then the texts that count themselves.
+// (what it is; its gap and the first token that it equals), then the texts that count themselves. It is hashed while
+// it is put together, since words are slow to read where single bytes were just written.
 class StatementShapes::Key {
  public:
   // False for a statement that has no shape.
@@ -95,7 +101,9 @@ class StatementShapes::Key {
     count_ = line.toks.size();
     bytes_[0] = static_cast<uint8_t>(line.kind);
     bytes_[1] = in_async_def;
+    uint64_t hash = count_ << 16 | static_cast<uint64_t>(line.kind) << 8 | in_async_def;
     const char* end = toks_[0].text;
+    size_t text_size = 0;
     size_t look_count = 0;
     uint8_t looks[kMaxTokens];
     for (size_t i = 0; i < count_; ++i) {
@@ -105,28 +113,47 @@ class StatementShapes::Key {
       const auto gap = static_cast<uint8_t>(touches ? kTouches : is_one_blank_apart ? kOneBlank : kApart);
       bytes_[kHead + 2 * i] = token.code;
       bytes_[kHead + 2 * i + 1] = static_cast<uint8_t>(gap << kGapShift);
+      hash = Mixed(hash, uint64_t{token.code} << 8 | gap);
       looks[look_count] = static_cast<uint8_t>(i);
       look_count += kNeedsLook[token.code];
-      text_size_ += token.length;
+      text_size += token.length;
       end = token.end();
     }
     size_ = kHead + 2 * count_;
+    text_size_ = text_size;
+    uint64_t look_hash = 0;
+    Known known;
     for (size_t k = 0; k < look_count; ++k) {
-      if (!Look(looks[k])) return false;
+      const uint8_t i = looks[k];
+      const Token& token = toks_[i];
+      const uint64_t front = Load64(token.text) & kFrontMasks[std::min<size_t>(token.length, 8)];
+      uint8_t what = token.code;
+      if (what != tok::NAME || front == kFrontOfKnownName) {
+        what = WhatIs(token);
+        if (what == kNever) return false;
+        bytes_[kHead + 2 * i] = what;
+      }
+      const uint8_t first = FirstEqual(i, front, known);
+      bytes_[kHead + 2 * i + 1] |= first;
+      look_hash = Mixed(look_hash, uint64_t{what} << 8 | first);
     }
+    std::memset(bytes_.data() + size_, 0, sizeof(uint64_t));
+    hash_ ^= hash + (look_hash << 32 | look_hash >> 32);
+    hash_ = Mixed(hash_ ^ hash_ >> 32, 0);
     return true;
   }
 
-  uint64_t Hash() {
-    std::memset(bytes_.data() + size_, 0, sizeof(uint64_t));
-    uint64_t hash = size_;
-    for (size_t at = 0; at < size_; at += sizeof(uint64_t)) {
-      hash = (hash ^ Load64(bytes_.data() + at)) * kMultiplier;
-      hash ^= hash >> 29;
-    }
-    return hash * kMultiplier;
+  // The size in words, the last of which may end in zeros.
+  static size_t WordsOf(size_t size) { return (size + sizeof(uint64_t) - 1) / sizeof(uint64_t); }
+  bool Equals(const uint8_t* bytes, size_t size) const {
+    if (size != size_) return false;
+    uint64_t difference = 0;
+    for (size_t i = 0; i < WordsOf(size); ++i)
+      difference |= Load64(bytes_.data() + sizeof(uint64_t) * i) ^ Load64(bytes + sizeof(uint64_t) * i);
+    return difference == 0;
   }
 
+  uint64_t hash() const { return hash_; }
   const uint8_t* bytes() const { return bytes_.data(); }
   size_t size() const { return size_; }
   size_t count() const { return count_; }
@@ -141,33 +168,31 @@ class StatementShapes::Key {
   static constexpr size_t kHead = 2;
   static constexpr unsigned kGapShift = 6;
 
-  // Says more of the token; false where no shape has it.
-  bool Look(uint8_t i) {
-    const Token& token = toks_[i];
-    uint8_t& what = bytes_[kHead + 2 * i];
+  static uint64_t Mixed(uint64_t hash, uint64_t value) { return (hash ^ value) * kMultiplier; }
+
+  // The tokens that equal none in front of them.
+  struct Known {
+    uint64_t seen = 0;  // a bit for the front of each
+    size_t count = 0;
+    std::array<uint64_t, kMaxTokens> fronts;
+    std::array<uint8_t, kMaxTokens> tokens;
+  };
+
+  // What a token is whose code does not say all that counts.
+  uint8_t WhatIs(const Token& token) {
     switch (token.code) {
       case tok::NAME:
-        bytes_[kHead + 2 * i + 1] |= FirstEqual(i);
-        if (token.length == 10 && IsKnownName(token.view())) [[unlikely]]
-          what = WithOwnText(token.view());
-        break;
+        return IsKnownName(token.view()) ? WithOwnText(token.view()) : uint8_t{tok::NAME};
       case tok::NUMBER:
-        bytes_[kHead + 2 * i + 1] |= FirstEqual(i);
-        what = IsAllDigits(token.view()) ? uint8_t{kDigits} : WithOwnText(token.view());
-        break;
+        return IsAllDigits(token.view()) ? uint8_t{kDigits} : WithOwnText(token.view());
       case tok::STRING:
-        bytes_[kHead + 2 * i + 1] |= FirstEqual(i);
-        what = WhatString(token);
-        break;
+        return WhatString(token);
       case tok::NOTEQUAL:
       case tok::ATEQUAL:
-        what = WithOwnText(token.view());
-        break;
+        return WithOwnText(token.view());
       default:
-        what = kNever;
-        break;
+        return kNever;
     }
-    return what != kNever;
   }
 
   uint8_t WhatString(const Token& token) {
@@ -185,26 +210,26 @@ class StatementShapes::Key {
     bytes_[size_++] = static_cast<uint8_t>(text.size());
     std::memcpy(bytes_.data() + size_, text.data(), text.size());
     size_ += text.size();
+    for (const char c : text) hash_ = Mixed(hash_, static_cast<unsigned char>(c));
     return kOwnText;
   }
 
-  // The first token of this text among the names, numbers and strings.
-  uint8_t FirstEqual(uint8_t i) {
+  // The first token of this text, which begins with `front`, among those that are looked at.
+  uint8_t FirstEqual(uint8_t i, uint64_t front, Known& known) const {
     const Token& token = toks_[i];
-    const uint64_t front = Load64(token.text) & kFrontMasks[std::min<size_t>(token.length, 8)];
     const uint64_t bit = uint64_t{1} << (front * kMultiplier >> 58);
-    if ((seen_ & bit) != 0) {
-      for (size_t known = 0; known < known_count_; ++known) {
-        if (known_fronts_[known] != front) continue;
-        const Token& other = toks_[known_[known]];
+    if ((known.seen & bit) != 0) {
+      for (size_t k = 0; k < known.count; ++k) {
+        if (known.fronts[k] != front) continue;
+        const Token& other = toks_[known.tokens[k]];
         if (other.length == token.length &&
             (token.length <= 8 || std::memcmp(other.text + 8, token.text + 8, token.length - 8) == 0))
-          return known_[known];
+          return known.tokens[k];
       }
     }
-    seen_ |= bit;
-    known_fronts_[known_count_] = front;
-    known_[known_count_++] = i;
+    known.seen |= bit;
+    known.fronts[known.count] = front;
+    known.tokens[known.count++] = i;
     return i;
   }
 
@@ -214,11 +239,7 @@ class StatementShapes::Key {
   size_t count_ = 0;
   size_t size_ = 0;
   size_t text_size_ = 0;
-  // The tokens that equal none in front of them.
-  uint64_t seen_ = 0;  // a bit for the front of each
-  size_t known_count_ = 0;
-  std::array<uint64_t, kMaxTokens> known_fronts_;
-  std::array<uint8_t, kMaxTokens> known_;
+  uint64_t hash_ = 0;
   std::array<uint8_t, kMostBytes + sizeof(uint64_t)> bytes_;
 };
 
@@ -333,36 +354,25 @@ class StatementShapes::Plan {
     bool is_bounded = false;
   };
 
+  Plan() = default;
   // That of a shape which has to be analysed each time.
-  explicit Plan(const Key& key) : Plan(key, Parts()) { is_whole_ = false; }
+  explicit Plan(const Key& key) : Plan(key, Parts(), false) {}
+  Plan(const Key& key, const Parts& parts) : Plan(key, parts, true) {}
 
-  Plan(const Key& key, const Parts& parts)
-      : is_bounded_(parts.is_bounded),
-        key_size_(static_cast<uint8_t>(key.size())),
-        row_count_(static_cast<uint8_t>(parts.row_count)),
-        record_count_(static_cast<uint8_t>(parts.records.size())),
-        piece_count_(static_cast<uint8_t>(parts.pieces.size())),
-        bytes_(new uint8_t[FixedBegin() + parts.fixed.size() + kSlack]) {
-    std::copy_n(key.bytes(), key.size(), bytes_.get());
-    std::copy_n(reinterpret_cast<const uint8_t*>(parts.records.data()), sizeof(RecordPlan) * record_count_,
-                bytes_.get() + RecordsBegin());
-    std::copy_n(reinterpret_cast<const uint8_t*>(parts.pieces.data()), sizeof(Piece) * piece_count_,
-                bytes_.get() + PiecesBegin());
-    std::copy_n(parts.fixed.data(), parts.fixed.size(), bytes_.get() + FixedBegin());
-  }
-
-  bool IsFor(const Key& key) const {
-    return key.size() == key_size_ && std::memcmp(key.bytes(), bytes_.get(), key_size_) == 0;
-  }
-  bool is_whole() const { return is_whole_; }
+  bool IsFor(const Key& key) const { return key.Equals(bytes_.get() + sizeof(Head), head().key_size); }
+  bool is_whole() const { return head().is_whole; }
   // Whether the statement holds operator expressions, whose text may be too long.
-  bool is_bounded() const { return is_bounded_; }
+  bool is_bounded() const { return head().is_bounded; }
 
   // Appends the records of a statement of the shape.
   void Tell(LogicalLine& line, std::string& scratch) const {
-    line.DirectAppendRows(row_count_, [&](size_t i) { return Make(i, line, scratch); });
-    for (size_t i = row_count_; i < record_count_; ++i) {
-      const Record record = Make(i, line, scratch);
+    const Head counts = head();
+    const uint8_t* const records = bytes_.get() + RecordsBegin(counts);
+    const uint8_t* const pieces = records + sizeof(RecordPlan) * counts.record_count;
+    const Composer composer{line, pieces, pieces + sizeof(Piece) * counts.piece_count, scratch};
+    line.DirectAppendRows(counts.row_count, [&](size_t i) { return composer.Make(records + sizeof(RecordPlan) * i); });
+    for (size_t i = counts.row_count; i < counts.record_count; ++i) {
+      const Record record = composer.Make(records + sizeof(RecordPlan) * i);
       line.DirectAppendArg(record.name(), record.info());
     }
   }
@@ -391,89 +401,127 @@ class StatementShapes::Plan {
   };
 
  private:
-  // What a copy of sixteen bytes may read behind a fixed text.
-  static constexpr size_t kSlack = 16;
+  struct Head {
+    uint8_t key_size = 0;
+    uint8_t row_count = 0;
+    uint8_t record_count = 0;
+    uint8_t piece_count = 0;
+    uint8_t is_whole = false;
+    uint8_t is_bounded = false;
+    uint8_t unused[2] = {};
+  };
+  static_assert(sizeof(Head) == 8);
 
-  size_t RecordsBegin() const { return key_size_; }
-  size_t PiecesBegin() const { return RecordsBegin() + sizeof(RecordPlan) * record_count_; }
-  size_t FixedBegin() const { return PiecesBegin() + sizeof(Piece) * piece_count_; }
-
-  Record Make(size_t i, LogicalLine& line, std::string& scratch) const {
-    RecordPlan plan;
-    std::memcpy(&plan, bytes_.get() + RecordsBegin() + sizeof plan * i, sizeof plan);
-    const Text name = Make(plan.name, line, scratch);
-    const Text info = Make(plan.info, line, scratch);
-    return {name.data(), info.data(), static_cast<uint32_t>(name.size()), static_cast<uint32_t>(info.size())};
-  }
-
-  Text Make(const TextPlan& plan, LogicalLine& line, std::string& scratch) const {
-    switch (plan.origin) {
-      case kFixed:
-        return kFixedTexts[plan.first];
-      case kTokens: {
-        const char* const begin = line.toks[plan.first].text;
-        return {begin, static_cast<size_t>(line.toks[plan.last].end() - begin)};
-      }
-      case kComposed:
-        return Compose(plan, line);
-      case kEncoded:
-        break;
-    }
-    return Encode(plan, line, scratch);
-  }
-
-  Text Compose(const TextPlan& plan, LogicalLine& line) const {
-    const uint8_t* const pieces = bytes_.get() + PiecesBegin() + sizeof(Piece) * plan.first;
-    size_t size = 0;
-    for (size_t i = 0; i < plan.last; ++i) {
-      size += pieces[2 * i];
-      if (pieces[2 * i + 1] != Piece::kNoToken) size += line.toks[pieces[2 * i + 1]].length;
-    }
-    char* const text = line.texts().Allocate(size);
-    char* at = text;
-    const auto append = [&at, limit = text + size](const char* from, size_t count) {
-      // Most are short, and both sides may be read and written sixteen bytes at a time.
-      if (count <= 16 && limit - at >= 16)
-        std::memcpy(at, from, 16);
-      else
-        std::memcpy(at, from, count);
-      at += count;
+  Plan(const Key& key, const Parts& parts, bool is_whole) {
+    Head head;
+    head.key_size = static_cast<uint8_t>(key.size());
+    head.row_count = static_cast<uint8_t>(parts.row_count);
+    head.record_count = static_cast<uint8_t>(parts.records.size());
+    head.piece_count = static_cast<uint8_t>(parts.pieces.size());
+    head.is_whole = is_whole;
+    head.is_bounded = parts.is_bounded;
+    const size_t records_begin = RecordsBegin(head);
+    const size_t records_size = sizeof(RecordPlan) * parts.records.size();
+    const size_t pieces_size = sizeof(Piece) * parts.pieces.size();
+    bytes_.reset(new uint8_t[records_begin + records_size + pieces_size + parts.fixed.size() + kCopySlack]);
+    uint8_t* at = bytes_.get();
+    const auto append = [&at](const void* from, size_t size) {
+      if (size != 0) std::memcpy(at, from, size);
+      at += size;
     };
-    const char* fixed = reinterpret_cast<const char*>(bytes_.get()) + FixedBegin() + plan.fixed;
-    for (size_t i = 0; i < plan.last; ++i) {
-      append(fixed, pieces[2 * i]);
-      fixed += pieces[2 * i];
-      if (pieces[2 * i + 1] == Piece::kNoToken) continue;
-      const Token& token = line.toks[pieces[2 * i + 1]];
-      append(token.text, token.length);
-    }
-    return {text, size};
+    append(&head, sizeof head);
+    append(key.bytes(), records_begin - sizeof head);
+    append(parts.records.data(), records_size);
+    append(parts.pieces.data(), pieces_size);
+    append(parts.fixed.data(), parts.fixed.size());
   }
 
-  [[gnu::noinline]] Text Encode(const TextPlan& plan, LogicalLine& line, std::string& scratch) const {
-    const uint8_t* const pieces = bytes_.get() + PiecesBegin() + sizeof(Piece) * plan.first;
-    const char* fixed = reinterpret_cast<const char*>(bytes_.get()) + FixedBegin() + plan.fixed;
-    scratch.clear();
-    for (size_t i = 0; i < plan.last; ++i) {
-      scratch.append(fixed, pieces[2 * i]);
-      fixed += pieces[2 * i];
-      const uint8_t token = pieces[2 * i + 1];
-      if (token == Piece::kNoToken) continue;
-      if ((token & Piece::kIsEncoded) != 0)
-        AppendEncodedStringLiteral(line.toks[token & ~Piece::kIsEncoded].view(), scratch);
-      else
-        scratch.append(line.toks[token].view());
-    }
-    return line.texts().Copy(scratch);
+  Head head() const {
+    Head head;
+    std::memcpy(&head, bytes_.get(), sizeof head);
+    return head;
   }
+  static size_t RecordsBegin(const Head& head) { return sizeof head + sizeof(uint64_t) * Key::WordsOf(head.key_size); }
 
-  bool is_whole_ = true;
-  bool is_bounded_;
-  uint8_t key_size_;
-  uint8_t row_count_;
-  uint8_t record_count_;
-  uint8_t piece_count_;
-  // The key, the records, the pieces, and the fixed texts that these refer to.
+  // Makes the records of a statement.
+  struct Composer {
+    LogicalLine& line;
+    const uint8_t* pieces;
+    const uint8_t* fixed_texts;
+    std::string& scratch;
+
+    Record Make(const uint8_t* record) const {
+      RecordPlan plan;
+      std::memcpy(&plan, record, sizeof plan);
+      const Text name = Make(plan.name);
+      const Text info = Make(plan.info);
+      return {name.data(), info.data(), static_cast<uint32_t>(name.size()), static_cast<uint32_t>(info.size())};
+    }
+
+    Text Make(const TextPlan& plan) const {
+      switch (plan.origin) {
+        case kFixed:
+          return kFixedTexts[plan.first];
+        case kTokens: {
+          const char* const begin = line.toks[plan.first].text;
+          return {begin, static_cast<size_t>(line.toks[plan.last].end() - begin)};
+        }
+        case kComposed:
+          return Compose(plan);
+        case kEncoded:
+          break;
+      }
+      return Encode(plan);
+    }
+
+    Text Compose(const TextPlan& plan) const {
+      const uint8_t* const first = pieces + sizeof(Piece) * plan.first;
+      const uint8_t* const end = first + sizeof(Piece) * plan.last;
+      size_t size = 0;
+      for (const uint8_t* piece = first; piece < end; piece += sizeof(Piece)) {
+        size += piece[0];
+        if (piece[1] != Piece::kNoToken) size += line.toks[piece[1]].length;
+      }
+      char* const text = line.texts().AllocateWithSlack(size);
+      char* at = text;
+      const auto append = [&at](const char* from, size_t count) {
+        // Most are short, and both sides may be read and written some bytes further.
+        std::memcpy(at, from, kCopySlack);
+        if (count > kCopySlack) [[unlikely]]
+          std::memcpy(at + kCopySlack, from + kCopySlack, count - kCopySlack);
+        at += count;
+      };
+      const char* fixed = reinterpret_cast<const char*>(fixed_texts) + plan.fixed;
+      for (const uint8_t* piece = first; piece < end; piece += sizeof(Piece)) {
+        append(fixed, piece[0]);
+        fixed += piece[0];
+        if (piece[1] == Piece::kNoToken) continue;
+        const Token& token = line.toks[piece[1]];
+        append(token.text, token.length);
+      }
+      return {text, size};
+    }
+
+    [[gnu::noinline]] Text Encode(const TextPlan& plan) const {
+      const uint8_t* const first = pieces + sizeof(Piece) * plan.first;
+      const char* fixed = reinterpret_cast<const char*>(fixed_texts) + plan.fixed;
+      scratch.clear();
+      for (size_t i = 0; i < plan.last; ++i) {
+        scratch.append(fixed, first[2 * i]);
+        fixed += first[2 * i];
+        const uint8_t token = first[2 * i + 1];
+        if (token == Piece::kNoToken) continue;
+        if ((token & Piece::kIsEncoded) != 0)
+          AppendEncodedStringLiteral(line.toks[token & ~Piece::kIsEncoded].view(), scratch);
+        else
+          scratch.append(line.toks[token].view());
+      }
+      return line.texts().Copy(scratch);
+    }
+  };
+
+  // The head, the key, the records, the pieces, and the fixed texts that these refer to, in one piece: most of it
+  // is read for each statement.
   std::unique_ptr<uint8_t[]> bytes_;
 };
 
@@ -569,36 +617,57 @@ class StatementShapes::PlanReader {
 
 // ---- the table ----
 
+// The shapes whose hashes lead to the same place, in one line of the cache.
+struct alignas(64) StatementShapes::Set {
+  static constexpr size_t kWays = 4;
+
+  std::array<uint32_t, kWays> tags{};  // of the hashes
+  std::array<uint32_t, kWays> uses{};  // of late: a plan that is used stays
+  std::array<Plan, kWays> plans;
+
+  // The first of the tag, or kWays.
+  size_t Find(uint32_t tag) const {
+    unsigned found = 1u << kWays;
+    for (size_t way = 0; way < kWays; ++way) found |= static_cast<unsigned>(tags[way] == tag) << way;
+    return static_cast<size_t>(std::countr_zero(found));
+  }
+  size_t LeastUsed() const { return static_cast<size_t>(std::min_element(uses.begin(), uses.end()) - uses.begin()); }
+};
+
 StatementShapes::StatementShapes(CPGenAnalyzerImpl& analyzer, uint8_t frequent)
     : analyzer_(analyzer), frequent_(frequent), is_able_(frequent != 0 && analyzer.HasNoKeywordsOfItsOwn()) {}
 
 StatementShapes::~StatementShapes() = default;
 
 bool StatementShapes::Tell(LogicalLine& line, const LinePlace& place, const TypingNames& typing) {
-  if (!is_able_ || is_learning_ || !line.no_embedded || line.toks.size() > kMaxTokens ||
-      line.kind == LineKind::kComment || typing.has_renamed_cast())
+  if (!is_able_ || is_learning_ || !line.no_embedded || line.toks.size() > kMaxTokens || typing.has_renamed_cast())
     return false;
+  if (line.kind == LineKind::kComment) return true;  // without a hint
   Key key;
   if (!key.Make(line, place.in_async_def)) return false;
-  const uint64_t hash = key.Hash();
-  const auto tag = static_cast<uint32_t>(hash);
-  if (slots_.empty()) [[unlikely]] {
-    slots_.resize(kSlots);
+  if (sets_.empty()) [[unlikely]] {
+    sets_.resize(kSets);
     counters_.resize(kCounters);
   }
-  Slot& slot = slots_[hash >> 32 & (kSlots - 1)];
-  if (slot.tag != tag || slot.plan == nullptr || !slot.plan->IsFor(key)) {
-    if (!IsFrequent(hash)) return false;
-    if (slot.plan != nullptr && slot.uses > 0) {
-      --slot.uses;
+  // 0 is that of no plan.
+  const uint32_t tag = static_cast<uint32_t>(key.hash()) | 1;
+  Set& set = sets_[key.hash() >> 32 & (kSets - 1)];
+  size_t way = set.Find(tag);
+  if (way == Set::kWays) {
+    if (!IsFrequent(key.hash())) return false;
+    way = set.LeastUsed();
+    if (set.uses[way] > 0) {
+      --set.uses[way];
       return false;
     }
-    slot.plan = Learn(key, line, place.in_async_def);
-    slot.tag = tag;
-    slot.uses = kFirstUses;
+    set.plans[way] = Learn(key, line, place.in_async_def);
+    set.tags[way] = tag;
+    set.uses[way] = kFirstUses;
+  } else if (!set.plans[way].IsFor(key)) [[unlikely]] {
+    return false;
   }
-  slot.uses += slot.uses < kMostUses;
-  const Plan& plan = *slot.plan;
+  set.uses[way] += set.uses[way] < kMostUses;
+  const Plan& plan = set.plans[way];
   if (!plan.is_whole() || (plan.is_bounded() && key.MostJoined() > CNodeWalker::kMaxOperatorText)) return false;
   plan.Tell(line, scratch_);
   // Comes last: a host that is asked whether to stop may have other lines analysed, and plans replaced.
@@ -637,8 +706,7 @@ bool StatementShapes::IsFrequent(uint64_t hash) {
   return counter == frequent_;
 }
 
-std::unique_ptr<const StatementShapes::Plan> StatementShapes::Learn(const Key& key, const LogicalLine& line,
-                                                                    bool in_async_def) {
+StatementShapes::Plan StatementShapes::Learn(const Key& key, const LogicalLine& line, bool in_async_def) {
   struct Learning {
     bool& is_on;
     ~Learning() { is_on = false; }
@@ -654,13 +722,13 @@ std::unique_ptr<const StatementShapes::Plan> StatementShapes::Learn(const Key& k
   made_up.no_embedded = true;
   made_up.token_count = line.token_count;
   made_up.WriteTo(&made_up_records_);
-  if (!analyzer_.WalkWithoutDoubt(made_up, in_async_def)) return std::make_unique<Plan>(key);
+  if (!analyzer_.WalkWithoutDoubt(made_up, in_async_def)) return Plan(key);
   const bool is_bounded = analyzer_.node_walker().met_operator_text();
-  if (is_bounded && statement.MostJoined() > CNodeWalker::kMaxOperatorText) return std::make_unique<Plan>(key);
+  if (is_bounded && statement.MostJoined() > CNodeWalker::kMaxOperatorText) return Plan(key);
   PlanReader reader(statement);
-  if (!reader.Read(made_up)) return std::make_unique<Plan>(key);
+  if (!reader.Read(made_up)) return Plan(key);
   reader.parts().is_bounded = is_bounded;
-  return std::make_unique<Plan>(key, reader.parts());
+  return Plan(key, reader.parts());
 }
 
 }  // namespace quillet

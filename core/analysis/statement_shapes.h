@@ -23,9 +23,7 @@
 // of its business. The table of shapes has a fixed size; each analyzer has one of its own.
 #pragma once
 
-#include <array>
 #include <cstdint>
-#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
@@ -37,7 +35,7 @@ namespace quillet {
 class StatementShapes {
  public:
   // How often a shape is met until it has a plan, unless somebody says otherwise.
-  static constexpr uint8_t kFrequent = 8;
+  static constexpr uint8_t kFrequent = 4;
 
   // `frequent` 0: no shape ever has a plan.
   explicit StatementShapes(CPGenAnalyzerImpl& analyzer, uint8_t frequent = kFrequent);
@@ -58,23 +56,19 @@ class StatementShapes {
   class MadeUp;
   class Plan;
   class PlanReader;
-  struct Slot {
-    uint32_t tag = 0;   // of the hash
-    uint32_t uses = 0;  // of late: a plan that is used stays
-    std::unique_ptr<const Plan> plan;
-  };
+  struct Set;
 
-  static constexpr size_t kSlots = size_t{1} << 14;
+  static constexpr size_t kSets = size_t{1} << 12;
   static constexpr size_t kCounters = size_t{1} << 15;
 
   // Whether a shape without a plan is met often enough for one.
   bool IsFrequent(uint64_t hash);
-  std::unique_ptr<const Plan> Learn(const Key& key, const LogicalLine& line, bool in_async_def);
+  Plan Learn(const Key& key, const LogicalLine& line, bool in_async_def);
 
   CPGenAnalyzerImpl& analyzer_;
   const uint8_t frequent_;
   const bool is_able_;             // no word of the analyzer's own is a keyword
-  std::vector<Slot> slots_;        // by hash
+  std::vector<Set> sets_;          // by hash
   std::vector<uint8_t> counters_;  // by hash: how often shapes without a plan were met
   size_t misses_ = 0;              // since the counters were halved
   bool is_learning_ = false;       // a host may come back in the middle

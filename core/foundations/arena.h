@@ -16,6 +16,8 @@ namespace quillet {
 
 class TextArena {
  public:
+  static constexpr size_t kSlack = 16;
+
   TextArena() = default;
   TextArena(const TextArena&) = delete;
   TextArena& operator=(const TextArena&) = delete;
@@ -36,6 +38,13 @@ class TextArena {
     char* result = next_;
     next_ += size;
     return result;
+  }
+
+  // The same, with kSlack bytes behind them that may be written until the next call.
+  char* AllocateWithSlack(size_t size) {
+    if (size + kSlack > static_cast<size_t>(end_ - next_)) [[unlikely]]
+      AddBlock(size + kSlack);
+    return Allocate(size);
   }
 
   // Empty text stays apart from none: a copy has data unless the original had none.

@@ -125,6 +125,7 @@ void CTypeHintWalker::CountCommentHints(LogicalLine& logical) {
     }
     return;
   }
+  if (logical.hooks == nullptr && logical.no_embedded) return;
   for (const Token& token : logical.toks) fCommentHintCount += token.code == tok::COMMENT && holds_mark(token);
 }
 

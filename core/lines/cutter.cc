@@ -394,17 +394,6 @@ void TokenizeOnly(SourceText& source, Version version) {
   Scan(source, version, SIZE_MAX, client);
 }
 
-void SetFromRow(LogicalLine& line, const Ref<SourceText>& source, const LineRow& row) {
-  if (line.source.get() != source.get()) line.source = source;
-  line.toks = TokenSpan(source->tokens).subspan(row.first_token, row.token_count);
-  line.kind = row.kind;
-  line.parsed = false;
-  line.no_embedded = row.no_embedded;
-  line.first_line = static_cast<int32_t>(row.first_line);
-  line.token_count = static_cast<int32_t>(row.token_count);
-  if (line.has_stored_positions()) line.UseSourcePositions();
-}
-
 bool IsScopeStartLogical(const LogicalLine& line) {
   if (line.kind == LineKind::kFunctionDef || line.kind == LineKind::kClassDef) return true;
   const auto count = static_cast<uint32_t>(line.toks.size());

@@ -45,6 +45,15 @@ void CutLinesCompletely(SourceText& source, Version version, std::vector<LineRow
 void TokenizeOnly(SourceText& source, Version version);
 
 // Points `line` at a row: tokens, kind, first line. Records are left as they are.
-void SetFromRow(LogicalLine& line, const Ref<SourceText>& source, const LineRow& row);
+inline void SetFromRow(LogicalLine& line, const Ref<SourceText>& source, const LineRow& row) {
+  if (line.source.get() != source.get()) line.source = source;
+  line.toks = TokenSpan(source->tokens).subspan(row.first_token, row.token_count);
+  line.kind = row.kind;
+  line.parsed = false;
+  line.no_embedded = row.no_embedded;
+  line.first_line = static_cast<int32_t>(row.first_line);
+  line.token_count = static_cast<int32_t>(row.token_count);
+  if (line.has_stored_positions()) line.UseSourcePositions();
+}
 
 }  // namespace quillet

@@ -148,7 +148,16 @@ inline CNode* CNodeFactory::NewNode(CNodeClassInfo* cls_info, Text text, TokenCo
   node->code = code;
   pool->SetContext(node, context);
   if (children != nullptr) {
-    std::copy_n(children, child_count, pool->ResizeChildren(node, child_count));
+    CNode** const own = pool->ResizeChildren(node, child_count);
+    // Nearly all have two or three, for which a call takes longer than the copy.
+    if (child_count >= 2) [[likely]] {
+      own[0] = children[0];
+      own[1] = children[1];
+      if (child_count > 2) own[2] = children[2];
+      if (child_count > 3) std::copy(children + 3, children + child_count, own + 3);
+    } else {
+      std::copy_n(children, child_count, own);
+    }
   } else if (node->has_children) [[unlikely]] {
     pool->ClearChildren(node);  // left by a discard that failed at an absent child
   }
