@@ -19,7 +19,6 @@ from quillet._languages import PY2_PRINT_FUNCTION_GRAMMAR, native_language_of
 from quillet._languages import language_version as language_version
 from quillet._records import KINDS, Record
 from quillet._source import to_utf8
-from quillet.logicalline import CLogicalLine
 from quillet.tarvex import CPGenAnalyzerImpl, _host, kPy2DefaultGrammar, kPy3DefaultGrammar
 
 _LINE_END = re.compile(rb"\r\n|\r|\n")
@@ -83,53 +82,20 @@ def analyze(
     return Analysis(to_utf8(source), language, exact=exact)
 
 
-class Line:
+class Line(_host.AnalyzedLine):
     """One logical line: a statement, a statement's head, or a line of comment or nothing.
 
-    `logical` is the core's own record, with the raw (name, info) pairs in `fTypeEquivs` and
-    `fArgTypeEquivs`. `first_line` and `last_line` count physical lines from 1, both inclusive; `indent`
-    is the width of the indentation, tabs to multiples of 8. `in_async_def` and `first_in_def` are what
+    `records` is what the line says of names, in the order in which it was found; parameters come last. `logical`
+    is the core's own record, with the raw (name, info) pairs in `fTypeEquivs` and `fArgTypeEquivs`. Both are made
+    when they are first asked for. `first_line` and `last_line` count physical lines from 1, both inclusive;
+    `indent` is the width of the indentation, tabs to multiples of 8. `in_async_def` and `first_in_def` are what
     the line was analysed with: whether it stands directly in the body of an `async def`, and whether it
     is the first of a function's body. `error` is the line's SyntaxError or None; its `msg` names
     what is missing where that is certain, its `lineno` counts from the line's own first line, see
     `error_position`.
     """
 
-    __slots__ = (
-        "_index",
-        "_logical",
-        "_native",
-        "_records",
-        "error",
-        "first_in_def",
-        "first_line",
-        "in_async_def",
-        "indent",
-        "last_line",
-    )
-
-    def __init__(self, native: _host.AnalyzedSource, index: int) -> None:
-        self._native = native
-        self._index = index
-        self.first_line, self.last_line, self.indent, self.in_async_def, self.first_in_def, self.error = native.PlaceAt(
-            index
-        )
-        self._logical: CLogicalLine | None = None
-        self._records: tuple[Record, ...] | None = None
-
-    @property
-    def logical(self) -> CLogicalLine:
-        """The core's own record of the line, made when it is first asked for."""
-        if self._logical is None:
-            self._logical = self._native.LogicalAt(self._index)
-        return self._logical
-
-    @property
-    def records(self) -> tuple[Record, ...]:
-        """What the line says of names, in the order in which it was found; parameters come last."""
-        if self._records is None:
-            self._records = self._native.RecordsAt(self._index, Record, KINDS)
-        return self._records
+    __slots__ = ()
 
     @property
     def error_position(self) -> tuple[int, int] | None:
@@ -144,6 +110,9 @@ class Line:
 
 class _Lines(Sequence[Line]):
     """Lines that are made when they are asked for, and then kept."""
+
+    # How many a loop over all of them makes at a time.
+    _CHUNK = 64
 
     def __init__(self, native: _host.AnalyzedSource) -> None:
         self._native = native
@@ -163,16 +132,13 @@ class _Lines(Sequence[Line]):
             return [self[place] for place in range(len(self))[index]]
         line = self._made[index]
         if line is None:
-            line = self._made[index] = Line(self._native, index % len(self))
+            index %= len(self)
+            [line] = self._native.MakeLines(self._made, index, index + 1, Line)
         return line
 
     def __iter__(self) -> Iterator[Line]:
-        # The loop of those who read all of a source.
-        made, native = self._made, self._native
-        for index, line in enumerate(made):
-            if line is None:
-                line = made[index] = Line(native, index)
-            yield line
+        for start in range(0, len(self), self._CHUNK):
+            yield from self._native.MakeLines(self._made, start, start + self._CHUNK, Line)
 
 
 class Analysis:
@@ -181,7 +147,7 @@ class Analysis:
     def __init__(self, source: bytes, version: tuple[int, int], *, exact: bool = False) -> None:
         self.version = version
         self._source = source
-        self._native = _host.AnalyzedSource(native_language_of(version, exact=exact), source)
+        self._native = _host.AnalyzedSource(native_language_of(version, exact=exact), source, Record, KINDS)
 
     @property
     def analyzer(self) -> CPGenAnalyzerImpl:

@@ -2,8 +2,12 @@
 
 from __future__ import annotations
 
+import copy
+import gc
 import sys
 import threading
+import weakref
+from collections.abc import Callable
 from pathlib import Path
 
 import pytest
@@ -393,3 +397,47 @@ def test_the_grammar_with_the_print_function_is_that_of_2_7_less_the_statement()
     other = ParserGenerator(GetNorvaFilename(folder + "-print-function")).make_grammar().symbol2number
     assert set(plain) - set(other) == {"print_stmt"}
     assert set(other) < set(plain)
+
+
+def test_a_line_is_made_once_and_keeps_what_was_read() -> None:
+    lines = analyze(SOURCE).lines
+    first = lines[0]
+    assert all(line is lines[index] for index, line in enumerate(lines))
+    assert lines[0] is first
+    assert first.records is first.records
+    assert first.logical is first.logical
+    error = analyze("x = (1 2)").lines[0]
+    assert error.error is not None
+    assert error.error is error.error
+
+
+def test_a_line_outlives_its_analysis() -> None:
+    line = analyze("x = f(a)").lines[0]
+    gc.collect()
+    assert [record.name for record in line.records] == ["x", "x", "f", "f", "a"]
+    assert (line.first_line, line.last_line, line.indent) == (1, 1, 0)
+
+
+def test_only_a_source_makes_lines() -> None:
+    kind = type(analyze("x").lines[0])
+    makers: list[Callable[[], object]] = [
+        kind,
+        lambda: object.__new__(kind),
+        lambda: copy.copy(analyze("x").lines[0]),
+    ]
+    for make in makers:
+        with pytest.raises(TypeError):
+            make()
+
+
+def test_a_line_in_a_ring_with_its_error_is_let_go_of() -> None:
+    class Witness:
+        pass
+
+    line = analyze("x = (1 2)").lines[0]
+    witness = Witness()
+    line.error.ring = line, witness  # type: ignore[union-attr]
+    gone = weakref.ref(witness)
+    del line, witness
+    gc.collect()
+    assert gone() is None
