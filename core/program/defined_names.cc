@@ -12,10 +12,12 @@
 #include "foundations/stop.h"
 #include "names/binder.h"
 #include "names/text_table.h"
+#include "program/blanks.h"
 #include "program/possible_symbols.h"
 #include "program/two_threads.h"
 #include "project/file_system.h"
 #include "project/word_search.h"
+#include "tokens/token_ends.h"
 
 namespace quillet {
 
@@ -147,9 +149,6 @@ class DefinitionsMaker {
 
 // ---- whether a text may define a member, without its analysis ----
 
-bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\f'; }
-bool EndsLine(char c) { return c == '\n' || c == '\r'; }
-
 // Where the line of a place begins, where what stands on it does, and how far that is indented.
 struct Line {
   size_t begin, first, indent;
@@ -157,7 +156,7 @@ struct Line {
 Line LineAround(Text source, size_t at) {
   static constexpr size_t kTab = 8;
   size_t begin = at;
-  while (begin > 0 && !EndsLine(source[begin - 1])) --begin;
+  while (begin > 0 && !IsLineEnd(source[begin - 1])) --begin;
   size_t first = begin, indent = 0;
   for (; first < source.size() && IsBlank(source[first]); ++first)
     indent = source[first] == '\t' ? (indent / kTab + 1) * kTab : indent + 1;
@@ -218,7 +217,7 @@ bool IsSurelyLocal(Text source, size_t place, size_t& budget) {
     if (budget < behind - line.begin) return false;
     budget -= behind - line.begin;
     const Text text = source.substr(line.first);
-    if (line.indent >= indent || EndsLine(text.front()) || text.front() == '#') continue;
+    if (line.indent >= indent || IsLineEnd(text.front()) || text.front() == '#') continue;
     if (BeginsWithWord(text, "class")) return false;
     if (!IsIdentifierByte(text.front()) && text.front() != '@') return false;
     indent = line.indent;

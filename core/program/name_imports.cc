@@ -4,14 +4,13 @@
 
 #include <utility>
 
+#include "program/blanks.h"
 #include "project/word_search.h"
+#include "tokens/token_ends.h"
 
 namespace quillet {
 
 namespace {
-
-bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\f'; }
-bool EndsLine(char c) { return c == '\n' || c == '\r'; }
 
 class ImportReader {
  public:
@@ -64,7 +63,7 @@ class ImportReader {
     while (at_ < source_.size()) {
       if (IsBlank(source_[at_])) {
         ++at_;
-      } else if (source_[at_] == '\\' && EndsLine(ByteAt(at_ + 1))) {
+      } else if (source_[at_] == '\\' && IsLineEnd(ByteAt(at_ + 1))) {
         at_ += source_.substr(at_ + 1, 2) == "\r\n" ? 3 : 2;
       } else {
         return;
@@ -95,12 +94,12 @@ class ImportReader {
       } else if (byte == '(' && !is_in_bracket) {
         is_in_bracket = true;
       } else if (byte == '#' && is_in_bracket) {
-        while (!EndsLine(ByteAt(at_ + 1))) ++at_;
+        while (!IsLineEnd(ByteAt(at_ + 1))) ++at_;
       } else if (byte == ')' && is_in_bracket) {
         return true;
-      } else if (EndsLine(byte) ? !is_in_bracket : byte == ';' || byte == '#' || byte == '"' || byte == '\'') {
+      } else if (IsLineEnd(byte) ? !is_in_bracket : byte == ';' || byte == '#' || byte == '"' || byte == '\'') {
         return !is_in_bracket;
-      } else if (byte != ',' && !EndsLine(byte)) {
+      } else if (byte != ',' && !IsLineEnd(byte)) {
         return false;
       }
       ++at_;
@@ -133,10 +132,10 @@ LineEnd EndOfLine(Text line) {
 bool MayStandBehindDot(Text source, size_t at) {
   static constexpr int kMostLines = 100;
   while (at > 0 && IsBlank(source[at - 1])) --at;
-  if (at == 0 || !EndsLine(source[at - 1])) return at > 0 && source[at - 1] == '.';
+  if (at == 0 || !IsLineEnd(source[at - 1])) return at > 0 && source[at - 1] == '.';
   for (int i = 0; at > 0; ++i) {
     size_t begin = --at;
-    while (begin > 0 && !EndsLine(source[begin - 1])) --begin;
+    while (begin > 0 && !IsLineEnd(source[begin - 1])) --begin;
     const LineEnd end = i < kMostLines ? EndOfLine(source.substr(begin, at - begin)) : LineEnd::kDot;
     if (end != LineEnd::kUnknown) return end == LineEnd::kDot;
     at = begin;

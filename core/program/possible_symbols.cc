@@ -5,6 +5,7 @@
 #include "program/possible_symbols.h"
 
 #include "foundations/stop.h"
+#include "program/blanks.h"
 #include "tokens/token_ends.h"
 
 namespace quillet {
@@ -14,7 +15,6 @@ namespace {
 constexpr size_t kSpare = 64;  // zeros that scans may load
 constexpr int64_t kBytesOfAStep = 16;
 
-bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\f'; }
 bool IsHigh(char c) { return static_cast<unsigned char>(c) >= 0x80; }
 bool IsWordByte(char c) { return IsAsciiIdentifierByte(c) || IsHigh(c); }
 
