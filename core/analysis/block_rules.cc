@@ -21,28 +21,42 @@ constexpr size_t kMostBlocks = 100;  // as deep as the language lets blocks nest
 
 using Role = BlockRules::Role;
 
-constexpr auto kRoles = [] {
-  std::array<Role, static_cast<size_t>(LineKind::kOther) + 1> table{};
-  table.fill(Role::kOther);
-  const auto set = [&table](Role role, std::initializer_list<LineKind> kinds) {
-    for (const LineKind kind : kinds) table[static_cast<size_t>(kind)] = role;
+struct FactsOfKind {
+  Role role;
+  BlockRules::Head head;        // of what stands inside
+  BlockRules::Clauses clauses;  // that may come behind it
+};
+
+constexpr auto kFactsOfKinds = [] {
+  using Head = BlockRules::Head;
+  using Clauses = BlockRules::Clauses;
+  std::array<FactsOfKind, static_cast<size_t>(LineKind::kOther) + 1> table{};
+  table.fill({Role::kOther, Head::kPlain, Clauses::kNone});
+  const auto set = [&table](std::initializer_list<LineKind> kinds, Role role, Head head = Head::kPlain,
+                            Clauses clauses = Clauses::kNone) {
+    for (const LineKind kind : kinds) table[static_cast<size_t>(kind)] = {role, head, clauses};
   };
-  set(Role::kNothing, {LineKind::kBlankLine, LineKind::kComment});
-  set(Role::kPlain,
-      {LineKind::kStringExpression, LineKind::kAssignment, LineKind::kPass, LineKind::kRaise, LineKind::kAssert,
-       LineKind::kReturn, LineKind::kImport, LineKind::kPrint, LineKind::kDelete, LineKind::kTypeStatement});
-  set(Role::kMaybePlain, {LineKind::kUnknown});
-  set(Role::kImport, {LineKind::kFromImport});
-  set(Role::kHead,
-      {LineKind::kIfBeginning, LineKind::kWith, LineKind::kForBeginning, LineKind::kWhileBeginning, LineKind::kTry});
-  set(Role::kDefinitionHead, {LineKind::kFunctionDef, LineKind::kClassDef});
-  set(Role::kClause, {LineKind::kElifBeginning, LineKind::kElseBeginning, LineKind::kFinally});
-  set(Role::kExcept, {LineKind::kExcept});
-  set(Role::kMatch, {LineKind::kMatch, LineKind::kCase});
+  set({LineKind::kBlankLine, LineKind::kComment}, Role::kNothing);
+  set({LineKind::kStringExpression, LineKind::kAssignment, LineKind::kPass, LineKind::kRaise, LineKind::kAssert,
+       LineKind::kReturn, LineKind::kImport, LineKind::kPrint, LineKind::kDelete, LineKind::kTypeStatement},
+      Role::kPlain);
+  set({LineKind::kUnknown}, Role::kMaybePlain);
+  set({LineKind::kFromImport}, Role::kImport);
+  set({LineKind::kWith}, Role::kHead);
+  set({LineKind::kIfBeginning}, Role::kHead, Head::kPlain, Clauses::kElif);
+  set({LineKind::kForBeginning, LineKind::kWhileBeginning}, Role::kHead, Head::kLoop, Clauses::kElse);
+  set({LineKind::kTry}, Role::kHead, Head::kPlain, Clauses::kTry);
+  set({LineKind::kFunctionDef, LineKind::kClassDef}, Role::kDefinitionHead, Head::kDefinition);
+  set({LineKind::kElifBeginning}, Role::kClause, Head::kPlain, Clauses::kElif);
+  set({LineKind::kElseBeginning}, Role::kClause);
+  set({LineKind::kFinally}, Role::kClause, Head::kFinally);
+  set({LineKind::kExcept}, Role::kExcept, Head::kPlain, Clauses::kExcept);
+  set({LineKind::kMatch, LineKind::kCase}, Role::kMatch);
   return table;
 }();
 
-Role RoleOf(LineKind kind) { return kRoles[static_cast<size_t>(kind)]; }
+constexpr const FactsOfKind& FactsOf(const LineRow& row) { return kFactsOfKinds[static_cast<size_t>(row.kind)]; }
+constexpr Role RoleOf(LineKind kind) { return kFactsOfKinds[static_cast<size_t>(kind)].role; }
 bool IsHeadKind(LineKind kind) { return RoleOf(kind) >= Role::kHead; }
 
 bool IsDefinitionKind(LineKind kind) { return kind == LineKind::kFunctionDef || kind == LineKind::kClassDef; }
@@ -107,139 +121,101 @@ const BlockRules::Irrefutable* BlockRules::IrrefutableAt(size_t index) {
              : nullptr;
 }
 
-inline BlockRules::Clauses BlockRules::ClausesBehind(LineKind kind) {
-  switch (kind) {
-    case LineKind::kIfBeginning:
-      return Clauses::kElif;
-    case LineKind::kForBeginning:
-    case LineKind::kWhileBeginning:
-      return Clauses::kElse;
-    case LineKind::kTry:
-      return Clauses::kTry;
-    default:
-      return Clauses::kNone;
-  }
-}
-
-inline BlockRules::Head BlockRules::HeadOfPlain(LineKind kind) {
-  switch (kind) {
-    case LineKind::kForBeginning:
-    case LineKind::kWhileBeginning:
-      return Head::kLoop;
-    case LineKind::kFunctionDef:
-    case LineKind::kClassDef:
-      return Head::kDefinition;
-    case LineKind::kFinally:
-      return Head::kFinally;
-    default:
-      return Head::kPlain;
-  }
-}
-
 // What is known of the rows so far is kept at hand here, and is that of the object again at the end. Nothing of a row
 // counts until it is certain.
 size_t BlockRules::GoOn(size_t index) {
   if ((watch_ & ~kHead) != 0) return index;
-  const std::span<const LineRow> rows = rows_;
   const Token* const tokens = source_->tokens.data();
   const uint32_t* const line_starts = source_->line_starts.data();
   const char* const begin = source_->begin();
-  const size_t end = NextRejected(index);
+  const LineRow* const rows = rows_.data();
+  const LineRow* const end = rows + NextRejected(index);
   blocks_.resize(blocks_.size() + kDeepBlocks);
   Block* top = &blocks_.back() - kDeepBlocks;
   const Block* const deepest = blocks_.data() + kDeepBlocks - 1;
-  size_t last = last_index_, head_index = head_index_;
+  uint32_t head_index = head_index_;
   Head head = head_;
-  size_t i = index;
-  for (; i < end; ++i) {
-    const LineRow& row = rows[i];
-    const Role role = RoleOf(row.kind);
-    if (role == Role::kNothing) continue;
-    if (row.continues_physical_line || row.has_inline_body || row.is_async) break;
-    const Token* const toks = tokens + row.first_token;
-    const uint32_t column = row.indent;
-    const auto narrow = static_cast<uint32_t>(toks->text - (begin + line_starts[row.first_line]));
+  const LineRow* last = nullptr;
+  const LineRow* row = rows + index;
+  for (; row < end; ++row) {
+    const FactsOfKind& facts = FactsOf(*row);
+    if (facts.role == Role::kNothing) continue;
+    if ((row->continues_physical_line | row->has_inline_body | row->is_async) != 0) break;
+    const Token* const toks = tokens + row->first_token;
+    const uint32_t column = row->indent;
+    const auto narrow = static_cast<uint32_t>(toks->text - (begin + line_starts[row->first_line]));
     if (narrow != column) break;
     bool is_decorator = false;
-    switch (role) {
-      case Role::kPlain:
-        break;
-      case Role::kMaybePlain: {
-        const TokenCode first = toks->code;
-        is_decorator = first == tok::AT;
-        if (!is_decorator && first != word::kGlobal && first != word::kNonlocal && !IsSkipCode(first)) break;
-        // What stands behind a decorator on its line is in no row.
-        if (is_decorator && IsLineEnd(*toks[row.token_count - 1].end())) break;
-        goto done;
-      }
-      case Role::kImport:
-        if (row.token_count < 2 || toks[1].length == kFuture.size()) goto done;
-        break;
-      case Role::kHead:
-      case Role::kDefinitionHead:
-      case Role::kClause:
-      case Role::kExcept:
-        if (toks[row.token_count - 1].code != tok::COLON) goto done;
-        break;
-      default:
-        goto done;
+    if (facts.role >= Role::kHead) {
+      if (facts.role >= Role::kMatch || toks[row->token_count - 1].code != tok::COLON) break;
+    } else if (facts.role == Role::kMaybePlain) {
+      const TokenCode first = toks->code;
+      if (first == word::kGlobal || first == word::kNonlocal || IsSkipCode(first)) break;
+      is_decorator = first == tok::AT;
+      // What stands behind a decorator on its line is in no row.
+      if (is_decorator && !IsLineEnd(*toks[row->token_count - 1].end())) break;
+    } else if (facts.role != Role::kPlain) {
+      if (facts.role != Role::kImport || row->token_count < 2 || toks[1].length == kFuture.size()) break;
     }
 
     Block* block = top;
     if (head_index != kNoRow) {
-      if (role >= Role::kClause || column <= top->column || narrow <= top->narrow_column || top >= deepest ||
+      if (facts.role >= Role::kClause || column <= top->column || narrow <= top->narrow_column || top >= deepest ||
           head == Head::kMatch)
         break;
-      *++block = {column, narrow, head, Clauses::kNone, head_index};
+      ++block;
+      *block = {column, narrow, head};
+      block->head_row = head_index;
     } else if (column != top->column) {
       // The first one stands at the margin.
       while (column < block->column && block->clauses < Clauses::kTry) --block;
       if (column != block->column) break;
     }
     if (narrow != block->narrow_column) break;
-    const Clauses before = block->clauses;
-    if (role < Role::kHead) {
+    if (facts.role < Role::kHead) {
+      const Clauses before = block->clauses;
       if (before >= Clauses::kTry && (before != Clauses::kDecorated || !is_decorator)) break;
       block->clauses = is_decorator ? Clauses::kDecorated : Clauses::kNone;
       head_index = kNoRow;
     } else {
-      if (!TakesHead(row, role, toks, *block)) break;
-      head_index = i;
-      head = HeadOfPlain(row.kind);
+      const bool is_named_except = row->token_count > 2 && IsNameCode(toks[1].code);
+      if (!TakesHead(row->kind, is_named_except, *block)) break;
+      head_index = static_cast<uint32_t>(row - rows);
+      head = facts.head;
     }
     top = block;
-    last = i;
+    last = row;
   }
-done:
   blocks_.resize(static_cast<size_t>(top - blocks_.data()) + 1);
-  if (last != last_index_) inline_.clear();
-  last_index_ = last;
+  if (last != nullptr) {
+    inline_.clear();
+    last_index_ = static_cast<uint32_t>(last - rows);
+  }
   head_index_ = head_index;
   head_ = head;
   watch_ = head_index != kNoRow ? kHead : 0;
-  return i;
+  return static_cast<size_t>(row - rows);
 }
 
 // The head of a statement or of one of its clauses, in its block: whether it is in its place there.
-inline bool BlockRules::TakesHead(const LineRow& row, Role role, const Token* toks, Block& block) {
+inline bool BlockRules::TakesHead(LineKind kind, bool is_named_except, Block& block) {
   const Clauses before = block.clauses;
-  Clauses next = ClausesBehind(row.kind);
-  if (role < Role::kClause) {
-    if (before >= Clauses::kTry && (before != Clauses::kDecorated || role != Role::kDefinitionHead)) return false;
+  const FactsOfKind& facts = kFactsOfKinds[static_cast<size_t>(kind)];
+  Clauses next = facts.clauses;
+  if (facts.role < Role::kClause) {
+    if (before >= Clauses::kTry && (before != Clauses::kDecorated || facts.role != Role::kDefinitionHead)) return false;
     if (next == Clauses::kTry) {
       block.has_except = block.has_except_star = false;
       block.bare_except = kNoRow;
     }
-  } else if (role == Role::kExcept) {
+  } else if (facts.role == Role::kExcept) {
     if ((before != Clauses::kTry && before != Clauses::kExcept) || block.has_except_star ||
-        block.bare_except != kNoRow || row.token_count < 3 || !IsNameCode(toks[1].code))
+        block.bare_except != kNoRow || !is_named_except)
       return false;
     block.has_except = true;
-    next = Clauses::kExcept;
-  } else if (row.kind == LineKind::kElifBeginning) {
+  } else if (kind == LineKind::kElifBeginning) {
     if (before != Clauses::kElif) return false;
-    next = Clauses::kElif;
-  } else if (row.kind == LineKind::kElseBeginning) {
+  } else if (kind == LineKind::kElseBeginning) {
     if (before != Clauses::kElif && before != Clauses::kElse && before != Clauses::kExcept) return false;
     if (before == Clauses::kExcept) next = Clauses::kTryElse;
   } else if (before != Clauses::kTry && before != Clauses::kExcept && before != Clauses::kTryElse) {
@@ -275,7 +251,7 @@ void BlockRules::Next(size_t index) {
     // A definition's body on its line is a row of its own.
     const Head head = HeadOf(row);
     if (code == tok::COLON && !row.has_inline_body) {
-      head_index_ = index;
+      head_index_ = static_cast<uint32_t>(index);
       head_ = head;
     } else {
       if (blocks_.size() >= kDeepBlocks) CheckNesting(index);
@@ -291,7 +267,7 @@ void BlockRules::Next(size_t index) {
   }
   SetWatch(kHead, head_index_ != kNoRow);
   SetWatch(kRejection, was_rejected);
-  last_index_ = index;
+  last_index_ = static_cast<uint32_t>(index);
 }
 
 void BlockRules::End() {
@@ -354,7 +330,8 @@ void BlockRules::Push(size_t index, uint32_t column, uint32_t narrow_column, Hea
     Add(index, Context::At({0, 0}), "too many levels of indentation", true, SyntaxError::Kind::kIndentation);
   }
   if (blocks_.size() >= kDeepBlocks && head != Head::kUnknown) CheckNesting(head_index_);
-  blocks_.push_back({column, narrow_column, head, clauses, head != Head::kUnknown ? head_index_ : kNoRow});
+  blocks_.push_back({column, narrow_column, head, clauses});
+  if (head != Head::kUnknown) blocks_.back().head_row = head_index_;
 }
 
 void BlockRules::Dedent(size_t index, const LineRow& row, uint32_t column, uint32_t narrow_column) {
@@ -447,7 +424,7 @@ void BlockRules::Clause(size_t index, const LineRow& row, bool was_rejected) {
     case LineKind::kIfBeginning:
     case LineKind::kForBeginning:
     case LineKind::kWhileBeginning:
-      begin(ClausesBehind(row.kind));
+      begin(FactsOf(row).clauses);
       break;
     case LineKind::kTry:
       begin(Clauses::kTry);
@@ -491,7 +468,7 @@ void BlockRules::Except(size_t index, const LineRow& row, Block& block) {
   if (is_star) SetWatch(kStarredExcept, true);
   if (block.bare_except != kNoRow)
     Add(block.bare_except, Context::Index(0), "default 'except:' must be last", /*comes_first=*/false);
-  block.bare_except = next < toks.size() && toks[next].code == tok::COLON ? index : kNoRow;
+  block.bare_except = next < toks.size() && toks[next].code == tok::COLON ? static_cast<uint32_t>(index) : kNoRow;
 }
 
 void BlockRules::Case(size_t index, bool was_rejected, Block& block) {
@@ -506,7 +483,7 @@ void BlockRules::Case(size_t index, bool was_rejected, Block& block) {
     block.irrefutable = kNoRow;
   }
   if (const Irrefutable* found = IrrefutableAt(index))
-    block.irrefutable = static_cast<size_t>(found - readings_->irrefutable.data());
+    block.irrefutable = static_cast<uint32_t>(found - readings_->irrefutable.data());
 }
 
 // ---- statements in their place ----
@@ -610,7 +587,7 @@ void BlockRules::FutureImport(size_t index, const LineRow& row) {
 void BlockRules::Add(size_t row, Context place, std::string message, bool comes_first, SyntaxError::Kind kind) {
   // The first thing that is wrong with a row is told.
   if (row == told_row_) return;
-  told_row_ = row;
+  told_row_ = static_cast<uint32_t>(row);
   findings_.push_back({row, kind, std::move(message), place, comes_first});
 }
 
@@ -649,7 +626,7 @@ BlockRules::Head BlockRules::HeadOf(const LineRow& row) const {
       return next < toks.size() && toks[next].code == tok::STAR ? Head::kExceptStar : Head::kPlain;
     }
     default:
-      return HeadOfPlain(row.kind);
+      return FactsOf(row).head;
   }
 }
 

@@ -56,6 +56,11 @@ class BlockRules {
     kMatch,
   };
 
+  // As far as what stands inside depends on it.
+  enum class Head : uint8_t { kFile, kPlain, kLoop, kDefinition, kExceptStar, kFinally, kMatch, kUnknown };
+  // Which clauses may come next: those of the statement that stands last in a block. From kTry on something has to.
+  enum class Clauses : uint8_t { kNone, kElse, kElif, kExcept, kTryElse, kUnknown, kTry, kDecorated, kCase };
+
   // What is wrong is in findings().
   void Check(const SourceText& source, std::span<const LineRow> rows, Version version, const Readings& readings);
 
@@ -65,12 +70,8 @@ class BlockRules {
   bool has_async_definitions() const { return has_async_definitions_; }
 
  private:
-  static constexpr size_t kNoRow = SIZE_MAX;
+  static constexpr uint32_t kNoRow = UINT32_MAX;
 
-  // As far as what stands inside depends on it.
-  enum class Head : uint8_t { kFile, kPlain, kLoop, kDefinition, kExceptStar, kFinally, kMatch, kUnknown };
-  // Which clauses may come next: those of the statement that stands last in a block. From kTry on something has to.
-  enum class Clauses : uint8_t { kNone, kElse, kElif, kExcept, kTryElse, kUnknown, kTry, kDecorated, kCase };
   // What makes the next row one to look at.
   enum Watch : uint8_t { kHead = 1, kRejection = 2, kFutureImports = 4, kStarredExcept = 8 };
 
@@ -79,19 +80,19 @@ class BlockRules {
     uint32_t narrow_column;  // with tabs one wide
     Head head;
     Clauses clauses = Clauses::kNone;
-    size_t head_row = kNoRow;
     // Of the try whose clauses may come.
     bool has_except = false;
     bool has_except_star = false;
-    size_t bare_except = kNoRow;
+    uint32_t head_row = kNoRow;
+    uint32_t bare_except = kNoRow;  // of that try
     // Of a match: the number of the case that leaves nothing to those behind it.
-    size_t irrefutable = kNoRow;
+    uint32_t irrefutable = kNoRow;
   };
 
   // Goes over rows that are one more plain statement, head, clause or decorator in its place, as most are, and gives
   // the first one from `index` on that is not: it goes to Next.
   size_t GoOn(size_t index);
-  static bool TakesHead(const LineRow& row, Role role, const Token* toks, Block& block);
+  static bool TakesHead(LineKind kind, bool is_named_except, Block& block);
   void Next(size_t index);
   void End();
   // The first row from `index` on that the grammar rejected, or how many rows there are; asked in order, as the other.
@@ -102,9 +103,6 @@ class BlockRules {
   void Push(size_t index, uint32_t column, uint32_t narrow_column, Head head, Clauses clauses);
   void ContinueLine(size_t index, const LineRow& row);
   void Clause(size_t index, const LineRow& row, bool was_rejected);
-  // Of a statement that holds no others, or of the head of one.
-  static Clauses ClausesBehind(LineKind kind);
-  static Head HeadOfPlain(LineKind kind);
   void Except(size_t index, const LineRow& row, Block& block);
   void Case(size_t index, bool was_rejected, Block& block);
   void Decorator(size_t index, const LineRow& row);
@@ -134,11 +132,11 @@ class BlockRules {
   std::span<const LineRow> rows_;
   Version version_;
   std::vector<Block> blocks_;
-  std::vector<Head> inline_;    // heads whose bodies are on the line under way
-  size_t head_index_ = kNoRow;  // the head that waits for its block
-  Head head_ = Head::kPlain;    // what it is to that
-  size_t last_index_ = kNoRow;  // the statement before
-  size_t told_row_ = kNoRow;    // the last one of which something was told
+  std::vector<Head> inline_;      // heads whose bodies are on the line under way
+  uint32_t head_index_ = kNoRow;  // the head that waits for its block
+  Head head_ = Head::kPlain;      // what it is to that
+  uint32_t last_index_ = kNoRow;  // the statement before
+  uint32_t told_row_ = kNoRow;    // the last one of which something was told
   uint8_t watch_ = 0;
   bool has_async_definitions_ = false;
   std::vector<uint32_t> declarations_;

@@ -2,6 +2,7 @@
 #include "analysis/closer_look.h"
 
 #include <algorithm>
+#include <cstring>
 
 #include "lines/token_search.h"
 #include "parser/string_escapes.h"
@@ -65,10 +66,24 @@ bool MayBeText(const Token& token, bool is_last) {
   return (token.text[0] | 0x20) != 'b' && (IsQuote(token.text[0]) || (token.text[1] | 0x20) != 'b');
 }
 
+// Eight bytes at a time: such literals are long.
+bool IsAsciiText(Text text) {
+  const char* at = text.data();
+  const char* const end = at + text.size();
+  uint64_t bytes = 0;
+  for (; end - at >= 8; at += 8) {
+    uint64_t eight;
+    std::memcpy(&eight, at, sizeof eight);
+    bytes |= eight;
+  }
+  for (; at < end; ++at) bytes |= static_cast<unsigned char>(*at);
+  return (bytes & 0x8080808080808080u) == 0;
+}
+
 // Bytes are ASCII, and no text stands beside them.
 bool AreUnusualBytes(TokenSpan toks, size_t i) {
   const Text text = toks[i].view();
-  if (std::ranges::any_of(text, [](char c) { return static_cast<unsigned char>(c) >= 0x80; })) return true;
+  if (!IsAsciiText(text)) return true;
   return (i > 0 && MayBeText(toks[i - 1], false)) ||
          (i + 1 < toks.size() && MayBeText(toks[i + 1], i + 2 == toks.size()));
 }
@@ -117,9 +132,12 @@ bool CloserLook::NeedsCompleteParser(const LogicalLine& line) const {
     case LineKind::kFunctionDef:
     case LineKind::kClassDef:
       break;
-    default:
+    case LineKind::kUnknown:
+    case LineKind::kAssignment:
       if (!line.toks.empty() && line.toks[0].code == tok::NAME) return false;
       break;
+    default:
+      return false;
   }
   const size_t count = line.toks.size();
   size_t i = NextSignificant(line.toks, 0, count);
@@ -153,10 +171,10 @@ uint8_t CloserLook::DoubtOf(const LogicalLine& line) const {
   if (line.kind == LineKind::kFromImport) {
     TokenCode last = tok::ENDMARKER;
     for (const Token& token : line.toks) {
-      if (token.code == tok::STAR) doubt |= kInDefinition;
       if (!IsSkipCode(token.code)) last = token.code;
     }
     if (last == tok::COMMA) return kEverywhere;
+    if (last == tok::STAR) doubt |= kInDefinition;
   }
   for (size_t i = 0; i < line.toks.size(); ++i)
     if (is_unusual_[line.toks[i].code] && !IsUsual(line.toks[i])) doubt |= DoubtOfToken(line, i);

@@ -53,7 +53,8 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeCompletely(LogicalLine& log
   rejection_.reset();
   was_rejected_ = true;
   try {
-    logical.ClearDerivedInfo();
+    if (logical.has_records()) [[unlikely]]
+      logical.ClearDerivedInfo();
     InspectCompletely(logical, place, is_doubtful);
     if (rejection_) [[unlikely]] {
       logical.ClearDerivedInfo();

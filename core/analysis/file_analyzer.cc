@@ -145,7 +145,9 @@ void FileAnalyzer::AnalyzeRow(Analyzer& analyzer, const LineRow& row, bool is_wa
   result.depth = place.depth;
   result.record_begin = static_cast<uint32_t>(found_.store.rows.size());
   result.arg_record_begin = static_cast<uint32_t>(found_.store.arg_rows.size());
-  if (row.token_count != 0 && is_wanted) {
+  // A comment says nothing but types.
+  const bool is_silent = row.kind == LineKind::kComment && row.no_embedded;
+  if (row.token_count != 0 && is_wanted && !is_silent) {
     SetFromRow(line, found_.source, row);
     line.parsed = false;
     line.WriteTo(&found_.store);

@@ -30,8 +30,13 @@ class NameDoubts {
     if (HoldsEmbedded(head, declaration)) return true;
     // Its own name is not in its scope.
     const size_t name_end = rows_[head].first_token + (rows_[head].is_async ? size_t{3} : size_t{2});
-    const size_t end = rows_[declaration].first_token + at;
-    const TokenSpan in_front = Between(std::min(name_end, end), end);
+    // Nor do declarations like this one matter.
+    size_t first = head + 1;
+    while (IsDeclaring(toks[0].code) && first < declaration &&
+           (IsSilent(first) || TokensOf(first)[0].code == toks[0].code))
+      ++first;
+    const TokenSpan head_toks = Between(std::min(name_end, EndOf(head)), EndOf(head));
+    const TokenSpan in_front = Between(rows_[first].first_token, rows_[declaration].first_token + at);
     const bool is_nonlocal = at < toks.size() && toks[at].code == word::kNonlocal;
     for (size_t i = at; i < toks.size() && !is_exhausted(); ++i) {
       if (toks[i].code != tok::NAME) {
@@ -40,7 +45,9 @@ class NameDoubts {
         continue;
       }
       const Text name = toks[i].view();
-      if (!IsAscii(name) || Holds(in_front, name) || IsAnnotatedBehind(declaration, head, name)) return true;
+      if (!IsAscii(name) || Holds(head_toks, name) || Holds(in_front, name) ||
+          IsAnnotatedBehind(declaration, head, name))
+        return true;
       if (is_nonlocal && !IsBoundAround(head, name)) return true;
     }
     return false;

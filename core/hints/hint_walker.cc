@@ -135,7 +135,8 @@ void CTypeHintWalker::WalkTree(CNode* node, LogicalLine* logical, bool first_in_
     ~Reset() { count = 0; }
   } reset{fCommentHintCount};
   hint_error_.reset();
-  CountCommentHints(*logical);
+  // What reads completely has lines of a cutter, which looked for them.
+  if (complete_parser_ == nullptr || !logical->no_embedded) CountCommentHints(*logical);
 
   if (node != nullptr) {
     const bool is_small =

@@ -23,7 +23,8 @@ class UnusualTokens {
   explicit UnusualTokens(Version version)
       : python3_(version.AtLeast(3, 0)),
         is_old_(python3_ && !version.AtLeast(3, 6)),
-        has_slash_(!python3_ || version.AtLeast(3, 8)) {
+        operators_(Bit(tok::VBAREQUAL) | Bit(tok::RARROW) | Bit(python3_ ? tok::NOTEQUAL : tok::STAR) |
+                   (python3_ && !version.AtLeast(3, 8) ? Bit(tok::SLASH) : 0)) {
     Reset();
   }
 
@@ -41,26 +42,9 @@ class UnusualTokens {
       reasons_ |= kOther;
   }
   void SeeOperator(char first, TokenCode code) {
-    switch (first) {
-      case '<':
-        if (code == tok::NOTEQUAL && python3_) reasons_ |= kOther;
-        break;
-      case '|':
-        if (code == tok::VBAREQUAL) reasons_ |= kOther;
-        break;
-      case '-':
-      case '@':
-        if (code == tok::RARROW) reasons_ |= kOther;
-        break;
-      case '*':
-        if (code == tok::STAR && !python3_) reasons_ |= kOther;
-        break;
-      case '/':
-        if (code == tok::SLASH && !has_slash_) reasons_ |= kOther;
-        break;
-      default:
-        break;
-    }
+    if ((operators_ >> code & 1) == 0) return;
+    // "!=" has the code of "<>".
+    if (code != tok::NOTEQUAL || first == '<') reasons_ |= kOther;
   }
   void SeeWalrus() { reasons_ |= kOther; }
   void SeeNumber(Text number) {
@@ -96,6 +80,8 @@ class UnusualTokens {
  private:
   static constexpr Text kDebug = "__debug__";
 
+  static constexpr uint64_t Bit(TokenCode code) { return uint64_t{1} << code; }
+
   // One that means the same in every version.
   bool IsPlainNumber(Text number) const {
     const char next = *(number.data() + number.size());
@@ -106,8 +92,8 @@ class UnusualTokens {
   }
 
   const bool python3_;
-  const bool is_old_;  // of versions that lack so much that each statement is looked at
-  const bool has_slash_;
+  const bool is_old_;         // of versions that lack so much that each statement is looked at
+  const uint64_t operators_;  // a bit a code
   uint8_t reasons_;
 };
 

@@ -21,7 +21,8 @@
 //   void Assign(uint32_t index), Colon(uint32_t index)            of a token outside brackets
 //   void String(uint32_t index, bool formatted), Comment(Text comment)
 //   void SeeName(TokenCode code), SeeUnderscore(const char* name), SeeOperator(char first, TokenCode code),
-//   SeeWalrus(), SeeNumber(Text number), SeeString(Text string)
+//   SeeWalrus(), SeeNumber(Text number)
+//   SeeString(Text string)                     of a string with a prefix, an escape or lines of its own
 #pragma once
 
 #include <algorithm>
@@ -233,7 +234,6 @@ class Scanner : private ScanOutput {
   // Of a code that is known here.
   const char* Emit(const char* at, const char* token_end, TokenCode code) {
     if (code == tok::NUMBER) client_.SeeNumber(Text(at, static_cast<size_t>(token_end - at)));
-    if (code == tok::STRING) client_.SeeString(Text(at, static_cast<size_t>(token_end - at)));
     return Keep(at, token_end, code);
   }
 
@@ -420,6 +420,7 @@ class Scanner : private ScanOutput {
       const char* stop;
       if (const char* string_end = NestedFormattedStringEnd(quote, end_, raw, stop)) {
         AddLineStartsWithin(quote, string_end);
+        client_.SeeString(Text(at, static_cast<size_t>(string_end - at)));
         return Emit(at, string_end, tok::STRING);
       }
       failed_search_budget_ -= std::min(failed_search_budget_, static_cast<size_t>(stop - quote));
@@ -430,7 +431,10 @@ class Scanner : private ScanOutput {
   const char* ScanPlainString(const char* at, const char* quote) {
     if (IsTripleQuote(quote)) return ScanTripleString(at, quote);
     const char* stop = FindInSingleString(quote + 1, end_, *quote);
-    if (*stop == *quote && stop < end_) return Emit(at, stop + 1, tok::STRING);
+    if (*stop == *quote && stop < end_) {
+      if (quote != at) client_.SeeString(Text(at, static_cast<size_t>(stop + 1 - at)));
+      return Emit(at, stop + 1, tok::STRING);
+    }
     return ScanEscapedString(at, quote, stop);
   }
 
@@ -452,6 +456,7 @@ class Scanner : private ScanOutput {
     }
     if (stop < end_ && *stop == *quote) {
       if (crosses_lines) AddLineStartsWithin(quote, stop);
+      client_.SeeString(Text(at, static_cast<size_t>(stop + 1 - at)));
       return Emit(at, stop + 1, tok::STRING);
     }
     if (crosses_lines) unclosed = {quote, stop};
@@ -463,6 +468,7 @@ class Scanner : private ScanOutput {
     if (!unclosed) {
       if (const char* string_end = TripleStringEnd(quote, end_)) {
         AddLineStartsWithin(quote, string_end);
+        client_.SeeString(Text(at, static_cast<size_t>(string_end - at)));
         return Emit(at, string_end, tok::STRING);
       }
       // Whatever closed a later string of this kind would have closed this one.

@@ -59,15 +59,12 @@ void CNodeWalker::DoubtTarget(const CNode* target) {
   met_doubtful_ |= !IsPlainTuple(target);
 }
 
-void CNodeWalker::DoubtArguments(const UsedArgList& arg_list) {
-  const auto is_plain = [](const CArgInfo& arg) { return arg.name == nullptr && IsNone(arg.prefix); };
-  size_t i = 0;
-  while (i < arg_list.size() && is_plain(arg_list[i])) ++i;
+void CNodeWalker::DoubtNamedArguments(const UsedArgList& arg_list) {
   bool has_keyword = false;
   bool has_star = false;
-  for (; i < arg_list.size(); ++i) {
+  for (size_t i = 0; i < arg_list.size(); ++i) {
     const CArgInfo& arg = arg_list[i];
-    if (is_plain(arg)) {
+    if (arg.name == nullptr && IsNone(arg.prefix)) {
       // In front of Python 3 a star comes last.
       met_doubtful_ |= has_keyword || (has_star && !fPy3);
       continue;

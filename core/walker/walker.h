@@ -283,7 +283,11 @@ class CNodeWalker {
 
   // ---- complete readings (complete.cc) ----
   void DoubtTarget(const CNode* target);
-  void DoubtArguments(const UsedArgList& arg_list);
+  void DoubtArguments(const UsedArgList& arg_list) {
+    for (const CArgInfo& arg : arg_list)
+      if (arg.name != nullptr || !IsNone(arg.prefix)) return DoubtNamedArguments(arg_list);
+  }
+  void DoubtNamedArguments(const UsedArgList& arg_list);
   void DoubtParameters(const ArgList& arg_list);
   // What stands in brackets that only group it.
   CNode* TargetIn(CNode* node) const { return is_complete_ ? DropSimpleParens(node) : node; }
