@@ -17,6 +17,7 @@
 #include "analysis/file_analyzer.h"
 #include "bench/corpus.h"
 #include "names/binder.h"
+#include "names/scope_rules.h"
 #include "syntax/reader.h"
 
 namespace quillet::bench {
@@ -27,6 +28,7 @@ constexpr Version kVersion{{3, 11, 0}, 3};
 FileAnalyzer::Options AnalyzerOptions(bool reads_completely = false) {
   FileAnalyzer::Options options;
   options.reads_completely = reads_completely;
+  if (reads_completely) options.make_name_rules = MakeScopeRules;
   options.version = kVersion;
   options.grammar_file = std::string(QUILLET_SOURCE_DIR "/resources/pgen-grammars/") + kPy3DefaultGrammar;
   options.hint_grammar_file = options.grammar_file;

@@ -244,6 +244,36 @@ def test_what_only_the_compiler_rejects_keeps_its_records() -> None:
     assert read("f() = a") == ["1:1 cannot assign to function call here. Maybe you meant '==' instead of '='?"]
 
 
+@pytest.mark.parametrize(
+    ("version", "source"),
+    [
+        ((3, 7), "(a := b)"),  # of another version
+        ((3, 9), "match a:\n case b: pass"),
+        (NEWEST, "return a"),  # in another place
+        (NEWEST, "  a"),
+        (NEWEST, "f(a=1, a=b)"),  # the compiler's
+        (NEWEST, "*a, *b = c"),
+        (NEWEST, "x = y  # type: any text"),  # a hint's
+        (NEWEST, "def f(a: 'any text'): pass"),
+    ],
+)
+def test_an_error_of_the_version_the_place_the_compiler_or_a_hint_keeps_the_records(
+    version: tuple[int, int], source: str
+) -> None:
+    lines = [line for line in analyze(source + "\n", version=version).lines if line.error is not None]
+    assert lines
+    assert lines[0].records
+
+
+@pytest.mark.parametrize(
+    "source", ["f(a b)", "a = 0777", "a b", "f() = a", "f(a=1, b)", "def f(a=1, b): pass", "del f()", "x = f'{a b}'"]
+)
+def test_an_error_of_the_grammar_drops_them(source: str) -> None:
+    line = analyze(source + "\n", version=NEWEST).lines[0]
+    assert line.error is not None
+    assert line.records == ()
+
+
 def test_an_exact_reading_is_that_of_the_tables() -> None:
     for source in ("return a", "f() = 1", "def f(a=1, b): pass", "x = 1  # type: ignore[misc]"):
         assert analyze(source, exact=True).errors == []
