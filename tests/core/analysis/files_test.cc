@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "analysis/file_analyzer.h"
+#include "foundations/stop.h"
 #include "lines/future_imports.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
@@ -219,6 +220,31 @@ TEST(Memory, WhatIsMadeOfTheResultsCounts) {
   }
   EXPECT_NO_THROW(file.CheckMemory(0));
   EXPECT_THROW(file.CheckMemory(size_t{1} << 20), Error);
+}
+
+// ---- steps ----
+
+// How often an analysis asks whether it is still wanted: once for so many steps.
+size_t QuestionsOf(FileAnalyzer& file, Text source) {
+  size_t questions = 0;
+  const ThreadStopQuestion count([&questions] { ++questions; });
+  file.Analyze(source);
+  return questions;
+}
+
+// Each line cuts off the one in front of it.
+TEST(Steps, AreAsManyForEachOfAMillionLinesThatCutOneAnotherOff) {
+  constexpr size_t kCount = 1'000'000;
+  const std::string unit = "f(\ndef g(\n";
+  FileAnalyzer file(Options());
+  const size_t few = QuestionsOf(file, Repeat(unit, kCount / 16));
+  EXPECT_EQ(file.errors().size(), kCount / 16 + 1);
+  const size_t many = QuestionsOf(file, Repeat(unit, kCount));
+  EXPECT_EQ(file.errors().size(), kCount + 1);
+  EXPECT_EQ(file.results().size(), kCount + 1);
+  EXPECT_GT(few, 0u);
+  EXPECT_LE(many, 16 * few + 16);
+  EXPECT_LT(static_cast<int64_t>(many) * kStepsBetweenQuestions, int64_t{64} * kCount);
 }
 
 // ---- the stack ----
