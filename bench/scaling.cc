@@ -4,12 +4,14 @@
 // size and at four times that size. Each is analysed as 3.12 and as 2.7, cut into records and written in
 // each format, in a process of its own, on a thread with a small stack. What costs more a byte at the
 // larger size, costs more than any honest input does, or ends the process, is named; exit code 1 then.
-// The last phases make the tree and the text of each statement, and the lines embedded in it, and the statements and
-// expressions of all of it at once.
+// The last phases make the tree and the text of each statement, and the lines embedded in it; the statements and
+// expressions of all of it at once; the occurrences of its names; and the answers of a workspace of this file alone,
+// asked at places from its beginning to its end.
 //
 //   quillet_scaling                     the list below
 //   quillet_scaling --pairs             all pairs of fragments, repeated
 //   quillet_scaling --random N [SEED]   N random sequences of fragments, repeated, half of them behind a front
+//   --count N                           each unit of the list N times, once: whether it ends, whatever it costs
 //   --size KIB, --stack KIB, --only TEXT, --list
 //
 // Time is that of the processor. It is taken again where it looks bad, since other processes disturb it.
@@ -29,9 +31,11 @@
 #include <vector>
 
 #include "foundations/console.h"
+#include "names/binder.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
 #include "syntax/reader.h"
+#include "workspace/questions.h"
 
 namespace quillet::bench {
 namespace {
@@ -46,8 +50,11 @@ struct Shape {
   std::string end = "\n";
 };
 
-std::string Make(const Shape& shape, size_t size) {
-  const size_t count = std::max<size_t>(1, size / std::max<size_t>(1, shape.unit.size() + shape.back.size()));
+size_t CountFor(const Shape& shape, size_t size) {
+  return std::max<size_t>(1, size / std::max<size_t>(1, shape.unit.size() + shape.back.size()));
+}
+
+std::string Make(const Shape& shape, size_t count) {
   std::string text = shape.front;
   const auto repeat = [&](const std::string& unit) {
     for (size_t i = 0; i < count; ++i) {
@@ -569,8 +576,8 @@ std::string Shown(const std::string& text) {
 
 // ---- one measurement, in a process of its own ----
 
-constexpr int kPhases = 5;
-constexpr const char* kPhaseNames[kPhases] = {"3.12", "2.7", "output", "text", "syntax"};
+constexpr int kPhases = 7;
+constexpr const char* kPhaseNames[kPhases] = {"3.12", "2.7", "output", "text", "syntax", "names", "asked"};
 
 struct Costs {
   double seconds[kPhases][2];
@@ -616,6 +623,17 @@ struct Tools {
 Tools& TheTools() {
   static Tools tools;
   return tools;
+}
+
+// Whether something takes more memory than a source may.
+bool IsRefused(const std::function<void()>& work) {
+  try {
+    work();
+  } catch (const Error& error) {
+    if (error.kind() != ErrorKind::kOverflowError) throw;
+    return true;
+  }
+  return false;
 }
 
 void WriteAll(const FileAnalyzer& file) {
@@ -669,28 +687,75 @@ void ReadSyntax(Text text) {
   }
 }
 
-Costs MeasureHere(const Shape& shape, size_t size) {
+void BindNames(Text text) {
+  for (const Version version : {Version::Of(3, 12), Version::Of(2, 7)}) NameBinder(version).Bind(text);
+}
+
+void Ask(Text text) {
+  constexpr uint32_t kPlaces = 4;
+  Workspace::Settings settings;
+  settings.roots = {"/nowhere"};
+  settings.version = Version::Of(3, 12);
+  Workspace workspace(std::move(settings));
+  const FileId file = workspace.FileOf("/nowhere/a.py");
+  workspace.Open(file, std::string(text));
+  for (uint32_t i = 0; i <= kPlaces; ++i) {
+    const auto place = static_cast<uint32_t>(text.size() * i / kPlaces);
+    for (const uint32_t at : {place, place == 0 ? 0 : place - 1}) {
+      (void)workspace.Definitions(file, at);
+      (void)workspace.References(file, at);
+      (void)workspace.HoverAt(file, at);
+      (void)workspace.Signatures(file, at);
+      (void)workspace.Complete(file, at);
+      (void)workspace.Selections(file, at);
+      (void)workspace.RenameTo(file, at, "renamed");
+    }
+  }
+  (void)workspace.Outline(file);
+  (void)workspace.Problems(file);
+  (void)workspace.Folds(file);
+  (void)workspace.Colours(file);
+  (void)workspace.Hints(file);
+}
+
+// One measurement at a count, or two: at that of a size and of four times that size.
+struct Amount {
+  size_t size;
+  size_t count;  // 0 stands for that of the size
+};
+
+Costs MeasureHere(const Shape& shape, Amount amount) {
   Costs costs{};
   Tools& tools = TheTools();
-  for (int step = 0; step < 2; ++step) {
-    const std::string text = Make(shape, step == 0 ? size : 4 * size);
+  const size_t counts[] = {amount.count != 0 ? amount.count : CountFor(shape, amount.size),
+                           CountFor(shape, 4 * amount.size)};
+  const int rounds = amount.count != 0 ? 1 : 2;
+  for (int step = 0; step < rounds; ++step) {
+    const std::string text = Make(shape, counts[step]);
     costs.bytes[step] = static_cast<double>(text.size());
     const double memory = PeakBytes();
     // The second time round memory is there.
-    for (int round = 0; round < 2; ++round) {
-      double at[kPhases + 1];
-      at[0] = ProcessorSeconds();
-      tools.py3.Analyze(text);
-      at[1] = ProcessorSeconds();
-      tools.py2.Analyze(text);
-      at[2] = ProcessorSeconds();
-      WriteAll(tools.py3);
-      at[3] = ProcessorSeconds();
-      RenderAll(text);
-      at[4] = ProcessorSeconds();
-      ReadSyntax(text);
-      at[5] = ProcessorSeconds();
-      for (int phase = 0; phase < kPhases; ++phase) costs.seconds[phase][step] = at[phase + 1] - at[phase];
+    for (int round = 0; round < rounds; ++round) {
+      bool is_analysed = false;
+      const std::function<void()> phases[kPhases] = {
+          [&] {
+            tools.py3.Analyze(text);
+            is_analysed = true;
+          },
+          [&] { tools.py2.Analyze(text); },
+          [&] {
+            if (is_analysed) WriteAll(tools.py3);
+          },
+          [&] { RenderAll(text); },
+          [&] { ReadSyntax(text); },
+          [&] { BindNames(text); },
+          [&] { Ask(text); },
+      };
+      for (int phase = 0; phase < kPhases; ++phase) {
+        const double begin = ProcessorSeconds();
+        costs.refused |= IsRefused(phases[phase]);
+        costs.seconds[phase][step] = ProcessorSeconds() - begin;
+      }
     }
     costs.memory[step] = PeakBytes() - memory;
   }
@@ -699,31 +764,29 @@ Costs MeasureHere(const Shape& shape, size_t size) {
 
 struct Job {
   const Shape* shape;
-  size_t size;
+  Amount amount;
   int pipe;
 };
 
 void* RunJob(void* argument) {
   const Job& job = *static_cast<Job*>(argument);
   Costs costs{};
-  try {
-    costs = MeasureHere(*job.shape, job.size);
-  } catch (const Error& error) {
-    if (error.kind() != ErrorKind::kOverflowError) throw;
-    costs.refused = true;
-  }
+  costs = MeasureHere(*job.shape, job.amount);
   if (write(job.pipe, &costs, sizeof costs) != sizeof costs) std::perror("write");
   return nullptr;
 }
 
+constexpr unsigned kMostSeconds = 1800;  // for a count
+
 // Empty, or what became of the process.
-std::string Measure(const Shape& shape, size_t size, size_t stack, Costs& costs) {
+std::string Measure(const Shape& shape, Amount amount, size_t stack, Costs& costs) {
   int ends[2];
   if (pipe(ends) != 0) return "no pipe";
   const pid_t child = fork();
   if (child == 0) {
     close(ends[0]);
-    Job job{&shape, size, ends[1]};
+    if (amount.count != 0) alarm(kMostSeconds);
+    Job job{&shape, amount, ends[1]};
     pthread_attr_t attributes;
     pthread_attr_init(&attributes);
     pthread_attr_setstacksize(&attributes, stack);
@@ -745,7 +808,7 @@ std::string Measure(const Shape& shape, size_t size, size_t stack, Costs& costs)
 // ---- judging ----
 
 struct Limits {
-  size_t size = 256 << 10;
+  Amount amount = {256 << 10, 0};
   size_t stack = 512 << 10;
   double growth = 2;          // of the cost of a byte, from a size to four times that size
   double least = 15;          // ns a byte: below it nothing but noise and caches make the growth
@@ -756,6 +819,7 @@ struct Limits {
 // What is wrong with the costs of a shape; empty where nothing is.
 std::string Judge(const Costs& costs, const Limits& limits) {
   std::string wrong;
+  if (limits.amount.count != 0) return wrong;
   char line[160];
   for (int phase = 0; phase < kPhases; ++phase) {
     const double small = costs.seconds[phase][0] / costs.bytes[0] * 1e9;
@@ -778,17 +842,18 @@ bool Try(const Shape& shape, const Limits& limits, bool show_all) {
   std::string wrong;
   Costs costs{};
   for (int attempt = 0; attempt < 3; ++attempt) {
-    wrong = Measure(shape, limits.size, limits.stack, costs);
+    wrong = Measure(shape, limits.amount, limits.stack, costs);
     if (!wrong.empty() || costs.refused) break;
     wrong = Judge(costs, limits);
     if (wrong.empty()) break;
   }
   if (show_all || !wrong.empty()) {
     std::printf("%-44s", shape.name.c_str());
-    for (int phase = 0; phase < kPhases; ++phase)
-      std::printf(" %6.0f", costs.bytes[1] > 0 ? costs.seconds[phase][1] / costs.bytes[1] * 1e9 : 0.0);
-    std::printf(" %6.0f %s%s%s\n", costs.bytes[1] > 0 ? costs.memory[1] / costs.bytes[1] : 0.0,
-                costs.refused ? "  refused: too large" : "", wrong.empty() ? "" : "  <--", wrong.c_str());
+    const int last = limits.amount.count != 0 ? 0 : 1;
+    const double bytes = std::max(costs.bytes[last], 1.0);
+    for (int phase = 0; phase < kPhases; ++phase) std::printf(" %6.0f", costs.seconds[phase][last] / bytes * 1e9);
+    std::printf(" %6.0f %s%s%s\n", costs.memory[last] / bytes, costs.refused ? "  refused: too large" : "",
+                wrong.empty() ? "" : "  <--", wrong.c_str());
     std::fflush(stdout);
   }
   return wrong.empty();
@@ -809,7 +874,9 @@ int Main(int argc, char** argv) {
       random_count = value();
       if (i + 1 < argc && argv[i + 1][0] != '-') seed = static_cast<unsigned>(value());
     } else if (option == "--size") {
-      limits.size = value() << 10;
+      limits.amount.size = value() << 10;
+    } else if (option == "--count") {
+      limits.amount.count = value();
     } else if (option == "--stack") {
       limits.stack = value() << 10;
     } else if (option == "--only" && i + 1 < argc) {
@@ -819,7 +886,7 @@ int Main(int argc, char** argv) {
       return 0;
     } else {
       std::fprintf(stderr,
-                   "usage: quillet_scaling [--pairs | --random N [SEED]] [--size KIB] [--stack KIB] "
+                   "usage: quillet_scaling [--pairs | --random N [SEED]] [--size KIB | --count N] [--stack KIB] "
                    "[--only TEXT] [--list]\n");
       return 2;
     }

@@ -17,6 +17,7 @@
 #include "bindings/interpreter_lock.h"
 #include "bindings/language_object.h"
 #include "bindings/signals.h"
+#include "foundations/file_status.h"
 #include "output/arrow_stream.h"
 
 namespace quillet::host {
@@ -123,6 +124,9 @@ nb::object StreamCapsule(nb::object batch, Export export_stream) {
 void BindBatch(nb::module_& tarvex) {
   nb::module_ host = SiblingModule(tarvex, "host");
   host.attr("MOST_BYTES_READ") = kMostBytesRead;
+  host.def(
+      "DeviceProblem", [](int descriptor) { return StrOf(DeviceProblem(descriptor)); }, nb::arg("descriptor"),
+      "Why an open file is not to be read to its end; empty for what is no device.");
   nb::class_<NativeBatch>(host, "NativeBatch", "Sources through the native path, without an object a line.")
       .def(nb::init<Language&>(), nb::arg("language"), nb::keep_alive<1, 2>())
       .def("Analyze", &NativeBatch::Analyze, nb::arg("sources"),

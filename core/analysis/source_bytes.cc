@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <system_error>
 
+#include "foundations/file_status.h"
 #include "foundations/stop.h"
 #include "foundations/utf8.h"
 
@@ -111,6 +112,7 @@ std::string ReadSourceFile(const std::string& path, std::string& bytes, size_t m
   struct stat info;
   if (fstat(file.get(), &info) != 0) return ReasonOf(errno);
   if (S_ISDIR(info.st_mode)) return ReasonOf(EISDIR);
+  if (const Text problem = DeviceProblem(file.get()); !problem.empty()) return std::string(problem);
   const bool is_regular = S_ISREG(info.st_mode);
   const size_t expected = is_regular ? static_cast<size_t>(info.st_size) : 0;
   return ReadAll(expected, most_bytes, bytes, [&](char* at, size_t size) -> ssize_t {

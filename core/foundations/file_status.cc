@@ -161,6 +161,35 @@ std::optional<int> ReadBeginning(const std::string& path, bool follow_links, siz
 
 #endif
 
+#ifdef _WIN32
+
+Text DeviceProblem(int) { return {}; }
+Text DeviceProblem(const std::string&) { return {}; }
+
+#else
+
+Text DeviceProblem(int descriptor) {
+  struct stat info;
+  if (fstat(descriptor, &info) != 0) return {};
+  if (S_ISBLK(info.st_mode)) return "is a block device";
+  if (!S_ISCHR(info.st_mode) || isatty(descriptor)) return {};
+  struct stat null;
+  const bool is_null = stat("/dev/null", &null) == 0 && null.st_rdev == info.st_rdev;
+  return is_null ? Text() : Text("is a device");
+}
+
+Text DeviceProblem(const std::string& path) {
+  struct stat info;
+  if (stat(path.c_str(), &info) != 0 || !(S_ISBLK(info.st_mode) || S_ISCHR(info.st_mode))) return {};
+  const int file = open(path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
+  if (file < 0) return {};
+  const Text problem = DeviceProblem(file);
+  close(file);
+  return problem;
+}
+
+#endif
+
 std::string RealPathOf(const std::string& path) {
   if (path.find('\0') != std::string::npos) return {};
 #ifndef _WIN32

@@ -8,6 +8,8 @@
 #include <string>
 #include <vector>
 
+#include "foundations/text.h"
+
 namespace quillet {
 
 struct FileStatus {
@@ -36,5 +38,10 @@ std::optional<int> ListFolder(const std::string& path, std::vector<ListedEntry>&
 // The first bytes of a regular file, all of them where it is no larger. Neither waits for a pipe nor, without
 // `follow_links`, reads what a link leads to. Gives nothing, or the number of the error; EINVAL for what is no file.
 std::optional<int> ReadBeginning(const std::string& path, bool follow_links, size_t most, std::string& bytes);
+
+// Why a file, by its descriptor or its path, is not to be read to its end: a device need not have one. Empty for all
+// others, a terminal and the null device among them, and for what is not there.
+Text DeviceProblem(int descriptor);
+Text DeviceProblem(const std::string& path);
 
 }  // namespace quillet

@@ -182,12 +182,16 @@ class FileWalk {
     for (const std::string& argument : arguments_) roots_.push_back(argument != "-" ? RealSlashed(argument) : "");
     for (argument_ = 0; argument_ < arguments_.size(); ++argument_) {
       const std::string& argument = arguments_[argument_];
-      const std::optional<FileStatus> status = argument != "-" ? StatusOf(argument) : std::nullopt;
+      if (argument == "-") {
+        found_.push_back({argument, {}, argument_, 0, 0, 0});
+        continue;
+      }
+      const std::optional<FileStatus> status = StatusOf(argument);
       if (status && status->is_folder) {
         WalkFolder(argument);
         continue;
       }
-      found_.push_back({argument, {}, argument_, 0, 0, 0});
+      found_.push_back({argument, std::string(DeviceProblem(argument)), argument_, 0, 0, 0});
     }
     AddLinks();
     return std::move(found_);

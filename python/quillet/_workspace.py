@@ -435,8 +435,7 @@ class Workspace:
         """The path of a file that can be read. Raises `OSError` for any other."""
         file = self._path(path)
         if not self._native.CanRead(file):
-            with open(file, "rb"):
-                pass
+            os.close(os.open(file, os.O_RDONLY | getattr(os, "O_NONBLOCK", 0)))  # which a pipe would wait for
             raise OSError(f"{os.fsdecode(file)}: cannot be read as source")
         return file
 

@@ -896,6 +896,8 @@ class _host:  # a module at run time
         def Cancel(self) -> None: ...
 
     MOST_BYTES_READ: int
+    @staticmethod
+    def DeviceProblem(descriptor: int) -> str: ...
     SITE_PAGE_HEAD_SIZE: int
     SITE_MOST_BYTES: int
     SITE_MOST_BYTES_OF_LINE: int

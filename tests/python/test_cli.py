@@ -362,6 +362,12 @@ def test_a_device_is_not_read_to_its_end(tmp_path: Path) -> None:
             )
         assert result.returncode == 1
         assert b"is a device" in result.stderr
+    for command in ("defs", "outline"):
+        result = run(command, "zero.py", cwd=tmp_path)
+        assert (result.returncode, result.stderr) == (2, b"quillet: zero.py: is a device\n")
+    for command in ("index", "report"):
+        result = run(command, "zero.py", "-o", "made", cwd=tmp_path)
+        assert b"quillet: zero.py: is a device" in result.stderr
     assert run("analyze", "/dev/null").returncode == 0
     assert b"/dev/stdin:1: x = 1" in run("analyze", "/dev/stdin", stdin=b"x = 1\n").stdout
 

@@ -7,15 +7,12 @@ from __future__ import annotations
 import errno
 import os
 import re
-import stat
 from collections.abc import Iterable, Iterator, Sequence
 from typing import NamedTuple
 
 from quillet.index.paths import pattern_lines
 
 _PIECE = 1 << 20
-# How a device is opened to be looked at, as far as the system has such flags.
-_QUIETLY = getattr(os, "O_NONBLOCK", 0) | getattr(os, "O_NOCTTY", 0) | getattr(os, "O_CLOEXEC", 0)
 
 
 class Found(NamedTuple):
@@ -23,19 +20,6 @@ class Found(NamedTuple):
 
     path: str
     problem: str | None = None
-
-
-class Walked(NamedTuple):
-    """A file as the core finds it. `below` is where the path goes on below its argument, 0 for the argument itself;
-    size and time are those of files below a folder.
-    """
-
-    path: bytes
-    problem: str | None
-    argument: int
-    below: int
-    size: int
-    mtime_ns: int
 
 
 def find_files(paths: Sequence[str], *, gitignore: bool, exclude: Iterable[str] = ()) -> Iterator[Found]:
@@ -51,14 +35,13 @@ def find_files(paths: Sequence[str], *, gitignore: bool, exclude: Iterable[str] 
 def walk(
     paths: Sequence[str], *, gitignore: bool, exclude: Iterable[str] = ()
 ) -> Iterator[tuple[bytes, str | None, int, int, int, int]]:
-    """The same with what is known of each file, the fields of `Walked`."""
+    """The same with what is known of each file: its path, why it cannot be read, the number of its argument, where the
+    path goes on below that (0 for the argument itself), and for files below a folder size and time in ns.
+    """
     from quillet.tarvex import _host
 
     arguments = [os.fsencode(path) for path in paths]
-    for file in _host.FindFiles(arguments, gitignore, pattern_lines(exclude)):
-        if file[3] == 0 and file[1] is None and file[0] != b"-":
-            file = Walked(*file)._replace(problem=device_problem(paths[file[2]]))
-        yield file
+    yield from _host.FindFiles(arguments, gitignore, pattern_lines(exclude))
 
 
 class Exclusion:
@@ -87,8 +70,7 @@ def read_file(path: str) -> bytes:
     from quillet.tarvex import _host
 
     with open(0 if path == "-" else path, "rb", closefd=path != "-") as file:
-        problem = device_problem(file.fileno())
-        if problem is not None:
+        if problem := _host.DeviceProblem(file.fileno()):
             raise OSError(errno.EINVAL, problem)
         pieces = []
         size = 0
@@ -103,29 +85,3 @@ def read_file(path: str) -> bytes:
 def problem_of(error: OSError | ValueError) -> str:
     """The reason of a failure to read, as one phrase."""
     return (error.strerror if isinstance(error, OSError) else None) or str(error)
-
-
-def device_problem(file: int | str) -> str | None:
-    """Why a file, by path or descriptor, is not to be read to its end: a device need not have one."""
-    try:
-        status = os.stat(file)
-    except (OSError, ValueError):
-        return None  # whoever reads it says why not
-    if stat.S_ISBLK(status.st_mode):
-        return "is a block device"
-    if not stat.S_ISCHR(status.st_mode) or os.path.samestat(status, os.stat(os.devnull)):
-        return None
-    return None if _is_terminal(file) else "is a device"
-
-
-def _is_terminal(file: int | str) -> bool:
-    if isinstance(file, int):
-        return os.isatty(file)
-    try:
-        descriptor = os.open(file, os.O_RDONLY | _QUIETLY)
-    except OSError:
-        return False
-    try:
-        return os.isatty(descriptor)
-    finally:
-        os.close(descriptor)
