@@ -25,7 +25,7 @@ nb::list FoundFiles(nb::handle arguments, bool gitignore, nb::handle exclude) {
   {
     const Unlocked unlocked;
     const ThreadStopQuestion signals(HandlesSignals());
-    found = FindFiles(paths, gitignore, patterns);
+    found = FindFiles(paths, {.gitignore = gitignore, .exclude = patterns});
   }
   nb::list files;
   for (const FoundFile& file : found) {

@@ -109,6 +109,7 @@ std::optional<int> ReadBeginning(const std::string& path, bool follow_links, siz
 std::optional<int> ListFolder(const std::string& path, std::vector<ListedEntry>& entries) {
   using Kind = ListedEntry::Kind;
   entries.clear();
+  if (path.find('\0') != std::string::npos) return ENOENT;
   DIR* const folder = opendir(path.c_str());
   if (folder == nullptr) return errno;
   errno = 0;

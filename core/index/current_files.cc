@@ -28,7 +28,7 @@ CurrentFiles::CurrentFiles(const std::vector<IndexRoot>& roots, bool gitignore, 
     arguments.push_back(root.path);
     if (root.stored.empty() || root.stored.ends_with('/')) folders_.push_back(root.stored);
   }
-  for (const FoundFile& file : FindFiles(arguments, gitignore, exclude)) {
+  for (const FoundFile& file : FindFiles(arguments, {.gitignore = gitignore, .exclude = exclude})) {
     if (!file.problem.empty()) continue;
     const std::string& stored = roots[file.argument].stored;
     if (file.below != 0) {

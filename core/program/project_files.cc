@@ -1,6 +1,4 @@
-// The walk asks the rules of a folder, then those of the folders around it: the last rule that matches decides, and
-// whatever lies in a folder that is left out is left out. The stamps of all folders and rules that were read say
-// whether a walk would find something else.
+// The stamps of all folders and files of rules that a walk has read say whether another one would find something else.
 #include "program/project_files.h"
 
 #include <algorithm>
@@ -13,7 +11,7 @@
 #include "foundations/stop.h"
 #include "program/two_threads.h"
 #include "project/file_system.h"
-#include "project/ignore_rules.h"
+#include "project/find_files.h"
 #include "project/word_filters.h"
 #include "project/word_search.h"
 
@@ -24,32 +22,6 @@ namespace {
 // Fewer files than this are searched before another thread has begun.
 constexpr size_t kFilesWorthAThread = 64;
 
-bool IsSourceName(Text name) { return name.ends_with(".py") || name.ends_with(".pyi"); }
-
-// The rules of one folder, in front of those that they overrule.
-struct FolderRules {
-  std::shared_ptr<FolderRules> outer;
-  std::string folder;
-  IgnoreRules rules;
-
-  FolderRules(std::shared_ptr<FolderRules> outer_rules, std::string path, IgnoreRules own)
-      : outer(std::move(outer_rules)), folder(std::move(path)), rules(std::move(own)) {}
-
-  // What they say themselves of a path below.
-  IgnoreRules::Verdict Of(Text path, bool is_folder) {
-    return rules.Of(path.substr(folder.ends_with('/') ? folder.size() : folder.size() + 1), is_folder);
-  }
-  // Whether a path below is left out.
-  static bool Exclude(FolderRules* at, Text path, bool is_folder) {
-    for (; at != nullptr; at = at->outer.get()) {
-      const IgnoreRules::Verdict verdict = at->Of(path, is_folder);
-      if (verdict != IgnoreRules::Verdict::kNone) return verdict == IgnoreRules::Verdict::kExcluded;
-    }
-    return false;
-  }
-};
-using Rules = std::shared_ptr<FolderRules>;
-
 // What a walk read besides sources, as it was in front of the reading.
 struct Watched {
   std::string path;
@@ -57,162 +29,28 @@ struct Watched {
 };
 using WatchList = std::vector<Watched>;
 
-void Watch(std::string path, WatchList& watched) {
-  FileStamp stamp = SettledStamp(StampOf(path));
-  watched.push_back({std::move(path), stamp});
-}
+void Watch(const std::string& path, WatchList& watched) { watched.push_back({path, SettledStamp(StampOf(path))}); }
 
-Rules WithRulesOf(Rules outer, const std::string& folder, const std::string& path, WatchList& watched) {
-  Watch(path, watched);
-  const std::string text = ReadSmallFile(path);
-  if (text.empty()) return outer;
-  return std::make_shared<FolderRules>(std::move(outer), folder, IgnoreRules(text));
-}
-
-Text WithoutLineEnd(Text text) {
-  while (text.ends_with('\n') || text.ends_with('\r') || text.ends_with(' ')) text.remove_suffix(1);
-  return text;
-}
-
-std::string PathFrom(const std::string& folder, Text path) {
-  return NormalPath(path.starts_with('/') ? std::string(path) : Join(folder, path));
-}
-
-// The rules of a repository that are in no folder of it.
-Rules RepositoryRules(const std::string& root, WatchList& watched) {
-  std::string git = Join(root, ".git");
-  if (!StampOf(git).is_folder()) {  // a worktree or a submodule: a file names the folder
-    const std::string text = ReadSmallFile(git);
-    Text path = WithoutLineEnd(text);
-    if (!path.starts_with("gitdir:")) return nullptr;
-    path.remove_prefix(7);
-    path.remove_prefix(std::min(path.find_first_not_of(' '), path.size()));
-    git = PathFrom(root, path);
-    if (const std::string common = ReadSmallFile(Join(git, "commondir")); !common.empty())
-      git = PathFrom(git, WithoutLineEnd(common));
+// The files below the roots. One that lies below two of them by different names counts once.
+std::vector<std::string> PathsBelow(const std::vector<std::string>& roots, Text exclude, WatchList& watched) {
+  std::vector<std::string> real_roots;
+  for (const std::string& root : roots) {
+    real_roots.push_back(RealPath(root));
+    if (!StampOf(root).is_folder()) Watch(root, watched);
   }
-  return WithRulesOf(nullptr, root, Join(git, "info/exclude"), watched);
-}
-
-// The rules that hold in a folder from outside it. A folder that is named is wanted: where they exclude it, they do
-// not count.
-Rules RulesAbove(const std::string& folder, WatchList& watched) {
-  std::vector<std::string> chain = {folder};
-  while (!IsThere(Join(chain.back(), ".git"))) {
-    std::string parent(FolderOf(chain.back()));
-    if (parent == chain.back()) return nullptr;
-    chain.push_back(std::move(parent));
-  }
-  Rules rules = RepositoryRules(chain.back(), watched);
-  for (size_t i = chain.size() - 1; i > 0; --i) {
-    rules = WithRulesOf(std::move(rules), chain[i], Join(chain[i], ".gitignore"), watched);
-    if (FolderRules::Exclude(rules.get(), chain[i - 1], true)) return nullptr;
-  }
-  return rules;
-}
-
-class ProjectWalk {
- public:
-  ProjectWalk(const std::vector<std::string>& roots, const std::string& exclude, WatchList& watched)
-      : roots_(roots), exclude_(exclude), watched_(watched) {
-    for (const std::string& root : roots) real_roots_.push_back(RealPath(root));
-  }
-
-  std::vector<std::string> Paths() {
-    for (size_t i = 0; i < roots_.size(); ++i) {
-      if (const FileStamp stamp = StampOf(roots_[i]); !stamp.is_folder()) {
-        Watch(roots_[i], watched_);
-        if (stamp.is_file()) AddFile(roots_[i], real_roots_[i]);
-      } else if (!folders_.contains(real_roots_[i])) {
-        if (!exclude_.empty())
-          excluded_ = std::make_unique<FolderRules>(nullptr, real_roots_[i], IgnoreRules(exclude_));
-        Walk(roots_[i], real_roots_[i], RulesAbove(real_roots_[i], watched_));
-      }
+  const auto watch = [&](const std::string& path) { Watch(path, watched); };
+  std::vector<std::string> paths;
+  std::unordered_set<std::string> met;
+  for (FoundFile& file : FindFiles(roots, {.exclude = exclude, .is_program = true, .watch = watch})) {
+    if (!file.problem.empty() || (file.below == 0 && !StampOf(file.path).is_file())) continue;
+    if (roots.size() > 1) {
+      const std::string& root = real_roots[file.argument];
+      if (!met.insert(file.below == 0 ? root : Join(root, Text(file.path).substr(file.below))).second) continue;
     }
-    for (auto& [path, target] : links_) {
-      if (met_.insert(std::move(target)).second) paths_.push_back(std::move(path));
-    }
-    return std::move(paths_);
+    paths.push_back(std::move(file.path));
   }
-
- private:
-  struct Pending {
-    std::string folder;
-    std::string real_folder;
-    Rules rules;
-  };
-
-  void Walk(const std::string& top, const std::string& real_top, Rules rules) {
-    std::vector<Pending> pending;
-    pending.push_back({top, real_top, std::move(rules)});
-    while (!pending.empty()) {
-      Pending next = std::move(pending.back());
-      pending.pop_back();
-      if (!folders_.insert(next.real_folder).second) continue;
-      CountSteps(kStepsOfFolder);
-      WalkFolder(std::move(next), next.real_folder == real_top, pending);
-    }
-  }
-
-  void WalkFolder(Pending at, bool is_top, std::vector<Pending>& pending) {
-    Watch(at.folder, watched_);
-    const std::vector<FolderEntry> entries = EntriesOf(at.folder);
-    bool has_rules = false;
-    bool is_repository = false;
-    for (const FolderEntry& entry : entries) {
-      has_rules |= entry.name == ".gitignore" && entry.kind == FolderEntry::Kind::kFile;
-      is_repository |= entry.name == ".git";
-      if (entry.name == "pyvenv.cfg" && !is_top) return;
-    }
-    if (is_repository && !is_top)
-      at.rules = RepositoryRules(at.real_folder, watched_);  // one within, with rules of its own
-    if (has_rules) at.rules = WithRulesOf(at.rules, at.real_folder, Join(at.real_folder, ".gitignore"), watched_);
-    for (const FolderEntry& entry : entries) {
-      const bool is_folder = entry.kind == FolderEntry::Kind::kFolder;
-      if (!is_folder && (entry.kind == FolderEntry::Kind::kOther || !IsSourceName(entry.name))) continue;
-      if (is_folder && IsLeftOut(entry.name)) continue;
-      std::string real_path = Join(at.real_folder, entry.name);
-      if (IsExcluded(at.rules.get(), real_path, is_folder)) continue;
-      std::string path = Join(at.folder, entry.name);
-      if (is_folder) {
-        pending.push_back({std::move(path), std::move(real_path), at.rules});
-      } else if (entry.kind == FolderEntry::Kind::kFile) {
-        AddFile(std::move(path), std::move(real_path));
-      } else if (StampOf(path).is_file()) {
-        std::string target = RealPath(path);
-        if (std::ranges::any_of(real_roots_, [&](const std::string& root) { return IsWithin(target, root); }))
-          links_.emplace_back(std::move(path), std::move(target));
-      }
-    }
-  }
-
-  bool IsExcluded(FolderRules* rules, Text path, bool is_folder) const {
-    const IgnoreRules::Verdict own =
-        excluded_ == nullptr ? IgnoreRules::Verdict::kNone : excluded_->Of(path, is_folder);
-    if (own != IgnoreRules::Verdict::kNone) return own == IgnoreRules::Verdict::kExcluded;
-    return FolderRules::Exclude(rules, path, is_folder);
-  }
-
-  static bool IsLeftOut(Text folder) {
-    return folder.starts_with('.') || folder == "__pycache__" || folder == "node_modules";
-  }
-
-  void AddFile(std::string path, std::string real_path) {
-    if (met_.insert(std::move(real_path)).second) paths_.push_back(std::move(path));
-  }
-
-  static constexpr int64_t kStepsOfFolder = 100;
-
-  const std::vector<std::string>& roots_;
-  const std::string& exclude_;
-  std::unique_ptr<FolderRules> excluded_;  // by `exclude_`, for the root that is walked
-  WatchList& watched_;
-  std::vector<std::string> real_roots_;
-  std::vector<std::string> paths_;
-  std::unordered_set<std::string> met_;      // files, by real paths
-  std::unordered_set<std::string> folders_;  // likewise
-  std::vector<std::pair<std::string, std::string>> links_;
-};
+  return paths;
+}
 
 }  // namespace
 
@@ -307,7 +145,7 @@ class ProjectFiles::Impl {
 
   void Walk() {
     WatchList watched;
-    std::vector<std::string> paths = ProjectWalk(roots_, exclude_, watched).Paths();
+    std::vector<std::string> paths = PathsBelow(roots_, exclude_, watched);
     buffers_ = files_.Buffers();
     for (const FileId buffer : buffers_) {
       if (const std::string& path = files_.PathOf(buffer); IsBelowRoots(path)) paths.push_back(path);

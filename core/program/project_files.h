@@ -19,10 +19,9 @@ class ProjectFiles {
   explicit ProjectFiles(Files& files, std::vector<std::string> roots, Text exclude = Text(""));
   ~ProjectFiles();
 
-  // All *.py and *.pyi files below the roots and open buffers there, in the order of their paths; what .gitignore
-  // leaves out is not there, nor are hidden folders, `__pycache__`, `node_modules` and virtual environments. A root
-  // that is a file is one of them. Links to folders are not followed, and those to files where these lie below a
-  // root. Walked once, and again when Refresh, or the next question behind Forget, finds that folders changed.
+  // All files below the roots that FindFiles gives of a program, and open buffers there, in the order of their paths.
+  // A root that is a file is one of them. Walked once, and again when Refresh, or the next question behind Forget,
+  // finds that folders changed.
   const std::vector<FileId>& All();
   // Those in which all the words occur as whole words, in the order of their paths, and maybe a few more. Nothing is
   // analysed.

@@ -1,5 +1,4 @@
-// By the calls of POSIX, which tell a folder's entries from its files without asking for each, and by those of the
-// standard library on Windows.
+// By the calls of POSIX, and by those of the standard library on Windows.
 #include "project/file_system.h"
 
 #include <chrono>
@@ -11,8 +10,6 @@
 #ifdef _WIN32
 #include <algorithm>
 #else
-#include <dirent.h>
-#include <fcntl.h>
 #include <sys/stat.h>
 #endif
 
@@ -66,25 +63,6 @@ FileStamp StampOf(const std::string& path) {
   return stamp;
 }
 
-std::vector<FolderEntry> EntriesOf(const std::string& folder) {
-  std::vector<FolderEntry> entries;
-  std::error_code error;
-  for (fs::directory_iterator at(NativePath(folder), error), end; !error && at != end; at.increment(error)) {
-    std::error_code ignored;
-    const FolderEntry::Kind kind = at->is_symlink(ignored)        ? FolderEntry::Kind::kLink
-                                   : at->is_directory(ignored)    ? FolderEntry::Kind::kFolder
-                                   : at->is_regular_file(ignored) ? FolderEntry::Kind::kFile
-                                                                  : FolderEntry::Kind::kOther;
-    entries.push_back({TextOfPath(at->path().filename()), kind});
-  }
-  return entries;
-}
-
-bool IsThere(const std::string& path) {
-  std::error_code error;
-  return fs::exists(fs::symlink_status(NativePath(path), error));
-}
-
 #else
 
 FileStamp StampOf(const std::string& path) {
@@ -106,41 +84,13 @@ FileStamp StampOf(const std::string& path) {
   return stamp;
 }
 
+#endif
+
 std::vector<FolderEntry> EntriesOf(const std::string& folder) {
   std::vector<FolderEntry> entries;
-  DIR* const stream = folder.find('\0') == std::string::npos ? opendir(folder.c_str()) : nullptr;
-  if (stream == nullptr) return entries;
-  while (const dirent* entry = readdir(stream)) {
-    const Text name = entry->d_name;
-    if (name == "." || name == "..") continue;
-    FolderEntry::Kind kind = FolderEntry::Kind::kOther;
-    if (entry->d_type == DT_REG) {
-      kind = FolderEntry::Kind::kFile;
-    } else if (entry->d_type == DT_DIR) {
-      kind = FolderEntry::Kind::kFolder;
-    } else if (entry->d_type == DT_LNK) {
-      kind = FolderEntry::Kind::kLink;
-    } else if (entry->d_type == DT_UNKNOWN) {
-      struct stat info;
-      if (fstatat(dirfd(stream), entry->d_name, &info, AT_SYMLINK_NOFOLLOW) == 0) {
-        kind = S_ISREG(info.st_mode) ? FolderEntry::Kind::kFile
-               : S_ISDIR(info.st_mode) ? FolderEntry::Kind::kFolder
-               : S_ISLNK(info.st_mode) ? FolderEntry::Kind::kLink
-                                       : FolderEntry::Kind::kOther;
-      }
-    }
-    entries.push_back({std::string(name), kind});
-  }
-  closedir(stream);
+  if (ListFolder(folder, entries)) entries.clear();
   return entries;
 }
-
-bool IsThere(const std::string& path) {
-  struct stat info;
-  return path.find('\0') == std::string::npos && lstat(path.c_str(), &info) == 0;
-}
-
-#endif
 
 std::string ReadSmallFile(const std::string& path) {
   const FileStamp stamp = StampOf(path);

@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "foundations/file_status.h"
 #include "foundations/text.h"
 
 namespace quillet {
@@ -29,17 +30,10 @@ FileStamp StampOf(const std::string& path);
 // the same stamp, one that equals none that StampOf gives.
 FileStamp SettledStamp(FileStamp stamp);
 
-struct FolderEntry {
-  enum class Kind : uint8_t { kFile, kFolder, kLink, kOther };
-  std::string name;
-  Kind kind;
-};
+using FolderEntry = ListedEntry;
 
 // What lies in a folder, in no order; nothing for one that cannot be read.
 std::vector<FolderEntry> EntriesOf(const std::string& folder);
-
-// Whether anything is there, even a link to nothing.
-bool IsThere(const std::string& path);
 
 // The content of a small regular file, such as one of settings; empty where it cannot be read.
 std::string ReadSmallFile(const std::string& path);

@@ -20,6 +20,8 @@ namespace {
 
 // What is never anybody's source: left out below a folder, as if a rule behind all others said so.
 constexpr Text kLeftOut = ".venv/\nnode_modules/\n__pycache__/\n";
+constexpr Text kLeftOutOfPrograms = ".*/\nnode_modules/\n__pycache__/\n";
+constexpr Text kMarkOfEnvironments = "pyvenv.cfg";
 constexpr size_t kMostRules = size_t{1} << 24;
 constexpr size_t kFirstLine = 256;
 constexpr int64_t kStepsAnEntry = 100;
@@ -39,8 +41,6 @@ bool IsBelow(Text path, Text folder) {
   folder = WithoutSlashes(folder);
   return path.size() > folder.size() && path.starts_with(folder) && path[folder.size()] == '/';
 }
-
-bool HasSuffix(Text name) { return name.ends_with(".py") || name.ends_with(".pyi") || name.ends_with(".pyw"); }
 
 bool IsWord(char c) { return (AsciiClassOf(c) & (kAsciiAlpha | kAsciiDigit | kAsciiUnderscore)) != 0; }
 
@@ -113,16 +113,6 @@ std::optional<int> ReadIfThere(const std::string& path, bool follow, std::string
   }
 }
 
-// The rules of a file, in front of `outer`; only those where there are none.
-std::optional<int> ReadRules(const RuleChain& outer, Text folder, const std::string& path, bool follow,
-                             RuleChain& rules) {
-  std::string text;
-  rules = outer;
-  if (const std::optional<int> error = ReadIfThere(path, follow, text)) return error;
-  if (!text.empty()) rules = std::make_shared<ChainedRules>(outer, folder, text);
-  return std::nullopt;
-}
-
 Text Stripped(Text text) {
   constexpr Text kBlanks = " \t\r\n\v\f";
   text = text.substr(std::min(text.find_first_not_of(kBlanks), text.size()));
@@ -131,52 +121,72 @@ Text Stripped(Text text) {
 
 std::string PathIn(Text folder, Text path) { return path.starts_with('/') ? std::string(path) : Joined(folder, path); }
 
-// The rules of a repository that are in no folder of it.
-RuleChain ReadExclude(const RuleChain& outer, const std::string& root) {
-  std::string folder = root + "/.git";
-  const std::optional<FileStatus> status = StatusOf(folder);
-  if (!status || !status->is_folder) {  // a worktree or a submodule: a file names the folder
-    std::string text;
-    if (ReadIfThere(folder, true, text)) return outer;
-    Text named = text;
-    if (named.starts_with("gitdir:")) named.remove_prefix(7);
-    folder = PathIn(root, Stripped(named));
-    if (ReadIfThere(folder + "/commondir", true, text)) return outer;
-    folder = PathIn(folder, text.empty() ? Text(".") : Stripped(text));
-  }
-  RuleChain rules;
-  return ReadRules(outer, root, folder + "/info/exclude", true, rules) ? outer : rules;
-}
-
 std::string ParentOf(const std::string& path) {
   const size_t slash = path.rfind('/');
   return slash == std::string::npos ? path : path.substr(0, std::max<size_t>(slash, 1));
 }
 
-// The rules that hold in a folder from outside it: those of its repository, in front of `outer`. A folder that is
-// named is wanted: where they exclude it, they do not count.
-RuleChain RulesAbove(const RuleChain& outer, const std::string& folder) {
-  std::vector<std::string> chain = {folder};
-  while (!StatusOf(Joined(chain.back(), ".git"), false)) {
-    std::string parent = ParentOf(chain.back());
-    if (parent == chain.back()) return outer;  // in no repository: only the folder's own files count
-    chain.push_back(std::move(parent));
+// Reads files of rules, and says which in front of it.
+class RuleReader {
+ public:
+  explicit RuleReader(const std::function<void(const std::string&)>& watch) : watch_(watch) {}
+
+  // The rules of a file, in front of `outer`; only those where there are none.
+  std::optional<int> ReadRules(const RuleChain& outer, Text folder, const std::string& path, bool follow,
+                               RuleChain& rules) {
+    std::string text;
+    rules = outer;
+    if (watch_) watch_(path);
+    if (const std::optional<int> error = ReadIfThere(path, follow, text)) return error;
+    if (!text.empty()) rules = std::make_shared<ChainedRules>(outer, folder, text);
+    return std::nullopt;
   }
-  RuleChain rules = ReadExclude(outer, chain.back());
-  for (size_t i = chain.size() - 1; i-- > 0;) {
-    const std::string& above = chain[i + 1];
-    RuleChain read;
-    // Who may not read a file of rules outside of what was named is no worse off than without it.
-    if (!ReadRules(rules, above, Joined(above, ".gitignore"), false, read)) rules = read;
-    if (rules->Of(chain[i], true) == IgnoreRules::Verdict::kExcluded) return outer;
+
+  // The rules of a repository that are in no folder of it.
+  RuleChain ReadExclude(const RuleChain& outer, const std::string& root) {
+    std::string folder = root + "/.git";
+    const std::optional<FileStatus> status = StatusOf(folder);
+    if (!status || !status->is_folder) {  // a worktree or a submodule: a file names the folder
+      std::string text;
+      if (ReadIfThere(folder, true, text)) return outer;
+      Text named = text;
+      if (named.starts_with("gitdir:")) named.remove_prefix(7);
+      folder = PathIn(root, Stripped(named));
+      if (ReadIfThere(folder + "/commondir", true, text)) return outer;
+      folder = PathIn(folder, text.empty() ? Text(".") : Stripped(text));
+    }
+    RuleChain rules;
+    return ReadRules(outer, root, folder + "/info/exclude", true, rules) ? outer : rules;
   }
-  return rules;
-}
+
+  // The rules that hold in a folder from outside it: those of its repository, in front of `outer`. A folder that is
+  // named is wanted: where they exclude it, they do not count.
+  RuleChain RulesAbove(const RuleChain& outer, const std::string& folder) {
+    std::vector<std::string> chain = {folder};
+    while (!StatusOf(Joined(chain.back(), ".git"), false)) {
+      std::string parent = ParentOf(chain.back());
+      if (parent == chain.back()) return outer;  // in no repository: only the folder's own files count
+      chain.push_back(std::move(parent));
+    }
+    RuleChain rules = ReadExclude(outer, chain.back());
+    for (size_t i = chain.size() - 1; i-- > 0;) {
+      const std::string& above = chain[i + 1];
+      RuleChain read;
+      // Who may not read a file of rules outside of what was named is no worse off than without it.
+      if (!ReadRules(rules, above, Joined(above, ".gitignore"), false, read)) rules = read;
+      if (rules->Of(chain[i], true) == IgnoreRules::Verdict::kExcluded) return outer;
+    }
+    return rules;
+  }
+
+ private:
+  const std::function<void(const std::string&)>& watch_;
+};
 
 class FileWalk {
  public:
-  FileWalk(const std::vector<std::string>& arguments, bool gitignore, Text exclude)
-      : arguments_(arguments), gitignore_(gitignore), exclude_(exclude) {}
+  FileWalk(const std::vector<std::string>& arguments, const WalkRules& rules)
+      : arguments_(arguments), rules_(rules), reader_(rules.watch) {}
 
   std::vector<FoundFile> Files() {
     for (const std::string& argument : arguments_) roots_.push_back(argument != "-" ? RealSlashed(argument) : "");
@@ -223,20 +233,23 @@ class FileWalk {
     // above the folder that was named.
     const std::string& real_top = roots_[argument_];
     below_ = static_cast<uint32_t>(Joined(top, "").size());
-    base_ = std::make_shared<ChainedRules>(nullptr, real_top, kLeftOut);
-    own_ = exclude_.empty() ? nullptr : std::make_shared<ChainedRules>(nullptr, real_top, exclude_);
+    base_ = std::make_shared<ChainedRules>(nullptr, real_top, rules_.is_program ? kLeftOutOfPrograms : kLeftOut);
+    own_ = rules_.exclude.empty() ? nullptr : std::make_shared<ChainedRules>(nullptr, real_top, rules_.exclude);
     std::vector<Folder> pending;
-    pending.push_back({top, real_top, gitignore_ ? RulesAbove(base_, real_top) : base_});
+    pending.push_back({top, real_top, rules_.gitignore ? reader_.RulesAbove(base_, real_top) : base_});
     while (!pending.empty()) {
       Folder folder = std::move(pending.back());
       pending.pop_back();
+      if (rules_.watch) rules_.watch(folder.path);
       if (const std::optional<int> error = ListFolder(folder.path, entries_)) {
         AddProblem(folder.path, *error);
         continue;
       }
       std::sort(entries_.begin(), entries_.end(),
                 [](const ListedEntry& a, const ListedEntry& b) { return a.name < b.name; });
-      if (gitignore_) AddRules(folder, folder.real == real_top);
+      const bool is_top = folder.real == real_top;
+      if (!is_top && Holds(kMarkOfEnvironments)) continue;
+      if (rules_.gitignore) AddRules(folder, is_top);
       std::vector<Folder> folders;
       for (const ListedEntry& entry : entries_) {
         CountSteps(kStepsAnEntry);
@@ -246,16 +259,25 @@ class FileWalk {
     }
   }
 
+  // Whether an entry of the folder has a name.
+  bool Holds(Text name) const {
+    const auto at = std::lower_bound(entries_.begin(), entries_.end(), name,
+                                     [](const ListedEntry& entry, Text wanted) { return entry.name < wanted; });
+    return at != entries_.end() && at->name == name;
+  }
+
+  bool HasSuffix(Text name) const {
+    return name.ends_with(".py") || name.ends_with(".pyi") || (!rules_.is_program && name.ends_with(".pyw"));
+  }
+  // Whether a file may be Python whose name does not say so.
+  bool MayNamePython(Text name) const { return !rules_.is_program && name.find('.') == Text::npos; }
+
   void AddRules(Folder& folder, bool is_top) {
-    const auto holds = [this](Text name) {
-      return std::any_of(entries_.begin(), entries_.end(),
-                         [&](const ListedEntry& entry) { return entry.name == name; });
-    };
-    if (!is_top && holds(".git")) folder.rules = ReadExclude(base_, folder.real);  // a repository within: its own rules
-    if (!holds(".gitignore")) return;
+    if (!is_top && Holds(".git")) folder.rules = reader_.ReadExclude(base_, folder.real);  // a repository within
+    if (!Holds(".gitignore")) return;
     RuleChain rules;
     if (const std::optional<int> error =
-            ReadRules(folder.rules, folder.real, Joined(folder.real, ".gitignore"), false, rules)) {
+            reader_.ReadRules(folder.rules, folder.real, Joined(folder.real, ".gitignore"), false, rules)) {
       AddProblem(Joined(folder.path, ".gitignore"), *error);
     } else {
       folder.rules = rules;
@@ -266,7 +288,7 @@ class FileWalk {
     using Verdict = IgnoreRules::Verdict;
     const bool is_folder = entry.kind == ListedEntry::Kind::kFolder;
     if (entry.name == ".git") return;
-    if (!is_folder && !HasSuffix(entry.name) && entry.name.find('.') != std::string::npos) return;
+    if (!is_folder && !HasSuffix(entry.name) && !MayNamePython(entry.name)) return;
     std::string real = Joined(folder.real, entry.name);
     Verdict verdict = own_ != nullptr ? own_->Of(real, is_folder) : Verdict::kNone;
     if (verdict == Verdict::kNone) verdict = folder.rules->Of(real, is_folder);
@@ -275,13 +297,19 @@ class FileWalk {
     if (is_folder) {
       folders.push_back({std::move(path), std::move(real), folder.rules});
     } else if (entry.kind == ListedEntry::Kind::kFile) {
-      const std::optional<FileStatus> status =
-          HasSuffix(entry.name) || NamesPython(path) ? StatusOf(path) : std::nullopt;
-      if (!status) return;
-      found_.push_back({std::move(path), {}, argument_, below_, status->size, status->time});
+      AddFile(std::move(path), HasSuffix(entry.name));
     } else if (entry.kind == ListedEntry::Kind::kLink) {
       LookAtLink(std::move(path), HasSuffix(entry.name));
     }
+  }
+
+  void AddFile(std::string path, bool has_suffix) {
+    if (rules_.is_program) {
+      found_.push_back({std::move(path), {}, argument_, below_, 0, 0});
+      return;
+    }
+    const std::optional<FileStatus> status = has_suffix || NamesPython(path) ? StatusOf(path) : std::nullopt;
+    if (status) found_.push_back({std::move(path), {}, argument_, below_, status->size, status->time});
   }
 
   void LookAtLink(std::string path, bool has_suffix) {
@@ -302,8 +330,8 @@ class FileWalk {
   void AddProblem(const std::string& path, int error) { found_.push_back({path, ReasonOf(error), argument_, 0, 0, 0}); }
 
   const std::vector<std::string>& arguments_;
-  const bool gitignore_;
-  const Text exclude_;
+  const WalkRules& rules_;
+  RuleReader reader_;
   std::vector<std::string> roots_;  // where the arguments really are; empty for "-"
   std::vector<FoundFile> found_;
   std::vector<std::pair<FoundFile, std::string>> links_;  // and where they lead
@@ -316,8 +344,8 @@ class FileWalk {
 
 }  // namespace
 
-std::vector<FoundFile> FindFiles(const std::vector<std::string>& arguments, bool gitignore, Text exclude) {
-  return FileWalk(arguments, gitignore, exclude).Files();
+std::vector<FoundFile> FindFiles(const std::vector<std::string>& arguments, const WalkRules& rules) {
+  return FileWalk(arguments, rules).Files();
 }
 
 }  // namespace quillet

@@ -31,7 +31,7 @@ class FoundFiles : public ::testing::Test {
   // Paths from the top on, those of problems with what is said.
   std::vector<std::string> In(bool gitignore = true, Text exclude = "") {
     std::vector<std::string> paths;
-    for (const FoundFile& file : FindFiles({top_.string()}, gitignore, exclude)) {
+    for (const FoundFile& file : FindFiles({top_.string()}, {.gitignore = gitignore, .exclude = exclude})) {
       const std::string below = fs::path(file.path).lexically_relative(top_).generic_string();
       paths.push_back(file.problem.empty() ? below : below + ": " + file.problem);
       if (file.problem.empty()) {
@@ -49,10 +49,26 @@ class FoundFiles : public ::testing::Test {
 using Paths = std::vector<std::string>;
 
 TEST_F(FoundFiles, AreThoseOfPythonInOrder) {
-  for (const char* path :
-       {"b.py", "a.pyi", "c.pyw", "d.txt", "sub/a.py", "also/a.py", "node_modules/a.py", ".git/a.py"})
+  for (const char* path : {"b.py", "a.pyi", "c.pyw", "d.txt", "sub/a.py", "also/a.py", "node_modules/a.py", ".git/a.py",
+                           ".venv/a.py", "__pycache__/a.py", "env/pyvenv.cfg", "env/lib/a.py"})
     Write(path);
   EXPECT_EQ(In(), (Paths{"a.pyi", "b.py", "c.pyw", "also/a.py", "sub/a.py"}));
+}
+
+TEST_F(FoundFiles, OfAProgramHaveNoOtherNamesAndNoHiddenFolders) {
+  for (const char* path : {"b.py", "a.pyi", "c.pyw", ".hidden/a.py", "sub/.b.py", "env/pyvenv.cfg", "env/lib/a.py"})
+    Write(path);
+  Write("d", "#!/usr/bin/env python3\n");
+  const std::string top = top_.string();
+  Paths paths, watched;
+  WalkRules rules{.is_program = true, .watch = [&](const std::string& path) { watched.push_back(path); }};
+  for (const FoundFile& file : FindFiles({top}, rules)) paths.push_back(file.path.substr(file.below));
+  EXPECT_EQ(paths, (Paths{"a.pyi", "b.py", "sub/.b.py"}));
+  EXPECT_EQ(watched, (Paths{top, top + "/env", top + "/sub"}));
+  Write(".gitignore", "b.py\n");
+  watched.clear();
+  EXPECT_EQ(FindFiles({top}, rules).size(), 2u);
+  EXPECT_EQ(watched.at(1), top + "/.gitignore");
 }
 
 TEST_F(FoundFiles, MayNamePythonInTheirFirstLine) {
@@ -97,7 +113,7 @@ TEST_F(FoundFiles, AreNotFoundTwiceNorElsewhereByLinks) {
 TEST_F(FoundFiles, ThatAreNamedPassAsTheyAre) {
   Write("a.txt");
   const std::string path = (top_ / "a.txt").string();
-  const std::vector<FoundFile> found = FindFiles({"-", path, path + ".gone"}, true, "");
+  const std::vector<FoundFile> found = FindFiles({"-", path, path + ".gone"}, {});
   ASSERT_EQ(found.size(), 3u);
   EXPECT_EQ(found[0].path, "-");
   EXPECT_EQ(found[1].path, path);
