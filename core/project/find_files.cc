@@ -212,6 +212,7 @@ class FileWalk {
     std::string path;
     std::string real;
     RuleChain rules;
+    bool is_wanted;  // an argument, or taken in by a rule
   };
 
   // Behind all files, those that were not met by their own names.
@@ -236,7 +237,7 @@ class FileWalk {
     base_ = std::make_shared<ChainedRules>(nullptr, real_top, rules_.is_program ? kLeftOutOfPrograms : kLeftOut);
     own_ = rules_.exclude.empty() ? nullptr : std::make_shared<ChainedRules>(nullptr, real_top, rules_.exclude);
     std::vector<Folder> pending;
-    pending.push_back({top, real_top, rules_.gitignore ? reader_.RulesAbove(base_, real_top) : base_});
+    pending.push_back({top, real_top, rules_.gitignore ? reader_.RulesAbove(base_, real_top) : base_, true});
     while (!pending.empty()) {
       Folder folder = std::move(pending.back());
       pending.pop_back();
@@ -247,9 +248,8 @@ class FileWalk {
       }
       std::sort(entries_.begin(), entries_.end(),
                 [](const ListedEntry& a, const ListedEntry& b) { return a.name < b.name; });
-      const bool is_top = folder.real == real_top;
-      if (!is_top && Holds(kMarkOfEnvironments)) continue;
-      if (rules_.gitignore) AddRules(folder, is_top);
+      if (!folder.is_wanted && Holds(kMarkOfEnvironments)) continue;
+      if (rules_.gitignore) AddRules(folder, folder.real == real_top);
       std::vector<Folder> folders;
       for (const ListedEntry& entry : entries_) {
         CountSteps(kStepsAnEntry);
@@ -295,7 +295,7 @@ class FileWalk {
     if (verdict == Verdict::kExcluded) return;
     std::string path = Joined(folder.path, entry.name);
     if (is_folder) {
-      folders.push_back({std::move(path), std::move(real), folder.rules});
+      folders.push_back({std::move(path), std::move(real), folder.rules, verdict == Verdict::kIncluded});
     } else if (entry.kind == ListedEntry::Kind::kFile) {
       AddFile(std::move(path), HasSuffix(entry.name));
     } else if (entry.kind == ListedEntry::Kind::kLink) {

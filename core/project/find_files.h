@@ -4,7 +4,7 @@
 // names, the files of a folder before those of its subfolders. .gitignore files count where git would read them: in the
 // folder, in those below it and in those above it up to the root of the repository; the one nearest to a file decides.
 // A file that is named is taken whatever excludes it. The repository's own folder .git is never entered, and neither is
-// a virtual environment below an argument, which a file pyvenv.cfg tells.
+// a virtual environment (a file pyvenv.cfg tells) that is no argument and that no rule takes in.
 // The trap: a folder may hold anything. Only regular files are opened. A link to a folder is not followed, a link to a
 // file counts where the file lies below an argument and was not met by its own name, and one that leads nowhere that
 // can be told is named, as is whatever else cannot be looked at.

@@ -246,10 +246,12 @@ def test_links_to_folders_are_not_followed(tmp_path: Path) -> None:
 
 def test_folders_that_are_nobodys_source_are_left_out_unless_named(tmp_path: Path) -> None:
     source = "x = 1\n"
-    make(tmp_path, {f"{name}/a.py": source for name in (".venv/lib", "node_modules", "sub/__pycache__", "kept")})
+    make(tmp_path, {f"{name}/a.py": source for name in (".venv/lib", "node_modules", "sub/__pycache__", "env", "kept")})
+    make(tmp_path, {".venv/pyvenv.cfg": "", "env/pyvenv.cfg": ""})
     assert files_read(tmp_path) == ["./kept/a.py"]
     assert files_read(tmp_path, "--no-gitignore") == ["./kept/a.py"]
     assert files_read(tmp_path, "--exclude", "!.venv") == ["./.venv/lib/a.py", "./kept/a.py"]
+    assert files_read(tmp_path, "--exclude", "!/env") == ["./env/a.py", "./kept/a.py"]
     assert files_read(tmp_path / ".venv") == ["./lib/a.py"]
     assert files_read(tmp_path / "node_modules") == ["./a.py"]
 
