@@ -435,9 +435,15 @@ class Workspace:
         """The path of a file that can be read. Raises `OSError` for any other."""
         file = self._path(path)
         if not self._native.CanRead(file):
-            os.close(os.open(file, os.O_RDONLY | getattr(os, "O_NONBLOCK", 0)))  # which a pipe would wait for
+            with open(file, "rb", opener=_open_at_once):
+                pass
             raise OSError(f"{os.fsdecode(file)}: cannot be read as source")
         return file
+
+
+def _open_at_once(path: str, flags: int) -> int:
+    """Opens a pipe without waiting for who writes to it."""
+    return os.open(path, flags | getattr(os, "O_NONBLOCK", 0))
 
 
 def _utf8(text: str) -> bytes:

@@ -269,6 +269,10 @@ def test_a_file_that_cannot_be_read_is_an_error(project: Path) -> None:
         workspace.definitions(project / "nothing.py", 1, 1)
     with pytest.raises(IsADirectoryError):
         workspace.outline(project)
+    if hasattr(os, "mkfifo"):
+        os.mkfifo(project / "pipe.py")
+        with pytest.raises(OSError, match="cannot be read as source"):
+            workspace.definitions(project / "pipe.py", 1, 1)
 
 
 def test_places_outside_of_a_file_are_held_to_it(project: Path) -> None:
