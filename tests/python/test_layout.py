@@ -53,3 +53,13 @@ def test_no_binding_is_longer_than_a_reader_can_hold() -> None:
     lengths = {path.name: path.read_text().count("\n") for path in (ROOT / "bindings").iterdir()}
     assert len(lengths) > 20
     assert {name: length for name, length in lengths.items() if length > 400} == {}
+
+
+def test_the_documents_name_the_stages_in_their_order() -> None:
+    page = (ROOT / "docs/architecture.md").read_text()
+    listed = page.partition("a folder includes only what stands before it: ")[2].partition("(")[0]
+    assert re.findall(r"`(\w+)`", listed) == stages()
+    table = (ROOT / "README.md").read_text().partition("| Folder | |")[2].partition("| `bindings/`")[0]
+    rows = [row.partition(" | ")[0] for row in table.splitlines() if row.startswith("| `core/")]
+    named = re.findall(r"`(?:core/)?(\w+)/", " ".join(rows[1:]))
+    assert named == stages()
