@@ -59,6 +59,8 @@ class Browser:
             [executable, *arguments],
             preexec_fn=take_pipes,
             close_fds=False,
+            # A sanitizer that Python was started with is none of the browser's.
+            env={name: value for name, value in os.environ.items() if name != "LD_PRELOAD"},
             stdout=subprocess.DEVNULL,
             stderr=subprocess.DEVNULL,
         )
