@@ -43,6 +43,7 @@ OPERATORS = {
     41: "Mod", 42: "BitAnd", 43: "BitOr", 44: "BitXor", 45: "LShift", 46: "RShift", 47: "Pow", 49: "FloorDiv",
     51: "MatMult",
 }  # fmt: skip
+AND = 128  # the first of the words
 UNARY = {14: "UAdd", 15: "USub", 32: "Invert"}
 COMPARE = ("Eq", "NotEq", "Lt", "Gt", "LtE", "GtE", "Is", "IsNot", "In", "NotIn")
 PARAMETERS = ("plain", "*", "**", "bare *", "/")
