@@ -180,7 +180,7 @@ class Tree:
             case "Binary":
                 node.detail = (OPERATORS[expr.op],)
             case "Boolean":
-                node.detail = (expr.op,)
+                node.detail = ("And" if expr.op == AND else "Or",)
                 # One of three is two of two.
                 flat: list[int] = []
                 first = number

@@ -305,7 +305,7 @@ class Reference:
             case ast.BinOp(left, op, right):
                 return made("Binary", self.all([left, right]), type(op).__name__)
             case ast.BoolOp(op, values):
-                return made("Boolean", self.all(values), 128 if isinstance(op, ast.And) else 158)
+                return made("Boolean", self.all(values), type(op).__name__)
             case ast.Compare(left, ops, comparators):
                 return made("Compare", self.all([left, *comparators]), type(ops[0]).__name__)
             case ast.IfExp(test, body, orelse):
