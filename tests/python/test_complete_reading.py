@@ -390,6 +390,8 @@ NEWEST_FORMS = [
     ("try: x\nexcept* A, B: y", None, True),
     ("try: x\nexcept (A, B) as e: y", None, False),
     ("try: x\nexcept A, B as e: y", "2:8 multiple exception types must be parenthesized when using 'as'", True),
+    ("f(**a, b)", "1:9 positional argument follows keyword argument unpacking", True),
+    ("f(a=1, b)", "1:9 positional argument follows keyword argument", True),
     ("def f():\n try: x\n finally: return y", None, False),
     ("for x in y:\n try: x\n finally: break", None, False),
     ("for x in y:\n try: x\n finally: continue", None, False),
