@@ -48,7 +48,7 @@ from dataclasses import asdict, dataclass
 from pathlib import Path
 
 ROOT = Path(__file__).resolve().parent.parent
-COPIED = ("core", "tests", "bench", "cmake", "resources", "fuzz", "bindings", "python", "examples", "scripts")
+COPIED = ("core", "tests", "bench", "cmake", "resources", "fuzz", "bindings", "python", "docs", "examples", "scripts")
 FOLDERS = re.findall(r"quillet_library\((\w+)", (ROOT / "core" / "CMakeLists.txt").read_text())
 WANTED = 0.95
 # Tests that take more seconds than this are asked only about changes that the digest sees.

@@ -14,6 +14,7 @@ import quillet
 from quillet import corpus
 
 pyarrow = pytest.importorskip("pyarrow")
+pytest.importorskip("pyarrow.compute")
 
 SHOP = b"""\
 class Shop:
