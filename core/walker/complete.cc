@@ -105,7 +105,6 @@ void CNodeWalker::DoubtParameters(const ArgList& arg_list) {
       has_default = true;
     else if (has_default && !behind_star)
       met_doubtful_ = true;
-    if (arg.value != nullptr && !IsNone(arg.prefix)) met_doubtful_ = true;
     if (arg.name == nullptr) continue;
     const Text name = arg.name->fText();
     if (IsConstant(arg.name->code) || IsDebugName(name)) met_doubtful_ = true;

@@ -2,6 +2,8 @@
 #include <algorithm>
 #include <cctype>
 
+#include "program/blanks.h"
+#include "tokens/token_ends.h"
 #include "workspace/workspace_impl.h"
 
 namespace quillet {
@@ -297,23 +299,54 @@ Value Workspace::Impl::ValueAt(const SourceFile& file, uint32_t index) {
   return value;
 }
 
+static bool EndsInItsOwnBracket(const Expr& expr) {
+  switch (expr.kind) {
+    case ExprKind::kCall:
+    case ExprKind::kSubscript:
+    case ExprKind::kList:
+    case ExprKind::kSet:
+    case ExprKind::kDict:
+    case ExprKind::kListComprehension:
+    case ExprKind::kSetComprehension:
+    case ExprKind::kDictComprehension:
+    case ExprKind::kPatternClass:
+    case ExprKind::kPatternSequence:
+    case ExprKind::kPatternMapping:
+      return true;
+    case ExprKind::kTuple:
+    case ExprKind::kGenerator:
+      return (expr.flags & kParenthesized) != 0;
+    default:
+      return false;
+  }
+}
+
 // At a closing bracket the expression that it ends.
 ExprId Workspace::Impl::ExpressionClosedAt(const SourceFile& file, uint32_t offset) {
   const Text text = file.text();
   if (offset >= text.size() || (text[offset] != ')' && text[offset] != ']' && text[offset] != '}')) return kNoExpr;
   ExprId expr = file.syntax.ExpressionAt(offset + 1);
   while (expr != kNoExpr && file.syntax[expr].end <= offset) expr = file.syntax[expr].parent;
-  if (expr != kNoExpr && file.syntax[expr].end == offset + 1) return expr;
-  // Round brackets are no part of what they hold.
+  if (expr != kNoExpr && file.syntax[expr].end == offset + 1 && EndsInItsOwnBracket(file.syntax[expr])) return expr;
+  // Round brackets are no part of what they hold, so these are counted: as many close an expression as open it.
+  const auto is_space = [&](uint32_t place) { return IsBlank(text[place]) || IsLineEnd(text[place]); };
   uint32_t at = offset;
-  while (at > 0 && (text[at] == ')' || text[at] == ' ')) --at;
+  uint32_t closed = 0;
+  for (; at > 0 && (text[at] == ')' || is_space(at)); --at) closed += text[at] == ')' ? 1 : 0;
   ExprId held = kNoExpr;
-  for (expr = file.syntax.ExpressionAt(at); expr != kNoExpr && file.syntax[expr].end <= at + 1;
+  for (expr = file.syntax.ExpressionAt(at); expr != kNoExpr && file.syntax[expr].end <= offset;
        expr = file.syntax[expr].parent) {
-    uint32_t before = file.syntax[expr].begin;
-    while (before > 0 && text[before - 1] == ' ') --before;
-    const bool is_opened = before > 0 && text[before - 1] == '(';
-    if (file.syntax[expr].end == at + 1 && (is_opened || (file.syntax[expr].flags & kParenthesized) != 0)) held = expr;
+    if ((file.syntax[expr].flags & kParenthesized) == 0) continue;
+    held = expr;
+    uint32_t opened = 0;
+    for (uint32_t before = file.syntax[expr].begin; before > 0; --before) {
+      if (text[before - 1] == '(')
+        ++opened;
+      else if (!is_space(before - 1))
+        break;
+    }
+    if (closed <= opened) break;
+    closed -= opened;
   }
   return held;
 }

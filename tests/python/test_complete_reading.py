@@ -223,6 +223,8 @@ ERRORS = [
     ((3, 13), "x <> y", "1:3 invalid syntax"),
     ((2, 7), "f() = 1", "1:1 cannot assign to function call here. Maybe you meant '==' instead of '='?"),
     ((2, 7), "x: int = 1", "1:2 invalid syntax"),
+    ((2, 7), "exec a, b", "1:7 invalid syntax"),
+    ((2, 7), "exec a b", "1:8 invalid syntax"),
 ]
 
 

@@ -313,11 +313,13 @@ TEST(Batch, ThreadsStayWithinTheirBoundsOfTheReader) {
       ++written;
     }
   };
-  for (const bool by_bytes : {false, true}) {
+  const size_t no_bound = BatchAnalyzer::Options().most_waiting_bytes;
+  // Where no byte may wait, what is handed out next is still made.
+  for (const size_t most_bytes : {no_bound, size_t{1}, size_t{0}}) {
     written = 0;
     BatchAnalyzer::Options options = Options(4);
-    options.most_waiting = by_bytes ? 1000 : 5;
-    if (by_bytes) options.most_waiting_bytes = 1;
+    options.most_waiting = most_bytes == no_bound ? 5 : 1000;
+    options.most_waiting_bytes = most_bytes;
     options.make_writer = [] { return std::make_unique<Counting>(); };
     BatchAnalyzer batch(std::move(options), ManySources(100));
     BatchResult result;

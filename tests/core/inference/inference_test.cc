@@ -251,6 +251,10 @@ TEST(Inference, LooksThroughDecorators) {
        "$f\n",
        {"int", "a.D"}},
       {"from nowhere import d\n@d\ndef f(): return 1\n$a = f()\n", {"int"}},
+      // What a decorator says that it makes of a method takes the receiver first, too.
+      {"from typing import Any, Callable\ndef d(f) -> Callable[[Any, int], str]: ...\n"
+       "class A:\n  @d\n  def m(self, x): pass\n$a = A().m\n$b = A.m\n$c = A().m(1)\n",
+       {"def (int) -> str", "def (typing.Any, int) -> str", "str"}},
   });
 }
 

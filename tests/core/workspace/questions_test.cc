@@ -608,6 +608,11 @@ TEST(Hovers, TakeWordsFromTheSourceWhereAStubHasNone) {
 TEST(Types, AtAClosingBracketAreThoseOfWhatItCloses) {
   EXPECT_EQ(Program("class B: pass\nclass A(B$): pass\nx = (1 + 1$)\ny = str(1$)\n").AllTypes(),
             (Words{"type[a.B]", "builtins.int", "builtins.str"}));
+  // Of each its own, where several end in a row.
+  EXPECT_EQ(
+      Program("x = ('a' + str(1)$)\ny = (1.5 * (2$)$)\nz = (1.5 + int(x\n  $)\n $)\nw = (1.5 * ((2$)$)$)\n").AllTypes(),
+      (Words{"builtins.str", "builtins.int", "builtins.float", "builtins.int", "builtins.float", "builtins.int",
+             "builtins.int", "builtins.float"}));
 }
 
 TEST(Types, OfFunctionsAreTheirSignatures) {
@@ -694,6 +699,16 @@ TEST(Calls, AreKnownFromBothSides) {
             (Words{"a.A.m: a.py:2:16", "b.f.inner: b.py:6:16", "b.f: b.py:4:3"}));
   EXPECT_EQ(SayCalls(program, program->Callees(program[2].file, program[2].offset)),
             (Words{"a.A.m: b.py:3:5", "a.A: b.py:5:3", "a.helper: b.py:4:3"}));
+}
+
+TEST(Classes, ThatAreBasesOfEachOtherHaveEachOnce) {
+  Program program({
+      {"a.py", "import b\nclass $A(b.B): pass\n"},
+      {"b.py", "import a\nclass $B(a.A):\n  def m(self): return 1\n"},
+  });
+  for (const size_t i : {0u, 1u})
+    EXPECT_EQ(program.Say(program->Supertypes(program[i].file, program[i].offset)).size(), 1u);
+  EXPECT_EQ(program.Say(program->Supertypes(program[0].file, program[0].offset)), Words{"b.py:2:7"});
 }
 
 TEST(Classes, KnowTheirBasesAndWhatDerivesFromThem) {
