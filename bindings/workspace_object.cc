@@ -55,13 +55,14 @@ nb::tuple EnvironmentOf(nb::handle path) {
 }  // namespace
 
 WorkspaceObject::WorkspaceObject(nb::handle roots, nb::handle libraries, nb::handle typeshed, nb::handle version,
-                                 nb::handle exclude, const Language& language) {
+                                 nb::handle exclude, nb::handle index_maker, const Language& language) {
   Workspace::Settings settings;
   settings.roots = PathsOf(roots);
   settings.libraries = PathsOf(libraries);
   settings.typeshed = HostText::FromBytes(typeshed).text();
   settings.version = VersionOf(version);
   settings.exclude = HostText::FromBytes(exclude).text();
+  settings.index_maker = HostText::FromBytes(index_maker).text();
   settings.analyzer = std::make_shared<FileAnalyzer::Options>(language.options());
   const Unlocked unlocked;
   workspace_ = std::make_unique<Workspace>(std::move(settings));

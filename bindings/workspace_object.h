@@ -18,10 +18,10 @@ namespace quillet::host {
 
 class WorkspaceObject {
  public:
-  // Sequences of paths as bytes, a path as bytes (empty for none), a version, lines of an ignore file as bytes, and
-  // what errors of syntax are found with.
+  // Sequences of paths as bytes, a path as bytes (empty for none), a version, lines of an ignore file as bytes, what
+  // made the indexes that may be used, and what errors of syntax are found with.
   WorkspaceObject(nb::handle roots, nb::handle libraries, nb::handle typeshed, nb::handle version, nb::handle exclude,
-                  const Language& language);
+                  nb::handle index_maker, const Language& language);
 
   // Calls `ask(workspace)` when no other thread does. Signals are heard meanwhile, and in front of it; a handler that
   // asks the same workspace is told that it cannot (RuntimeError).

@@ -288,9 +288,9 @@ bool CanReadFile(WorkspaceObject& self, nb::handle path) {
 
 void BindQuestions(nb::module_& host) {
   nb::class_<WorkspaceObject> workspace(host, "Workspace", "Questions about the programs below some folders.");
-  workspace.def(nb::init<nb::handle, nb::handle, nb::handle, nb::handle, nb::handle, const Language&>(),
+  workspace.def(nb::init<nb::handle, nb::handle, nb::handle, nb::handle, nb::handle, nb::handle, const Language&>(),
                 nb::arg("roots"), nb::arg("libraries"), nb::arg("typeshed"), nb::arg("version_triple"),
-                nb::arg("exclude"), nb::arg("language"));
+                nb::arg("exclude"), nb::arg("index_maker"), nb::arg("language"));
   const auto def_at = [&workspace](const char* name, auto function, const char* doc) {
     workspace.def(name, function, nb::arg("path"), nb::arg("line"), nb::arg("column"), doc);
   };

@@ -292,6 +292,7 @@ def AddTo(commands: argparse._SubParsersAction[argparse.ArgumentParser]) -> None
     parser.add_argument("--project", type=Path, required=True, metavar="FOLDER", help=f"a project: {HOW_TO_GET}")
     parser.add_argument("--symbol", metavar="FILE:NAME", help="whose references are asked; of copies that of the first")
     parser.add_argument("--copies", type=int, default=0, help="ask in so many renamed copies of the project's package")
+    parser.add_argument("--index", action="store_true", help="with an index in the folder of the copies")
     parser.add_argument("--all-cores", action="store_true")
     parser.add_argument("--without", action="store_true", help="measure the servers alone")
     parser.add_argument("--seed", type=int, default=1)
@@ -305,6 +306,9 @@ def Run(options: argparse.Namespace) -> int:
         if options.copies:
             within = Copies(folder, options.copies, Path(name))
             folder = Path(name).resolve()
+            if options.index:
+                time.sleep(2.5)  # a file that was written just now is not known by its time
+                subprocess.run([sys.executable, "-m", "quillet", "index", ".", "--quiet"], cwd=folder, check=True)
         lines = sum(len(Cut(ReadText(path))) for path in SourceFiles(folder))
         questions = Choose(folder, options.symbol, options.seed, within)
         symbol = Path(questions.symbol.path).relative_to(folder)

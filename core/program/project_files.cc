@@ -3,12 +3,14 @@
 
 #include <algorithm>
 #include <array>
-#include <numeric>
+#include <atomic>
+#include <memory>
 #include <unordered_map>
 #include <unordered_set>
 #include <utility>
 
 #include "foundations/stop.h"
+#include "program/indexed_words.h"
 #include "program/two_threads.h"
 #include "project/file_system.h"
 #include "project/find_files.h"
@@ -56,8 +58,8 @@ std::vector<std::string> PathsBelow(const std::vector<std::string>& roots, Text 
 
 class ProjectFiles::Impl {
  public:
-  Impl(Files& files, std::vector<std::string> roots, Text exclude)
-      : files_(files), roots_(std::move(roots)), exclude_(exclude) {
+  Impl(Files& files, std::vector<std::string> roots, Text exclude, Text index_maker)
+      : files_(files), roots_(std::move(roots)), exclude_(exclude), index_maker_(index_maker) {
     for (std::string& root : roots_) root = NormalPath(root);
   }
 
@@ -72,7 +74,7 @@ class ProjectFiles::Impl {
     std::ranges::stable_sort(words, std::greater(), &Text::size);
     std::vector<WordKey> keys;
     for (const Text word : words) {
-      if (HasWordKey(word)) keys.push_back(KeyOfWord(word));
+      if (IsInFilters(word)) keys.push_back(KeyOfWord(word));
     }
     return Candidates(words, [&](const Filter& filter) {
       const uint64_t* bits = bits_.data() + filter.begin;
@@ -82,6 +84,7 @@ class ProjectFiles::Impl {
 
   std::vector<FileId> Defining(Text name) {
     if (!HasWordKey(name)) return {};
+    if (!IsInFilters(name)) return WithWords({name});
     const WordKey word = KeyOfWord(name);
     const WordKey definition = KeyOfDefinition(name);
     return Candidates({name}, [&](const Filter& filter) {
@@ -106,6 +109,7 @@ class ProjectFiles::Impl {
     return bits_.capacity() * sizeof(bits_[0]) + filters_.capacity() * sizeof(filters_[0]) +
            stamps_.capacity() * sizeof(stamps_[0]);
   }
+  size_t read_count() const { return read_count_; }
 
  private:
   // Where the filter of a file lies among the bits.
@@ -133,6 +137,9 @@ class ProjectFiles::Impl {
   static constexpr size_t kMostFilesSearched = 64;
   static constexpr size_t kShareSearched = 16;
   static constexpr size_t kLongestWordNotSearched = 3;
+
+  // Whether filters tell of a word, those made of an index among them.
+  static bool IsInFilters(Text word) { return HasWordKey(word) && word.size() < IndexedWords::kLongestWord; }
 
   bool IsBelowRoots(const std::string& path) const {
     return std::ranges::any_of(roots_, [&](const std::string& root) { return IsWithin(path, root); });
@@ -189,22 +196,58 @@ class ProjectFiles::Impl {
       const FileStamp stamp = StampOf(files_.PathOf(all_[i]));
       if (stamp != stamps_[i]) MakeFilter(i, stamp, maker);
     });
+    TakeFilters(makers);
+    are_filters_fresh_ = true;
+  }
+
+  void MakeFilter(size_t i, const FileStamp& stamp, FilterMaker& maker) const {
+    ++read_count_;
+    files_.ReadSource(all_[i], stamp, maker.source);
+    maker.keys.Read(maker.source);
+    MakeFilter(i, stamp, maker.keys.keys(), maker.keys.may_define_any(), maker);
+  }
+
+  static void MakeFilter(size_t i, const FileStamp& stamp, const std::vector<WordKey>& keys, bool may_define_any,
+                         FilterMaker& maker) {
+    const size_t begin = maker.bits.size();
+    AppendFilter(keys, maker.bits);
+    const Filter filter = {static_cast<uint32_t>(begin), static_cast<uint32_t>(maker.bits.size() - begin),
+                           may_define_any};
+    maker.made.push_back({i, SettledStamp(stamp), filter});
+  }
+
+  // Makes filters of what the indexes in the roots say. Those of other versions know other names.
+  void MakeFiltersOfIndexes() {
+    for (const std::string& root : roots_) {
+      const std::unique_ptr<IndexedWords> index =
+          index_maker_.empty() ? nullptr : IndexedWords::Read(root, index_maker_);
+      if (index == nullptr) continue;
+      std::array<FilterMaker, 2> makers;
+      std::array<std::vector<WordKey>, 2> keys;
+      ForEachByThreads(all_.size(), kFilesWorthAThread, makers, [&](size_t i, FilterMaker& maker) {
+        const Version version = files_.VersionOf(all_[i]);
+        const std::string& path = files_.PathOf(all_[i]);
+        if (stamps_[i] != FileStamp() || version.parts[0] != index->version().parts[0] ||
+            version.parts[1] != index->version().parts[1] || files_.IsOpen(all_[i]) || !IsWithin(path, root) ||
+            path.size() <= root.size() + 1)
+          return;
+        const FileStamp stamp = StampOf(path);
+        const std::optional<uint32_t> known = index->Find(Text(path).substr(root.size() + 1), stamp);
+        if (!known) return;
+        std::vector<WordKey>& of_file = keys[&maker == makers.data() ? 0 : 1];
+        index->KeysOf(*known, of_file);
+        MakeFilter(i, stamp, of_file, false, maker);
+      });
+      TakeFilters(makers);
+    }
+  }
+
+  void TakeFilters(const std::array<FilterMaker, 2>& makers) {
     // A vector that grew as vectors do would take twice the memory.
     const size_t size = bits_.size() + makers[0].bits.size() + makers[1].bits.size();
     if (size > bits_.capacity()) bits_.reserve(bits_.empty() ? size : size + size / 8);
     for (const FilterMaker& maker : makers) AddFilters(maker);
     if (bits_.size() > 2 * used_) DropUnusedBits();
-    are_filters_fresh_ = true;
-  }
-
-  void MakeFilter(size_t i, const FileStamp& stamp, FilterMaker& maker) const {
-    files_.ReadSource(all_[i], stamp, maker.source);
-    maker.keys.Read(maker.source);
-    const size_t begin = maker.bits.size();
-    AppendFilter(maker.keys.keys(), maker.bits);
-    const Filter filter = {static_cast<uint32_t>(begin), static_cast<uint32_t>(maker.bits.size() - begin),
-                           maker.keys.may_define_any()};
-    maker.made.push_back({i, SettledStamp(stamp), filter});
   }
 
   // One that fits in the place of the old one takes it.
@@ -238,22 +281,32 @@ class ProjectFiles::Impl {
 
   // Those whose filters hold what is asked for; the bytes of buffers are searched, and of all that are left where
   // these are few or filters do not know a word. To make all filters takes five times as long as to search all files,
-  // so the first question, whose answer somebody waits for, does without.
+  // so the first question, whose answer somebody waits for, does without those that no index says.
   template <class Question>
   std::vector<FileId> Candidates(const std::vector<Text>& words, Question&& may_be) {
     All();
-    if (!std::exchange(was_asked_, true)) return Searched(words);
-    UpdateFilters();
-    std::vector<uint32_t> candidates;
-    for (uint32_t i = 0; i < all_.size(); ++i) {
-      if (may_be(filters_[i])) candidates.push_back(i);
+    const bool is_first = !std::exchange(was_asked_, true);
+    if (is_first) {
+      MakeFiltersOfIndexes();
+    } else {
+      UpdateFilters();
     }
-    const bool are_known = std::ranges::all_of(words, HasWordKey);
+    std::vector<uint32_t> candidates;
+    std::vector<uint32_t> unknown;
+    for (uint32_t i = 0; i < all_.size(); ++i) {
+      if (is_first && stamps_[i] == FileStamp()) {
+        unknown.push_back(i);
+      } else if (may_be(filters_[i])) {
+        candidates.push_back(i);
+      }
+    }
+    const bool are_known = std::ranges::all_of(words, IsInFilters);
     const bool is_cheap = candidates.size() <= std::max(kMostFilesSearched, all_.size() / kShareSearched);
     const bool are_all_searched =
         !are_known || (is_cheap && !words.empty() && words.front().size() > kLongestWordNotSearched);
     const std::vector<uint32_t> open = OpenFiles();
     std::vector<uint32_t> searched = open;
+    searched.insert(searched.end(), unknown.begin(), unknown.end());
     if (are_all_searched) {
       searched.insert(searched.end(), candidates.begin(), candidates.end());
       candidates.clear();
@@ -266,13 +319,6 @@ class ProjectFiles::Impl {
     candidates.insert(candidates.end(), searched.begin(), searched.end());
     std::ranges::sort(candidates);
     return FilesAt(candidates);
-  }
-
-  std::vector<FileId> Searched(const std::vector<Text>& words) const {
-    std::vector<uint32_t> searched(all_.size());
-    std::iota(searched.begin(), searched.end(), 0);
-    Search(words, searched);
-    return FilesAt(searched);
   }
 
   std::vector<FileId> FilesAt(const std::vector<uint32_t>& indexes) const {
@@ -299,6 +345,7 @@ class ProjectFiles::Impl {
     std::vector<char> holds(files.size());
     std::array<std::string, 2> memories;
     ForEachByThreads(files.size(), kFilesWorthAThread, memories, [&](size_t i, std::string& memory) {
+      ++read_count_;
       const Text source = files_.SourceOf(all_[files[i]], memory);
       CountSteps(static_cast<int64_t>(source.size() / kBytesOfAStep));
       holds[i] = std::ranges::all_of(words, [&](Text word) { return HoldsWord(source, word); });
@@ -313,6 +360,7 @@ class ProjectFiles::Impl {
   Files& files_;
   std::vector<std::string> roots_;
   const std::string exclude_;
+  const std::string index_maker_;
   std::vector<FileId> all_;
   // Of the walk.
   WatchList watched_;
@@ -326,10 +374,11 @@ class ProjectFiles::Impl {
   std::vector<uint64_t> bits_;
   size_t used_ = 0;  // of the bits
   bool are_filters_fresh_ = false;
+  mutable std::atomic<size_t> read_count_{0};
 };
 
-ProjectFiles::ProjectFiles(Files& files, std::vector<std::string> roots, Text exclude)
-    : impl_(std::make_unique<Impl>(files, std::move(roots), exclude)) {}
+ProjectFiles::ProjectFiles(Files& files, std::vector<std::string> roots, Text exclude, Text index_maker)
+    : impl_(std::make_unique<Impl>(files, std::move(roots), exclude, index_maker)) {}
 ProjectFiles::~ProjectFiles() = default;
 
 const std::vector<FileId>& ProjectFiles::All() { return impl_->All(); }
@@ -338,5 +387,6 @@ std::vector<FileId> ProjectFiles::Defining(Text name) { return impl_->Defining(n
 bool ProjectFiles::Refresh() { return impl_->Refresh(); }
 void ProjectFiles::Forget() { impl_->Forget(); }
 size_t ProjectFiles::ByteSize() const { return impl_->ByteSize(); }
+size_t ProjectFiles::read_count() const { return impl_->read_count(); }
 
 }  // namespace quillet

@@ -1,7 +1,9 @@
 // The Python files below the roots of a project, and which of them hold a word.
 //
 // The first question about words searches all files; the second one makes a filter of each one's words, about a byte a
-// word. Those behind it ask the filters, and read again what has changed.
+// word. Those behind it ask the filters, and read again what has changed. Where an index lies in a root, filters are
+// made of what it says in front of the first question, which searches the files that the index does not know as they
+// are.
 #pragma once
 
 #include <memory>
@@ -15,16 +17,18 @@ namespace quillet {
 
 class ProjectFiles {
  public:
-  // `exclude` are lines of an ignore file for each root that is a folder; they overrule others.
-  explicit ProjectFiles(Files& files, std::vector<std::string> roots, Text exclude = Text(""));
+  // `exclude` are lines of an ignore file for each root that is a folder; they overrule others. Indexes made by
+  // `index_maker` are used; none where it is empty.
+  explicit ProjectFiles(Files& files, std::vector<std::string> roots, Text exclude = Text(""),
+                        Text index_maker = Text(""));
   ~ProjectFiles();
 
   // All files below the roots that FindFiles gives of a program, and open buffers there, in the order of their paths.
   // A root that is a file is one of them. Walked once, and again when Refresh, or the next question behind Forget,
   // finds that folders changed.
   const std::vector<FileId>& All();
-  // Those in which all the words occur as whole words, in the order of their paths, and maybe a few more. Nothing is
-  // analysed.
+  // Those in which all the words are names, in the order of their paths, and maybe more: those that hold them as whole
+  // words anywhere. Nothing is analysed.
   std::vector<FileId> WithWords(const std::vector<Text>& words);
   // Those in which a name may be defined as a function, a class, a variable or an attribute that is assigned: all in
   // which it is, and some more. By an import or as a parameter is not counted.
@@ -38,6 +42,8 @@ class ProjectFiles {
 
   // Of the filters.
   size_t ByteSize() const;
+  // How many sources were searched, or read for their filters, until now.
+  size_t read_count() const;
 
  private:
   class Impl;

@@ -1,5 +1,7 @@
 // Definitions: where what a name stands for is bound.
 #include <algorithm>
+#include <span>
+#include <utility>
 
 #include "workspace/workspace_impl.h"
 
@@ -193,22 +195,28 @@ std::vector<Location> Workspace::Impl::LocationsOf(const Entities& entities, boo
   return found;
 }
 
+// The bound is one of the files that define such a member, in the order of their paths: how many more are looked at
+// depends on what is known of them.
 std::vector<Location> Workspace::Impl::MembersNamed(Text name) {
-  static constexpr size_t kMaxFiles = 400;
+  static constexpr size_t kMaxDefiners = 400;
+  static constexpr size_t kFilesAtOnce = 256;
   std::vector<Location> found;
-  std::vector<FileId> candidates = project.Defining(name);
-  if (candidates.size() > kMaxFiles) {
-    is_bounded = true;
-    candidates.resize(kMaxFiles);
-  }
-  defined.ReadForMember(candidates, name);
-  const uint32_t number = defined.Find(name);
-  if (number == kNoIndex) return found;
-  for (const FileId file : candidates) {
-    for (const DefinedNames::Definition& definition : defined.Of(file)) {
+  size_t definers = 0;
+  const std::vector<FileId> candidates = project.Defining(name);
+  for (size_t i = 0; i < candidates.size(); ++i) {
+    if (i % kFilesAtOnce == 0)
+      defined.ReadForMember(std::span(candidates).subspan(i, std::min(kFilesAtOnce, candidates.size() - i)), name);
+    const uint32_t number = defined.Find(name);
+    if (number == kNoIndex) continue;
+    bool is_definer = false;
+    for (const DefinedNames::Definition& definition : defined.Of(candidates[i])) {
       if (definition.name != number || !(definition.in_class || definition.of_self)) continue;
+      if (!std::exchange(is_definer, true) && ++definers > kMaxDefiners) {
+        is_bounded = true;
+        return found;
+      }
       Location location;
-      location.file = file;
+      location.file = candidates[i];
       location.begin = definition.begin;
       location.end = definition.begin + static_cast<uint32_t>(name.size());
       location.role = NameRoleWords()[static_cast<size_t>(definition.role)];
@@ -459,11 +467,11 @@ std::vector<Location> Workspace::Subtypes(FileId id, uint32_t offset) {
     if (t.kind == TypeKind::kClass || t.kind == TypeKind::kInstance) wanted.push_back(t.a);
   }
   for (const ClassId cls : wanted) {
-    const Text name = in.inference.InfoOf(cls).name;
+    const std::string name(in.inference.InfoOf(cls).name);
     for (const FileId candidate : in.project.WithWords({name})) {
       const Impl::Visit visit(in, candidate);
       const SourceFile* source = visit.file;
-      if (source == nullptr) continue;
+      if (source == nullptr || NumberOfText(source->bindings, name) == kNoIndex) continue;
       for (StmtId stmt = 1; stmt < source->syntax.stmts.size(); ++stmt) {
         if (source->syntax.stmt(stmt).kind != StmtKind::kClass) continue;
         const ClassId sub = in.inference.ClassOfStmt(candidate, stmt);

@@ -160,9 +160,14 @@ std::vector<Location> Workspace::Impl::MembersBelow(const SourceFile& file, Expr
     if (!IsProject(inference.InfoOf(t.a).file)) continue;
     static constexpr size_t kMaxFiles = 200;
     size_t count = 0;
-    for (const FileId id : project.WithWords({name, inference.InfoOf(t.a).name})) {
-      const SourceFile* source = ++count > kMaxFiles ? nullptr : Get(id);
-      if (source == nullptr) continue;
+    const std::string of_class(inference.InfoOf(t.a).name);
+    for (const FileId id : project.WithWords({name, of_class})) {
+      if (count == kMaxFiles) break;
+      const SourceFile* source = Get(id);
+      if (source == nullptr || NumberOfText(source->bindings, name) == kNoIndex ||
+          NumberOfText(source->bindings, of_class) == kNoIndex)
+        continue;
+      ++count;
       for (StmtId stmt = 1; stmt < source->syntax.stmts.size(); ++stmt) {
         if (source->syntax.stmt(stmt).kind != StmtKind::kClass) continue;
         const ClassId cls = inference.ClassOfStmt(id, stmt);

@@ -38,7 +38,7 @@ Workspace::Impl::Impl(Settings given)
     : settings(std::move(given)),
       files(settings.version),
       modules(files, ModuleSettings(settings)),
-      project(files, settings.roots, settings.exclude),
+      project(files, settings.roots, settings.exclude, settings.index_maker),
       defined(files),
       inference(files, modules) {
   inference.set_callers(this);

@@ -165,6 +165,7 @@ class Workspace {
   struct Settings {
     std::vector<std::string> roots;      // folders of the project
     std::string exclude;                 // lines of an ignore file for each of them
+    std::string index_maker;             // what made the indexes that may be used; empty for none
     std::vector<std::string> libraries;  // the environment's
     std::string typeshed;
     Version version;

@@ -225,6 +225,7 @@ class Workspace:
             _typeshed(),
             (*found_version, 0),
             _utf8("\n".join(exclude)),
+            _index_maker(folders),
             native_language_of(found_version),
         )
         if columns not in _COLUMNS:
@@ -484,6 +485,17 @@ def _environment(roots: Sequence[bytes], given: StrPath | None) -> tuple[list[st
 
 def _is_known(version: tuple[int, int]) -> bool:
     return version == (2, 7) or version[0] == 3
+
+
+def _index_maker(folders: list[bytes]) -> bytes:
+    """What makes the indexes that are used, where one lies in any of the folders: this very build of the engine, as
+    another one may tell other words of a file.
+    """
+    if not any(os.path.isfile(os.path.join(folder, b".quillet-index")) for folder in folders):
+        return b""
+    from quillet.index.writing import engine_mark
+
+    return engine_mark().encode()
 
 
 def _typeshed() -> bytes:

@@ -681,6 +681,7 @@ class _host:  # a module at run time
             typeshed: bytes,
             version_triple: _Version,
             exclude: bytes,
+            index_maker: bytes,
             language: _host.Language,
         ) -> None: ...
         def Definitions(self, path: bytes, line: int, column: int) -> list[tuple[Any, ...]]: ...

@@ -8,6 +8,7 @@ import subprocess
 import sys
 import threading
 from pathlib import Path
+from random import Random
 
 import pytest
 
@@ -358,6 +359,101 @@ def test_edits_keep_the_encoding(tmp_path: Path) -> None:
     assert file.read_bytes() == "# coding: latin-1\nä = 1; ö = ä\n".encode("latin-1")
     with pytest.raises(ValueError, match="cannot be written in the encoding"):
         edited_files([Edit(str(file), 2, 9, 10, "中")])
+
+
+# ---- with an index ----
+
+
+def _without_index(project: Path) -> Workspace:
+    index = project / ".quillet-index"
+    hidden = index.rename(project / "hidden")
+    workspace = Workspace(project, version=(3, 12))
+    hidden.rename(index)
+    return workspace
+
+
+def _answers(workspace: Workspace, project: Path) -> list[object]:
+    cart = project / "src" / "shop" / "cart.py"
+    answers: list[object] = [
+        getattr(workspace, question)(path, line, column)
+        for path, line, column in ((cart, 15, 9), (cart, 10, 7), (cart, 13, 14), (project / "main.py", 5, 15))
+        for question in ("references", "callers", "definitions", "subtypes", "callees")
+    ]
+    for name in ("total", "Cart", "more", "x"):
+        answers += [workspace.symbols(name), workspace.named(name)]
+    try:
+        answers.append(workspace.rename(cart, 10, 7, "Basket", only_certain=False))
+    except RenameError as error:
+        answers.append(str(error))
+    return answers
+
+
+@pytest.mark.parametrize("seed", range(4))
+def test_answers_are_the_same_with_an_index(project: Path, seed: int) -> None:
+    random = Random(seed)
+    cart = project / "src" / "shop" / "cart.py"
+    pieces = [
+        "x.total()\n",
+        "Cart\n",
+        "# total\n",
+        "'total'\n",
+        "class More(Cart):\n  def total(self): pass\n",
+        "(",
+        '"""',
+    ]
+    pieces += [
+        "import shop.cart as c\n",
+        "from shop.cart import *\n",
+        "__all__ = ['pay']\n",
+        "pay(items=1)\n",
+        "x = 1\n",
+    ]
+    files = [project / f"m{number}.py" for number in range(30)]
+    for path in files:
+        path.write_text("".join(random.choices(pieces, k=4)))
+    for path in project.rglob("*.py"):
+        os.utime(path, (1_000_000_000, 1_000_000_000))  # so that the times count
+    command = [sys.executable, "-m", "quillet", "index", ".", "--python", "3.12", "--quiet"]
+    subprocess.run(command, cwd=project, check=True, timeout=120)
+    written = (project / ".quillet-index").read_bytes()
+    assert _answers(Workspace(project, version=(3, 12)), project) == _answers(_without_index(project), project)
+    for _ in range(3):
+        for path in random.sample(files, 5):
+            match random.randrange(4):
+                case 0:
+                    path.unlink(missing_ok=True)
+                case 1:
+                    path.write_text("".join(random.choices(pieces, k=3)))
+                case 2:
+                    (project / f"new{random.random()}.py").write_text(random.choice(pieces))
+                case _:
+                    text = cart.read_text(encoding="utf-8")
+                    cart.write_text(
+                        text.replace("print(", random.choice(["total(", "pay(", "Cart("])), encoding="utf-8"
+                    )
+        assert _answers(Workspace(project, version=(3, 12)), project) == _answers(_without_index(project), project)
+    assert (project / ".quillet-index").read_bytes() == written
+
+
+def test_an_index_says_where_to_look(project: Path) -> None:
+    """A file that is written anew behind the index' back, with its size and its time, is not looked at."""
+    paths = [project / f"m{number}.py" for number in range(3)]
+    for path in paths:
+        path.write_text("from shop.cart import pay\n")
+    for path in project.rglob("*.py"):
+        os.utime(path, (1_000_000_000, 1_000_000_000))
+    command = [sys.executable, "-m", "quillet", "index", ".", "--python", "3.12", "--quiet"]
+    subprocess.run(command, cwd=project, check=True, timeout=120)
+    paths[0].write_text("from shop.cart import Car\n")
+    paths[1].write_text("from shop.cart import Car\n")
+    os.utime(paths[0], (1_000_000_000, 1_000_000_000))
+    with (project / "src/shop/cart.py").open("a") as file:
+        file.write("\n\nclass Car: pass\n")
+    place = (project / "src/shop/cart.py", len(CART.splitlines()) + 3, 7)
+    assert [Path(at.path).name for at in Workspace(project, version=(3, 12)).references(*place)] == ["m1.py", "cart.py"]
+    # That of another version does not count.
+    found = [Path(at.path).name for at in Workspace(project, version=(3, 11)).references(*place)]
+    assert found == ["m0.py", "m1.py", "cart.py"]
 
 
 # ---- from a shell ----

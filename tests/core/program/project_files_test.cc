@@ -4,11 +4,17 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <chrono>
+#include <filesystem>
+#include <optional>
 #include <string>
 #include <vector>
 
+#include "foundations/file_status.h"
+#include "index/name_index.h"
 #include "project/word_filters.h"
 #include "project/word_search.h"
+#include "tests/core/support/analyzer_helper.h"
 #include "tests/core/support/temporary_folder.h"
 
 namespace quillet {
@@ -261,6 +267,177 @@ TEST(ProjectFiles, AreFoundByWhatIsNoWordAndByNothing) {
   EXPECT_EQ(at.With("\xC3\xA4hnlich"), (Paths{"sub/c.py"}));
   EXPECT_EQ(Below(at.folder, at.files, at.project.WithWords({})), at.All());
   EXPECT_TRUE(at.Defining("").empty());
+}
+
+// A folder of many files with an index of them, that a project may use.
+struct Indexed {
+  static constexpr size_t kFiles = 90;
+  TemporaryFolder folder = {
+      {"a.py", "def total(): pass\n"}, {"b.py", "self.total = 1 # cart\n"}, {"c.py", "total()\n"}};
+  std::vector<std::string> stored = {"a.py", "b.py", "c.py"};
+  NameIndexWriter writer;
+
+  Indexed() {
+    for (size_t i = stored.size(); i < kFiles; ++i) {
+      stored.push_back("many/m" + std::to_string(i) + ".py");
+      folder.Write(stored.back(), "x = " + std::to_string(i) + "\n");
+    }
+    for (const std::string& path : stored) {
+      // What was written just now is read again by the next question.
+      const std::filesystem::path file = folder / path;
+      std::filesystem::last_write_time(file, std::filesystem::last_write_time(file) - std::chrono::hours(1));
+      Add(path, path);
+    }
+  }
+  // What is said of a path is what is in a file.
+  void Add(const std::string& path, const std::string& of) {
+    static FileAnalyzer file(FileAnalyzer::Options{testing::AnalyzerOptions(testing::kPy3), {}});
+    const auto words = MakeWordsWriter(testing::kPy3);
+    std::string source, written;
+    ASSERT_FALSE(ReadBeginning(folder / of, true, 4096, source).has_value());
+    ScopeNames scopes;
+    PlacedRecords placed;
+    file.Analyze(source, nullptr);
+    scopes.Build(file);
+    words->Write(BatchInput{path, {}, {}}, file, scopes, placed, written);
+    const FileStatus status = *StatusOf(folder / of);
+    const auto errors = static_cast<uint32_t>(of == "broken.py");
+    ASSERT_TRUE(writer.Add({path, status.size, status.time, 0, 1, 0, errors, ""}, written).has_value());
+  }
+  // Its bytes, as they are made for a version by something.
+  std::string Bytes(Text version = "3.12", Text made_by = "us") {
+    return writer.Finish(std::string(version) + std::string("\0001\0", 3) + std::string(made_by) +
+                         std::string("\0", 1));
+  }
+  void WriteIndex(const std::string& bytes) { folder.Write(".quillet-index", bytes); }
+
+  struct Answers {
+    Paths with_total, with_cart, defining;
+    size_t read_first = 0, read = 0;
+  };
+  Answers Ask(Text maker = "us", const Paths& roots = {""}) {
+    Files files(Version::Of(3, 12));
+    Paths whole;
+    for (const std::string& root : roots) whole.push_back(folder / root);
+    ProjectFiles project(files, whole, "", maker);
+    Answers answers;
+    answers.with_total = Below(folder, files, project.WithWords({"total"}));
+    answers.read_first = project.read_count();
+    answers.defining = Below(folder, files, project.Defining("total"));
+    answers.with_cart = Below(folder, files, project.WithWords({"cart"}));
+    answers.read = project.read_count();
+    return answers;
+  }
+};
+
+TEST(ProjectFiles, ReadNothingThatAnIndexKnows) {
+  Indexed at;
+  const Indexed::Answers without = at.Ask();
+  EXPECT_EQ(without.with_total, (Paths{"a.py", "b.py", "c.py"}));
+  EXPECT_EQ(without.defining, (Paths{"a.py", "b.py"}));
+  EXPECT_EQ(without.with_cart, (Paths{"b.py"})) << "in a comment";
+  EXPECT_EQ(without.read_first, Indexed::kFiles);
+  at.WriteIndex(at.Bytes());
+  const Indexed::Answers with = at.Ask();
+  EXPECT_EQ(with.with_total, without.with_total);
+  EXPECT_EQ(with.defining, without.defining);
+  EXPECT_LE(with.read_first, 5u);
+  EXPECT_LE(with.read, 12u);
+  EXPECT_LE(at.Ask("us", {"many", ""}).read_first, 5u) << "of another root";
+  EXPECT_EQ(at.Ask("us", {"many"}).read_first, Indexed::kFiles - 3) << "that of a root alone";
+}
+
+TEST(ProjectFiles, ReadWhatIsNotAsAnIndexKnowsIt) {
+  Indexed at;
+  at.folder.Write("broken.py", "x = (1\n");
+  at.Add("broken.py", "broken.py");
+  at.WriteIndex(at.Bytes());
+  at.folder.Write("many/m7.py", "x = total\n");
+  const auto old = std::filesystem::last_write_time(at.folder / "many/m8.py");
+  at.folder.Write("many/m8.py", "total\n");  // of the same size
+  std::filesystem::last_write_time(at.folder / "many/m8.py", old + std::chrono::seconds(1));
+  at.folder.Write("new.py", "total\n");
+  at.folder.Remove("c.py");
+  const Indexed::Answers with = at.Ask();
+  EXPECT_EQ(with.with_total, (Paths{"a.py", "b.py", "many/m7.py", "many/m8.py", "new.py"}));
+  EXPECT_GE(with.read_first, 4u);
+  EXPECT_LE(with.read_first, 8u);
+
+  // A buffer is searched, whatever the file is.
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {at.folder.path()}, "", "us");
+  files.Open(files.NumberOf(at.folder / "a.py"), "nothing\n");
+  files.Open(files.NumberOf(at.folder / "many/m9.py"), "total\n");
+  EXPECT_EQ(Below(at.folder, files, project.WithWords({"total"})),
+            (Paths{"b.py", "many/m7.py", "many/m8.py", "many/m9.py", "new.py"}));
+
+  // What changes behind the first question is seen.
+  at.folder.Write("b.py", "nothing at all\n");
+  project.Refresh();
+  EXPECT_EQ(Below(at.folder, files, project.WithWords({"total"})),
+            (Paths{"many/m7.py", "many/m8.py", "many/m9.py", "new.py"}));
+}
+
+TEST(ProjectFiles, AskNoIndexForLongWords) {
+  Indexed at;
+  const std::string name(kMaxWordSize + 20, 'n');
+  at.folder.Write("long.py", name + " = 1\n");
+  at.Add("long.py", "long.py");
+  at.WriteIndex(at.Bytes());
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {at.folder.path()}, "", "us");
+  for (int i = 0; i < 2; ++i) {
+    EXPECT_EQ(Below(at.folder, files, project.WithWords({name})), (Paths{"long.py"}));
+    EXPECT_EQ(Below(at.folder, files, project.Defining(name)), (Paths{"long.py"}));
+    EXPECT_TRUE(project.WithWords({Text(name).substr(1)}).empty());
+  }
+}
+
+TEST(ProjectFiles, UseNoIndexThatDoesNotFit) {
+  Indexed at;
+  const std::string fine = at.Bytes();
+  const auto expect_unused = [&](const char* why, Text maker = "us") {
+    const Indexed::Answers answers = at.Ask(maker);
+    EXPECT_EQ(answers.with_total, (Paths{"a.py", "b.py", "c.py"})) << why;
+    EXPECT_EQ(answers.read_first, Indexed::kFiles) << why;
+  };
+  at.WriteIndex(fine);
+  ASSERT_LE(at.Ask().read_first, 5u);
+  expect_unused("none is wanted", "");
+  expect_unused("made by something else", "others");
+  for (size_t size : {0, 5, 12, 16, 23, 24, 100}) {
+    at.WriteIndex(fine.substr(0, size));
+    expect_unused("cut off");
+  }
+  for (size_t i = 0; i < fine.size(); i += 61) {
+    std::string damaged = fine;
+    damaged[i] = static_cast<char>(damaged[i] ^ 0x41);
+    at.WriteIndex(damaged);
+    expect_unused("damaged");
+  }
+  at.WriteIndex("SQLite format 3");
+  expect_unused("something else");
+  at.WriteIndex(at.Bytes("3.11"));
+  expect_unused("of another version");
+  at.folder.Remove(".quillet-index");
+  at.folder.Write("elsewhere", fine);
+  at.folder.Link("elsewhere", ".quillet-index");
+  expect_unused("a link");
+  at.folder.Remove(".quillet-index");
+  at.folder.Write(".quillet-index/file", fine);
+  expect_unused("a folder");
+}
+
+TEST(ProjectFiles, FollowNoPathOfAnIndex) {
+  Indexed at;
+  const TemporaryFolder other = {{"secret.py", "total\n"}};
+  for (const std::string& path : {other / "secret.py", "../" + std::string(other.path().substr(5)) + "/secret.py",
+                                  std::string("many/../a.py"), std::string("gone.py")})
+    at.Add(path, "a.py");
+  at.WriteIndex(at.Bytes());
+  const Indexed::Answers with = at.Ask();
+  EXPECT_EQ(with.with_total, (Paths{"a.py", "b.py", "c.py"}));
+  EXPECT_LE(with.read_first, 5u);
 }
 
 // Whether a source may define a name, by its keys.
