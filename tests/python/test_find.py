@@ -108,6 +108,7 @@ def test_without_an_index_the_files_are_looked_through(tmp_path: Path) -> None:
     )
     assert result.stderr == ""
     assert run("find", "nowhere", cwd=tmp_path).returncode == 1
+    assert run("find", "SHOP", cwd=tmp_path).stderr == "quillet: nothing found; try: Shop, shop\n"
     assert run("find", "Shop", "--index", "none", cwd=tmp_path).returncode == 2
     assert run("defs", "shop.py", cwd=tmp_path).returncode == 0
     assert run("outline", "shop.py", cwd=tmp_path).returncode == 0
