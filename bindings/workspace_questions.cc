@@ -1,6 +1,5 @@
 // The questions of a workspace: places in, plain tuples out, which the package gives names.
 #include <algorithm>
-#include <numeric>
 #include <string>
 #include <unordered_map>
 #include <utility>
@@ -167,32 +166,18 @@ nb::list CallsAt(WorkspaceObject& self, nb::handle path, int line, int column) {
 
 nb::list SymbolsLike(WorkspaceObject& self, nb::handle query, size_t most) {
   const HostText asked = HostText::FromBytes(query);
-  struct Answer {
-    std::vector<SymbolInfo> symbols;
-    std::vector<PlacedRange> ranges;
-    std::unordered_map<FileId, std::string> paths;
-  };
-  const Answer answer = self.Asked([&](Workspace& workspace) {
-    Answer made;
-    made.symbols = workspace.Symbols(asked.text(), most);
-    Placer placer(workspace);
-    // Those of a file one after the other, so that it is read once.
-    std::vector<uint32_t> order(made.symbols.size());
-    std::iota(order.begin(), order.end(), 0);
-    std::ranges::sort(order, {}, [&](uint32_t at) { return std::pair(made.symbols[at].file, made.symbols[at].begin); });
-    made.ranges.resize(order.size());
-    for (const uint32_t at : order)
-      made.ranges[at] = placer.Range(made.symbols[at].file, made.symbols[at].begin, made.symbols[at].end);
-    made.paths = placer.TakePaths();
-    return made;
+  std::unordered_map<FileId, std::string> paths;
+  const std::vector<SymbolInfo> symbols = self.Asked([&](Workspace& workspace) {
+    std::vector<SymbolInfo> found = workspace.Symbols(asked.text(), most);
+    for (const SymbolInfo& symbol : found)
+      if (!paths.contains(symbol.file)) paths.emplace(symbol.file, workspace.PathOf(symbol.file));
+    return found;
   });
-  Rows paths(answer.paths);
+  Rows hosts(std::move(paths));
   nb::list rows;
-  for (size_t i = 0; i < answer.symbols.size(); ++i) {
-    const SymbolInfo& symbol = answer.symbols[i];
-    const PlacedRange& range = answer.ranges[i];
+  for (const SymbolInfo& symbol : symbols) {
     rows.append(nb::make_tuple(ShownText(symbol.name), Word(symbol.kind), ShownText(symbol.container),
-                               paths.Path(range.file), range.begin.line, range.begin.col, range.end.col));
+                               hosts.Path(symbol.file), symbol.place.line, symbol.place.col, symbol.end_column));
   }
   return rows;
 }

@@ -67,7 +67,7 @@ class DefinitionsMaker {
     std::optional<NameBinder>& binder = is_stub ? stub_binder_ : binder_;
     if (!binder) binder.emplace(version);
     const size_t begin = definitions.size();
-    Take(binder->Bind(source));
+    Take(binder->Bind(source), source);
     made.push_back({index, stamp, begin, definitions.size() - begin});
   }
 
@@ -81,7 +81,7 @@ class DefinitionsMaker {
   static constexpr size_t kExpectedTexts = 1024;
   static constexpr uint32_t kNotAsked = kNoIndex - 1;
 
-  void Take(const Bindings& bindings) {
+  void Take(const Bindings& bindings, Text source) {
     scopes_.assign(bindings.scopes.size(), kNotAsked);
     texts_.assign(bindings.texts.size(), kNoIndex);
     seen_.assign(bindings.symbols.size(), 0);
@@ -90,6 +90,11 @@ class DefinitionsMaker {
       if (occurrence.kind == NameKind::kNone ? !IsOfSelf(bindings, i) : !IsDefinition(bindings, occurrence)) continue;
       Definition definition{};
       definition.begin = occurrence.begin;
+      const Position place = bindings.PositionOf(occurrence.begin);
+      const size_t line_begin = place.line == 0 ? 0 : occurrence.begin - static_cast<size_t>(place.col);
+      const size_t end = occurrence.begin + bindings.TextOf(occurrence).size();
+      definition.line = place.line + 1;
+      definition.column = IsAscii(source.substr(line_begin, end - line_begin)) ? place.col + 1 : 0;
       definition.role = occurrence.role;
       definition.kind = occurrence.kind;
       definition.of_self = occurrence.kind == NameKind::kNone;
@@ -105,6 +110,10 @@ class DefinitionsMaker {
       }
       definitions.push_back(definition);
     }
+  }
+
+  static bool IsAscii(Text text) {
+    return std::ranges::all_of(text, [](char c) { return static_cast<unsigned char>(c) < 0x80; });
   }
 
   static bool IsDefinition(const Bindings& bindings, const Occurrence& occurrence) {

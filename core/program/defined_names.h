@@ -1,6 +1,6 @@
 // What the files of a project define, by name: enough to say where a name is defined without holding the files.
 //
-// A file is bound once, and its definitions are kept, 16 bytes each, until it changes. What it may define at all is
+// A file is bound once, and its definitions are kept, 24 bytes each, until it changes. What it may define at all is
 // told by its text in a third of the time.
 #pragma once
 
@@ -21,13 +21,16 @@ class DefinedNames {
     uint32_t name;   // number of its text, as it is spelled
     uint32_t scope;  // of the names of the classes and functions around, with dots; kNoIndex where there are none
     uint32_t begin;
+    int32_t line;    // counted from one, as the column is
+    int32_t column;  // 0 where letters beyond ASCII stand in front of the name's end: what counts as one depends on who
+                     // asks
     NameRole role;
     NameKind kind : 4;   // kNone for attributes
     bool is_symbol : 1;  // what one looks for by name: no attribute, and of a variable the first place alone
     bool in_class : 1;   // in the body of one
     bool of_self : 1;    // an attribute
   };
-  static_assert(sizeof(Definition) == 16);
+  static_assert(sizeof(Definition) == 24);
 
   explicit DefinedNames(const Files& files);
   ~DefinedNames();

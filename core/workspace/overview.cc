@@ -528,7 +528,18 @@ std::vector<SymbolInfo> Workspace::Symbols(Text query, size_t most) {
     }
     symbol.begin = definition.begin;
     symbol.end = definition.begin + static_cast<uint32_t>(symbol.name.size());
+    symbol.place = {definition.line, definition.column};
+    symbol.end_column = definition.column + static_cast<int32_t>(symbol.name.size());
     symbols.push_back(std::move(symbol));
+  }
+  // Those whose columns must be counted, of a file one after the other, so that it is read once.
+  std::vector<SymbolInfo*> uncounted;
+  for (SymbolInfo& symbol : symbols)
+    if (symbol.place.col == 0) uncounted.push_back(&symbol);
+  std::ranges::sort(uncounted, {}, [](const SymbolInfo* symbol) { return std::pair(symbol->file, symbol->begin); });
+  for (SymbolInfo* symbol : uncounted) {
+    symbol->place = PlaceOf(symbol->file, symbol->begin);
+    symbol->end_column = PlaceOf(symbol->file, symbol->end).col;
   }
   return symbols;
 }

@@ -79,6 +79,8 @@ struct SymbolInfo {
   FileId file = kNoFile;
   uint32_t begin = 0;  // of the name
   uint32_t end = 0;
+  Position place;  // of its beginning
+  int32_t end_column = 0;
 };
 
 struct OutlineItem {

@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <map>
 #include <memory>
 #include <string>
 #include <vector>
@@ -662,6 +663,31 @@ TEST(Symbols, AreRanked) {
   EXPECT_EQ(program->Symbols("total", 2).size(), 2u);
   EXPECT_EQ(program->Symbols("twoten").size(), 1u);
   EXPECT_EQ(program->Symbols("zzz").size(), 0u);
+}
+
+TEST(Symbols, HaveTheColumnsOfWhoAsks) {
+  Program program({
+      {"a.py", "\xEF\xBB\xBFxa = 1\nxb = 2\n"},
+      {"b.py", "\xC3\xA4 = 1; xc = 2\nx\xC3\xA4 = 3\n'\xF0\x9F\x98\x80'; xd = 4\nif a: xe = 5\n"},
+  });
+  const auto columns = [&] {
+    std::map<std::string, std::pair<int, int>> said;
+    for (const SymbolInfo& symbol : program->Symbols("x")) {
+      EXPECT_EQ(symbol.place, program->PlaceOf(symbol.file, symbol.begin)) << symbol.name;
+      said[symbol.name] = {symbol.place.col, symbol.end_column};
+    }
+    return said;
+  };
+  using Columns = std::map<std::string, std::pair<int, int>>;
+  EXPECT_EQ(
+      columns(),
+      (Columns{
+          {"xa", {1, 3}}, {"xb", {1, 3}}, {"xc", {9, 11}}, {"x\xC3\xA4", {1, 4}}, {"xd", {9, 11}}, {"xe", {7, 9}}}));
+  program->set_column_unit(ColumnUnit::kUtf16);
+  EXPECT_EQ(
+      columns(),
+      (Columns{
+          {"xa", {1, 3}}, {"xb", {1, 3}}, {"xc", {8, 10}}, {"x\xC3\xA4", {1, 3}}, {"xd", {7, 9}}, {"xe", {7, 9}}}));
 }
 
 TEST(Named, TakesDottedNames) {
