@@ -26,7 +26,7 @@ Text NextPart(Text& rest) {
   return part;
 }
 
-Version VersionOfText(Text text) {
+Version WrittenVersion(Text text) {
   const size_t dot = std::min(text.find('.'), text.size());
   int major = 0, minor = 0;
   std::from_chars(text.data(), text.data() + dot, major);
@@ -54,7 +54,7 @@ std::unique_ptr<IndexedWords> IndexedWords::Read(const std::string& folder, Text
 
 IndexedWords::IndexedWords(std::string bytes, Text made_by) : bytes_(std::move(bytes)), index_(bytes_) {
   Text settings = index_.settings();
-  version_ = VersionOfText(NextPart(settings));
+  version_ = WrittenVersion(NextPart(settings));
   NextPart(settings);
   if (NextPart(settings) != made_by) return;
   keys_.reserve(index_.words().size());

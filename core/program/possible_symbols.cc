@@ -16,7 +16,7 @@ constexpr size_t kSpare = 64;  // zeros that scans may load
 constexpr int64_t kBytesOfAStep = 16;
 
 bool IsHigh(char c) { return static_cast<unsigned char>(c) >= 0x80; }
-bool IsWordByte(char c) { return IsAsciiIdentifierByte(c) || IsHigh(c); }
+bool IsPartOfWord(char c) { return IsAsciiIdentifierByte(c) || IsHigh(c); }
 
 bool Is(const char* begin, const char* end, Text word) { return Text(begin, static_cast<size_t>(end - begin)) == word; }
 
@@ -335,7 +335,7 @@ const char* PossibleSymbols::SkipLine(const char* at) const {
 // Behind the string whose quotes stand there; null where it does not end.
 const char* PossibleSymbols::StringEnd(const char* quote) const {
   const char* prefix = quote;
-  while (prefix > begin_ && quote - prefix < 3 && IsWordByte(prefix[-1])) --prefix;
+  while (prefix > begin_ && quote - prefix < 3 && IsPartOfWord(prefix[-1])) --prefix;
   const Text letters(prefix, static_cast<size_t>(quote - prefix));
   const bool is_template = version_.AtLeast(3, 14) && IsTemplatePrefix(letters);
   const StringPrefix said = PrefixOf(prefix, letters.size());
