@@ -66,8 +66,11 @@ class DefinitionsMaker {
   void Make(size_t index, const FileStamp& stamp, bool is_stub, Version version, Text source) {
     std::optional<NameBinder>& binder = is_stub ? stub_binder_ : binder_;
     if (!binder) binder.emplace(version);
+    Make(index, stamp, binder->Bind(source), source);
+  }
+  void Make(size_t index, const FileStamp& stamp, const Bindings& bindings, Text source) {
     const size_t begin = definitions.size();
-    Take(binder->Bind(source), source);
+    Take(bindings, source);
     made.push_back({index, stamp, begin, definitions.size() - begin});
   }
 
@@ -343,7 +346,10 @@ class DefinedNames::Impl {
       if (stamp == table.stamp) return;
       found[i] = Found::kPossible;
       if (may_be_possible && !is_open && stamp == table.possible_stamp) return;
-      if (!is_open) {
+      const SourceFile* const held = files_.HeldAs(file, stamp);
+      if (held != nullptr) {
+        source = held->text();
+      } else if (!is_open) {
         files_.ReadSource(file, stamp, maker.memory);
         if (may_be_possible && maker.MakePossible(i, SettledStamp(stamp), files_.VersionOf(file), maker.memory)) return;
         source = maker.memory;
@@ -351,6 +357,10 @@ class DefinedNames::Impl {
       found[i] = Found::kNothing;
       if (!IsNone(member) && table.round == 0 && !MayDefineMember(source, member)) return;
       found[i] = Found::kDefinitions;
+      if (held != nullptr) {  // bound before
+        maker.Make(i, SettledStamp(stamp), held->bindings, source);
+        return;
+      }
       CountSteps(static_cast<int64_t>(source.size() / kBytesOfAStepOfBinding));
       maker.Make(i, SettledStamp(stamp), files_.IsStub(file), files_.VersionOf(file), source);
     });

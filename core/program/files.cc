@@ -171,6 +171,11 @@ class Files::Impl {
     return memory;
   }
 
+  const SourceFile* HeldAs(FileId file, const FileStamp& stamp) const {
+    const Entry& entry = entries_[file];
+    return entry.buffer || entry.stamp == stamp ? entry.file.get() : nullptr;
+  }
+
   // One file's lines are kept: places are mostly asked in the order of files.
   Position PlaceOf(FileId file, uint32_t offset) {
     Entry& entry = entries_[file];
@@ -369,6 +374,8 @@ bool Files::Exists(FileId file) { return impl_->Exists(file); }
 const SourceFile* Files::Get(FileId file) { return impl_->Get(file); }
 void Files::ReadAhead(std::span<const FileId> files) { impl_->ReadAhead(files); }
 Text Files::SourceOf(FileId file, std::string& memory) const { return impl_->SourceOf(file, memory); }
+
+const SourceFile* Files::HeldAs(FileId file, const FileStamp& stamp) const { return impl_->HeldAs(file, stamp); }
 
 Position Files::PlaceOf(FileId file, uint32_t offset) { return impl_->PlaceOf(file, offset); }
 

@@ -55,6 +55,9 @@ class Files {
   // read. Any number of threads may ask while nothing else is called.
   Text SourceOf(FileId file, std::string& memory) const;
 
+  // What is held of a file, where it was read with such a stamp, or of its buffer. As SourceOf.
+  const SourceFile* HeldAs(FileId file, const FileStamp& stamp) const;
+
   // The same of a file as it is on disk, whatever is held of it, by a stamp of it that was taken before: into `memory`,
   // which is empty where it cannot be read.
   void ReadSource(FileId file, const FileStamp& stamp, std::string& memory) const;

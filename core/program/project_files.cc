@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <array>
 #include <atomic>
+#include <functional>
 #include <memory>
 #include <unordered_map>
 #include <unordered_set>
@@ -69,17 +70,31 @@ class ProjectFiles::Impl {
     return all_;
   }
 
-  std::vector<FileId> WithWords(std::vector<Text> words) {
-    // The longest is most likely the one that is not there.
-    std::ranges::stable_sort(words, std::greater(), &Text::size);
+  // What asks a filter for words.
+  auto HasWords(const std::vector<Text>& words) const {
     std::vector<WordKey> keys;
     for (const Text word : words) {
       if (IsInFilters(word)) keys.push_back(KeyOfWord(word));
     }
-    return Candidates(words, [&](const Filter& filter) {
+    return [this, keys = std::move(keys)](const Filter& filter) {
       const uint64_t* bits = bits_.data() + filter.begin;
       return std::ranges::all_of(keys, [&](WordKey key) { return MayHold(bits, filter.size, key); });
-    });
+    };
+  }
+
+  std::vector<FileId> WithWords(std::vector<Text> words) {
+    // The longest is most likely the one that is not there.
+    std::ranges::stable_sort(words, std::greater(), &Text::size);
+    return Candidates(words, HasWords(words));
+  }
+
+  void EachWithWord(Text word, const std::function<bool(FileId)>& take) {
+    const std::vector<Text> words = {word};
+    std::string memory;
+    for (const Candidate& candidate : CandidatesFor(words, HasWords(words))) {
+      const FileId file = all_[candidate.index];
+      if ((!candidate.is_searched || Holds(file, words, memory)) && !take(file)) return;
+    }
   }
 
   std::vector<FileId> Defining(Text name) {
@@ -87,9 +102,11 @@ class ProjectFiles::Impl {
     if (!IsInFilters(name)) return WithWords({name});
     const WordKey word = KeyOfWord(name);
     const WordKey definition = KeyOfDefinition(name);
-    return Candidates({name}, [&](const Filter& filter) {
+    // Who asks looks into the text anyway.
+    const auto may_define = [&](const Filter& filter) {
       return MayHold(bits_.data() + filter.begin, filter.size, filter.may_define_any ? word : definition);
-    });
+    };
+    return Candidates({name}, may_define, false);
   }
 
   bool Refresh() {
@@ -279,11 +296,17 @@ class ProjectFiles::Impl {
     bits_ = std::move(bits);
   }
 
+  // A file that may hold what is asked for, and whether its text is to be searched first.
+  struct Candidate {
+    uint32_t index;
+    bool is_searched;
+  };
   // Those whose filters hold what is asked for; the bytes of buffers are searched, and of all that are left where
-  // these are few or filters do not know a word. To make all filters takes five times as long as to search all files,
-  // so the first question, whose answer somebody waits for, does without those that no index says.
+  // these are few and that narrows the answer for who wants it narrow, or filters do not know a word. To make all
+  // filters takes five times as long as to search all files, so the first question, whose answer somebody waits for,
+  // does without those that no index says.
   template <class Question>
-  std::vector<FileId> Candidates(const std::vector<Text>& words, Question&& may_be) {
+  std::vector<Candidate> CandidatesFor(const std::vector<Text>& words, Question&& may_be, bool is_narrowed = true) {
     All();
     const bool is_first = !std::exchange(was_asked_, true);
     if (is_first) {
@@ -291,40 +314,38 @@ class ProjectFiles::Impl {
     } else {
       UpdateFilters();
     }
-    std::vector<uint32_t> candidates;
-    std::vector<uint32_t> unknown;
+    std::vector<Candidate> candidates;
+    const std::vector<uint32_t> open = OpenFiles();
+    size_t filtered = 0;
     for (uint32_t i = 0; i < all_.size(); ++i) {
-      if (is_first && stamps_[i] == FileStamp()) {
-        unknown.push_back(i);
-      } else if (may_be(filters_[i])) {
-        candidates.push_back(i);
-      }
+      const bool is_unknown = (is_first && stamps_[i] == FileStamp()) || std::ranges::binary_search(open, i);
+      if (!is_unknown && !may_be(filters_[i])) continue;
+      if (!is_unknown) ++filtered;
+      candidates.push_back({i, is_unknown});
     }
     const bool are_known = std::ranges::all_of(words, IsInFilters);
-    const bool is_cheap = candidates.size() <= std::max(kMostFilesSearched, all_.size() / kShareSearched);
-    const bool are_all_searched =
-        !are_known || (is_cheap && !words.empty() && words.front().size() > kLongestWordNotSearched);
-    const std::vector<uint32_t> open = OpenFiles();
-    std::vector<uint32_t> searched = open;
-    searched.insert(searched.end(), unknown.begin(), unknown.end());
-    if (are_all_searched) {
-      searched.insert(searched.end(), candidates.begin(), candidates.end());
-      candidates.clear();
-    } else {
-      std::erase_if(candidates, [&](uint32_t i) { return std::ranges::binary_search(open, i); });
-    }
-    std::ranges::sort(searched);
-    searched.erase(std::unique(searched.begin(), searched.end()), searched.end());
-    Search(words, searched);
-    candidates.insert(candidates.end(), searched.begin(), searched.end());
-    std::ranges::sort(candidates);
-    return FilesAt(candidates);
+    const bool is_cheap = filtered <= std::max(kMostFilesSearched, all_.size() / kShareSearched);
+    if (!are_known || (is_narrowed && is_cheap && !words.empty() && words.front().size() > kLongestWordNotSearched))
+      for (Candidate& candidate : candidates) candidate.is_searched = true;
+    return candidates;
   }
 
-  std::vector<FileId> FilesAt(const std::vector<uint32_t>& indexes) const {
+  template <class Question>
+  std::vector<FileId> Candidates(const std::vector<Text>& words, Question&& may_be, bool is_narrowed = true) {
+    const std::vector<Candidate> candidates = CandidatesFor(words, may_be, is_narrowed);
+    std::vector<uint32_t> searched;
+    for (const Candidate& candidate : candidates)
+      if (candidate.is_searched) searched.push_back(candidate.index);
+    Search(words, searched);
+    auto next = searched.begin();
     std::vector<FileId> files;
-    files.reserve(indexes.size());
-    for (const uint32_t i : indexes) files.push_back(all_[i]);
+    for (const Candidate& candidate : candidates) {
+      if (!candidate.is_searched) {
+        files.push_back(all_[candidate.index]);
+      } else if (next != searched.end() && *next == candidate.index) {
+        files.push_back(all_[*next++]);
+      }
+    }
     return files;
   }
 
@@ -340,16 +361,19 @@ class ProjectFiles::Impl {
     return open;
   }
 
+  bool Holds(FileId file, const std::vector<Text>& words, std::string& memory) const {
+    ++read_count_;
+    const Text source = files_.SourceOf(file, memory);
+    CountSteps(static_cast<int64_t>(source.size() / kBytesOfAStep));
+    return std::ranges::all_of(words, [&](Text word) { return HoldsWord(source, word); });
+  }
+
   // Leaves those in which all words occur.
   void Search(const std::vector<Text>& words, std::vector<uint32_t>& files) const {
     std::vector<char> holds(files.size());
     std::array<std::string, 2> memories;
-    ForEachByThreads(files.size(), kFilesWorthAThread, memories, [&](size_t i, std::string& memory) {
-      ++read_count_;
-      const Text source = files_.SourceOf(all_[files[i]], memory);
-      CountSteps(static_cast<int64_t>(source.size() / kBytesOfAStep));
-      holds[i] = std::ranges::all_of(words, [&](Text word) { return HoldsWord(source, word); });
-    });
+    ForEachByThreads(files.size(), kFilesWorthAThread, memories,
+                     [&](size_t i, std::string& memory) { holds[i] = Holds(all_[files[i]], words, memory); });
     size_t kept = 0;
     for (size_t i = 0; i < files.size(); ++i) {
       if (holds[i] != 0) files[kept++] = files[i];
@@ -383,6 +407,7 @@ ProjectFiles::~ProjectFiles() = default;
 
 const std::vector<FileId>& ProjectFiles::All() { return impl_->All(); }
 std::vector<FileId> ProjectFiles::WithWords(const std::vector<Text>& words) { return impl_->WithWords(words); }
+void ProjectFiles::EachWithWord(Text word, const std::function<bool(FileId)>& take) { impl_->EachWithWord(word, take); }
 std::vector<FileId> ProjectFiles::Defining(Text name) { return impl_->Defining(name); }
 bool ProjectFiles::Refresh() { return impl_->Refresh(); }
 void ProjectFiles::Forget() { impl_->Forget(); }

@@ -6,6 +6,7 @@
 // are.
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <string>
 #include <vector>
@@ -30,6 +31,9 @@ class ProjectFiles {
   // Those in which all the words are names, in the order of their paths, and maybe more: those that hold them as whole
   // words anywhere. Nothing is analysed.
   std::vector<FileId> WithWords(const std::vector<Text>& words);
+  // The same files one after the other, until `take` has enough and gives false: no more are searched. `take` asks
+  // nothing of the project.
+  void EachWithWord(Text word, const std::function<bool(FileId)>& take);
   // Those in which a name may be defined as a function, a class, a variable or an attribute that is assigned: all in
   // which it is, and some more. By an import or as a parameter is not counted.
   std::vector<FileId> Defining(Text name);

@@ -120,7 +120,7 @@ void Workspace::Impl::AddMembers(Value receiver, Text prefix, std::vector<Comple
         for (const MadeField& field : info.fields) add(field.name, "attribute", info.name);
     }
   };
-  for (const TypeId id : inference.types().CopyOf(receiver.set)) {
+  for (const TypeId id : InOrder(receiver.set)) {
     const Type t = inference.types()[id];
     if (t.kind == TypeKind::kModule) {
       AddModuleNames(t.a, prefix, found, true);
@@ -321,6 +321,7 @@ bool Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text 
     }
   }
   bool is_full = true, is_any = false;
+  const Value callee = inference.ValueOf(file.id, syntax.ChildOf(expr, 0));
   const auto add = [&](FunctionId function, bool is_bound) {
     const FunctionInfo info = inference.function(function);
     const SourceFile* source = Get(info.file);
@@ -341,18 +342,17 @@ bool Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text 
       if (given.contains(name) || i < first_keyword) continue;
       if (!name.empty() && Fits(name, prefix))
         found.push_back(
-            {std::string(name) + "=", "parameter", TextOfParameter(info, i, true), {}, Certainty::kCertain});
+            {std::string(name) + "=", "parameter", TextOfParameter(info, i, true), {}, CertaintyOf(callee.doubt)});
     }
     is_full = is_full && !takes_more;
     is_any = true;
   };
-  const Value callee = inference.ValueOf(file.id, syntax.ChildOf(expr, 0));
   const auto add_all = [&](Value value, bool is_bound) {
-    for (const TypeId id : inference.types().CopyOf(value.set))
+    for (const TypeId id : InOrder(value.set))
       if (inference.types()[id].kind == TypeKind::kFunction)
         add(inference.types()[id].a, is_bound || inference.types()[id].args_count > 0);
   };
-  for (const TypeId id : inference.types().CopyOf(callee.set)) {
+  for (const TypeId id : InOrder(callee.set)) {
     const Type t = inference.types()[id];
     if (t.kind == TypeKind::kFunction) add_all(inference.Just(id), false);
     if (t.kind == TypeKind::kInstance) add_all(inference.AttributeOf(inference.Just(id), "__call__"), true);
@@ -361,7 +361,7 @@ bool Workspace::Impl::AddKeywords(const SourceFile& file, uint32_t offset, Text 
       if (!info.fields.empty()) {
         for (const MadeField& field : info.fields)
           if (Fits(field.name, prefix))
-            found.push_back({std::string(field.name) + "=", "parameter", {}, {}, Certainty::kCertain});
+            found.push_back({std::string(field.name) + "=", "parameter", {}, {}, CertaintyOf(callee.doubt)});
       } else {
         add_all(inference.AttributeOf(inference.Just(inference.InstanceOf(t.a)), "__init__"), true);
       }

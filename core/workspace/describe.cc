@@ -1,6 +1,7 @@
 // Types, signatures and documentation as text.
 #include <algorithm>
 #include <cctype>
+#include <tuple>
 
 #include "program/blanks.h"
 #include "tokens/token_ends.h"
@@ -98,6 +99,39 @@ std::string Workspace::Impl::TextOfType(TypeId id, bool is_short, int depth) {
              TextOfSet(inference.types().ArgOf(id, 0), is_short, depth + 1);
   }
   return {};
+}
+
+std::vector<TypeId> Workspace::Impl::InOrder(TypeSetId set) {
+  struct Keyed {
+    std::string path;
+    uint32_t offset = 0;
+    std::string text;
+    TypeId type;
+  };
+  std::vector<Keyed> keyed;
+  for (const TypeId type : inference.types().CopyOf(set)) {
+    Keyed& key = keyed.emplace_back();
+    key.type = type;
+    if (inference.types().SizeOf(set) == 1) break;
+    key.text = TextOfType(type);
+    const Type t = inference.types()[type];
+    const auto place = [&](FileId id, StmtId stmt, ExprId expr) {
+      const SourceFile* file = Get(id);
+      key.path = files.PathOf(id);
+      if (file != nullptr) key.offset = expr != kNoExpr ? file->syntax[expr].begin : file->syntax.stmt(stmt).begin;
+    };
+    if (t.kind == TypeKind::kFunction) {
+      const FunctionInfo info = inference.function(t.a);
+      place(info.file, info.stmt, info.lambda);
+    } else if (t.kind == TypeKind::kInstance || t.kind == TypeKind::kClass) {
+      const ClassInfo& info = inference.InfoOf(t.a);
+      place(info.file, info.stmt, info.call);
+    }
+  }
+  std::ranges::stable_sort(keyed, {}, [](const Keyed& key) { return std::tie(key.path, key.offset, key.text); });
+  std::vector<TypeId> types;
+  for (const Keyed& key : keyed) types.push_back(key.type);
+  return types;
 }
 
 std::vector<std::string> Workspace::Impl::TextsOf(Value value, bool is_short) {
@@ -367,7 +401,7 @@ std::vector<std::string> Workspace::Types(FileId id, uint32_t offset) {
 void Workspace::Impl::Describe(Value value, Text name, Hover& hover) {
   hover.types = TextsOf(value);
   hover.certainty = CertaintyOf(value.doubt);
-  for (const TypeId type : inference.types().CopyOf(value.set)) {
+  for (const TypeId type : InOrder(value.set)) {
     const Type t = inference.types()[type];
     if (hover.documentation.empty()) hover.documentation = DocumentationOf(type);
     std::string line;
@@ -379,7 +413,7 @@ void Workspace::Impl::Describe(Value value, Text name, Hover& hover) {
       if (const auto constructor = inference.FindMember(t.a, "__init__");
           constructor && constructor->owner != inference.ClassNamed("builtins", "object")) {
         const Value init = inference.AttributeOf(inference.Just(inference.InstanceOf(t.a)), "__init__");
-        for (const TypeId function : inference.types().CopyOf(init.set)) {
+        for (const TypeId function : InOrder(init.set)) {
           if (inference.types()[function].kind != TypeKind::kFunction) continue;
           const std::string signature = TextOfFunction(inference.types()[function].a, true, false, true);
           const size_t open = signature.find('('), arrow = signature.rfind(" -> ");
@@ -518,14 +552,14 @@ std::vector<Signature> Workspace::Signatures(FileId id, uint32_t offset) {
     found.push_back(std::move(signature));
   };
   const auto add_functions = [&](Value value, bool is_bound, Text name) {
-    for (const TypeId type : in.inference.types().CopyOf(value.set)) {
+    for (const TypeId type : in.InOrder(value.set)) {
       const Type t = in.inference.types()[type];
       if (t.kind == TypeKind::kFunction) add(t.a, is_bound || t.args_count > 0, name);
     }
   };
   const Text written =
       syntax.NameOf(children[0]).empty() ? syntax.TextOf(syntax[children[0]]) : syntax.NameOf(children[0]);
-  for (const TypeId type : in.inference.types().CopyOf(callee.set)) {
+  for (const TypeId type : in.InOrder(callee.set)) {
     const Type t = in.inference.types()[type];
     if (t.kind == TypeKind::kFunction) {
       add(t.a, t.args_count > 0, written);

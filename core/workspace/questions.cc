@@ -149,16 +149,11 @@ std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
   const auto [at, is_new] = calls_by_name_.try_emplace(key);
   if (!is_new) return at->second;
   std::vector<ExprPlace> calls;
-  std::vector<FileId> candidates;
-  if (IsProject(function.file)) candidates = project.WithWords({name});
-  std::erase(candidates, function.file);
-  candidates.insert(candidates.begin(), function.file);
   size_t count = 0;  // of files that have the name
-  for (const FileId id : candidates) {
-    if (calls.size() >= kMaxCalls || count >= kMaxFiles) break;
+  const auto look = [&](FileId id) {
     const SourceFile* file = inference.FileOf(id);
     const uint32_t number = file == nullptr ? kNoIndex : NumberOfText(file->bindings, name);
-    if (number == kNoIndex) continue;
+    if (number == kNoIndex) return;
     ++count;
     for (const Occurrence& occurrence : file->bindings.occurrences) {
       if (occurrence.text != number) continue;
@@ -174,6 +169,14 @@ std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
       if (call != kNoExpr && file->syntax[call].kind == ExprKind::kCall && file->syntax.ChildOf(call, 0) == named)
         calls.push_back({id, call});
     }
+  };
+  const auto is_enough = [&] { return calls.size() >= kMaxCalls || count >= kMaxFiles; };
+  look(function.file);
+  if (IsProject(function.file) && !is_enough()) {
+    project.EachWithWord(name, [&](FileId id) {
+      if (id != function.file) look(id);
+      return !is_enough();
+    });
   }
   calls_by_name_[key] = calls;
   return calls;

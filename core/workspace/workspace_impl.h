@@ -126,6 +126,8 @@ class Workspace::Impl final : public CallerSource {
   std::string TextOfType(TypeId type, bool is_short = false, int depth = 0);
   std::string TextOfSet(TypeSetId set, bool is_short = false, int depth = 0);
   std::vector<std::string> TextsOf(Value value, bool is_short = false);
+  // Types by where they are defined: their numbers say what was met first.
+  std::vector<TypeId> InOrder(TypeSetId set);
   std::string TextOfFunction(FunctionId function, bool is_bound, bool has_name, bool is_short, int depth = 0);
   std::string TextOfParameter(const FunctionInfo& info, size_t index, bool is_short);
   // The text, the documentation and the types of what a name stands for.

@@ -361,6 +361,50 @@ def test_edits_keep_the_encoding(tmp_path: Path) -> None:
         edited_files([Edit(str(file), 2, 9, 10, "中")])
 
 
+# ---- whatever was asked before ----
+
+
+def test_answers_within_bounds_are_the_same_in_any_order() -> None:
+    """Of a program that is large enough for types to be met in many orders: this package."""
+    folder = Path(quillet.__file__).parent
+    random = Random(1)
+    questions = []
+    for path in sorted(folder.rglob("*.py")):
+        names = [
+            name for name in quillet.bind(path.read_bytes()).occurrences if name.is_attribute or name.column % 5 == 0
+        ]
+        for name in random.sample(names, min(12, len(names))):
+            for question in ("definitions", "complete", "types", "hover", "signatures"):
+                questions.append((question, path, name.line, name.column))
+    assert len(questions) > 1000
+
+    def answers() -> dict[object, object]:
+        workspace = Workspace(folder, version=(3, 12))
+        given: dict[object, object] = {}
+        for question in questions:
+            answer = getattr(workspace, question[0])(*question[1:])
+            given[question] = "bounded" if workspace.was_bounded else answer
+        return given
+
+    first = answers()
+    random.shuffle(questions)
+    second = answers()
+    within = [each for each in questions if "bounded" not in (first[each], second[each])]
+    assert len(within) > 0.98 * len(questions)
+    assert [each for each in within if first[each] != second[each]] == []
+
+
+def test_keywords_of_a_function_that_is_guessed_are_no_more_than_likely(tmp_path: Path) -> None:
+    workspace = Workspace(tmp_path, version=(3, 12))
+    path = tmp_path / "a.py"
+    text = "def f(price): pass\ndef g(h):\n  h()\ng(f)\nf()\n"
+    workspace.open(path, text)
+    found = {item.name: item.certainty for item in workspace.complete(path, 3, 5)}
+    assert found["price="] == "likely"
+    found = {item.name: item.certainty for item in workspace.complete(path, 5, 3)}
+    assert found["price="] == "certain"
+
+
 # ---- with an index ----
 
 

@@ -25,6 +25,22 @@ TEST(Files, HaveOneNumberForAPath) {
   EXPECT_EQ(files.PathOf(files.NumberOf("/..")), "/");
 }
 
+TEST(Files, SayWhatIsHeldOfAStamp) {
+  const TemporaryFolder folder = {{"a.py", "x = 1\n"}};
+  Files files(Version::Of(3, 12));
+  const FileId a = files.NumberOf(folder / "a.py");
+  const FileStamp stamp = StampOf(folder / "a.py");
+  EXPECT_EQ(files.HeldAs(a, stamp), nullptr);
+  const SourceFile* held = files.Get(a);
+  EXPECT_EQ(files.HeldAs(a, stamp), held);
+  folder.Write("a.py", "x, y = 1, 2\n");
+  EXPECT_EQ(files.HeldAs(a, StampOf(folder / "a.py")), nullptr);
+  files.Open(a, "z = 1\n");
+  EXPECT_EQ(files.HeldAs(a, stamp), nullptr);
+  held = files.Get(a);
+  EXPECT_EQ(files.HeldAs(a, {}), held);
+}
+
 TEST(Files, AreReadAgainWhereTheyChanged) {
   const TemporaryFolder folder = {{"a.py", "x = 1\n"}, {"b.py", "y = 1\n"}};
   Files files(Version::Of(3, 12));

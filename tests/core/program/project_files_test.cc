@@ -347,6 +347,30 @@ TEST(ProjectFiles, ReadNothingThatAnIndexKnows) {
   EXPECT_EQ(at.Ask("us", {"many"}).read_first, Indexed::kFiles - 3) << "that of a root alone";
 }
 
+TEST(ProjectFiles, AreGivenOneAfterTheOtherUntilThereAreEnough) {
+  Indexed at;
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {at.folder.path()});
+  for (int round = 0; round < 2; ++round) {
+    std::vector<FileId> found;
+    const size_t before = project.read_count();
+    project.EachWithWord("total", [&](FileId file) {
+      found.push_back(file);
+      return found.size() < 2;
+    });
+    EXPECT_EQ(Below(at.folder, files, found), (Paths{"a.py", "b.py"}));
+    if (round == 0) {
+      EXPECT_EQ(project.read_count() - before, 2u);
+    }
+    found.clear();
+    project.EachWithWord("total", [&](FileId file) {
+      found.push_back(file);
+      return true;
+    });
+    EXPECT_EQ(found, project.WithWords({"total"}));
+  }
+}
+
 TEST(ProjectFiles, ReadWhatIsNotAsAnIndexKnowsIt) {
   Indexed at;
   at.folder.Write("broken.py", "x = (1\n");
