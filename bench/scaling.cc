@@ -12,6 +12,9 @@
 //   quillet_scaling --pairs             all pairs of fragments, repeated
 //   quillet_scaling --random N [SEED]   N random sequences of fragments, repeated, half of them behind a front
 //   --count N                           each unit of the list N times, once: whether it ends, whatever it costs
+//   --phase NAME                        this column alone
+//   --slow SECONDS                      names the questions to a workspace that take longer
+//   --seconds N                         ends an input of a count behind so many
 //   --size KIB, --stack KIB, --only TEXT, --list
 //
 // Time is that of the processor. It is taken again where it looks bad, since other processes disturb it.
@@ -35,6 +38,7 @@
 #include "output/json_lines.h"
 #include "output/text_lines.h"
 #include "syntax/reader.h"
+#include "tests/core/support/small_library.h"
 #include "workspace/questions.h"
 
 namespace quillet::bench {
@@ -576,8 +580,8 @@ std::string Shown(const std::string& text) {
 
 // ---- one measurement, in a process of its own ----
 
-constexpr int kPhases = 7;
-constexpr const char* kPhaseNames[kPhases] = {"3.12", "2.7", "output", "text", "syntax", "names", "asked"};
+constexpr int kPhases = 8;
+constexpr const char* kPhaseNames[kPhases] = {"3.12", "2.7", "whole", "output", "text", "syntax", "names", "asked"};
 
 struct Costs {
   double seconds[kPhases][2];
@@ -586,11 +590,12 @@ struct Costs {
   bool refused;      // the larger one: it takes more memory than a source may
 };
 
-FileAnalyzer::Options OptionsFor(bool py3) {
+FileAnalyzer::Options OptionsFor(bool py3, bool reads_completely = false) {
   const std::string folder = QUILLET_SOURCE_DIR "/resources/pgen-grammars/";
   FileAnalyzer::Options options;
   options.version = py3 ? Version::Of(3, 12) : Version::Of(2, 7);
   options.py3_grammar = py3;
+  options.reads_completely = reads_completely;
   options.grammar_file = folder + (py3 ? kPy3DefaultGrammar : kPy2DefaultGrammar);
   options.hint_grammar_file = folder + kPy3DefaultGrammar;
   for (const Text keyword : py3 ? Py3Keywords() : Py27Keywords()) options.keywords.emplace_back(keyword);
@@ -614,6 +619,7 @@ double PeakBytes() {
 struct Tools {
   FileAnalyzer py3{OptionsFor(true)};
   FileAnalyzer py2{OptionsFor(false)};
+  FileAnalyzer whole{OptionsFor(true, true)};
   std::unique_ptr<FileWriter> json = MakeJsonLinesWriter({});
   std::unique_ptr<FileWriter> text = MakeTextLinesWriter({});
   RecordTableMaker tables;
@@ -691,37 +697,59 @@ void BindNames(Text text) {
   for (const Version version : {Version::Of(3, 12), Version::Of(2, 7)}) NameBinder(version).Bind(text);
 }
 
+// Questions that take longer are named on standard error; 0 for none of them.
+double g_slow_seconds = 0;
+
 void Ask(Text text) {
   constexpr uint32_t kPlaces = 4;
   Workspace::Settings settings;
   settings.roots = {"/nowhere"};
   settings.version = Version::Of(3, 12);
+  settings.typeshed = testing::SmallLibrary();
   Workspace workspace(std::move(settings));
+  const auto timed = [](const char* name, uint32_t at, const auto& question) {
+    const double begin = ProcessorSeconds();
+    (void)question();
+    const double seconds = ProcessorSeconds() - begin;
+    if (g_slow_seconds > 0 && seconds > g_slow_seconds) std::fprintf(stderr, "  %s at %u: %.2f s\n", name, at, seconds);
+  };
   const FileId file = workspace.FileOf("/nowhere/a.py");
-  workspace.Open(file, std::string(text));
+  timed("Open", 0, [&] {
+    workspace.Open(file, std::string(text));
+    return workspace.CanRead(file);
+  });
   for (uint32_t i = 0; i <= kPlaces; ++i) {
     const auto place = static_cast<uint32_t>(text.size() * i / kPlaces);
     for (const uint32_t at : {place, place == 0 ? 0 : place - 1}) {
-      (void)workspace.Definitions(file, at);
-      (void)workspace.References(file, at);
-      (void)workspace.HoverAt(file, at);
-      (void)workspace.Signatures(file, at);
-      (void)workspace.Complete(file, at);
-      (void)workspace.Selections(file, at);
-      (void)workspace.RenameTo(file, at, "renamed");
+      timed("Definitions", at, [&] { return workspace.Definitions(file, at); });
+      timed("TypeDefinitions", at, [&] { return workspace.TypeDefinitions(file, at); });
+      timed("Declarations", at, [&] { return workspace.Declarations(file, at); });
+      timed("Implementations", at, [&] { return workspace.Implementations(file, at); });
+      timed("References", at, [&] { return workspace.References(file, at); });
+      timed("Types", at, [&] { return workspace.Types(file, at); });
+      timed("HoverAt", at, [&] { return workspace.HoverAt(file, at); });
+      timed("Signatures", at, [&] { return workspace.Signatures(file, at); });
+      timed("Complete", at, [&] { return workspace.Complete(file, at); });
+      timed("Callers", at, [&] { return workspace.Callers(file, at); });
+      timed("Callees", at, [&] { return workspace.Callees(file, at); });
+      timed("Supertypes", at, [&] { return workspace.Supertypes(file, at); });
+      timed("Selections", at, [&] { return workspace.Selections(file, at); });
+      timed("RenameTo", at, [&] { return workspace.RenameTo(file, at, "renamed"); });
     }
   }
-  (void)workspace.Outline(file);
-  (void)workspace.Problems(file);
-  (void)workspace.Folds(file);
-  (void)workspace.Colours(file);
-  (void)workspace.Hints(file);
+  timed("Outline", 0, [&] { return workspace.Outline(file); });
+  timed("Problems", 0, [&] { return workspace.Problems(file); });
+  timed("Folds", 0, [&] { return workspace.Folds(file); });
+  timed("Colours", 0, [&] { return workspace.Colours(file); });
+  timed("Hints", 0, [&] { return workspace.Hints(file); });
+  timed("Symbols", 0, [&] { return workspace.Symbols("a"); });
 }
 
 // One measurement at a count, or two: at that of a size and of four times that size.
 struct Amount {
   size_t size;
-  size_t count;  // 0 stands for that of the size
+  size_t count;    // 0 stands for that of the size
+  int phase = -1;  // -1 stands for all
 };
 
 Costs MeasureHere(const Shape& shape, Amount amount) {
@@ -743,6 +771,7 @@ Costs MeasureHere(const Shape& shape, Amount amount) {
             is_analysed = true;
           },
           [&] { tools.py2.Analyze(text); },
+          [&] { tools.whole.Analyze(text); },
           [&] {
             if (is_analysed) WriteAll(tools.py3);
           },
@@ -752,6 +781,7 @@ Costs MeasureHere(const Shape& shape, Amount amount) {
           [&] { Ask(text); },
       };
       for (int phase = 0; phase < kPhases; ++phase) {
+        if (amount.phase != -1 && phase != amount.phase) continue;
         const double begin = ProcessorSeconds();
         costs.refused |= IsRefused(phases[phase]);
         costs.seconds[phase][step] = ProcessorSeconds() - begin;
@@ -776,7 +806,7 @@ void* RunJob(void* argument) {
   return nullptr;
 }
 
-constexpr unsigned kMostSeconds = 1800;  // for a count
+unsigned g_most_seconds = 1800;  // for a count
 
 // Empty, or what became of the process.
 std::string Measure(const Shape& shape, Amount amount, size_t stack, Costs& costs) {
@@ -785,7 +815,7 @@ std::string Measure(const Shape& shape, Amount amount, size_t stack, Costs& cost
   const pid_t child = fork();
   if (child == 0) {
     close(ends[0]);
-    if (amount.count != 0) alarm(kMostSeconds);
+    if (amount.count != 0) alarm(g_most_seconds);
     Job job{&shape, amount, ends[1]};
     pthread_attr_t attributes;
     pthread_attr_init(&attributes);
@@ -808,7 +838,7 @@ std::string Measure(const Shape& shape, Amount amount, size_t stack, Costs& cost
 // ---- judging ----
 
 struct Limits {
-  Amount amount = {256 << 10, 0};
+  Amount amount = {256 << 10, 0, -1};
   size_t stack = 512 << 10;
   double growth = 2;          // of the cost of a byte, from a size to four times that size
   double least = 15;          // ns a byte: below it nothing but noise and caches make the growth
@@ -881,19 +911,28 @@ int Main(int argc, char** argv) {
       limits.stack = value() << 10;
     } else if (option == "--only" && i + 1 < argc) {
       only = argv[++i];
+    } else if (option == "--phase" && i + 1 < argc) {
+      const Text name = argv[++i];
+      const auto found = std::ranges::find(kPhaseNames, name, [](const char* each) { return Text(each); });
+      limits.amount.phase = static_cast<int>(found - std::begin(kPhaseNames));
+    } else if (option == "--seconds") {
+      g_most_seconds = static_cast<unsigned>(value());
+    } else if (option == "--slow" && i + 1 < argc) {
+      g_slow_seconds = std::strtod(argv[++i], nullptr);
     } else if (option == "--list") {
       for (const Shape& shape : Shapes()) std::printf("%-44s %s\n", shape.name.c_str(), Shown(shape.unit).c_str());
       return 0;
     } else {
       std::fprintf(stderr,
                    "usage: quillet_scaling [--pairs | --random N [SEED]] [--size KIB | --count N] [--stack KIB] "
-                   "[--only TEXT] [--list]\n");
+                   "[--only TEXT] [--phase NAME] [--slow SECONDS] [--seconds N] [--list]\n");
       return 2;
     }
   }
   TheConsole().print_line = [](Text) {};
   TheConsole().report_exception = [](const std::exception_ptr&, bool) {};
   TheTools();
+  testing::SmallLibrary();
 
   size_t tried = 0, bad = 0;
   std::printf("%-44s", "input");

@@ -8,10 +8,23 @@ bool ContinuesChain(StmtKind kind) {
   return kind == StmtKind::kElif || kind == StmtKind::kElse || kind == StmtKind::kExcept || kind == StmtKind::kFinally;
 }
 
-bool BlockLeaves(const FileSyntax& syntax, StmtId owner, bool counts_jumps) {
-  StmtId last = syntax.stmt(owner).first_child;
-  if (last == kModuleStmt) return false;
+namespace {
+
+// The last statement of a block that has any: the one around the last that begins in it.
+StmtId LastOf(const FileSyntax& syntax, StmtId owner) {
+  const auto behind = std::ranges::lower_bound(syntax.stmts.begin() + owner + 1, syntax.stmts.end(),
+                                               syntax.stmt(owner).block_end, {}, &Stmt::begin);
+  auto last = static_cast<StmtId>(behind - syntax.stmts.begin() - 1);
+  while (last != owner && syntax.stmt(last).parent != owner) last = syntax.stmt(last).parent;
+  if (last == owner) last = syntax.stmt(owner).first_child;
   while (syntax.stmt(last).next != kModuleStmt) last = syntax.stmt(last).next;
+  return last;
+}
+
+// `blocks`: at the ends of how many blocks may be looked.
+bool BlockLeaves(const FileSyntax& syntax, StmtId owner, bool counts_jumps, int& blocks) {
+  if (syntax.stmt(owner).first_child == kModuleStmt || --blocks < 0) return false;
+  const StmtId last = LastOf(syntax, owner);
   const Stmt& stmt = syntax.stmt(last);
   switch (stmt.kind) {
     case StmtKind::kReturn:
@@ -20,11 +33,11 @@ bool BlockLeaves(const FileSyntax& syntax, StmtId owner, bool counts_jumps) {
     case StmtKind::kPass:
       return counts_jumps && (stmt.op == word::kBreak || stmt.op == word::kContinue);
     case StmtKind::kWith:
-      return BlockLeaves(syntax, last, counts_jumps);
+      return BlockLeaves(syntax, last, counts_jumps, blocks);
     case StmtKind::kElse: {
       StmtId clause = last;
       for (;;) {
-        if (!BlockLeaves(syntax, clause, counts_jumps)) return false;
+        if (!BlockLeaves(syntax, clause, counts_jumps, blocks)) return false;
         const StmtKind kind = syntax.stmt(clause).kind;
         if (kind == StmtKind::kIf) return true;
         if (kind != StmtKind::kElse && kind != StmtKind::kElif) return false;
@@ -35,6 +48,13 @@ bool BlockLeaves(const FileSyntax& syntax, StmtId owner, bool counts_jumps) {
     default:
       return false;
   }
+}
+
+}  // namespace
+
+bool BlockLeaves(const FileSyntax& syntax, StmtId owner, bool counts_jumps) {
+  int blocks = 4096;
+  return BlockLeaves(syntax, owner, counts_jumps, blocks);
 }
 
 bool MayEnd(const FileSyntax& syntax, StmtId owner, const std::function<int(ExprId)>& truth,
@@ -142,7 +162,8 @@ void Flow::Add(uint32_t offset) {
 }
 
 void Flow::All(uint32_t begin, uint32_t end) {
-  for (size_t i = FirstAt(begin); i < bindings_.size() && bindings_[i] < end; ++i) Add(bindings_[i]);
+  for (size_t i = FirstAt(begin); i < bindings_.size() && bindings_[i] < end && reached_->size() < kMaxBindings; ++i)
+    Add(bindings_[i]);
 }
 
 int Flow::TruthOf(StmtId clause) const {
@@ -150,8 +171,8 @@ int Flow::TruthOf(StmtId clause) const {
   return exprs.empty() ? -1 : truth_(exprs[0]);
 }
 
-StmtId Flow::HeadOfChain(StmtId stmt) const {
-  while (ContinuesChain(syntax_.stmt(stmt).kind) && syntax_.stmt(stmt).previous != kModuleStmt)
+StmtId Flow::HeadOfChain(StmtId stmt) {
+  while (ContinuesChain(syntax_.stmt(stmt).kind) && syntax_.stmt(stmt).previous != kModuleStmt && MayLook())
     stmt = syntax_.stmt(stmt).previous;
   return stmt;
 }
@@ -181,7 +202,7 @@ bool Flow::Head(StmtId id, bool holds) {
 
 bool Flow::Bound(uint32_t begin, uint32_t end, uint32_t place, bool holds) {
   bool is_sure = false;
-  for (size_t i = FirstAt(begin); i < bindings_.size() && bindings_[i] < end; ++i) {
+  for (size_t i = FirstAt(begin); i < bindings_.size() && bindings_[i] < end && MayLook(); ++i) {
     Add(bindings_[i]);
     is_sure = is_sure || IsSure(bindings_[i], place, holds);
   }
@@ -189,13 +210,14 @@ bool Flow::Bound(uint32_t begin, uint32_t end, uint32_t place, bool holds) {
 }
 
 // What stands behind `and`, in a branch of `a if b else c` or in a comprehension's loop need not be evaluated.
-bool Flow::IsSure(uint32_t binding, uint32_t place, bool holds) const {
+bool Flow::IsSure(uint32_t binding, uint32_t place, bool holds) {
   const auto is_and = [&](ExprId expr) {
     return syntax_[expr].kind == ExprKind::kBoolean && syntax_[expr].op == word::kAnd;
   };
   for (ExprId expr = syntax_.NamedAt(binding); expr != kNoExpr; expr = syntax_[expr].parent) {
     const ExprId parent = syntax_[expr].parent;
     if (parent == kNoExpr) return true;
+    if (!MayLook()) return false;
     const Expr& around = syntax_[parent];
     const bool holds_place = around.begin <= place && place < around.end;
     switch (around.kind) {
@@ -206,13 +228,13 @@ bool Flow::IsSure(uint32_t binding, uint32_t place, bool holds) const {
         if (holds_place || syntax_.ChildOf(parent, 0) == expr) break;
         // `a or b or c` is `(a or b) or c`.
         ExprId at = parent;
-        for (ExprId up = syntax_[at].parent;
-             syntax_[up].kind == ExprKind::kBoolean && syntax_[up].op == around.op && syntax_.ChildOf(up, 0) == at;
+        for (ExprId up = syntax_[at].parent; syntax_[up].kind == ExprKind::kBoolean && syntax_[up].op == around.op &&
+                                             syntax_.ChildOf(up, 0) == at && MayLook();
              up = syntax_[at].parent)
           at = up;
         if (syntax_[at].begin <= place && place < syntax_[at].end) return true;
         at = parent;
-        while (holds && at != kNoExpr && is_and(at)) at = syntax_[at].parent;
+        while (holds && at != kNoExpr && is_and(at) && MayLook()) at = syntax_[at].parent;
         if (!holds || at != kNoExpr) return false;
         break;
       }
@@ -240,7 +262,7 @@ bool Flow::Leaves(StmtId owner) const { return BlockLeaves(syntax_, owner, true)
 bool Flow::Jumps(StmtId loop, uint16_t word, bool* has_any) {
   const Stmt& head = syntax_.stmt(loop);
   bool is_bound = true;
-  for (StmtId id = loop + 1; id < syntax_.stmts.size() && syntax_.stmt(id).begin < head.block_end; ++id) {
+  for (StmtId id = loop + 1; id < syntax_.stmts.size() && syntax_.stmt(id).begin < head.block_end && MayLook(); ++id) {
     if (syntax_.stmt(id).kind != StmtKind::kPass || syntax_.stmt(id).op != word) continue;
     StmtId around = syntax_.stmt(id).parent;
     const auto is_around = [&](StmtKind kind) {
@@ -266,7 +288,7 @@ void Flow::BackEdges(StmtId loop) {
 Flow::Outcome Flow::BlockEnd(StmtId owner) {
   if (Leaves(owner)) return Outcome::kLeaves;
   uint32_t end = syntax_.stmt(owner).block_end;
-  while (const StmtId last = LastIn(owner, end)) {
+  while (const StmtId last = MayLook() ? LastIn(owner, end) : kModuleStmt) {
     const StmtId head = HeadOfChain(last);
     if (Group(head) == Outcome::kAlways) return Outcome::kAlways;
     end = InFrontOf(head, end);
@@ -277,7 +299,8 @@ Flow::Outcome Flow::BlockEnd(StmtId owner) {
 Flow::Outcome Flow::Group(StmtId head) {
   const Stmt& stmt = syntax_.stmt(head);
   const auto clauses = [&](auto&& visit) {
-    for (StmtId at = stmt.next; at != kModuleStmt && ContinuesChain(syntax_.stmt(at).kind); at = syntax_.stmt(at).next)
+    for (StmtId at = stmt.next; at != kModuleStmt && ContinuesChain(syntax_.stmt(at).kind) && MayLook();
+         at = syntax_.stmt(at).next)
       visit(at, syntax_.stmt(at).kind);
   };
   switch (stmt.kind) {
@@ -346,7 +369,7 @@ Flow::Outcome Flow::Group(StmtId head) {
     }
     case StmtKind::kMatch: {
       bool always = true, is_exhaustive = false;
-      for (StmtId at = stmt.first_child; at != kModuleStmt; at = syntax_.stmt(at).next) {
+      for (StmtId at = stmt.first_child; at != kModuleStmt && MayLook(); at = syntax_.stmt(at).next) {
         const bool in_head = Head(at);
         if (BlockEnd(at) == Outcome::kMaybe && !in_head) always = false;
         const auto exprs = syntax_.ExprsOf(syntax_.stmt(at));
@@ -376,7 +399,8 @@ bool Flow::Above(StmtId clause) {
 bool Flow::Chain(StmtId clause) {
   const StmtKind own = syntax_.stmt(clause).kind;
   if (!ContinuesChain(own)) return false;
-  for (StmtId at = clause; ContinuesChain(syntax_.stmt(at).kind) && syntax_.stmt(at).previous != kModuleStmt;) {
+  for (StmtId at = clause;
+       ContinuesChain(syntax_.stmt(at).kind) && syntax_.stmt(at).previous != kModuleStmt && MayLook();) {
     at = syntax_.stmt(at).previous;
     const Stmt& other = syntax_.stmt(at);
     switch (other.kind) {
@@ -408,7 +432,7 @@ bool Flow::Before(StmtId stmt, StmtId top) {
   for (;;) {
     const StmtId owner = syntax_.stmt(stmt).parent;
     uint32_t end = syntax_.stmt(HeadOfChain(stmt)).begin;
-    while (const StmtId last = LastIn(owner, end)) {
+    while (const StmtId last = MayLook() ? LastIn(owner, end) : kModuleStmt) {
       const StmtId head = HeadOfChain(last);
       if (Group(head) == Outcome::kAlways) return true;
       end = InFrontOf(head, end);
@@ -433,7 +457,7 @@ bool Flow::Reach(uint32_t offset, StmtId top, std::vector<uint32_t>& reached) {
         stmt.kind != StmtKind::kAnnotated && stmt.kind != StmtKind::kDef && stmt.kind != StmtKind::kClass) {
       is_bound = Bound(stmt.begin, end, offset);
     } else {
-      for (size_t i = FirstAt(stmt.begin); i < bindings_.size() && bindings_[i] < end; ++i) {
+      for (size_t i = FirstAt(stmt.begin); i < bindings_.size() && bindings_[i] < end && MayLook(); ++i) {
         const ExprId named = syntax_.NamedAt(bindings_[i]);
         if (named == kNoExpr || syntax_[syntax_[named].parent].kind != ExprKind::kNamed) continue;
         is_bound = Bound(bindings_[i], bindings_[i] + 1, offset) || is_bound;
@@ -441,6 +465,14 @@ bool Flow::Reach(uint32_t offset, StmtId top, std::vector<uint32_t>& reached) {
     }
     if (!is_bound && stmt.kind == StmtKind::kWhile) BackEdges(at);
     is_bound = is_bound || Chain(at) || Before(at, top);
+  }
+  return End(is_bound, offset, reached);
+}
+
+bool Flow::End(bool is_bound, uint32_t end, std::vector<uint32_t>& reached) {
+  if (looks_ > kMaxLooks) {
+    for (size_t i = FirstAt(end); i-- > 0 && reached.size() < kMaxBindings;) Add(bindings_[i]);
+    is_bound = false;
   }
   std::ranges::sort(reached);
   return is_bound;
@@ -451,7 +483,7 @@ bool Flow::ReachEnd(StmtId top, std::vector<uint32_t>& reached) {
   steps_ = kMaxLoops;
   uint32_t end = top == kModuleStmt ? static_cast<uint32_t>(file_.source->size()) + 1 : syntax_.stmt(top).block_end;
   bool is_bound = false;
-  while (const StmtId last = LastIn(top, end)) {
+  while (const StmtId last = MayLook() ? LastIn(top, end) : kModuleStmt) {
     const StmtId head = HeadOfChain(last);
     if (Group(head) == Outcome::kAlways) {
       is_bound = true;
@@ -459,8 +491,7 @@ bool Flow::ReachEnd(StmtId top, std::vector<uint32_t>& reached) {
     }
     end = InFrontOf(head, end);
   }
-  std::ranges::sort(reached);
-  return is_bound;
+  return End(is_bound, UINT32_MAX, reached);
 }
 
 }  // namespace quillet

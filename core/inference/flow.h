@@ -20,6 +20,9 @@ class Flow {
   static constexpr size_t kMaxBindings = 64;
   // What more loops than this bind counts as bound anywhere in them.
   static constexpr int kMaxLoops = 400;
+  // What more statements, clauses and bindings than this would have to be looked at for counts as bound anywhere in
+  // front.
+  static constexpr uint32_t kMaxLooks = 1 << 16;
 
   // The offsets, sorted, at which names of the variable's own scope bind it. `truth` says of a condition whether it
   // holds in every run: 1, 0, or -1 where that is not known.
@@ -30,6 +33,8 @@ class Flow {
   bool Reach(uint32_t offset, StmtId top, std::vector<uint32_t>& reached);
   // The same for the end of the scope.
   bool ReachEnd(StmtId top, std::vector<uint32_t>& reached);
+  // How many statements, clauses and bindings were looked at.
+  uint32_t looks() const { return looks_; }
 
  private:
   enum class Outcome : uint8_t { kMaybe, kAlways, kLeaves };
@@ -47,14 +52,17 @@ class Flow {
   bool Head(StmtId stmt, bool holds = false);
   // The same for what is bound from `begin` to `end`, of a place behind it in the same statement.
   bool Bound(uint32_t begin, uint32_t end, uint32_t place, bool holds = false);
-  bool IsSure(uint32_t binding, uint32_t place, bool holds) const;
+  bool IsSure(uint32_t binding, uint32_t place, bool holds);
   void All(uint32_t begin, uint32_t end);
   size_t FirstAt(uint32_t offset) const;
   bool HasAny(uint32_t begin, uint32_t end) const;
   // The statement of a block that holds the last binding in front of `end`; kModuleStmt without one.
   StmtId LastIn(StmtId owner, uint32_t end) const;
   uint32_t InFrontOf(StmtId head, uint32_t end) const;
-  StmtId HeadOfChain(StmtId stmt) const;
+  StmtId HeadOfChain(StmtId stmt);
+  bool MayLook() { return ++looks_ <= kMaxLooks; }
+  // Ends a search that met the bound. Whether the variable is surely bound at the end of it.
+  bool End(bool is_bound, uint32_t end, std::vector<uint32_t>& reached);
   void Add(uint32_t offset);
   int TruthOf(StmtId clause) const;
 
@@ -64,6 +72,7 @@ class Flow {
   const std::function<int(ExprId)>& truth_;
   std::vector<uint32_t>* reached_ = nullptr;
   int steps_ = 0;
+  uint32_t looks_ = 0;
 };
 
 // Whether a clause goes on with the statement in front of it: `elif`, `else`, `except`, `finally`.

@@ -25,6 +25,10 @@ void Inference::Clear() {
   frames_by_hash_.clear();
   for (Memos* memos : {&values_, &bindings_, &results_, &hints_, &guesses_}) *memos = {};
   reaching_ = {};
+  own_bindings_ = {};
+  is_definition_ = {};
+  truths_.Clear();
+  reachable_clauses_.Clear();
   at_end_ = {};
   annotated_ = {};
   conditions_ = {};
@@ -50,6 +54,7 @@ size_t Inference::ByteSize() const {
     bytes += memos->known.ByteSize();
     for (const MemosOfLevel& level : memos->levels) bytes += level.found.ByteSize();
   }
+  bytes += own_bindings_.ByteSize() + is_definition_.ByteSize() + truths_.ByteSize() + reachable_clauses_.ByteSize();
   bytes += reaching_.ByteSize() + at_end_.ByteSize() + annotated_.ByteSize() + conditions_.ByteSize();
   const size_t nodes = classes_by_place_.size() + functions_by_place_.size() + 3 * frames_by_hash_.size();
   static constexpr size_t kBytesOfAClass = 4096;  // with its members

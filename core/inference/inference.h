@@ -30,6 +30,7 @@
 
 #include "foundations/arena.h"
 #include "foundations/number_map.h"
+#include "foundations/stop.h"
 #include "foundations/text.h"
 #include "inference/types.h"
 #include "program/files.h"
@@ -394,6 +395,16 @@ class Inference {
     guess_steps_ -= static_cast<uint32_t>(std::min<uint64_t>(guess_steps_, unpaid_ / kBytesOfAStep));
     unpaid_ = 0;
   }
+  // Counts what was looked at beside values: statements, names, conditions. What no source takes that people write
+  // counts as steps.
+  void CountLooks(uint64_t looks) {
+    static constexpr uint64_t kFree = 1024;
+    static constexpr uint64_t kLooksOfAStep = 128;
+    CountSteps(static_cast<int64_t>(looks));
+    if (looks <= kFree) return;
+    uint32_t& steps = guess_level_ == kMaxGuesses ? steps_ : guess_steps_;
+    steps -= static_cast<uint32_t>(std::min<uint64_t>(steps, (looks - kFree) / kLooksOfAStep));
+  }
   // What is found while this lives is found as if nothing else were being found.
   class Afresh;
 
@@ -431,6 +442,12 @@ class Inference {
     std::vector<Binding> bindings;
     bool may_be_unbound = false;
   };
+  // The bindings of a variable by where they stand, sorted.
+  struct OwnBindings {
+    std::vector<uint32_t> own, elsewhere, parameters, unreachable;
+  };
+  const OwnBindings& BindingsOfVariable(const SourceFile& file, uint32_t variable);
+  OwnBindings FindBindingsOfVariable(const SourceFile& file, uint32_t variable);
   Reaching FindBindingsReaching(const SourceFile& file, uint32_t occurrence);
   std::vector<Binding> FindBindingsAtEnd(const SourceFile& file, uint32_t symbol);
   // Where a variable is given an annotation, in the version and on the platform asked for.
@@ -464,6 +481,7 @@ class Inference {
     ExprId expr;
     bool holds;
   };
+  std::vector<Condition> ConditionsOf(const SourceFile& file, ExprId expr);
   std::vector<Condition> ConditionsOn(const SourceFile& file, ExprId expr);
   Value Narrowed(const SourceFile& file, ExprId expr, Value value, FrameId frame);
   // An attribute, or an item by a literal key, behind an assignment to it.
@@ -473,10 +491,14 @@ class Inference {
   const std::vector<ExprId>& WritesOf(const SourceFile& file, Text name);
   // -1 where it is not known before the program runs.
   int StaticTruth(const SourceFile& file, ExprId condition);
+  int FindStaticTruth(const SourceFile& file, ExprId condition);
   // The same by what parameters are in a frame.
   int TruthIn(const SourceFile& file, ExprId condition, FrameId frame);
+  int FindTruthIn(const SourceFile& file, ExprId condition, FrameId frame);
+  // Of what is made of one or two conditions.
+  static int CombinedTruth(const Expr& around, int left, int right);
   int Compared(Value left, Value right, CompareOperator op);
-  static bool IsDefinition(const SourceFile& file, ExprId expr);
+  bool IsDefinition(const SourceFile& file, ExprId expr);
 
   // ---- classes.cc ----
   void FindBases(ClassId cls);
@@ -597,6 +619,10 @@ class Inference {
     size_t ByteSize() const { return numbers.ByteSize() + found.size() * 2 * sizeof(T); }
   };
   FoundOnce<Reaching> reaching_;
+  FoundOnce<OwnBindings> own_bindings_;   // by symbol
+  FoundOnce<bool> is_definition_;         // by symbol
+  NumberMap<int8_t> truths_;              // of conditions, by file and expression
+  NumberMap<uint8_t> reachable_clauses_;  // by file and statement: bits of ClauseReach
   FoundOnce<std::vector<Binding>> at_end_;
   FoundOnce<std::vector<Binding>> annotated_;
   FoundOnce<std::vector<Condition>> conditions_;

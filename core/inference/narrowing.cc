@@ -8,6 +8,11 @@ namespace quillet {
 
 namespace {
 
+// Longer chains of attributes and items are not followed.
+constexpr int kMaxLinks = 64;
+// How much is looked at for one name: uses of it, conditions around it.
+constexpr size_t kMaxLooks = size_t{1} << 12;
+
 // The key of an item whose key is a literal; empty for others.
 Text KeyOf(const FileSyntax& syntax, ExprId expr) {
   if (syntax[expr].kind != ExprKind::kSubscript || syntax[expr].children_count != 2) return {};
@@ -24,7 +29,10 @@ bool IsLink(const FileSyntax& syntax, ExprId expr) {
 // Names, and attributes and items by literal keys of such, whose value stays what a condition found until something is
 // assigned.
 bool IsChain(const FileSyntax& syntax, ExprId expr) {
-  while (IsLink(syntax, expr)) expr = syntax.ChildOf(expr, 0);
+  for (int links = 0; IsLink(syntax, expr); ++links) {
+    if (links == kMaxLinks) return false;
+    expr = syntax.ChildOf(expr, 0);
+  }
   return syntax[expr].kind == ExprKind::kName;
 }
 
@@ -38,6 +46,11 @@ bool SameChain(const FileSyntax& syntax, ExprId a, ExprId b) {
          syntax.TextOf(syntax[a]) == syntax.TextOf(syntax[b]);
 }
 
+// `not`, `and`, `or`.
+bool IsMadeOfConditions(const Expr& e) {
+  return e.kind == ExprKind::kBoolean || (e.kind == ExprKind::kUnary && e.op == word::kNot);
+}
+
 }  // namespace
 
 class Inference::Narrowing {
@@ -47,18 +60,43 @@ class Inference::Narrowing {
 
   // The value where the condition holds, or where it does not.
   Value Where(ExprId condition, bool holds, Value value, int depth = 0) {
+    const Values found = WhereEither(condition, value, holds, !holds, depth);
+    return holds ? found.holding : found.other;
+  }
+
+ private:
+  struct Values {
+    Value holding, other;  // where a condition holds, and where it does not
+  };
+
+  // Both at once, those that are wanted: an `or` is made of both of what stands in front of it.
+  Values WhereEither(ExprId condition, Value value, bool wants_holding, bool wants_other, int depth) {
     static constexpr int kMaxNesting = 16;
-    if (condition == kNoExpr || depth > kMaxNesting) return value;
+    if (condition == kNoExpr || depth > kMaxNesting) return {value, value};
+    const Expr& e = syntax_[condition];
+    const ExprId left = syntax_.ChildOf(condition, 0), right = syntax_.ChildOf(condition, 1);
+    if (e.kind == ExprKind::kUnary && e.op == word::kNot) {
+      const Values found = WhereEither(left, value, wants_other, wants_holding, depth + 1);
+      return {found.other, found.holding};
+    }
+    if (e.kind == ExprKind::kBoolean && e.op == word::kAnd) {
+      const Values first = WhereEither(left, value, true, wants_other, depth + 1);
+      const Values second = WhereEither(right, first.holding, wants_holding, wants_other, depth + 1);
+      return {second.holding, wants_other ? in_.types_.Union(first.other, second.other) : value};
+    }
+    if (e.kind == ExprKind::kBoolean) {
+      const Values first = WhereEither(left, value, wants_holding, true, depth + 1);
+      const Values second = WhereEither(right, first.other, wants_holding, wants_other, depth + 1);
+      return {wants_holding ? in_.types_.Union(first.holding, second.holding) : value, second.other};
+    }
+    return {wants_holding ? WhereAlone(condition, true, value, depth) : value,
+            wants_other ? WhereAlone(condition, false, value, depth) : value};
+  }
+
+  // Of a condition that is not made of others.
+  Value WhereAlone(ExprId condition, bool holds, Value value, int depth) {
     const Expr& e = syntax_[condition];
     switch (e.kind) {
-      case ExprKind::kUnary:
-        return e.op == word::kNot ? Where(syntax_.ChildOf(condition, 0), !holds, value, depth + 1) : value;
-      case ExprKind::kBoolean: {
-        const ExprId left = syntax_.ChildOf(condition, 0), right = syntax_.ChildOf(condition, 1);
-        if ((e.op == word::kAnd) == holds) return Where(right, holds, Where(left, holds, value, depth + 1), depth + 1);
-        return in_.types_.Union(Where(left, holds, value, depth + 1),
-                                Where(right, holds, Where(left, !holds, value, depth + 1), depth + 1));
-      }
       case ExprKind::kNamed:
         if (SameChain(syntax_, syntax_.ChildOf(condition, 0), subject_)) return Truth(value, holds);
         return value;
@@ -87,7 +125,6 @@ class Inference::Narrowing {
     }
   }
 
- private:
   bool IsSubject(ExprId expr) const { return SameChain(syntax_, expr, subject_); }
 
   Value Truth(Value value, bool holds) { return in_.WithoutFalse(value, !holds); }
@@ -261,7 +298,7 @@ Value Inference::Assigned(const SourceFile& file, ExprId expr, Value value, Fram
   const bool is_attribute = syntax[expr].kind == ExprKind::kAttribute;
   const std::vector<ExprId>& writes = WritesOf(file, is_attribute ? syntax.NameOf(expr) : KeyOf(syntax, expr));
   if (writes.empty()) return value;
-  const auto root_of = [&](ExprId at) {
+  const auto root_of = [&](ExprId at) {  // of what is the same chain: a short one
     while (IsLink(syntax, at)) at = syntax.ChildOf(at, 0);
     return at;
   };
@@ -270,6 +307,8 @@ Value Inference::Assigned(const SourceFile& file, ExprId expr, Value value, Fram
   const uint32_t root = syntax[root_of(expr)].begin;
   // Those of the same chain in the same scope; the offset of an assignment is that of its root.
   std::vector<std::pair<uint32_t, ExprId>> same;
+  CountLooks(writes.size());
+  if (writes.size() > kMaxLooks) return value;
   for (const ExprId write : writes)
     if (SameChain(syntax, write, expr) && file.ScopeAt(syntax[write].begin) == scope)
       same.emplace_back(syntax[root_of(write)].begin, write);
@@ -280,15 +319,19 @@ Value Inference::Assigned(const SourceFile& file, ExprId expr, Value value, Fram
   std::vector<uint32_t> offsets;
   for (const auto& [offset, write] : same) offsets.push_back(offset);
   // What is assigned to the parts in front of it.
-  for (const uint32_t i : file.occurrences().Of(variable)) {
+  const auto uses = file.occurrences().Of(variable);
+  CountLooks(uses.size());
+  if (uses.size() > kMaxLooks) return value;
+  for (const uint32_t i : uses) {
     const Occurrence& other = file.bindings.occurrences[i];
     if (other.kind != NameKind::kNone) {
       if (other.kind != NameKind::kParameter) offsets.push_back(other.begin);
       continue;
     }
     ExprId at = syntax.NamedAt(other.begin);
-    while (at != kNoExpr && syntax[at].parent != kNoExpr && IsLink(syntax, syntax[at].parent) &&
-           syntax.ChildOf(syntax[at].parent, 0) == at) {
+    for (int links = 0; links < kMaxLinks && at != kNoExpr && syntax[at].parent != kNoExpr &&
+                        IsLink(syntax, syntax[at].parent) && syntax.ChildOf(syntax[at].parent, 0) == at;
+         ++links) {
       at = syntax[at].parent;
       if ((syntax[at].flags & kIsTarget) == 0 || SameChain(syntax, at, expr)) continue;
       for (ExprId part = syntax.ChildOf(expr, 0); IsLink(syntax, part); part = syntax.ChildOf(part, 0))
@@ -299,7 +342,10 @@ Value Inference::Assigned(const SourceFile& file, ExprId expr, Value value, Fram
   offsets.erase(std::unique(offsets.begin(), offsets.end()), offsets.end());
   const std::function<int(ExprId)> truth = [&](ExprId condition) { return StaticTruth(file, condition); };
   std::vector<uint32_t> reached;
-  if (!Flow(file, offsets, truth).Reach(syntax[expr].begin, top, reached) || reached.empty()) return value;
+  Flow flow(file, offsets, truth);
+  const bool is_bound = flow.Reach(syntax[expr].begin, top, reached);
+  CountLooks(flow.looks());
+  if (!is_bound || reached.empty()) return value;
   Value given;
   for (const uint32_t offset : reached) {
     const auto write = std::ranges::find(same, offset, &std::pair<uint32_t, ExprId>::first);
@@ -318,10 +364,25 @@ Value Inference::Assigned(const SourceFile& file, ExprId expr, Value value, Fram
 Value Inference::Narrowed(const SourceFile& file, ExprId expr, Value value, FrameId frame) {
   if (!IsChain(file.syntax, expr) || (file.syntax[expr].flags & kIsTarget) != 0) return value;
   if (file.syntax[expr].kind != ExprKind::kName) value = Assigned(file, expr, value, frame);
-  const std::vector<Condition>& conditions = conditions_.Get(file.id, expr, [&] { return ConditionsOn(file, expr); });
+  const std::vector<Condition> conditions = ConditionsOf(file, expr);
   Narrowing narrowing(*this, file, expr, frame);
   for (size_t i = conditions.size(); i-- > 0;) value = narrowing.Where(conditions[i].expr, conditions[i].holds, value);
   return value;
+}
+
+// Many of them are not remembered: each of their names has many.
+std::vector<Inference::Condition> Inference::ConditionsOf(const SourceFile& file, ExprId expr) {
+  static constexpr size_t kMaxRemembered = 32;
+  std::vector<Condition> many;
+  const auto find = [&] {
+    std::vector<Condition> found = ConditionsOn(file, expr);
+    if (found.size() <= kMaxRemembered) return found;
+    many = std::move(found);
+    return std::vector<Condition>{{kNoExpr, false}};
+  };
+  const std::vector<Condition>& found = conditions_.Get(file.id, expr, find);
+  if (found.empty() || found[0].expr != kNoExpr) return found;
+  return many.empty() ? ConditionsOn(file, expr) : many;
 }
 
 // The innermost first, and those only behind which nothing was assigned.
@@ -331,15 +392,20 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
   ExprId root = expr;
   while (IsLink(syntax, root)) root = syntax.ChildOf(root, 0);
   const Text name = syntax.TextOf(syntax[root]);
+  static constexpr size_t kMaxConditions = 512;
+  static constexpr uint32_t kBytesOfALook = 16;
+  size_t looks = 0;
+  const auto may_look = [&] { return ++looks <= kMaxLooks && conditions.size() < kMaxConditions; };
   const auto mentions = [&](uint32_t begin, uint32_t end) {
-    return Text(syntax.source + begin, end - begin).find(name) != Text::npos;
+    looks += (end - begin) / kBytesOfALook;
+    return looks <= kMaxLooks && Text(syntax.source + begin, end - begin).find(name) != Text::npos;
   };
   const auto add = [&](ExprId condition, bool holds) {
     if (condition != kNoExpr && mentions(syntax[condition].begin, syntax[condition].end))
       conditions.push_back({condition, holds});
   };
   // In the expression itself.
-  for (ExprId at = expr; syntax[at].parent != kNoExpr; at = syntax[at].parent) {
+  for (ExprId at = expr; syntax[at].parent != kNoExpr && may_look(); at = syntax[at].parent) {
     const ExprId parent = syntax[at].parent;
     if (syntax[parent].kind == ExprKind::kBoolean && syntax.ChildOf(parent, 1) == at) {
       add(syntax.ChildOf(parent, 0), syntax[parent].op == word::kAnd);
@@ -350,9 +416,9 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
                syntax[parent].kind == ExprKind::kSetComprehension || syntax[parent].kind == ExprKind::kGenerator ||
                syntax[parent].kind == ExprKind::kDictComprehension) {
       for (const ExprId clause : syntax.ChildrenOf(parent)) {
-        if (clause == at || syntax[clause].kind != ExprKind::kComprehensionFor) continue;
+        if (clause == at || !may_look() || syntax[clause].kind != ExprKind::kComprehensionFor) continue;
         const auto parts = syntax.ChildrenOf(clause);
-        for (size_t i = 2; i < parts.size(); ++i) add(parts[i], true);
+        for (size_t i = 2; i < parts.size() && may_look(); ++i) add(parts[i], true);
       }
     }
   }
@@ -365,7 +431,7 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
     return exprs.empty() ? kNoExpr : exprs[0];
   };
   const auto in_head = [&](StmtId clause) { return syntax[expr].begin < syntax.stmt(clause).end; };
-  for (; stmt != kModuleStmt; stmt = syntax.stmt(stmt).parent) {
+  for (; stmt != kModuleStmt && may_look(); stmt = syntax.stmt(stmt).parent) {
     const Stmt& own = syntax.stmt(stmt);
     if (own.kind == StmtKind::kDef || own.kind == StmtKind::kClass) {
       if (!in_head(stmt)) break;
@@ -381,7 +447,7 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
     if (own.kind == StmtKind::kElif || own.kind == StmtKind::kElse) {
       for (;;) {
         at = syntax.stmt(at).previous;
-        if (at == kModuleStmt) break;
+        if (at == kModuleStmt || !may_look()) break;
         const StmtKind kind = syntax.stmt(at).kind;
         if (kind == StmtKind::kIf || kind == StmtKind::kElif) add(condition_of(at), false);
         if (kind != StmtKind::kElif && kind != StmtKind::kElse) break;
@@ -394,7 +460,8 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
         add(condition_of(at), true);
       } else if (before.kind == StmtKind::kWhile && mentions(before.begin, before.end)) {
         bool has_break = false;
-        for (StmtId inner = at + 1; inner < syntax.stmts.size() && syntax.stmt(inner).begin < before.block_end; ++inner)
+        for (StmtId inner = at + 1;
+             inner < syntax.stmts.size() && syntax.stmt(inner).begin < before.block_end && may_look(); ++inner)
           has_break =
               has_break || (syntax.stmt(inner).kind == StmtKind::kPass && syntax.stmt(inner).op == word::kBreak);
         if (!has_break) add(condition_of(at), false);
@@ -407,16 +474,26 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
       }
     }
   }
+  CountLooks(looks);
   if (conditions.empty()) return conditions;
-  // What was assigned in between.
+  // What was assigned in between: backwards, until nothing in front can be behind what was found. What more uses than
+  // may be looked at stand in front of counts as assigned by the last of them.
   const uint32_t index = file.OccurrenceBeginningAt(syntax[root].begin);
   if (index == kNoIndex) return {};
   uint32_t last_bound = 0;
   const uint32_t variable = file.bindings.VariableOf(file.bindings.occurrences[index]);
   if (variable != kNoIndex) {
-    for (const uint32_t i : file.occurrences().Of(variable)) {
-      const Occurrence& other = file.bindings.occurrences[i];
-      if (other.begin >= syntax[expr].begin) break;
+    const auto uses = file.occurrences().Of(variable);
+    const auto begin_of = [&](uint32_t i) { return file.bindings.occurrences[i].begin; };
+    const auto behind = std::ranges::lower_bound(uses, syntax[expr].begin, {}, begin_of);
+    const auto first = static_cast<size_t>(behind - uses.begin());
+    size_t next = first;
+    for (; next > 0 && begin_of(uses[next - 1]) > last_bound; --next) {
+      const Occurrence& other = file.bindings.occurrences[uses[next - 1]];
+      if (first - next == kMaxLooks) {
+        last_bound = other.begin;
+        break;
+      }
       if (other.kind != NameKind::kNone && other.kind != NameKind::kParameter) {
         const ExprId named = syntax.NamedAt(other.begin);
         const bool is_walrus = named != kNoExpr && syntax[named].parent != kNoExpr &&
@@ -426,34 +503,51 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
       if (root != expr) {  // the attribute itself
         const ExprId read = syntax.NamedAt(other.begin);
         ExprId chain = read == kNoExpr ? kNoExpr : syntax[read].parent;
-        while (chain != kNoExpr && IsLink(syntax, chain)) {
+        for (int links = 0; links < kMaxLinks && chain != kNoExpr && IsLink(syntax, chain); ++links) {
           if ((syntax[chain].flags & kIsTarget) != 0 && SameChain(syntax, chain, expr))
             last_bound = std::max(last_bound, other.begin);
           chain = syntax[chain].parent;
         }
       }
     }
+    CountLooks(first - next);
   }
   std::erase_if(conditions, [&](const Condition& condition) { return syntax[condition.expr].begin < last_bound; });
   return conditions;
 }
 
+int Inference::CombinedTruth(const Expr& around, int left, int right) {
+  if (around.kind == ExprKind::kUnary) return left < 0 ? -1 : 1 - left;
+  if (around.op == word::kAnd) return left == 0 || right == 0 ? 0 : left == 1 && right == 1 ? 1 : -1;
+  return left == 1 || right == 1 ? 1 : left == 0 && right == 0 ? 0 : -1;
+}
+
+// What `not`, `and` and `or` chain is gone down in a loop, and found from the innermost outwards.
 int Inference::TruthIn(const SourceFile& file, ExprId condition, FrameId frame) {
-  const int always = StaticTruth(file, condition);
-  if (always >= 0 || frame == kNoFrame || condition == kNoExpr) return always;
+  const FileSyntax& syntax = file.syntax;
+  int truth = StaticTruth(file, condition);
+  if (truth >= 0 || frame == kNoFrame || condition == kNoExpr) return truth;
+  std::vector<ExprId> around;
+  while (IsMadeOfConditions(syntax[condition])) {
+    around.push_back(condition);
+    condition = syntax.ChildOf(condition, 0);
+    truth = StaticTruth(file, condition);
+    if (truth >= 0 || condition == kNoExpr) break;
+  }
+  CountLooks(around.size());
+  if (truth < 0 && condition != kNoExpr) truth = FindTruthIn(file, condition, frame);
+  for (size_t i = around.size(); i-- > 0;) {
+    const Expr& e = syntax[around[i]];
+    const int right = e.kind == ExprKind::kBoolean ? TruthIn(file, syntax.ChildOf(around[i], 1), frame) : -1;
+    truth = CombinedTruth(e, truth, right);
+  }
+  return truth;
+}
+
+int Inference::FindTruthIn(const SourceFile& file, ExprId condition, FrameId frame) {
   const FileSyntax& syntax = file.syntax;
   const Expr& e = syntax[condition];
   switch (e.kind) {
-    case ExprKind::kUnary: {
-      const int inner = e.op == word::kNot ? TruthIn(file, syntax.ChildOf(condition, 0), frame) : -1;
-      return inner < 0 ? -1 : 1 - inner;
-    }
-    case ExprKind::kBoolean: {
-      const int left = TruthIn(file, syntax.ChildOf(condition, 0), frame);
-      const int right = TruthIn(file, syntax.ChildOf(condition, 1), frame);
-      if (e.op == word::kAnd) return left == 0 || right == 0 ? 0 : left == 1 && right == 1 ? 1 : -1;
-      return left == 1 || right == 1 ? 1 : left == 0 && right == 0 ? 0 : -1;
-    }
     case ExprKind::kCompare: {
       if (e.children_count != 2) return -1;
       const auto op = static_cast<CompareOperator>(e.op);
@@ -540,19 +634,44 @@ bool Inference::IsDefinition(const SourceFile& file, ExprId expr) {
       file.syntax[expr].kind == ExprKind::kName ? file.OccurrenceBeginningAt(file.syntax[expr].begin) : kNoIndex;
   const uint32_t variable = index == kNoIndex ? kNoIndex : file.bindings.VariableOf(file.bindings.occurrences[index]);
   if (variable == kNoIndex) return false;
-  size_t definitions = 0;
-  for (const uint32_t i : file.occurrences().Of(variable)) {
-    const NameKind kind = file.bindings.occurrences[i].kind;
-    if (kind == NameKind::kNone) continue;
-    if (kind != NameKind::kFunction && kind != NameKind::kClass) return false;
-    ++definitions;
-  }
-  return definitions == 1;
+  return is_definition_.Get(file.id, variable, [&] {
+    size_t definitions = 0;
+    for (const uint32_t i : file.occurrences().Of(variable)) {
+      const NameKind kind = file.bindings.occurrences[i].kind;
+      if (kind == NameKind::kNone) continue;
+      if (kind != NameKind::kFunction && kind != NameKind::kClass) return false;
+      ++definitions;
+    }
+    return definitions == 1;
+  });
 }
 
+// Found once for each condition, and for those that it is made of.
 int Inference::StaticTruth(const SourceFile& file, ExprId condition) {
-  const FileSyntax& syntax = file.syntax;
   if (condition == kNoExpr) return -1;
+  const FileSyntax& syntax = file.syntax;
+  const auto key = [&](ExprId expr) { return (uint64_t{file.id} << 32 | expr) + 1; };
+  std::vector<ExprId> around;
+  const int8_t* known = truths_.Find(key(condition));
+  while (known == nullptr && condition != kNoExpr && IsMadeOfConditions(syntax[condition])) {
+    around.push_back(condition);
+    condition = syntax.ChildOf(condition, 0);
+    known = truths_.Find(key(condition));
+  }
+  int truth = known != nullptr ? *known : condition == kNoExpr ? -1 : FindStaticTruth(file, condition);
+  if (known == nullptr && condition != kNoExpr) truths_.Put(key(condition), static_cast<int8_t>(truth));
+  CountSteps(static_cast<int64_t>(around.size()));
+  for (size_t i = around.size(); i-- > 0;) {
+    const Expr& e = syntax[around[i]];
+    const int right = e.kind == ExprKind::kBoolean ? StaticTruth(file, syntax.ChildOf(around[i], 1)) : -1;
+    truth = CombinedTruth(e, truth, right);
+    truths_.Put(key(around[i]), static_cast<int8_t>(truth));
+  }
+  return truth;
+}
+
+int Inference::FindStaticTruth(const SourceFile& file, ExprId condition) {
+  const FileSyntax& syntax = file.syntax;
   const Expr& e = syntax[condition];
   const Text text = syntax.TextOf(e);
   const Version version = files_.version();
@@ -567,17 +686,6 @@ int Inference::StaticTruth(const SourceFile& file, ExprId condition) {
       if (text.ends_with("PY2")) return version.AtLeast(3, 0) ? 0 : 1;
       if (text.ends_with("PY3")) return version.AtLeast(3, 0) ? 1 : 0;
       return IsDefinition(file, condition) ? 1 : -1;
-    case ExprKind::kUnary: {
-      if (e.op != word::kNot) return -1;
-      const int inner = StaticTruth(file, syntax.ChildOf(condition, 0));
-      return inner < 0 ? -1 : 1 - inner;
-    }
-    case ExprKind::kBoolean: {
-      const int left = StaticTruth(file, syntax.ChildOf(condition, 0)),
-                right = StaticTruth(file, syntax.ChildOf(condition, 1));
-      if (e.op == word::kAnd) return left == 0 || right == 0 ? 0 : left == 1 && right == 1 ? 1 : -1;
-      return left == 1 || right == 1 ? 1 : left == 0 && right == 0 ? 0 : -1;
-    }
     case ExprKind::kCall: {  // sys.platform.startswith("win")
       const auto children = syntax.ChildrenOf(condition);
       if (children.size() != 2 || syntax.TextOf(syntax[children[0]]) != "sys.platform.startswith") return -1;

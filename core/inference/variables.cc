@@ -40,21 +40,45 @@ Text NewNameOfBuiltin(Text name) {
 // ---- which bindings ----
 
 bool Inference::IsReachable(const SourceFile& file, StmtId id) {
+  enum ClauseReach : uint8_t { kIsReachable = 1, kEndsChain = 2 };  // nothing of its chain behind it runs
   const FileSyntax& syntax = file.syntax;
+  const auto key = [&](StmtId stmt) { return (uint64_t{file.id} << 32 | stmt) + 1; };
+  const auto is_clause = [](StmtKind kind) {
+    return kind == StmtKind::kIf || kind == StmtKind::kElif || kind == StmtKind::kElse;
+  };
+  std::vector<StmtId> chain;
   for (; id != kModuleStmt; id = syntax.stmt(id).parent) {
-    const StmtKind kind = syntax.stmt(id).kind;
-    if (kind != StmtKind::kIf && kind != StmtKind::kElif && kind != StmtKind::kElse) continue;
-    if (kind != StmtKind::kElse) {
-      const auto exprs = syntax.ExprsOf(syntax.stmt(id));
-      if (!exprs.empty() && StaticTruth(file, exprs[0]) == 0) return false;
+    if (!is_clause(syntax.stmt(id).kind)) continue;
+    const uint8_t* known = reachable_clauses_.Find(key(id));
+    if (known == nullptr) {
+      // Those in front of it of which nothing is known yet, and then each from the one in front.
+      chain.assign(1, id);
+      uint8_t before = 0;
+      for (StmtId at = id; syntax.stmt(at).kind != StmtKind::kIf;) {
+        at = syntax.stmt(at).previous;
+        if (at == kModuleStmt || (syntax.stmt(at).kind != StmtKind::kIf && syntax.stmt(at).kind != StmtKind::kElif))
+          break;
+        known = reachable_clauses_.Find(key(at));
+        if (known != nullptr) {
+          before = *known;
+          break;
+        }
+        chain.push_back(at);
+      }
+      CountSteps(static_cast<int64_t>(chain.size()));
+      for (size_t i = chain.size(); i-- > 0;) {
+        const auto exprs = syntax.ExprsOf(syntax.stmt(chain[i]));
+        const bool has_condition = syntax.stmt(chain[i]).kind != StmtKind::kElse && !exprs.empty();
+        const int truth = has_condition ? StaticTruth(file, exprs[0]) : -1;
+        const bool is_behind_end = (before & kEndsChain) != 0;
+        before = static_cast<uint8_t>((truth != 0 && !is_behind_end ? kIsReachable : 0) |
+                                      (truth == 1 || is_behind_end ? kEndsChain : 0));
+        reachable_clauses_.Put(key(chain[i]), before);
+      }
+      if ((before & kIsReachable) == 0) return false;
+      continue;
     }
-    for (StmtId at = id; syntax.stmt(at).kind == StmtKind::kElif || syntax.stmt(at).kind == StmtKind::kElse;) {
-      at = syntax.stmt(at).previous;
-      if (at == kModuleStmt || (syntax.stmt(at).kind != StmtKind::kIf && syntax.stmt(at).kind != StmtKind::kElif))
-        break;
-      const auto exprs = syntax.ExprsOf(syntax.stmt(at));
-      if (!exprs.empty() && StaticTruth(file, exprs[0]) == 1) return false;
-    }
+    if ((*known & kIsReachable) == 0) return false;
   }
   return true;
 }
@@ -65,30 +89,43 @@ const std::vector<Binding>& Inference::BindingsReaching(const SourceFile& file, 
   return found.bindings;
 }
 
-Inference::Reaching Inference::FindBindingsReaching(const SourceFile& file, uint32_t index) {
-  const Occurrence& occurrence = file.bindings.occurrences[index];
-  const uint32_t variable = file.bindings.VariableOf(occurrence);
-  if (variable == kNoIndex) return {};
+const Inference::OwnBindings& Inference::BindingsOfVariable(const SourceFile& file, uint32_t variable) {
+  return own_bindings_.Get(file.id, variable, [&] { return FindBindingsOfVariable(file, variable); });
+}
+
+Inference::OwnBindings Inference::FindBindingsOfVariable(const SourceFile& file, uint32_t variable) {
   const NameSymbol& owner = file.bindings.symbols[variable];
-  const NameScope& scope = file.bindings.scopes[owner.scope];
-  std::vector<uint32_t> own, elsewhere, parameters, unreachable;
-  for (const uint32_t i : file.occurrences().Of(variable)) {
+  OwnBindings found;
+  const auto indices = file.occurrences().Of(variable);
+  CountSteps(static_cast<int64_t>(indices.size()));
+  for (const uint32_t i : indices) {
     const Occurrence& other = file.bindings.occurrences[i];
     if (!Binds(other)) continue;
     if (!IsReachable(file, file.syntax.StatementAt(other.begin))) {
-      unreachable.push_back(other.begin);
+      found.unreachable.push_back(other.begin);
       continue;
     }
     uint32_t at = file.bindings.ScopeOf(other);
     while (at != owner.scope && at != kNoIndex && file.bindings.scopes[at].kind == NameScopeKind::kComprehension)
       at = file.bindings.scopes[at].parent;
     if (other.kind == NameKind::kParameter) {
-      parameters.push_back(other.begin);
+      found.parameters.push_back(other.begin);
     } else {
-      (at == owner.scope ? own : elsewhere).push_back(other.begin);
+      (at == owner.scope ? found.own : found.elsewhere).push_back(other.begin);
     }
   }
-  DropImportsOfItself(file, own);
+  DropImportsOfItself(file, found.own);
+  return found;
+}
+
+Inference::Reaching Inference::FindBindingsReaching(const SourceFile& file, uint32_t index) {
+  const Occurrence& occurrence = file.bindings.occurrences[index];
+  const uint32_t variable = file.bindings.VariableOf(occurrence);
+  if (variable == kNoIndex) return {};
+  const NameSymbol& owner = file.bindings.symbols[variable];
+  const NameScope& scope = file.bindings.scopes[owner.scope];
+  const OwnBindings& all = BindingsOfVariable(file, variable);
+  const std::vector<uint32_t>&own = all.own, &elsewhere = all.elsewhere, &parameters = all.parameters;
   std::vector<uint32_t> reached;
   bool is_bound = false;
   if (scope.kind != NameScopeKind::kModule && scope.kind != NameScopeKind::kFunction &&
@@ -110,11 +147,13 @@ Inference::Reaching Inference::FindBindingsReaching(const SourceFile& file, uint
       reached.insert(reached.end(), elsewhere.begin(), elsewhere.end());
     // A name that is used in front of its binding: by a hint, by a decorator in a loop, by mistake.
     if (reached.empty() && parameters.empty()) flow.ReachEnd(top, reached);
+    CountLooks(flow.looks());
   } else {
     reached = elsewhere;
   }
   if (!is_bound) reached.insert(reached.end(), parameters.begin(), parameters.end());
-  if (reached.empty()) reached = own.empty() ? unreachable : own;
+  if (reached.empty()) reached = own.empty() ? all.unreachable : own;
+  if (reached.size() > Flow::kMaxBindings) reached.resize(Flow::kMaxBindings);
   std::ranges::sort(reached);
   Reaching found;
   found.may_be_unbound = !is_bound && parameters.empty();

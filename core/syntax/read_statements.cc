@@ -153,7 +153,8 @@ void SyntaxReader::Impl::Broken(bool is_head) {
 void SyntaxReader::Impl::EndOfHead(StmtId stmt, size_t mark) {
   SetExprs(stmt, mark);
   const StmtKind kind = out_->stmts[stmt].kind;
-  OpenBlock(stmt);
+  const bool opens_block = blocks_.size() <= kMaxBlocks;
+  if (opens_block) OpenBlock(stmt);
   const size_t block = blocks_.size() - 1;
   if (!Is(tok::COLON)) {
     out_->stmts[stmt].flags |= kStmtIsBroken;
@@ -169,7 +170,7 @@ void SyntaxReader::Impl::EndOfHead(StmtId stmt, size_t mark) {
   out_->stmts[stmt].end = out_->stmts[stmt].block_end = LastEnd();
   if (next_comment_ < comments_.size()) TakeComments(stmt);
   const bool is_definition = kind == StmtKind::kDef || kind == StmtKind::kClass;
-  blocks_[block].is_inline = !AtEnd() || (is_definition && row_->has_inline_body);
+  if (opens_block) blocks_[block].is_inline = !AtEnd() || (is_definition && row_->has_inline_body);
 }
 
 void SyntaxReader::Impl::ConditionHead(StmtKind kind, bool has_condition) {

@@ -28,6 +28,7 @@ class SyntaxReader::Impl {
 
  private:
   static constexpr int kMaxDepth = 200;
+  static constexpr size_t kMaxBlocks = 200;
 
   // How tightly an operator binds; 0 is none.
   enum Binding : uint8_t {

@@ -8,7 +8,8 @@
 // Nodes are numbers. Expression 0 is the absent one, statement 0 the module. Offsets are bytes of the
 // source, so that a name finds its occurrence in Bindings by where it begins.
 //
-// Brackets nest to a depth of 200, in which the rest of a bracket is kMissing. What chains has no limit
+// Brackets nest to a depth of 200, in which the rest of a bracket is kMissing. So do blocks; what stands in a deeper
+// one is of the last that counts, behind its head. What chains has no limit
 // (`a.b.c...`, `a + b + c...`, `not not...`): who goes down such a tree goes in a loop, or counts.
 #pragma once
 
