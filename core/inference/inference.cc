@@ -244,7 +244,7 @@ std::string Inference::QualifiedName(ClassId cls) {
   for (; scope != kNoIndex && scope != 0; scope = file->bindings.scopes[scope].parent) {
     const NameScope& around = file->bindings.scopes[scope];
     if (around.kind != NameScopeKind::kClass && around.kind != NameScopeKind::kFunction) continue;
-    name = std::string(file->bindings.texts[around.name]) + "." + name;
+    name = std::string(file->bindings.NameOf(around)) + "." + name;
   }
   const ModuleId module = modules_.OfFile(info.file);
   return module == kNoModule ? name : modules_[module].name + "." + name;

@@ -79,7 +79,7 @@ std::vector<std::string> QualifiedNames(const Bindings& bindings) {
     std::string name = scope.parent == kNoIndex ? std::string() : names[scope.parent];
     if (scope.kind == NameScopeKind::kClass || scope.kind == NameScopeKind::kFunction) {
       if (!name.empty()) name += '.';
-      AppendShown(bindings.texts[scope.name], name);
+      AppendShown(bindings.NameOf(scope), name);
     }
     names.push_back(std::move(name));
   }

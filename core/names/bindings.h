@@ -125,6 +125,8 @@ struct Bindings {
   uint32_t EndOf(const Occurrence& occurrence) const {
     return occurrence.begin + static_cast<uint32_t>(TextOf(occurrence).size());
   }
+  // Empty for scopes without a name: those of no definition, and of a broken one.
+  Text NameOf(const NameScope& scope) const { return scope.name != kNoIndex ? texts[scope.name] : Text(); }
   // The scope in which it stands.
   uint32_t ScopeOf(const Occurrence& occurrence) const {
     return occurrence.has_symbol ? symbols[occurrence.place].scope : occurrence.place;

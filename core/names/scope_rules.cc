@@ -166,7 +166,7 @@ class ScopeRules : public NameRules {
       const uint32_t scope = ScopeAt(toks[0].text);
       if (names_->scopes[scope].kind != NameScopeKind::kFunction || !asks[scope]) continue;
       const std::string what = is_star ? "import * is not allowed" : "unqualified exec is not allowed";
-      Tell({row, 0}, what + " in function '" + std::string(names_->texts[names_->scopes[scope].name]) +
+      Tell({row, 0}, what + " in function '" + std::string(names_->NameOf(names_->scopes[scope])) +
                          "' because it contains a nested function with free variables");
     }
     CheckDeleted();

@@ -88,7 +88,7 @@ std::vector<Binding> Workspace::Impl::OtherSidesOf(Binding binding) {
   for (uint32_t scope = stub->bindings.ScopeOf(stub->bindings.occurrences[index]); scope != 0 && scope != kNoIndex;
        scope = stub->bindings.scopes[scope].parent) {
     const NameScope& around = stub->bindings.scopes[scope];
-    if (around.kind == NameScopeKind::kClass) path.push_back(stub->bindings.texts[around.name]);
+    if (around.kind == NameScopeKind::kClass) path.push_back(stub->bindings.NameOf(around));
   }
   Entities at = inference.EntitiesInFile(id, other, path.back());
   for (size_t i = path.size() - 1; i-- > 0;) {

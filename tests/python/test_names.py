@@ -283,6 +283,16 @@ def test_columns_say_what_objects_say() -> None:
     assert got == expected
 
 
+def test_columns_of_definitions_without_a_name() -> None:
+    pyarrow = pytest.importorskip("pyarrow")
+    source = b"class:\n    def f(self): x = 1\ndef (a): y = a\n"
+    with analyze_files([("a.py", source)], bindings=True) as results:
+        rows = pyarrow.table(results.occurrences).to_pylist()
+    assert [(row["text"], row["scope_name"]) for row in rows] == [
+        ("f", ""), ("self", "f"), ("x", "f"), ("a", ""), ("y", ""), ("a", ""),
+    ]  # fmt: skip
+
+
 def test_columns_need_bindings() -> None:
     with analyze_files([]) as results, pytest.raises(ValueError, match="not asked"):
         results.occurrences.__arrow_c_stream__()

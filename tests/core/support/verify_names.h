@@ -37,6 +37,7 @@ inline std::string VerifyScopes(const SourceText& source, const Bindings& bindin
     if (count != scope.symbol_count) return At("number of symbols of scope", i);
     seen += count;
   }
+  if (QualifiedNames(bindings).size() != bindings.scopes.size()) return "a scope has no qualified name";
   return seen == bindings.symbols.size() ? "" : "a symbol is in no scope";
 }
 

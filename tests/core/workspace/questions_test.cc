@@ -875,7 +875,8 @@ TEST(Questions, AreAnsweredAtEveryPlace) {
   const std::string_view text =
       "from a import *\nimport a.a as b\nclass A(A, B[int]):\n  x: 'A' = f(\n  def m(self, *a, **k): return self.\n"
       "with x as y, : z = [i for i in\nmatch a:\n  case {'k': v, **r}: f'{x!r:{w}}'\nlambda: (yield)\n@\n\xC3\xA4 = "
-      "\xFF\n";
+      "\xFF\nclass:\n  def m(self, a=1): return a\n  class D: pass\ndef (q):\n  from os import *\n  def g(): return "
+      "q\n";
   Program program(text);
   const FileId file = program.File("a.py");
   for (const FileId at : {file, program.File("nothing.py")}) {
