@@ -28,7 +28,8 @@ nb::list CutSource(Any source, Any version_triple) {
   nb::list lines;
   ScopeTracker scopes;
   for (const LineRow& row : rows) {
-    const LinePlace place = scopes.Next(row);
+    LinePlace place;
+    scopes.Next(row, place);
     lines.append(nb::make_tuple(NewLineObject(held, row, store), row.first_line, row.last_line, row.indent,
                                 place.in_async_def, place.first_in_def));
   }

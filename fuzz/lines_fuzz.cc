@@ -37,7 +37,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     ScopeTracker scopes;
     LogicalLine line;
     for (const LineRow& row : rows) {
-      const LinePlace place = scopes.Next(row);
+      LinePlace place;
+      scopes.Next(row, place);
       if (place.first_in_def && row.kind == LineKind::kBlankLine) Check("a blank line is the first of a body");
       SetFromRow(line, source, row);
       if (row.token_count > 0 && TextFromTokens(line).empty()) Check("tokens without a text");

@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "lines/token_search.h"
+#include "lines/unusual_tokens.h"
 #include "tokens/token_ends.h"
 
 namespace quillet {
@@ -21,7 +22,7 @@ constexpr size_t kMostBlocks = 100;  // as deep as the language lets blocks nest
 
 using Role = BlockRules::Role;
 
-struct FactsOfKind {
+struct alignas(uint32_t) FactsOfKind {
   Role role;
   BlockRules::Head head;        // of what stands inside
   BlockRules::Clauses clauses;  // that may come behind it
@@ -36,12 +37,13 @@ constexpr auto kFactsOfKinds = [] {
                             Clauses clauses = Clauses::kNone) {
     for (const LineKind kind : kinds) table[static_cast<size_t>(kind)] = {role, head, clauses};
   };
-  set({LineKind::kBlankLine, LineKind::kComment}, Role::kNothing);
+  set({LineKind::kBlankLine}, Role::kBlank);
+  set({LineKind::kComment}, Role::kComment);
   set({LineKind::kStringExpression, LineKind::kAssignment, LineKind::kPass, LineKind::kRaise, LineKind::kAssert,
-       LineKind::kReturn, LineKind::kImport, LineKind::kPrint, LineKind::kDelete, LineKind::kTypeStatement},
+       LineKind::kReturn, LineKind::kPrint, LineKind::kDelete, LineKind::kTypeStatement},
       Role::kPlain);
   set({LineKind::kUnknown}, Role::kMaybePlain);
-  set({LineKind::kFromImport}, Role::kImport);
+  set({LineKind::kImport, LineKind::kFromImport}, Role::kImport);
   set({LineKind::kWith}, Role::kHead);
   set({LineKind::kIfBeginning}, Role::kHead, Head::kPlain, Clauses::kElif);
   set({LineKind::kForBeginning, LineKind::kWhileBeginning}, Role::kHead, Head::kLoop, Clauses::kElse);
@@ -87,22 +89,30 @@ bool IsFutureFeature(Text name, Version version) {
 }  // namespace
 
 void BlockRules::Check(const SourceText& source, std::span<const LineRow> rows, Version version,
-                       const Readings& readings) {
+                       const Readings& readings, std::span<LineResult> places) {
   source_ = &source;
   rows_ = rows;
   version_ = version;
   readings_ = &readings;
   next_rejected_ = next_irrefutable_ = 0;
+  places_ = places.data();
+  next_place_ = {};
+  outside_inline_.reset();
   blocks_.clear();
-  blocks_.push_back({0, 0, Head::kFile});
+  blocks_.push_back({0, 0, next_place_, Head::kFile});
   inline_.clear();
   head_index_ = last_index_ = told_row_ = kNoRow;
   watch_ = kFutureImports;
   has_async_definitions_ = false;
+  imports_.clear();
   declarations_.clear();
   findings_.clear();
   for (size_t i = GoOn(0); i < rows.size(); i = GoOn(i + 1)) {
-    if (RoleOf(rows[i].kind) != Role::kNothing) Next(i);
+    const Role role = RoleOf(rows[i].kind);
+    if (role > Role::kComment)
+      Next(i);
+    else if (role == Role::kComment)
+      places_[i].LinePlace::operator=(next_place_);
   }
   End();
 }
@@ -124,83 +134,96 @@ const BlockRules::Irrefutable* BlockRules::IrrefutableAt(size_t index) {
 // What is known of the rows so far is kept at hand here, and is that of the object again at the end. Nothing of a row
 // counts until it is certain.
 size_t BlockRules::GoOn(size_t index) {
+  if (outside_inline_ && (index == rows_.size() || !rows_[index].continues_physical_line)) {
+    next_place_ = *outside_inline_;
+    outside_inline_.reset();
+  }
   if ((watch_ & ~kHead) != 0) return index;
   const Token* const tokens = source_->tokens.data();
-  const uint32_t* const line_starts = source_->line_starts.data();
-  const char* const begin = source_->begin();
   const LineRow* const rows = rows_.data();
   const LineRow* const end = rows + NextRejected(index);
   blocks_.resize(blocks_.size() + kDeepBlocks);
   Block* top = &blocks_.back() - kDeepBlocks;
   const Block* const deepest = blocks_.data() + kDeepBlocks - 1;
-  uint32_t head_index = head_index_;
+  LinePlace within = next_place_;  // a definition whose head was the last row
+  const LinePlace* next_place = &within;
+  LineResult* place = places_ + index;
+  const LineRow* head_row = head_index_ != kNoRow ? rows + head_index_ : nullptr;
   Head head = head_;
   const LineRow* last = nullptr;
   const LineRow* row = rows + index;
-  for (; row < end; ++row) {
+  for (; row < end; ++row, ++place) {
     const FactsOfKind& facts = FactsOf(*row);
-    if (facts.role == Role::kNothing) continue;
-    if ((row->continues_physical_line | row->has_inline_body | row->is_async) != 0) break;
+    if (facts.role <= Role::kComment) {
+      if (facts.role == Role::kComment) place->LinePlace::operator=(*next_place);
+      continue;
+    }
+    if ((row->unusual & UnusualTokens::kPlace) != 0) break;
     const Token* const toks = tokens + row->first_token;
-    const uint32_t column = row->indent;
-    const auto narrow = static_cast<uint32_t>(toks->text - (begin + line_starts[row->first_line]));
-    if (narrow != column) break;
-    bool is_decorator = false;
+    Clauses plain = Clauses::kNone;
     if (facts.role >= Role::kHead) {
       if (facts.role >= Role::kMatch || toks[row->token_count - 1].code != tok::COLON) break;
     } else if (facts.role == Role::kMaybePlain) {
       const TokenCode first = toks->code;
       if (first == word::kGlobal || first == word::kNonlocal || IsSkipCode(first)) break;
-      is_decorator = first == tok::AT;
-      // What stands behind a decorator on its line is in no row.
-      if (is_decorator && !IsLineEnd(*toks[row->token_count - 1].end())) break;
+      if (first == tok::AT) {
+        // What stands behind a decorator on its line is in no row.
+        if (!IsLineEnd(*toks[row->token_count - 1].end())) break;
+        plain = Clauses::kDecorated;
+      }
     } else if (facts.role != Role::kPlain) {
       if (facts.role != Role::kImport || row->token_count < 2 || toks[1].length == kFuture.size()) break;
     }
 
+    const uint32_t column = row->indent;
     Block* block = top;
-    if (head_index != kNoRow) {
-      if (facts.role >= Role::kClause || column <= top->column || narrow <= top->narrow_column || top >= deepest ||
-          head == Head::kMatch)
-        break;
-      ++block;
-      *block = {column, narrow, head};
-      block->head_row = head_index;
-    } else if (column != top->column) {
+    if (head_row != nullptr) {
+      if (facts.role >= Role::kClause || column <= top->column || top >= deepest || head == Head::kMatch) break;
+      *++block = {column, column, *next_place, head};
+      block->place.first_in_def = false;
+      block->head_row = static_cast<uint32_t>(head_row - rows);
+    } else {
       // The first one stands at the margin.
       while (column < block->column && block->clauses < Clauses::kTry) --block;
       if (column != block->column) break;
+      next_place = &block->place;
     }
-    if (narrow != block->narrow_column) break;
     if (facts.role < Role::kHead) {
       const Clauses before = block->clauses;
-      if (before >= Clauses::kTry && (before != Clauses::kDecorated || !is_decorator)) break;
-      block->clauses = is_decorator ? Clauses::kDecorated : Clauses::kNone;
-      head_index = kNoRow;
+      if (before >= Clauses::kTry && (before != Clauses::kDecorated || plain != Clauses::kDecorated)) break;
+      block->clauses = plain;
+      if (facts.role == Role::kImport) imports_.push_back(static_cast<uint32_t>(row - rows));
+      head_row = nullptr;
     } else {
-      const bool is_named_except = row->token_count > 2 && IsNameCode(toks[1].code);
-      if (!TakesHead(row->kind, is_named_except, *block)) break;
-      head_index = static_cast<uint32_t>(row - rows);
+      if (!TakesHead(*row, toks, *block)) break;
+      head_row = row;
       head = facts.head;
+    }
+    place->LinePlace::operator=(*next_place);
+    next_place = &block->place;
+    if (facts.role == Role::kDefinitionHead) {
+      within = block->place.Within(*row);
+      next_place = &within;
     }
     top = block;
     last = row;
   }
+  next_place_ = *next_place;
   blocks_.resize(static_cast<size_t>(top - blocks_.data()) + 1);
   if (last != nullptr) {
     inline_.clear();
     last_index_ = static_cast<uint32_t>(last - rows);
   }
-  head_index_ = head_index;
+  head_index_ = head_row != nullptr ? static_cast<uint32_t>(head_row - rows) : kNoRow;
   head_ = head;
-  watch_ = head_index != kNoRow ? kHead : 0;
+  watch_ = head_row != nullptr ? kHead : 0;
   return static_cast<size_t>(row - rows);
 }
 
 // The head of a statement or of one of its clauses, in its block: whether it is in its place there.
-inline bool BlockRules::TakesHead(LineKind kind, bool is_named_except, Block& block) {
+inline bool BlockRules::TakesHead(const LineRow& row, const Token* toks, Block& block) {
   const Clauses before = block.clauses;
-  const FactsOfKind& facts = kFactsOfKinds[static_cast<size_t>(kind)];
+  const FactsOfKind& facts = FactsOf(row);
   Clauses next = facts.clauses;
   if (facts.role < Role::kClause) {
     if (before >= Clauses::kTry && (before != Clauses::kDecorated || facts.role != Role::kDefinitionHead)) return false;
@@ -209,13 +232,14 @@ inline bool BlockRules::TakesHead(LineKind kind, bool is_named_except, Block& bl
       block.bare_except = kNoRow;
     }
   } else if (facts.role == Role::kExcept) {
+    const bool is_named = row.token_count > 2 && IsNameCode(toks[1].code);
     if ((before != Clauses::kTry && before != Clauses::kExcept) || block.has_except_star ||
-        block.bare_except != kNoRow || !is_named_except)
+        block.bare_except != kNoRow || !is_named)
       return false;
     block.has_except = true;
-  } else if (kind == LineKind::kElifBeginning) {
+  } else if (row.kind == LineKind::kElifBeginning) {
     if (before != Clauses::kElif) return false;
-  } else if (kind == LineKind::kElseBeginning) {
+  } else if (row.kind == LineKind::kElseBeginning) {
     if (before != Clauses::kElif && before != Clauses::kElse && before != Clauses::kExcept) return false;
     if (before == Clauses::kExcept) next = Clauses::kTryElse;
   } else if (before != Clauses::kTry && before != Clauses::kExcept && before != Clauses::kTryElse) {
@@ -230,7 +254,7 @@ void BlockRules::Next(size_t index) {
   const bool was_rejected = NextRejected(index) == index;
   const TokenSpan toks = TokensOf(row);
   const size_t last = LastSignificant(toks);
-  if (last == toks.size()) return;
+  if (last == toks.size()) return PassOver(index);
   if (row.continues_physical_line) {
     ContinueLine(index, row);
   } else {
@@ -238,6 +262,8 @@ void BlockRules::Next(size_t index) {
     Indent(index, row);
     Clause(index, row, was_rejected);
   }
+  Place(index);
+  if (FactsOf(row).role == Role::kImport) imports_.push_back(static_cast<uint32_t>(index));
   const TokenCode code = toks[last].code;
   if (code == word::kBreak || code == word::kContinue) Jump(index, row, last);
   if (Watches(kStarredExcept)) [[unlikely]] {
@@ -286,6 +312,32 @@ void BlockRules::End() {
   }
 }
 
+// ---- places ----
+
+void BlockRules::Place(size_t index) {
+  const LineRow& row = rows_[index];
+  places_[index].LinePlace::operator=(next_place_);
+  next_place_.first_in_def = false;
+  if (!IsDefinitionKind(row.kind)) return;
+  if (!row.has_inline_body)
+    outside_inline_.reset();
+  else if (!outside_inline_)
+    outside_inline_ = next_place_;
+  next_place_ = next_place_.Within(row);
+}
+
+void BlockRules::PassOver(size_t index) {
+  const LineRow& row = rows_[index];
+  if (!row.continues_physical_line) {
+    const auto ended = std::ranges::find_if(blocks_, [&](const Block& block) { return block.column >= row.indent; });
+    if (ended != blocks_.end()) {
+      next_place_ = ended->place;
+      for (auto block = ended; block != blocks_.end(); ++block) block->place = next_place_;
+    }
+  }
+  Place(index);
+}
+
 // ---- indentation ----
 
 void BlockRules::Indent(size_t index, const LineRow& row) {
@@ -294,6 +346,7 @@ void BlockRules::Indent(size_t index, const LineRow& row) {
   const bool may_indent = head_index_ != kNoRow || Watches(kRejection);
   const bool must_indent = head_index_ != kNoRow && !Watches(kRejection);
   const Block& top = blocks_.back();
+  if (column == top.column) next_place_ = top.place;
   if (column > top.column) {
     const bool is_mixed = narrow <= top.narrow_column;
     if (is_mixed && version_.AtLeast(3, 0)) {
@@ -330,8 +383,10 @@ void BlockRules::Push(size_t index, uint32_t column, uint32_t narrow_column, Hea
     Add(index, Context::At({0, 0}), "too many levels of indentation", true, SyntaxError::Kind::kIndentation);
   }
   if (blocks_.size() >= kDeepBlocks && head != Head::kUnknown) CheckNesting(head_index_);
-  blocks_.push_back({column, narrow_column, head, clauses});
+  blocks_.push_back({column, narrow_column, next_place_, head, clauses});
+  blocks_.back().place.first_in_def = false;
   if (head != Head::kUnknown) blocks_.back().head_row = head_index_;
+  if (narrow_column != column) SetWatch(kTabs, true);
 }
 
 void BlockRules::Dedent(size_t index, const LineRow& row, uint32_t column, uint32_t narrow_column) {
@@ -339,6 +394,7 @@ void BlockRules::Dedent(size_t index, const LineRow& row, uint32_t column, uint3
   while (left > 1 && blocks_[left - 1].column > column) --left;
   const Block& now = blocks_[left - 1];
   const bool fits = now.column == column;
+  next_place_ = fits ? now.place : blocks_[left].place;
   if (!fits && !Watches(kRejection)) {
     const char* const begin = source_->begin() + source_->line_starts[row.first_line];
     const char* end = begin;
@@ -356,6 +412,7 @@ void BlockRules::Dedent(size_t index, const LineRow& row, uint32_t column, uint3
     else if (blocks_.back().clauses == Clauses::kDecorated)
       Add(index, Context::At({0, 0}), "unexpected unindent", true, SyntaxError::Kind::kIndentation);
   }
+  SetWatch(kTabs, std::ranges::any_of(blocks_, [](const Block& block) { return block.narrow_column != block.column; }));
   if (!fits) Push(index, column, narrow_column, Head::kUnknown, Clauses::kUnknown);
 }
 

@@ -1,16 +1,19 @@
 // What the statements of a file may not say to each other: indentation, blocks that are missing, clauses without
 // what they are clauses of, and statements in a place where they mean nothing.
 //
-// One pass over the rows, when all of them are read. A stack holds the open blocks, by their indentation; each knows
-// what heads it and which clauses may come next in it. A statement that its own reading rejected says little about
-// what was meant: nothing is concluded from it, so that one fault is told once.
+// One pass over the rows, and another one where the readings of the rows told something. A stack holds the open blocks,
+// by their indentation; each knows what heads it, which clauses may come next in it and in which definitions it stands:
+// the places of the rows are told by the way, as a ScopeTracker tells them. A statement that its own reading rejected
+// says little about what was meant: nothing is concluded from it, so that one fault is told once.
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <span>
 #include <string>
 #include <vector>
 
+#include "analysis/line_result.h"
 #include "foundations/errors.h"
 #include "lines/cutter.h"
 
@@ -40,11 +43,13 @@ class BlockRules {
       rejected.clear();
       irrefutable.clear();
     }
+    bool tell_nothing() const { return rejected.empty() && irrefutable.empty(); }
   };
 
   // What a kind of row is to the blocks.
   enum class Role : uint8_t {
-    kNothing,
+    kBlank,
+    kComment,
     kOther,  // jumps
     kPlain,  // a statement that holds no others
     kMaybePlain,
@@ -61,10 +66,14 @@ class BlockRules {
   // Which clauses may come next: those of the statement that stands last in a block. From kTry on something has to.
   enum class Clauses : uint8_t { kNone, kElse, kElif, kExcept, kTryElse, kUnknown, kTry, kDecorated, kCase };
 
-  // What is wrong is in findings().
-  void Check(const SourceText& source, std::span<const LineRow> rows, Version version, const Readings& readings);
+  // What is wrong is in findings(). Fills in the places of the rows, which do not depend on the readings. The source
+  // was cut completely.
+  void Check(const SourceText& source, std::span<const LineRow> rows, Version version, const Readings& readings,
+             std::span<LineResult> places);
 
   std::vector<Finding>& findings() { return findings_; }
+  // The rows that are imports.
+  const std::vector<uint32_t>& imports() const { return imports_; }
   // What gives reason to look at the names of the source (name_rules.h): the rows that hold `global` or `nonlocal`.
   const std::vector<uint32_t>& declarations() const { return declarations_; }
   bool has_async_definitions() const { return has_async_definitions_; }
@@ -73,11 +82,12 @@ class BlockRules {
   static constexpr uint32_t kNoRow = UINT32_MAX;
 
   // What makes the next row one to look at.
-  enum Watch : uint8_t { kHead = 1, kRejection = 2, kFutureImports = 4, kStarredExcept = 8 };
+  enum Watch : uint8_t { kHead = 1, kRejection = 2, kFutureImports = 4, kStarredExcept = 8, kTabs = 16 };
 
   struct Block {
     uint32_t column;
     uint32_t narrow_column;  // with tabs one wide
+    LinePlace place;         // of its rows, but for the first one
     Head head;
     Clauses clauses = Clauses::kNone;
     // Of the try whose clauses may come.
@@ -92,9 +102,13 @@ class BlockRules {
   // Goes over rows that are one more plain statement, head, clause or decorator in its place, as most are, and gives
   // the first one from `index` on that is not: it goes to Next.
   size_t GoOn(size_t index);
-  static bool TakesHead(LineKind kind, bool is_named_except, Block& block);
+  static bool TakesHead(const LineRow& row, const Token* toks, Block& block);
   void Next(size_t index);
   void End();
+  // Gives the row the place that was found for it.
+  void Place(size_t index);
+  // What no grammar sees belongs to no block, and ends definitions by its indentation all the same.
+  void PassOver(size_t index);
   // The first row from `index` on that the grammar rejected, or how many rows there are; asked in order, as the other.
   size_t NextRejected(size_t index);
   const Irrefutable* IrrefutableAt(size_t index);
@@ -132,13 +146,17 @@ class BlockRules {
   std::span<const LineRow> rows_;
   Version version_;
   std::vector<Block> blocks_;
-  std::vector<Head> inline_;      // heads whose bodies are on the line under way
-  uint32_t head_index_ = kNoRow;  // the head that waits for its block
-  Head head_ = Head::kPlain;      // what it is to that
-  uint32_t last_index_ = kNoRow;  // the statement before
-  uint32_t told_row_ = kNoRow;    // the last one of which something was told
+  LineResult* places_ = nullptr;             // a row each
+  LinePlace next_place_;                     // of what comes next, unless it ends a block
+  std::optional<LinePlace> outside_inline_;  // the same behind this line, which holds the body of a definition
+  std::vector<Head> inline_;                 // heads whose bodies are on the line under way
+  uint32_t head_index_ = kNoRow;             // the head that waits for its block
+  Head head_ = Head::kPlain;                 // what it is to that
+  uint32_t last_index_ = kNoRow;             // the statement before
+  uint32_t told_row_ = kNoRow;               // the last one of which something was told
   uint8_t watch_ = 0;
   bool has_async_definitions_ = false;
+  std::vector<uint32_t> imports_;
   std::vector<uint32_t> declarations_;
   const Readings* readings_ = nullptr;
   size_t next_rejected_ = 0;     // of readings_

@@ -211,7 +211,7 @@ uint8_t CloserLook::DoubtOfToken(const LogicalLine& line, size_t i) const {
       return if_so(IsUnusualNumber(token, next, python3_ && minor_ >= 6));
     case tok::STRING:
       return if_so(IsUnusualString(line.toks, i, python3_, minor_ >= 6) ||
-                   !WrongEscape(token.view(), python3_).empty());
+                   (!UnusualTokens::HasPlainEscapes(token.view()) && !WrongEscape(token.view(), python3_).empty()));
     case tok::STAR:
       return if_so(IsStarredWithNameBehind(line.toks, i));
     case tok::VBAREQUAL:

@@ -75,7 +75,8 @@ FileAnalyzer::Analyzer& FileAnalyzer::AnalyzerForSource() {
 void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   Reset(bytes);
   Cut();
-  if (options_.reads_completely) typing_.Read(*found_.source, found_.rows);
+  FindPlaces();
+  if (options_.reads_completely) typing_.Read(*found_.source, found_.rows, block_rules_.imports());
   Analyzer& analyzer_and_shapes = AnalyzerForSource();
   CPGenAnalyzerImpl& analyzer = analyzer_and_shapes.analyzer;
   analyzer.set_spells_error_texts(options_.keeps_whole_errors);
@@ -84,23 +85,35 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   const NodePool& other_pool = analyzer.type_hint_walker().hint_parser().factory().pool();
   const auto node_count = [&] { return pool.node_count() + other_pool.node_count(); };
   const size_t nodes_before = node_count();
-  found_.results.reserve(found_.rows.size());
   // The text, and the copy of it that the caller has.
   held_before_ = 2 * found_.source->size() + SizeOf(found_.source->tokens) + SizeOf(found_.source->line_starts) +
-                 SizeOf(found_.rows);
+                 SizeOf(found_.rows) + SizeOf(found_.results);
   CountMemory();
   wanted_.assign(filter != nullptr ? found_.rows.size() : 0, false);
   const bool is_filtered = filter != nullptr && filter->Choose(*found_.source, found_.rows, wanted_);
   const bool has_rules = options_.reads_completely && !is_filtered;
   LogicalLine line;
+  uint32_t record_end = 0, arg_record_end = 0;
   for (size_t i = 0; i < found_.rows.size(); ++i) {
     const LineRow& row = found_.rows[i];
+    LineResult& result = found_.results[i];
+    result.record_begin = result.record_end = record_end;
+    result.arg_record_begin = result.arg_record_end = arg_record_end;
+    // A comment says nothing but types.
+    const bool is_silent = row.token_count == 0 || (row.kind == LineKind::kComment && row.no_embedded);
+    if (is_silent || (is_filtered && !wanted_[i])) continue;
     CheckMemory(std::max(MostMemoryOf(row), sizeof(CNode) * (node_count() - nodes_before)));
-    AnalyzeRow(analyzer_and_shapes, row, !is_filtered || wanted_[i], line);
+    row_under_way_ = i;
+    result.error = AnalyzeRow(analyzer_and_shapes, i, line);
+    result.record_end = record_end = static_cast<uint32_t>(found_.store.rows.size());
+    result.arg_record_end = arg_record_end = static_cast<uint32_t>(found_.store.arg_rows.size());
     CountMemory();
   }
+  row_under_way_ = found_.rows.size();
+  CountMemory();
   if (has_rules) {
-    block_rules_.Check(*found_.source, found_.rows, options_.version, readings_);
+    if (!readings_.tell_nothing())
+      block_rules_.Check(*found_.source, found_.rows, options_.version, readings_, found_.results);
     AddFindings(analyzer);
     ApplyNameRules();
     AddFindings(analyzer);
@@ -119,8 +132,8 @@ void FileAnalyzer::Reset(Text bytes) {
   DropIfHuge(found_.source->line_starts);
   if (found_.store.texts.byte_size() > kKeptMemory) found_.store.texts = TextArena();
   found_.store.Reset();
-  scopes_.Reset();
   readings_.Clear();
+  row_under_way_ = 0;
   found_.source->Assign(bytes);
   memory_limit_ = std::max(options_.least_memory_limit, kMemoryPerSourceByte * bytes.size());
   held_ = 0;
@@ -137,48 +150,44 @@ void FileAnalyzer::Cut() {
   }
 }
 
-void FileAnalyzer::AnalyzeRow(Analyzer& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line) {
-  LineResult result;
-  const LinePlace place = scopes_.Next(row);
-  result.in_async_def = place.in_async_def;
-  result.first_in_def = place.first_in_def;
-  result.depth = place.depth;
-  result.record_begin = static_cast<uint32_t>(found_.store.rows.size());
-  result.arg_record_begin = static_cast<uint32_t>(found_.store.arg_rows.size());
-  // A comment says nothing but types.
-  const bool is_silent = row.kind == LineKind::kComment && row.no_embedded;
-  if (row.token_count != 0 && is_wanted && !is_silent) {
-    SetFromRow(line, found_.source, row);
-    line.parsed = false;
-    line.WriteTo(&found_.store);
-    const bool is_doubtful = CloserLook::MayBeDoubtful(row.unusual, place) && analyzer.analyzer.IsDoubtful(line, place);
-    assert(is_doubtful || !options_.reads_completely || row.kind == LineKind::kComment ||
-           !analyzer.analyzer.IsDoubtful(line, place));
-    if (is_doubtful || !analyzer.shapes.Tell(line, place, typing_))
-      result.error = AnalyzeLine(analyzer.analyzer, line, place, is_doubtful);
-  }
-  result.record_end = static_cast<uint32_t>(found_.store.rows.size());
-  result.arg_record_end = static_cast<uint32_t>(found_.store.arg_rows.size());
-  found_.results.push_back(result);
+void FileAnalyzer::FindPlaces() {
+  found_.results.resize(found_.rows.size());
+  if (options_.reads_completely)
+    return block_rules_.Check(*found_.source, found_.rows, options_.version, readings_, found_.results);
+  ScopeTracker scopes;
+  LineResult* result = found_.results.data();
+  for (const LineRow& row : found_.rows) scopes.Next(row, *result++);
 }
 
-int32_t FileAnalyzer::AnalyzeLine(CPGenAnalyzerImpl& analyzer, LogicalLine& line, const LinePlace& place,
-                                  bool is_doubtful) {
+int32_t FileAnalyzer::AnalyzeRow(Analyzer& analyzer, size_t row, LogicalLine& line) {
+  const LinePlace& place = found_.results[row];
+  SetFromRow(line, found_.source, found_.rows[row]);
+  line.parsed = false;
+  line.WriteTo(&found_.store);
+  const bool is_doubtful =
+      CloserLook::MayBeDoubtful(found_.rows[row].unusual, place) && analyzer.analyzer.IsDoubtful(line, place);
+  assert(is_doubtful || !options_.reads_completely || line.kind == LineKind::kComment ||
+         !analyzer.analyzer.IsDoubtful(line, place));
+  if (!is_doubtful && analyzer.shapes.Tell(line, place, typing_)) return -1;
+  return AnalyzeLine(analyzer.analyzer, row, line, is_doubtful);
+}
+
+int32_t FileAnalyzer::AnalyzeLine(CPGenAnalyzerImpl& analyzer, size_t row, LogicalLine& line, bool is_doubtful) {
+  const LinePlace& place = found_.results[row];
   if (!options_.reads_completely) {
     const auto error = analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def);
     return error ? AddError(*error) : -1;
   }
   const auto error = analyzer.AnalyzeCompletely(line, place, typing_, is_doubtful);
   if (analyzer.was_rejected() || line.kind == LineKind::kCase) [[unlikely]]
-    Note(analyzer, line);
+    Note(analyzer, row);
   return error ? AddError(*error) : -1;
 }
 
-void FileAnalyzer::Note(const CPGenAnalyzerImpl& analyzer, const LogicalLine& line) {
-  const size_t row = found_.results.size();
+void FileAnalyzer::Note(const CPGenAnalyzerImpl& analyzer, size_t row) {
   if (analyzer.was_rejected()) return readings_.rejected.push_back(row);
   const CompleteParser& parser = analyzer.complete_parser();
-  if (line.kind == LineKind::kCase && !parser.irrefutable().empty())
+  if (found_.rows[row].kind == LineKind::kCase && !parser.irrefutable().empty())
     readings_.irrefutable.push_back({row, parser.irrefutable_at(), parser.irrefutable()});
 }
 
@@ -236,8 +245,8 @@ size_t FileAnalyzer::MostMemoryOf(const LineRow& row) const {
 }
 
 void FileAnalyzer::CountMemory() {
-  held_ = held_before_ + SizeOf(found_.results) + SizeOf(found_.errors) + SizeOf(found_.store.rows) +
-          SizeOf(found_.store.arg_rows) + found_.store.texts.byte_size();
+  held_ = held_before_ + SizeOf(found_.errors) + SizeOf(found_.store.rows) + SizeOf(found_.store.arg_rows) +
+          found_.store.texts.byte_size();
 }
 
 void FileAnalyzer::ThrowTooLarge() const {

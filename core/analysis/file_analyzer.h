@@ -16,10 +16,10 @@
 
 #include "analysis/analyzer.h"
 #include "analysis/block_rules.h"
+#include "analysis/line_result.h"
 #include "analysis/name_rules.h"
 #include "analysis/statement_shapes.h"
 #include "lines/cutter.h"
-#include "lines/scopes.h"
 
 namespace quillet {
 
@@ -34,15 +34,7 @@ class RowFilter {
 
 class FileAnalyzer {
  public:
-  // What became of one logical line: its place, and its ranges of records. Parallel to rows().
-  struct LineResult {
-    uint32_t record_begin = 0, record_end = 0;          // in store().rows
-    uint32_t arg_record_begin = 0, arg_record_end = 0;  // in store().arg_rows
-    int32_t error = -1;                                 // index in errors(), -1 without one
-    uint32_t depth = 0;                                 // of the definitions around it
-    bool in_async_def = false;
-    bool first_in_def = false;
-  };
+  using LineResult = quillet::LineResult;
 
   // What became of a statement that does not parse, without the text that nobody shows.
   struct Failure {
@@ -78,7 +70,7 @@ class FileAnalyzer {
   struct Found {
     Ref<SourceText> source;
     std::vector<LineRow> rows;
-    std::vector<LineResult> results;
+    std::vector<LineResult> results;  // parallel to the rows
     RecordStore store;
     std::vector<Failure> errors;
     std::unordered_set<std::string> error_texts;  // that those refer to
@@ -100,6 +92,8 @@ class FileAnalyzer {
   const SourceText& source() const { return *found_.source; }
   std::span<const LineRow> rows() const { return found_.rows; }
   std::span<const LineResult> results() const { return found_.results; }
+  // The row that is read, or how many there are when all of them were.
+  size_t row_under_way() const { return row_under_way_; }
   const RecordStore& store() const { return found_.store; }
   const std::vector<Failure>& errors() const { return found_.errors; }
   // Where the error of a row lies in the source; the row must have one.
@@ -121,13 +115,15 @@ class FileAnalyzer {
   Analyzer& AnalyzerForSource();
   void Reset(Text bytes);
   void Cut();
-  void AnalyzeRow(Analyzer& analyzer, const LineRow& row, bool is_wanted, LogicalLine& line);
+  // Makes the results of the rows, which tell nothing but their places yet.
+  void FindPlaces();
   // The index of its error, or -1.
-  int32_t AnalyzeLine(CPGenAnalyzerImpl& analyzer, LogicalLine& line, const LinePlace& place, bool is_doubtful);
+  int32_t AnalyzeRow(Analyzer& analyzer, size_t row, LogicalLine& line);
+  int32_t AnalyzeLine(CPGenAnalyzerImpl& analyzer, size_t row, LogicalLine& line, bool is_doubtful);
   // Returns its index.
   int32_t AddError(const SyntaxError& error);
   // What the line that was just read has to say to those around it.
-  void Note(const CPGenAnalyzerImpl& analyzer, const LogicalLine& line);
+  void Note(const CPGenAnalyzerImpl& analyzer, size_t row);
   void AddFindings(CPGenAnalyzerImpl& analyzer);
   void ApplyNameRules();
   // What the analysis of a row may take beside its results, at most.
@@ -141,7 +137,7 @@ class FileAnalyzer {
   std::unique_ptr<Analyzer> print_function_analyzer_;  // built at first need
   Found found_;
   std::vector<bool> wanted_;  // of the rows, where there is a filter
-  ScopeTracker scopes_;
+  size_t row_under_way_ = 0;
   BlockRules::Readings readings_;
   BlockRules block_rules_;
   std::unique_ptr<NameRules> name_rules_;  // built at first need

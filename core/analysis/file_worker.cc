@@ -21,8 +21,7 @@ struct Reports {
   std::vector<BatchResult::Message>* messages = nullptr;
 
   void Add(std::string text) {
-    // The line under way is the one that has no result yet.
-    const size_t row = file->results().size();
+    const size_t row = file->row_under_way();
     const uint32_t line = row < file->rows().size() ? file->rows()[row].first_line + 1 : 1;
     messages->push_back({line, 1, std::move(text)});
   }

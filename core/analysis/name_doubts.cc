@@ -27,7 +27,6 @@ class NameDoubts {
     const TokenSpan toks = TokensOf(declaration);
     size_t at = 0;
     while (at < toks.size() && !IsDeclaring(toks[at].code)) ++at;
-    if (HoldsEmbedded(head, declaration)) return true;
     // Its own name is not in its scope.
     const size_t name_end = rows_[head].first_token + (rows_[head].is_async ? size_t{3} : size_t{2});
     // Nor do declarations like this one matter.
@@ -45,7 +44,7 @@ class NameDoubts {
         continue;
       }
       const Text name = toks[i].view();
-      if (!IsAscii(name) || Holds(head_toks, name) || Holds(in_front, name) ||
+      if (!IsAscii(name) || Holds(head_toks, name) || Holds(in_front, name) || MayBeEmbedded(head, declaration, name) ||
           IsAnnotatedBehind(declaration, head, name))
         return true;
       if (is_nonlocal && !IsBoundAround(head, name)) return true;
@@ -131,10 +130,18 @@ class NameDoubts {
   }
 
   // What stands in a string is no token here.
-  bool HoldsEmbedded(size_t head, size_t row) {
+  bool MayBeEmbedded(size_t head, size_t row, Text name) {
     Spend(row - head);
-    return std::any_of(rows_.begin() + static_cast<ptrdiff_t>(head), rows_.begin() + static_cast<ptrdiff_t>(row) + 1,
-                       [](const LineRow& each) { return !each.no_embedded; });
+    for (size_t i = head; i <= row; ++i) {
+      if (rows_[i].no_embedded || rows_[i].token_count == 0) continue;
+      const TokenSpan toks = TokensOf(i);
+      Spend(toks.size());
+      if (std::ranges::any_of(toks, [&](const Token& token) {
+            return (token.code == tok::STRING || token.code == tok::COMMENT) && token.view().find(name) != Text::npos;
+          }))
+        return true;
+    }
+    return false;
   }
 
   bool IsAnnotatedBehind(size_t row, size_t head, Text name) {

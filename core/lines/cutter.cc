@@ -234,8 +234,10 @@ class Cutter {
     facts_ = {};
   }
 
-  void BeginStatement(uint32_t indent, const ScanOutput& out) {
+  void BeginStatement(uint32_t indent, uint32_t bytes, const ScanOutput& out) {
     indent_ = indent;
+    if (bytes != indent) [[unlikely]]
+      unusual_.SeePlace();
     BeginPiece(false, out);
   }
 
@@ -291,13 +293,14 @@ class Cutter {
   void SeeOperator(char first, TokenCode code) { unusual_.SeeOperator(first, code); }
   void SeeWalrus() { unusual_.SeeWalrus(); }
   void SeeNumber(Text number) { unusual_.SeeNumber(number); }
-  void SeeString(Text string) { unusual_.SeeString(string); }
+  void SeeString(Text string, TokenCode before) { unusual_.SeeString(string, before); }
 
  private:
   void BeginPiece(bool continues, const ScanOutput& out) {
     first_ = out.token_count();
     first_line_ = out.line();
     continues_ = continues;
+    if (continues) unusual_.SeePlace();
   }
 
   TokenCode LastSignificantCode(const ScanOutput& out) const {
@@ -328,6 +331,7 @@ class Cutter {
     const Statement statement(toks, first_, end, facts_, python2_);
     const uint32_t body = statement.IsDefinition() ? statement.InlineBody() : end;
     if (body == end) return AddRow(statement, toks, end, false, out);
+    unusual_.SeePlace();
     const StatementFacts head_facts = FactsOf(toks, first_, body);
     AddRow(Statement(toks, first_, body, head_facts, python2_), toks, body, true, out);
     const StatementFacts body_facts = FactsOf(toks, body, end);

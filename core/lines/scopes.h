@@ -22,52 +22,46 @@ struct LinePlace {
   bool in_class = false;  // directly
   bool in_def = false;    // directly, of either kind
   uint32_t depth = 0;     // of the open definitions around the line; 0 for a blank line
+
+  bool operator==(const LinePlace&) const = default;
+
+  // The place of what comes first in a definition that stands here.
+  LinePlace Within(const LineRow& definition) const {
+    const bool is_def = definition.kind == LineKind::kFunctionDef;
+    return {is_def && definition.is_async, is_def, !is_def, is_def, depth + 1};
+  }
 };
 
 class ScopeTracker {
  public:
-  // For another source; keeps its memory.
-  void Reset() { scopes_.clear(); }
-
-  // The place of the next row's line.
-  LinePlace Next(const LineRow& row);
+  // Fills in the place of the next row's line.
+  void Next(const LineRow& row, LinePlace& place);
 
  private:
   struct Scope {
     uint32_t indent;
-    bool is_def;
-    bool is_async;
-    bool is_inline;     // its body is on its own line and ends with that
-    bool awaits_first;  // no statement of the body was seen
+    bool is_inline;   // its body is on its own line and ends with that
+    LinePlace place;  // of the next line in it
   };
 
   std::vector<Scope> scopes_;
 };
 
-inline LinePlace ScopeTracker::Next(const LineRow& row) {
-  if (row.kind == LineKind::kBlankLine) return {};
+inline void ScopeTracker::Next(const LineRow& row, LinePlace& place) {
+  place = {};
+  if (row.kind == LineKind::kBlankLine) return;
   const bool is_comment = row.kind == LineKind::kComment;
   while (!scopes_.empty() && !row.continues_physical_line) {
     const Scope& scope = scopes_.back();
     if (!scope.is_inline && (is_comment || scope.indent < row.indent)) break;
     scopes_.pop_back();
   }
-
-  LinePlace place;
-  place.depth = static_cast<uint32_t>(scopes_.size());
   if (!scopes_.empty()) {
-    Scope& scope = scopes_.back();
-    place.in_async_def = scope.is_async;
-    place.in_def = scope.is_def;
-    place.in_class = !scope.is_def;
-    place.first_in_def = scope.is_def && scope.awaits_first;
-    if (!is_comment) scope.awaits_first = false;
+    place = scopes_.back().place;
+    if (!is_comment) scopes_.back().place.first_in_def = false;
   }
-  if (row.kind == LineKind::kFunctionDef || row.kind == LineKind::kClassDef) {
-    const bool is_def = row.kind == LineKind::kFunctionDef;
-    scopes_.push_back({row.indent, is_def, is_def && row.is_async, row.has_inline_body, true});
-  }
-  return place;
+  if (row.kind == LineKind::kFunctionDef || row.kind == LineKind::kClassDef)
+    scopes_.push_back({row.indent, row.has_inline_body, place.Within(row)});
 }
 
 }  // namespace quillet

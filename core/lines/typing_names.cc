@@ -11,12 +11,12 @@ bool IsTypingModule(Text name) { return name == "typing" || name == "typing_exte
 
 }  // namespace
 
-void TypingNames::Read(const SourceText& source, std::span<const LineRow> rows) {
+void TypingNames::Read(const SourceText& source, std::span<const LineRow> rows, std::span<const uint32_t> imports) {
   members_.clear();
   modules_.clear();
   has_star_ = has_renamed_cast_ = false;
-  for (const LineRow& row : rows) {
-    if (row.kind != LineKind::kFromImport && row.kind != LineKind::kImport) continue;
+  for (const uint32_t index : imports) {
+    const LineRow& row = rows[index];
     const TokenSpan toks = TokenSpan(source.tokens).subspan(row.first_token, row.token_count);
     if (row.kind == LineKind::kImport) {
       ReadImport(toks);

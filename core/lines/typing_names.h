@@ -18,8 +18,8 @@ namespace quillet {
 
 class TypingNames {
  public:
-  // Reads the imports among the rows of a source.
-  void Read(const SourceText& source, std::span<const LineRow> rows);
+  // Reads those rows of a source that are imports.
+  void Read(const SourceText& source, std::span<const LineRow> rows, std::span<const uint32_t> imports);
 
   // What the module calls that which stands here under `name`; empty where it is none of its names.
   Text MemberOf(Text name) const;

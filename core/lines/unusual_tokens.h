@@ -4,6 +4,7 @@
 // statements that nothing is to be found in them. Names and operators cost a comparison, brackets and the like nothing.
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
 #include <cstring>
 
@@ -18,11 +19,14 @@ class UnusualTokens {
   enum Reason : uint8_t {
     kReturn = 1,  // that matters outside of functions
     kOther = 2,
+    // No token, but where the statement stands: there is more on its line than its tokens, or more in front of it than
+    // blanks, or it is `async`.
+    kPlace = 4,
   };
 
   explicit UnusualTokens(Version version)
       : python3_(version.AtLeast(3, 0)),
-        is_old_(python3_ && !version.AtLeast(3, 6)),
+        at_first_(python3_ && !version.AtLeast(3, 6) ? kOther : 0),
         operators_(Bit(tok::VBAREQUAL) | Bit(tok::RARROW) | Bit(python3_ ? tok::NOTEQUAL : tok::STAR) |
                    (python3_ && !version.AtLeast(3, 8) ? Bit(tok::SLASH) : 0)) {
     Reset();
@@ -34,7 +38,10 @@ class UnusualTokens {
     static_assert(word::kNone < word::kAsync && word::kAsync < word::kAwait && word::kAwait < word::kNonlocal &&
                   word::kNonlocal < word::kReturn && word::kReturn < word::kYield && word::kYield + 1 == word::kEnd);
     if (code >= word::kNone) [[unlikely]]
-      reasons_ |= code == word::kReturn ? kReturn : code != word::kNone || !python3_ ? kOther : 0;
+      reasons_ |= code == word::kReturn              ? kReturn
+                  : code == word::kAsync             ? kOther | kPlace
+                  : code != word::kNone || !python3_ ? kOther
+                                                     : 0;
   }
   // In front of the name itself.
   void SeeUnderscore(const char* name) {
@@ -50,24 +57,30 @@ class UnusualTokens {
   void SeeNumber(Text number) {
     if (!IsPlainNumber(number)) reasons_ |= kOther;
   }
-  void SeeString(Text string) {
-    if (!IsPlainString(string)) reasons_ |= kOther;
+  // And the code of the token in front.
+  void SeeString(Text string, TokenCode before) {
+    if (!IsPlainString(string) && !ArePlainBytes(string, before)) reasons_ |= kOther;
   }
+  void SeePlace() { reasons_ |= kPlace; }
   // How the statement ends counts where it imports.
   void SeeEndOfImport(const Token& last) {
     if (!IsNameCode(last.code) && last.code != tok::RPAR) reasons_ |= kOther;
   }
 
   uint8_t reasons() const { return reasons_; }
-  void Reset() { reasons_ = is_old_ ? kOther : 0; }
+  void Reset() { reasons_ = at_first_; }
 
   static bool IsHexDigit(char c) { return IsAsciiDigit(c) || ((c | 0x20) >= 'a' && (c | 0x20) <= 'f'); }
 
   // Without a prefix, and without an escape that may be wrong: most are a letter for a line end or a quote.
   static bool IsPlainString(Text string) {
+    const char* const at = string.data();
+    if (!IsQuote(*at)) return (*at | 0x20) == 'r' && IsQuote(at[1]);
+    return HasPlainEscapes(string);
+  }
+  static bool HasPlainEscapes(Text string) {
     const char* at = string.data();
     const char* const end = at + string.size();
-    if (!IsQuote(*at)) return (*at | 0x20) == 'r' && IsQuote(at[1]);
     for (; (at = FindAny<'\\'>(at, end)) < end; at += 2) {
       if (at[1] == 'N' || at[1] == 'U') return false;
       const int digits = at[1] == 'x' ? 2 : at[1] == 'u' ? 4 : 0;
@@ -82,6 +95,20 @@ class UnusualTokens {
 
   static constexpr uint64_t Bit(TokenCode code) { return uint64_t{1} << code; }
 
+  // ASCII, and neither in front of another string nor behind one.
+  static bool ArePlainBytes(Text string, TokenCode before) {
+    const char* const at = string.data();
+    return (*at | 0x20) == 'b' && IsQuote(at[1]) && before != tok::STRING && !IsSkipCode(before) &&
+           std::ranges::none_of(string, [](char c) { return static_cast<unsigned char>(c) >= 0x80; }) &&
+           HasPlainEscapes(string) && !MayBeString(at + string.size());
+  }
+  // What follows behind blanks and line ends, as far as its first bytes tell.
+  static bool MayBeString(const char* at) {
+    while (*at == ' ' || IsLineEnd(*at)) ++at;
+    return *at == '#' || *at == '\\' || *at == '\t' || *at == '\f' || IsQuote(*at) ||
+           (IsAsciiLetter(*at) && (IsQuote(at[1]) || IsQuote(at[2])));
+  }
+
   // One that means the same in every version.
   bool IsPlainNumber(Text number) const {
     const char next = *(number.data() + number.size());
@@ -92,7 +119,7 @@ class UnusualTokens {
   }
 
   const bool python3_;
-  const bool is_old_;         // of versions that lack so much that each statement is looked at
+  const uint8_t at_first_;    // of versions that lack so much that each statement is looked at, a reason
   const uint64_t operators_;  // a bit a code
   uint8_t reasons_;
 };
@@ -105,7 +132,8 @@ struct NoUnusualTokens {
   void SeeOperator(char, TokenCode) {}
   void SeeWalrus() {}
   void SeeNumber(Text) {}
-  void SeeString(Text) {}
+  void SeeString(Text, TokenCode) {}
+  void SeePlace() {}
   void SeeEndOfImport(const Token&) {}
   uint8_t reasons() const { return 0; }
   void Reset() {}

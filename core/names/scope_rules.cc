@@ -157,7 +157,8 @@ class ScopeRules : public NameRules {
     const std::vector<bool> asks = ScopesThatAsk();
     ScopeTracker tracker;
     for (size_t row = 0; row < rows_.size(); ++row) {
-      const LinePlace place = tracker.Next(rows_[row]);
+      LinePlace place;
+      tracker.Next(rows_[row], place);
       if (place.depth == 0 || rows_[row].token_count == 0) continue;
       const TokenSpan toks = TokensOf(row);
       const bool is_star = rows_[row].kind == LineKind::kFromImport && LastCode(toks) == tok::STAR;
@@ -260,7 +261,8 @@ class ScopeRules : public NameRules {
     for (size_t row = 0; row < rows_.size(); ++row) {
       const LineKind kind = rows_[row].kind;
       if (kind == LineKind::kBlankLine || kind == LineKind::kComment) continue;
-      const LinePlace place = tracker.Next(rows_[row]);
+      LinePlace place;
+      tracker.Next(rows_[row], place);
       close(place.depth);
       const TokenSpan toks = TokensOf(row);
       if (!open.empty() && place.in_def) {

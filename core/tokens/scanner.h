@@ -11,7 +11,9 @@
 // strings have a budget for searches that fail.
 //
 // The client is a template argument and its calls are inlined; `out` is what was found so far:
-//   void BeginStatement(uint32_t indent, const ScanOutput& out)   in front of a line's first token
+//   void BeginStatement(uint32_t indent, uint32_t bytes, const ScanOutput& out)   in front of a line's first token,
+//   behind
+//                                              so many bytes of indentation
 //   void BlankLine(uint32_t indent, const ScanOutput& out)
 //   void CommentLine(uint32_t indent, const ScanOutput& out)      behind the line's one token
 //   bool Separator(const ScanOutput& out)      at a ";" outside brackets; true: it becomes no token
@@ -22,13 +24,14 @@
 //   void String(uint32_t index, bool formatted), Comment(Text comment)
 //   void SeeName(TokenCode code), SeeUnderscore(const char* name), SeeOperator(char first, TokenCode code),
 //   SeeWalrus(), SeeNumber(Text number)
-//   SeeString(Text string)                     of a string with a prefix, an escape or lines of its own
+//   SeeString(Text string, TokenCode before)   of a string with a prefix or an escape
 #pragma once
 
 #include <algorithm>
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 #include <vector>
 
 #include "foundations/errors.h"
@@ -174,7 +177,7 @@ class ScanOutput {
 struct TokensOnly {
   void BlankLine(uint32_t, const ScanOutput&) {}
   void CommentLine(uint32_t, const ScanOutput&) {}
-  void BeginStatement(uint32_t, const ScanOutput&) {}
+  void BeginStatement(uint32_t, uint32_t, const ScanOutput&) {}
   bool Separator(const ScanOutput&) { return false; }
   void KeptSeparator(const ScanOutput&) {}
   void EndStatement(const ScanOutput&) {}
@@ -188,7 +191,7 @@ struct TokensOnly {
   void SeeOperator(char, TokenCode) {}
   void SeeWalrus() {}
   void SeeNumber(Text) {}
-  void SeeString(Text) {}
+  void SeeString(Text, TokenCode) {}
 };
 
 template <class Client>
@@ -231,13 +234,7 @@ class Scanner : private ScanOutput {
     while ((at = FindAny<'\n', '\r'>(at, token_end)) < token_end) at = StepLineEnd(at);
   }
 
-  // Of a code that is known here.
   const char* Emit(const char* at, const char* token_end, TokenCode code) {
-    if (code == tok::NUMBER) client_.SeeNumber(Text(at, static_cast<size_t>(token_end - at)));
-    return Keep(at, token_end, code);
-  }
-
-  const char* Keep(const char* at, const char* token_end, TokenCode code) {
     Token& token = tokens_.next();
     token.text = at;
     token.length = static_cast<uint32_t>(token_end - at);
@@ -269,7 +266,7 @@ class Scanner : private ScanOutput {
       default:
         break;
     }
-    client_.BeginStatement(indent, *this);
+    client_.BeginStatement(indent, static_cast<uint32_t>(at - line), *this);
     return ScanStatements(at);
   }
 
@@ -294,7 +291,7 @@ class Scanner : private ScanOutput {
           break;
         case ByteClass::kDot:
           if (IsAsciiDigit(at[1])) {
-            at = Emit(at, NumberEnd(at), tok::NUMBER);
+            at = EmitNumber(at);
           } else {
             const bool ellipsis = at[1] == '.' && at[2] == '.';
             at = Emit(at, at + (ellipsis ? 3 : 1), ellipsis ? tok::ELLIPSIS : tok::DOT);
@@ -315,11 +312,11 @@ class Scanner : private ScanOutput {
             client_.Assign(token_count());
           }
           client_.SeeOperator(c, op.code);
-          at = Keep(at, at + op.length, op.code);
+          at = Emit(at, at + op.length, op.code);
           break;
         }
         case ByteClass::kDigit:
-          at = Emit(at, NumberEnd(at), tok::NUMBER);
+          at = EmitNumber(at);
           break;
         case ByteClass::kQuote:
           at = ScanString(at, at);
@@ -387,7 +384,7 @@ class Scanner : private ScanOutput {
     }
     const TokenCode code = CodeOfPaddedName(at, length);
     client_.SeeName(code);
-    return Keep(at, name_end, code);
+    return Emit(at, name_end, code);
   }
 
   const char* ScanHigh(const char* at) {
@@ -395,10 +392,21 @@ class Scanner : private ScanOutput {
     return name_end != at ? Emit(at, name_end, tok::NAME) : Emit(at, StrayEnd(at, end_), tok::ERRORTOKEN);
   }
 
+  const char* EmitNumber(const char* at) {
+    const char* number_end = NumberEnd(at);
+    client_.SeeNumber(Text(at, static_cast<size_t>(number_end - at)));
+    return Emit(at, number_end, tok::NUMBER);
+  }
+
   const char* EmitComment(const char* at) {
     const char* comment_end = FindAny<'\n', '\r'>(at + 1, end_);
     client_.Comment(Text(at, static_cast<size_t>(comment_end - at)));
     return Emit(at, comment_end, tok::COMMENT);
+  }
+
+  void SeeString(const char* at, const char* string_end) {
+    const TokenCode before = token_count() > 0 ? tokens()[token_count() - 1].code : TokenCode{tok::NEWLINE};
+    client_.SeeString(Text(at, static_cast<size_t>(string_end - at)), before);
   }
 
   // The string whose prefix begins at `at` and whose quotes stand at `quote`.
@@ -420,7 +428,7 @@ class Scanner : private ScanOutput {
       const char* stop;
       if (const char* string_end = NestedFormattedStringEnd(quote, end_, raw, stop)) {
         AddLineStartsWithin(quote, string_end);
-        client_.SeeString(Text(at, static_cast<size_t>(string_end - at)));
+        SeeString(at, string_end);
         return Emit(at, string_end, tok::STRING);
       }
       failed_search_budget_ -= std::min(failed_search_budget_, static_cast<size_t>(stop - quote));
@@ -432,7 +440,7 @@ class Scanner : private ScanOutput {
     if (IsTripleQuote(quote)) return ScanTripleString(at, quote);
     const char* stop = FindInSingleString(quote + 1, end_, *quote);
     if (*stop == *quote && stop < end_) {
-      if (quote != at) client_.SeeString(Text(at, static_cast<size_t>(stop + 1 - at)));
+      if (quote != at) SeeString(at, stop + 1);
       return Emit(at, stop + 1, tok::STRING);
     }
     return ScanEscapedString(at, quote, stop);
@@ -456,7 +464,7 @@ class Scanner : private ScanOutput {
     }
     if (stop < end_ && *stop == *quote) {
       if (crosses_lines) AddLineStartsWithin(quote, stop);
-      client_.SeeString(Text(at, static_cast<size_t>(stop + 1 - at)));
+      SeeString(at, stop + 1);
       return Emit(at, stop + 1, tok::STRING);
     }
     if (crosses_lines) unclosed = {quote, stop};
@@ -468,7 +476,8 @@ class Scanner : private ScanOutput {
     if (!unclosed) {
       if (const char* string_end = TripleStringEnd(quote, end_)) {
         AddLineStartsWithin(quote, string_end);
-        client_.SeeString(Text(at, static_cast<size_t>(string_end - at)));
+        if (quote != at || std::memchr(quote, '\\', static_cast<size_t>(string_end - quote)) != nullptr)
+          SeeString(at, string_end);
         return Emit(at, string_end, tok::STRING);
       }
       // Whatever closed a later string of this kind would have closed this one.

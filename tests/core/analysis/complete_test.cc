@@ -89,5 +89,48 @@ TEST(CompleteReading, DeepNestingIsAnErrorOrIsRead) {
             std::string::npos);
 }
 
+// Sources whose lines stand where nobody would put them.
+constexpr const char* kPlaces[] = {
+    "def f():\n  x\n  # c\n\ny\n# d\nclass C:\n  def g(self):\n    z\n  a = 1\nb\n",
+    "async def f():\n    if x:\n        a\n      b\n   c\n  d\ne\n",
+    "def f():\n        x\n\ty\n    z\n\tdef g():\n\t    a\n  b\n",
+    "def f(): a; b\n# c\n    d\nclass C: x = 1; y\n  def g(self): pass\nz\n",
+    "x; def f():\n  y\n  def g(): a; class D: b; async def h(): c\n  # d\n  e\nf\n",
+    "def f(\nclass C(\n  x\ndef g(:\n# c\n  y\nz\n",
+    "class C:\n  def f(self):\n    x\n\\\n\n    y\n  z\n\\\n",
+    "if a:\n  def f():\n    b\n  else: c\n@d\n  def g():\n    try: e\n    x\n except: y\nz\n",
+};
+
+// In a complete reading places are told by the rules of blocks.
+TEST(CompleteReading, PlacesAreTheSameWhateverIsWrongWithTheBlocks) {
+  FileAnalyzer files(CompleteOptions(Version::Of(3, 12)));
+  for (const std::string source : kPlaces) {
+    for (size_t length = 0; length <= source.size(); ++length) {
+      files.Analyze(source.substr(0, length) + source.substr(std::min(length + 2, source.size())));
+      ScopeTracker scopes;
+      for (size_t row = 0; row < files.rows().size(); ++row) {
+        LinePlace expected;
+        scopes.Next(files.rows()[row], expected);
+        const LinePlace& place = files.results()[row];
+        ASSERT_TRUE(place == expected) << source << " without what stands at " << length << ", row " << row;
+      }
+    }
+  }
+}
+
+TEST(CompleteReading, BytesBesideTextAreAnErrorHoweverTheyAreSetApart) {
+  FileAnalyzer files(CompleteOptions(Version::Of(3, 12)));
+  const auto has_error = [&](const char* source) {
+    files.Analyze(source);
+    return !files.errors().empty();
+  };
+  for (const char* source : {"x = b'a' 'b'\n", "x = 'a' b'b'\n", "x = (b'a'\n  'b')\n", "x = ('a'\n  b'b')\n",
+                             "x = (b'a' # c\n 'b')\n", "x = b'a' \\\n 'b'\n", "x = b'a'\t'b'\n", "x = b'a' f'{b}'\n",
+                             "x = b'a' Rb'b' r'c'\n", "x = b'a'u'b'\n", "x = b'\\x4'\n", "x = b'\xc3\xa9'\n"})
+    EXPECT_TRUE(has_error(source)) << source;
+  for (const char* source : {"x = b'a' b'b', 'c'\n", "x = [b'\\x4f', 'b'] if b'' in b else 'f'\n", "x = b'\\N'\n'b'\n"})
+    EXPECT_FALSE(has_error(source)) << source;
+}
+
 }  // namespace
 }  // namespace quillet

@@ -486,7 +486,8 @@ std::string PlacesOf(Text bytes) {
   ScopeTracker scopes;
   std::string places;
   for (const LineRow& row : cut.rows) {
-    const LinePlace place = scopes.Next(row);
+    LinePlace place;
+    scopes.Next(row, place);
     places += place.in_async_def ? (place.first_in_def ? 'b' : 'a') : (place.first_in_def ? 'f' : '.');
   }
   return places;
@@ -516,14 +517,6 @@ TEST(Scopes, BodiesOnTheLineEndWithIt) {
   EXPECT_EQ(PlacesOf("async def f(): a; b\nc"), ".ba.");
   EXPECT_EQ(PlacesOf("async def f(): a\n# c\n"), ".b.");
   EXPECT_EQ(PlacesOf("async def f():\n  def g(): a; b\n  c"), ".bf.a");
-}
-
-TEST(Scopes, ResetForgets) {
-  const Cut cut("async def f():\n  a\n");
-  ScopeTracker scopes;
-  EXPECT_FALSE(scopes.Next(cut.rows[0]).in_async_def);
-  scopes.Reset();
-  EXPECT_FALSE(scopes.Next(cut.rows[1]).in_async_def);
 }
 
 // ---- the record ----
@@ -715,12 +708,13 @@ uint8_t UnusualIn(Text statement, Version version = Version::Of(3, 12)) {
 TEST(Unusual, IsWhatOnlySomeVersionsTake) {
   for (const char* statement :
        {"a.b = c[1] + 0.5, 0x1F, 1e5, None", R"(f('x\n', "'\\x", r'\x', *a, **b))", "x != y / z - 1 | w",
-        "from a import (b, c,)", "import a.b as __name__", "debug = __debug"})
+        "from a import (b, c,)", "import a.b as __name__", "debug = __debug", R"(x = [b'a\x4f', 'b'])"})
     EXPECT_EQ(UnusualIn(statement), 0) << statement;
   for (const char* statement :
-       {"x = 0777", "x = 1L", "x = 1if y else z", R"(x = '\xZ')", R"(x = """\N{a}""")", "x = b'a'", "x = f'{a}'",
-        "x <> y", "f(a := b)", "def f() -> x:", "a @= b", "a |= b", "x = yield", "await x",
-        "async def f():", "nonlocal x", "x = __debug__", "from a import *", "from a import b,"})
+       {"x = 0777",       "x = 1L",        "x = 1if y else z", R"(x = '\xZ')",    R"(x = """\N{a}""")", R"(x = b'\x4')",
+        "x = b'a' 'b'",   "x = 'a' b'b'",  "x = b'\xc3\xa9'",  "x = Rb'a'",       "x = f'{a}'",         "x <> y",
+        "f(a := b)",      "def f() -> x:", "a @= b",           "a |= b",          "x = yield",          "await x",
+        "async def f():", "nonlocal x",    "x = __debug__",    "from a import *", "from a import b,"})
     EXPECT_EQ(UnusualIn(statement) & UnusualTokens::kOther, UnusualTokens::kOther) << statement;
   EXPECT_EQ(UnusualIn("if a: return b"), UnusualTokens::kReturn);
 }
@@ -736,6 +730,24 @@ TEST(Unusual, DependsOnTheVersion) {
     EXPECT_NE(UnusualIn(statement, python2), 0) << statement;
   EXPECT_EQ(UnusualIn("x <> y", python2), 0);
   EXPECT_NE(UnusualIn("x", Version::Of(3, 5)), 0);
+}
+
+TEST(Unusual, IsAPlaceThatIsNotToldByTheColumn) {
+  const auto is_odd = [](Text bytes, size_t row = 0) {
+    const Ref<SourceText> source = SourceText::Copy(bytes);
+    std::vector<LineRow> rows;
+    CutLinesCompletely(*source, Version::Of(3, 12), rows);
+    return (rows[row].unusual & UnusualTokens::kPlace) != 0;
+  };
+  EXPECT_FALSE(is_odd("  x\n"));
+  EXPECT_FALSE(is_odd("x; y\n"));
+  EXPECT_FALSE(is_odd("\tx\ny\n", 1));
+  EXPECT_TRUE(is_odd("x; y\n", 1));
+  EXPECT_TRUE(is_odd("\tx\n"));
+  EXPECT_TRUE(is_odd("\fx\n"));
+  EXPECT_TRUE(is_odd("def f(): x\n"));
+  EXPECT_TRUE(is_odd("def f(): x\n", 1));
+  EXPECT_TRUE(is_odd("async with x:\n"));
 }
 
 TEST(Unusual, IsNotAskedOfAnExactCut) { EXPECT_EQ(Cut("x = yield <> 0777\n").rows[0].unusual, 0); }
