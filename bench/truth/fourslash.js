@@ -1,13 +1,13 @@
 // Runs the scripts of fourslash cases with a helper that notes what each verification expects.
 //
 // In: JSON on standard input, a list of {name, script, files, markers, ranges} as fourslash.py parses them. Out: JSON, for
-// each case {name, calls: [{verb, expected: {marker: ...}, filter}]} or {name, error}. A script is TypeScript, whose types
+// each case {name, calls: [{verb, expected: {marker: ...}, filter}], opened: [path]} or {name, error}. A script is TypeScript, whose types
 // node itself strips.
 'use strict';
 const { stripTypeScriptTypes } = require('node:module');
 const vm = require('node:vm');
 
-function helperOf(test, calls) {
+function helperOf(test, calls, opened) {
     const starts = new Map(
         test.files.map((file) => {
             const offsets = [0];
@@ -63,6 +63,8 @@ function helperOf(test, calls) {
         },
         getFilteredRanges: (wanted) =>
             ranges.filter((range) => wanted(range.marker, range.marker ? range.marker.data : undefined, text(range))),
+        openFile: (path) => void opened.push(path),
+        openFiles: (paths) => void opened.push(...paths),
         getMappedFilePath: (path) => path,
         getDirectoryPath: (path) => path.slice(0, path.lastIndexOf('/')),
         getPathSep: () => '/',
@@ -87,21 +89,22 @@ function helperOf(test, calls) {
                     const expected = given.find((each) => each && typeof each === 'object' && !Array.isArray(each));
                     calls.push({ verb, expected, filter: given.find((each) => typeof each === 'string') ?? null });
                 };
-            return () => undefined; // opening, closing and going to places change no answer here
+            return () => undefined; // closing and going to places change no answer here
         },
     });
 }
 
 async function run(test) {
     const calls = [];
+    const opened = [];
     try {
         const script = stripTypeScriptTypes(`async function main(helper, _) {${test.script}\n}`);
         const context = vm.createContext({ console });
-        await vm.runInContext(`(${script})`, context, { timeout: 5000 })(helperOf(test, calls), {});
+        await vm.runInContext(`(${script})`, context, { timeout: 5000 })(helperOf(test, calls, opened), {});
     } catch (error) {
         return { name: test.name, error: String(error) };
     }
-    return { name: test.name, calls };
+    return { name: test.name, calls, opened };
 }
 
 async function main() {

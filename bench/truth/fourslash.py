@@ -257,7 +257,10 @@ def Run(options: argparse.Namespace) -> int:
             folder = Path(name).resolve()
             WriteProject(case, folder)
             roots = [folder / "project", *(each for each in [folder / "project/typings"] if each.exists())]
-            asked = Asked(case, folder, ENGINES[options.engine](roots, folder / "env"))
+            engine = ENGINES[options.engine](roots, folder / "env")
+            for path in result["opened"]:
+                engine.Open(str(folder / path), case.files[path])
+            asked = Asked(case, folder, engine)
             for call in result["calls"]:
                 if call["verb"] not in _GROUPS:
                     continue

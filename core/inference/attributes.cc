@@ -1,5 +1,6 @@
 // What stands behind a dot.
 #include <algorithm>
+#include <array>
 
 #include "inference/inference.h"
 
@@ -59,6 +60,17 @@ std::optional<Member> Inference::LookUpMember(ClassId cls, Text name, bool on_cl
     if (assigned && member.is_behind_open_base) break;
     if (info.is_enum || IsDeclared(member)) return member;
     if (!assigned) assigned = std::move(member);
+  }
+  if (assigned || name.size() < 3 || name[2] != '_') return assigned;
+  // What runs a generator or a coroutine is of a class of its own, which its type does not say.
+  static constexpr std::array<std::array<Text, 3>, 3> kRunning{{{"gi_", "Generator", "GeneratorType"},
+                                                                {"cr_", "Coroutine", "CoroutineType"},
+                                                                {"ag_", "AsyncGenerator", "AsyncGeneratorType"}}};
+  for (const auto& [prefix, type, running] : kRunning) {
+    if (!name.starts_with(prefix) || classes_[cls].name != type || ClassNamed("typing", type) != cls) continue;
+    const ClassId itself = ClassNamed("types", running);
+    assigned = itself == kNoId ? std::nullopt : LookUpMember(itself, name, on_class);
+    if (assigned) assigned->args = classes_[cls].order.front().args;
   }
   return assigned;
 }
@@ -256,12 +268,22 @@ Value Inference::ValueOfMember(const Member& member, Text name, TypeId receiver,
   ClassInfo& owner = MembersOf(member.owner);
   const SourceFile* file = FileOf(owner.file);
   if (file == nullptr) return kUnknownValue;
+  // What the library makes of a named tuple, as `_replace` does, may hold something else than that one.
+  if (file->is_stub && types_[receiver].kind == TypeKind::kInstance && classes_[types_[receiver].a].is_named_tuple &&
+      LiteralOf(types_[receiver]).starts_with('#')) {
+    const std::vector<TypeSetId> args(types_.ArgsOf(receiver).begin(), types_.ArgsOf(receiver).end());
+    receiver = InstanceOf(types_[receiver].a, args);
+  }
   Value value{kNoTypes, static_cast<uint8_t>(member.is_behind_open_base ? Value::kOpen : 0)};
   if (member.field != nullptr) {
     if (owner.is_enum) return Just(InstanceOf(member.owner));
     const Value field = member.field->hint != kNoExpr    ? ValueOfHint(owner.file, member.field->hint)
                         : member.field->value != kNoExpr ? ValueOf(owner.file, member.field->value)
                                                          : kUnknownValue;
+    if (owner.is_named_tuple && member.field->hint == kNoExpr && member.field->value == kNoExpr &&
+        LiteralOf(types_[receiver]).starts_with('#'))
+      for (const auto& [given_name, given] : EntriesOf(receiver))
+        if (given_name == name) return types_.Union(value, given);
     return types_.Union(value, field);
   }
   bool is_declared = false, is_property = false;

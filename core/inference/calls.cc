@@ -640,7 +640,27 @@ Value Inference::ResultOfClassCall(TypeId callee, std::vector<Argument>& argumen
     }
   }
   const std::vector<TypeSetId> args(types_.ArgsOf(callee).begin(), types_.ArgsOf(callee).end());
+  if (const uint32_t fields = info.is_named_tuple ? FieldsGiven(cls, arguments) : 0; fields != 0)
+    return Just(types_.Add(TypeKind::kInstance, cls, fields, args));
   return Just(InstanceOf(cls, args));
+}
+
+// What a named tuple whose fields say nothing themselves is made of, as a literal; 0 where that is not plain.
+uint32_t Inference::FieldsGiven(ClassId cls, std::vector<Argument>& arguments) {
+  const std::vector<MadeField> fields = MembersOf(cls).fields;
+  for (const Text maker : {Text("__new__"), Text("__init__")})
+    if (classes_[cls].symbols.contains(maker)) return 0;
+  std::vector<std::pair<Text, Value>> entries;
+  for (size_t i = 0; i < arguments.size(); ++i) {
+    const Argument::Kind kind = arguments[i].kind;
+    if (kind == Argument::kStar || kind == Argument::kDoubleStar) return 0;
+    const auto field = kind == Argument::kPlain ? fields.begin() + static_cast<ptrdiff_t>(std::min(i, fields.size()))
+                                                : std::ranges::find(fields, arguments[i].name, &MadeField::name);
+    if (field == fields.end() || field->hint != kNoExpr || field->value != kNoExpr) return 0;
+    const Value given = WithoutDisplay(WithoutLiterals(ValueOfArgument(arguments[i])));
+    if (given.IsKnown()) entries.emplace_back(field->name, given);
+  }
+  return entries.empty() ? 0 : LiteralNumber(TextOfEntries(entries));
 }
 
 // What the fields of a dataclass or named tuple, which make its constructor, are given.

@@ -309,6 +309,7 @@ void Inference::FindMembers(ClassId cls) {
     }
   }
   FindOutsideWrites(cls);
+  FindSlots(cls);
   if (info.is_dataclass || info.is_named_tuple || info.is_typed_dict) {
     std::vector<MadeField> fields;
     for (size_t i = info.bases.size(); i-- > 0;) {
@@ -324,6 +325,53 @@ void Inference::FindMembers(ClassId cls) {
   } else {
     info.fields.clear();
   }
+}
+
+// The names in `__slots__` that nothing else says of the class.
+void Inference::FindSlots(ClassId cls) {
+  ClassInfo& info = classes_[cls];
+  if (!info.symbols.contains("__slots__")) return;
+  for (const MadeField& slot : SlotsOf(*FileOf(info.file), info.stmt))
+    if (!info.symbols.contains(slot.name) && !info.self_attributes.contains(slot.name))
+      info.self_attributes[slot.name] = {slot.offset};
+}
+
+std::vector<MadeField> Inference::SlotsOf(const SourceFile& file, StmtId cls) {
+  const FileSyntax& syntax = file.syntax;
+  std::vector<MadeField> slots;
+  const auto add = [&](ExprId string) {
+    if (string == kNoExpr || syntax[string].kind != ExprKind::kString) return;
+    const Text text = syntax.TextOf(syntax[string]);
+    const size_t quote = text.find_first_of("'\"");
+    if (quote == Text::npos || text.size() < quote + 2) return;
+    const Text name = text.substr(quote + 1, text.size() - quote - 2);
+    if (CodeOfText(name) != tok::NAME) return;
+    slots.push_back({Kept(name), syntax[string].begin + static_cast<uint32_t>(quote) + 1, kNoExpr, kNoExpr});
+  };
+  for (StmtId id = syntax.stmt(cls).first_child; id != kModuleStmt; id = syntax.stmt(id).next) {
+    const Stmt& stmt = syntax.stmt(id);
+    const auto exprs = syntax.ExprsOf(stmt);
+    if ((stmt.kind != StmtKind::kAssign && stmt.kind != StmtKind::kAnnotated) || exprs.size() != 2 ||
+        syntax[exprs[0]].kind != ExprKind::kName || syntax.NameOf(exprs[0]) != "__slots__")
+      continue;
+    const auto items = syntax.ChildrenOf(exprs[1]);
+    switch (syntax[exprs[1]].kind) {
+      case ExprKind::kString:
+        add(exprs[1]);
+        break;
+      case ExprKind::kTuple:
+      case ExprKind::kList:
+      case ExprKind::kSet:
+        std::ranges::for_each(items, add);
+        break;
+      case ExprKind::kDict:
+        for (size_t i = 0; i < items.size(); i += 2) add(items[i]);
+        break;
+      default:
+        break;
+    }
+  }
+  return slots;
 }
 
 // Attributes that its file gives the class, or what a variable was made by calling it: `C.x = 1`, `c = C(); c.x = 1`.

@@ -28,6 +28,38 @@ constexpr OperatorRow kOperators[] = {
     {"@", "__matmul__", "__rmatmul__"},
 };
 
+// What a string literal, of one piece or several, holds as it is spelled: in front of it `b` for bytes, of which Python
+// 2 makes no difference. Empty where it is none, is made when it runs, or may be spelled in another way.
+std::string KeyInLiteral(Text literal, bool is_python2) {
+  std::string key(1, 's');
+  while (!literal.empty()) {
+    size_t quote = 0;
+    char kind = 's';
+    bool is_piece_raw = false;
+    for (; quote < literal.size() && literal[quote] != '\'' && literal[quote] != '"'; ++quote) {
+      const char c = static_cast<char>(literal[quote] | 0x20);
+      if (c == 'r') is_piece_raw = true;
+      if (c == 'b' && !is_python2) kind = 'b';
+      if (c == 'f' || c == 't' || c == '#') return {};
+      if (c != 'r' && c != 'b' && c != 'u' && Text(" \t\r\n\\").find(literal[quote]) == Text::npos) return {};
+    }
+    if (quote == literal.size()) break;  // blanks
+    const Text one = literal.substr(quote, 1);
+    const Text three = literal.substr(quote, 3);
+    const Text mark = three.size() == 3 && three[1] == one[0] && three[2] == one[0] ? three : one;
+    size_t end = quote + mark.size();
+    while (end < literal.size() && literal.substr(end, mark.size()) != mark) end += literal[end] == '\\' ? 2 : 1;
+    if (end >= literal.size()) return {};
+    const Text piece = literal.substr(quote + mark.size(), end - quote - mark.size());
+    const bool has_escape = piece.find('\\') != Text::npos;
+    if (has_escape && is_piece_raw) return {};
+    key[0] = kind;
+    key += piece;
+    literal.remove_prefix(end + mark.size());
+  }
+  return key;
+}
+
 }  // namespace
 
 Value Inference::ValueOf(FileId id, ExprId expr, FrameId frame) {
@@ -404,6 +436,8 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
     while (!text.empty() && text.front() != '\'' && text.front() != '"') text.remove_prefix(1);
     return text.size() >= 2 ? text.substr(1, text.size() - 2) : Text();
   };
+  const bool is_string = !IsNone(literal_key) && literal_key.find_first_of("'\"") != Text::npos;
+  const std::string string_key = is_string ? KeyInLiteral(literal_key, file.is_python2) : std::string();
   for (const TypeId id : types_.CopyOf(container.set)) {
     const Type t = types_[id];
     if (t.kind == TypeKind::kTuple) {
@@ -449,9 +483,10 @@ Value Inference::ItemOf(Value container, const SourceFile& file, std::span<const
             for (size_t i = 0; i + 1 < children.size(); i += 2) {
               const Expr& entry = source->syntax[children[i]];
               const Text text = source->syntax.TextOf(entry);
-              const bool is_same = entry.kind == ExprKind::kString
-                                       ? unquoted(text) == unquoted(literal_key) && !unquoted(text).empty()
-                                       : entry.kind == ExprKind::kNumber && text == literal_key;
+              const bool is_same =
+                  entry.kind == ExprKind::kString
+                      ? is_string && !string_key.empty() && KeyInLiteral(text, file.is_python2) == string_key
+                      : entry.kind == ExprKind::kNumber && text == literal_key;
               if (is_same) found = children[i + 1];
             }
           }
@@ -598,9 +633,39 @@ Value Inference::EvaluateSubscript(const SourceFile& file, ExprId expr, FrameId 
   return Narrowed(file, expr, value, frame);
 }
 
+// What `get` gives of a typed dictionary by a key that is a literal: the field, or what stands for it.
+Value Inference::GottenField(const SourceFile& file, std::span<const ExprId> call, FrameId frame) {
+  const FileSyntax& syntax = file.syntax;
+  const ExprId method = call[0];
+  if (syntax[method].kind != ExprKind::kAttribute || syntax.NameOf(method) != "get" || call.size() < 2 ||
+      call.size() > 3)
+    return kUnknownValue;
+  for (const ExprId argument : call.subspan(1))
+    if (syntax[argument].kind == ExprKind::kStarred || syntax[argument].kind == ExprKind::kDoubleStarred ||
+        syntax[argument].kind == ExprKind::kKeyword)
+      return kUnknownValue;
+  const Value receiver = ValueOf(file.id, syntax.ChildOf(method, 0), frame);
+  Value value{kNoTypes, receiver.doubt};
+  for (const TypeId id : types_.CopyOf(receiver.set)) {
+    if (types_[id].kind != TypeKind::kInstance || !InfoOf(types_[id].a).is_typed_dict) return kUnknownValue;
+    const Value key = ValueOf(file.id, call[1], frame);
+    if (types_.SizeOf(key.set) != 1) return kUnknownValue;
+    const std::string name = KeyInLiteral(LiteralOf(types_[types_.TypesOf(key.set)[0]]), file.is_python2);
+    if (name.size() < 2 || name[0] != 's' || !FindMember(types_[id].a, Kept(Text(name).substr(1))))
+      return kUnknownValue;
+    const Value field = AttributeOfType(id, Kept(Text(name).substr(1)));
+    if (!field.IsKnown()) return kUnknownValue;
+    value = types_.Union(value, field);
+    value.doubt |= key.doubt;
+  }
+  if (!value.IsKnown()) return value;
+  return types_.Union(value, call.size() > 2 ? WithoutLiterals(ValueOf(file.id, call[2], frame)) : NoneValue());
+}
+
 Value Inference::EvaluateCall(const SourceFile& file, ExprId expr, FrameId frame) {
   const auto children = file.syntax.ChildrenOf(expr);
   if (children.empty()) return kUnknownValue;
+  if (const Value field = GottenField(file, children, frame); field.IsKnown()) return field;
   const Value callee = ValueOf(file.id, children[0], frame);
   if (!callee.IsKnown()) return kUnknownValue;
   std::vector<Argument> arguments = ArgumentsOf(file, children.subspan(1), frame);

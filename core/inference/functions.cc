@@ -79,7 +79,8 @@ Value Inference::ValueOfParameter(FunctionId id, size_t index, FrameId frame) {
       value = Just(InstanceOf(cls), Value::kGuessed);
   }
   if (value.IsKnown()) return value;
-  if (!is_in_frame) value = GuessedParameter(id, index);
+  if (!is_in_frame) value = GivenByFixture(info, index);
+  if (!is_in_frame && !value.IsKnown()) value = GuessedParameter(id, index);
   if (value.IsKnown()) value.doubt |= Value::kGuessed | Value::kOpen;
   if (kind != ParameterKind::kPlain) return value.IsKnown() ? value : gathered(kUnknownValue);
   const ExprId otherwise = syntax.ChildOf(parameters[index], 1);
@@ -87,6 +88,73 @@ Value Inference::ValueOfParameter(FunctionId id, size_t index, FrameId frame) {
     Value given = ValueOf(info.file, otherwise);
     given.doubt |= Value::kOpen | Value::kGuessed;
     value = types_.Union(value, given);
+  }
+  return value;
+}
+
+namespace {
+
+// Whether a function is a fixture: decorated with `pytest.fixture` and the like, called or not.
+bool IsFixture(const FileSyntax& syntax, const Stmt& stmt) {
+  return stmt.kind == StmtKind::kDef && std::ranges::any_of(syntax.DecoratorsOf(stmt), [&](ExprId decorator) {
+           const ExprId named = syntax[decorator].kind == ExprKind::kCall ? syntax.ChildOf(decorator, 0) : decorator;
+           return syntax.NameOf(named) == "fixture" || syntax.NameOf(named) == "yield_fixture";
+         });
+}
+
+}  // namespace
+
+// As pytest looks for it: in the class, in the module, in `conftest.py` of the folder and of those around.
+FunctionId Inference::FixtureOf(const FunctionInfo& info, Text name) {
+  static constexpr int kMostFolders = 16;
+  const SourceFile* file = FileOf(info.file);
+  if (file == nullptr || file->is_stub || info.stmt == kModuleStmt || name.empty()) return kNoId;
+  const Stmt& own = file->syntax.stmt(info.stmt);
+  if (!file->syntax.NameOf(own).starts_with("test") && !IsFixture(file->syntax, own)) return kNoId;
+  const auto find = [&](const SourceFile& in, const auto& symbols) {
+    FunctionId found = kNoId;
+    const auto symbol = symbols.find(name);
+    if (symbol == symbols.end()) return found;
+    for (const uint32_t i : in.occurrences().Of(symbol->second)) {
+      const StmtId stmt = in.syntax.StatementNamedAt(in.bindings.occurrences[i].begin);
+      const bool is_itself = in.id == info.file && stmt == info.stmt;
+      if (stmt != kModuleStmt && !is_itself && IsFixture(in.syntax, in.syntax.stmt(stmt)))
+        found = FunctionOfStmt(in.id, stmt);
+    }
+    return found;
+  };
+  FunctionId found = info.cls == kNoId ? kNoId : find(*file, MembersOf(info.cls).symbols);
+  if (found == kNoId) found = find(*file, NamesOfModule(*file).symbols);
+  std::string folder(FolderOf(files_.PathOf(info.file)));
+  for (int i = 0; i < kMostFolders && found == kNoId && folder.size() > 1; ++i) {
+    const FileId conftest = files_.NumberOf(Join(folder, "conftest.py"));
+    const SourceFile* source = files_.Exists(conftest) ? FileOf(conftest) : nullptr;
+    if (source != nullptr && conftest != info.file) found = find(*source, NamesOfModule(*source).symbols);
+    folder = std::string(FolderOf(folder));
+  }
+  return found;
+}
+
+// What a test is given for a parameter by the fixture of its name: what that gives back, or gives while it waits.
+Value Inference::GivenByFixture(const FunctionInfo& info, size_t index) {
+  if (guess_level_ >= kMaxGuesses) {
+    needs_level_ = true;
+    return kUnknownValue;
+  }
+  const SourceFile* file = FileOf(info.file);
+  if (file == nullptr || info.lambda != kNoExpr) return kUnknownValue;
+  const ExprId parameter = ParametersOf(info)[index];
+  if (file->syntax[parameter].op != static_cast<uint8_t>(ParameterKind::kPlain) ||
+      file->syntax.ChildOf(parameter, 1) != kNoExpr)
+    return kUnknownValue;
+  const FunctionId fixture = FixtureOf(info, file->syntax.NameOf(parameter));
+  if (fixture == kNoId) return kUnknownValue;
+  Value value = ResultIn(fixture, kNoFrame);
+  const uint8_t flags = functions_[fixture].flags;
+  if ((flags & kIsGenerator) != 0) {
+    value = IterationOf(value, (flags & kIsAsync) != 0);
+  } else if ((flags & kIsAsync) != 0) {
+    value = EvaluateAwait(value);
   }
   return value;
 }

@@ -222,6 +222,10 @@ class Inference {
   // What a call of the value gives.
   Value ResultOf(Value callee, std::vector<Argument>& arguments, ExprPlace place = {});
   Value ResultOfFunction(FunctionId function);
+  // The function of a test's fixture that a parameter of a test, or of another fixture, is called like; kNoId without.
+  FunctionId FixtureOf(const FunctionInfo& info, Text name);
+  // The names that a class says by strings in `__slots__`.
+  std::vector<MadeField> SlotsOf(const SourceFile& file, StmtId cls);
 
   // ---- names ----
   // What the name of an occurrence stands for.
@@ -415,6 +419,7 @@ class Inference {
   bool SaysItems(ClassId cls);
   Value EvaluateSubscript(const SourceFile& file, ExprId expr, FrameId frame);
   Value EvaluateCall(const SourceFile& file, ExprId expr, FrameId frame);
+  Value GottenField(const SourceFile& file, std::span<const ExprId> call, FrameId frame);
   Value EvaluateBinary(const SourceFile& file, ExprId expr, FrameId frame);
   Value EvaluateString(const SourceFile& file, ExprId expr);
   Value EvaluateDict(const SourceFile& file, ExprId expr, FrameId frame);
@@ -506,6 +511,7 @@ class Inference {
   void FindOrder(ClassId cls);
   void FindMembers(ClassId cls);
   void FindOutsideWrites(ClassId cls);
+  void FindSlots(ClassId cls);
   ClassId MadeClass(const SourceFile& file, ExprId call, Text kind);
   void CollectTypeVars(TypeSetId set, std::vector<TypeId>& found, int depth = 0);
 
@@ -518,6 +524,7 @@ class Inference {
   Value ValueOfMember(const Member& member, Text name, TypeId receiver, bool on_class);
   Value Bound(Value value, TypeId receiver, bool on_class, ClassId owner);
   Value RawValueOfMember(const Member& member, Text name);
+  uint32_t FieldsGiven(ClassId cls, std::vector<Argument>& arguments);
   void SolveByFields(ClassId cls, std::vector<Argument>& arguments, Solution& solution);
   Solution SolutionFor(const Member& member, TypeId receiver);
 
@@ -545,6 +552,7 @@ class Inference {
   Value ResultBelow(FunctionId function);
   Value AttributeBelow(ClassId cls, Text name);
   Value GuessedParameter(FunctionId function, size_t index);
+  Value GivenByFixture(const FunctionInfo& info, size_t index);
   Value GuessParameters(FunctionId function);
   void FindCalls(FunctionId id, std::vector<ExprPlace>& calls, int depth);
   void FindCallsOfName(const SourceFile& file, uint32_t occurrence, std::vector<ExprPlace>& calls, int depth);

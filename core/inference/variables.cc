@@ -662,6 +662,13 @@ Value Inference::FindValueOfBinding(const SourceFile& file, uint32_t offset, Fra
       const auto parameters = ParametersOf(functions_[function]);
       for (size_t i = 0; i < parameters.size(); ++i)
         if (syntax[parameters[i]].name_begin == offset) return ValueOfParameter(function, i, frame);
+      // One of a tuple, as Python 2 has them.
+      for (size_t i = 0; i < parameters.size(); ++i) {
+        const ExprId tuple = syntax.ChildOf(parameters[i], 2), target = syntax.NamedAt(offset);
+        if (tuple == kNoExpr || target == kNoExpr || offset < syntax[tuple].begin || offset >= syntax[tuple].end)
+          continue;
+        return Unpack(file, target, tuple, ValueOfParameter(function, i, frame), {}, frame);
+      }
       return kUnknownValue;
     }
     case NameKind::kTypeParameter: {

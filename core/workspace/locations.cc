@@ -285,6 +285,13 @@ std::vector<Location> Workspace::Impl::KeyDefinitions(const SourceFile& file, ui
     const auto index = static_cast<size_t>(std::ranges::find(children, string) - children.begin());
     if (syntax[parent].kind == ExprKind::kSet || index % 2 == 0) owner = ExpectedOf(file, parent);
   }
+  if (syntax[parent].kind == ExprKind::kCall && syntax[parent].children_count > 1 &&
+      syntax.ChildOf(parent, 1) == string) {
+    const ExprId method = syntax.ChildOf(parent, 0);
+    const Text name = syntax.NameOf(method);
+    if (syntax[method].kind == ExprKind::kAttribute && (name == "get" || name == "pop" || name == "setdefault"))
+      owner = inference.ValueOf(file.id, syntax.ChildOf(method, 0));
+  }
   const Text key = TextInString(syntax.TextOf(syntax[string]));
   for (const TypeId type : inference.types().CopyOf(owner.set)) {
     const Type t = inference.types()[type];

@@ -188,6 +188,10 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
       if (owner != kNoFile && std::ranges::find(candidates, owner) == candidates.end()) candidates.push_back(owner);
     }
     if (std::ranges::find(candidates, file.id) == candidates.end()) candidates.push_back(file.id);
+    // What an editor shows of a library is looked at as if it were the project's.
+    for (const FileId buffer : files.Buffers())
+      if (!IsProject(buffer) && files.Holds(buffer, name) && std::ranges::find(candidates, buffer) == candidates.end())
+        candidates.push_back(buffer);
     LeaveOutOtherImports(candidates, name, wanted.found);
   }
   for (const Entity& entity : wanted.found) {
@@ -196,6 +200,22 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
     location.file = modules[entity.a].file != kNoFile ? modules[entity.a].file : modules[entity.a].stub;
     location.role = location.kind = "module";
     if (location.file != kNoFile) hits.push_back({location, location.file, kNoIndex});
+  }
+  // Strings in `__slots__`, which say the attribute.
+  for (const Entity& entity : wanted.found) {
+    if (entity.kind != Entity::kMember) continue;
+    const ClassInfo& info = inference.MembersOf(entity.a);
+    const SourceFile* source = info.symbols.contains("__slots__") ? Get(info.file) : nullptr;
+    if (source == nullptr || (!everywhere && info.file != file.id)) continue;
+    for (const MadeField& slot : inference.SlotsOf(*source, info.stmt)) {
+      if (slot.name != name) continue;
+      Location location;
+      location.file = source->id;
+      location.begin = slot.offset;
+      location.end = slot.offset + static_cast<uint32_t>(name.size());
+      location.role = "declaration";
+      hits.push_back({location, source->id, kNoIndex});
+    }
   }
   // How many classes define an attribute of this name: what is used of an unknown receiver is likely the only one.
   std::vector<Hit> unknown;
@@ -259,7 +279,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
           continue;
         }
       }
-      const bool is_foreign = id != own && !IsProject(id);
+      const bool is_foreign = id != own && !IsProject(id) && !files.IsOpen(id);
       if (meets &&
           (!is_foreign || other.kind != NameKind::kNone || (other.is_attribute && other.role == NameRole::kWrite)))
         hits.push_back({AtOccurrence(*source, i, certainty), id, i});

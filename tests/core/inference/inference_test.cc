@@ -546,4 +546,69 @@ TEST(Inference, BelievesDocstrings) {
   });
 }
 
+TEST(Inference, KnowsTheTuplesAmongParametersOfPython2) {
+  Check(
+      {
+          {"def f(a, ($b, (c, $d))): return $c\n$e = f(1, ('x', (2, 1.5)))\n", {"str", "float", "int", "int"}},
+          {"def f(a, ($b, c)=(1, 'x')):\n  $c\n", {"int", "str"}},
+          {"f = lambda (a, b): b\n$c = f((1, 'x'))\n", {"str"}},
+      },
+      Version::Of(2, 7));
+}
+
+TEST(Inference, KnowsLiteralKeysHoweverTheyAreSpelled) {
+  Check({
+      {"k = {'a': 1, u'b': 'x', b'c': 1.5, 'd' \"e\": None, r'f': b'', 'g\\n': True}\n"
+       "$a = k[\"a\"]\n$b = k['b']\n$c = k[b'c']\n$d = k['de']\n$e = k['d' 'e']\n$f = k['f']\n$g = k['g\\n']\n"
+       "$h = k[\"\"\"a\"\"\"]\n",
+       {"int", "str", "float", "None", "None", "bytes", "bool", "int"}},
+      // Bytes are no text, and a raw string is what it is spelled: what is there is one of all.
+      {"k = {'a': 1, 'b\\n': 'x'}\n$a = k[b'a']\n$b = k[r'b\\n']\n", {"int | str", "int | str"}},
+  });
+  Check({{"k = {'a': 1, 'b': 'x'}\n$a = k[b'a']\n$b = k[u'b']\n", {"int", "str"}}}, Version::Of(2, 7));
+}
+
+TEST(Inference, KnowsWhatANamedTupleIsMadeOf) {
+  Check({
+      {"from collections import namedtuple\nP = namedtuple('P', 'x y')\np = P(1, y='a')\n$a = p.x\n$b = p.y\n"
+       "$c = p[1]\n$d, $e = p\n$f = P(*z).x\n$g = p._replace(x='b').x\n$h = [P(1, 2), P(3, 'a')][0]\n"
+       "def made(n): return P(n, n)\n$i = made(b'').x\n",
+       {"int", "str", "str", "int", "str", "", "", "a.P", "bytes"}},
+      {"from collections import namedtuple\nclass Q(namedtuple('P', 'x')):\n  def m(self): return self.x\n"
+       "$a = Q('b').m()\nclass R(Q):\n  def __new__(cls, y): return Q.__new__(cls, 1)\n$b = R('b').x\n",
+       {"str", ""}},
+  });
+}
+
+TEST(Inference, KnowsWhatIsGottenFromATypedDictionary) {
+  Check({
+      {"from typing import TypedDict\nclass M(TypedDict):\n  name: str\n  year: int\ndef f(m: M, k: str, n: M | "
+       "dict):\n"
+       "  $a = m.get('name')\n  $b = m.get('year', '')\n  $c = m.get('year', 0)\n  $d = m['name']\n",
+       {"None | str", "int | str", "int", "str"}},
+  });
+}
+
+TEST(Inference, KnowsWhatATestIsGivenByItsFixtures) {
+  Program program({
+      {"tests/test_a.py",
+       "import pytest\nclass Shop: pass\n@pytest.fixture\ndef shop(): return Shop()\n@pytest.fixture(scope='module')\n"
+       "def door(shop):\n  yield [$shop]\ndef test(shop, door, cash, other, missing):\n"
+       "  $shop\n  $door\n  $cash\n  $other\n  $missing\ndef plain(shop): $shop\n"
+       "class TestIn:\n  @pytest.fixture\n  def shop(self): return 1\n  def test(self, shop): $shop\n"
+       "@pytest.fixture\ndef cash(cash): return [cash]\n"},
+      {"tests/conftest.py", "import pytest\n@pytest.fixture\ndef cash(): return 1.5\ndef other(): return 1\n"},
+      {"conftest.py", "import pytest\n@pytest.fixture\ndef missing(): return b''\n"},
+  });
+  std::vector<std::string> types = program.AllTypes();
+  for (std::string& type : types) {
+    type = WithoutBuiltins(type);
+    for (size_t at; (at = type.find("tests.")) != std::string::npos;) type.erase(at, 6);
+  }
+  EXPECT_EQ(types, (std::vector<std::string>{"test_a.Shop", "test_a.Shop", "list[test_a.Shop]", "list[float]", "",
+                                             "bytes", "", "int"}));
+  // That is a guess.
+  EXPECT_EQ(program->HoverAt(program[1].file, program[1].offset).certainty, Certainty::kLikely);
+}
+
 }  // namespace quillet

@@ -392,6 +392,40 @@ TEST(References, OfAttributesThatMethodsSet) {
   EXPECT_EQ(program.References(), (Words{"a.py:3:10", "a.py:5:10", "a.py:8:17"}));
 }
 
+TEST(References, OfNamesInSlots) {
+  Program program(
+      "class A:\n  __slots__ = ('x', \"y\")\n  def m(self): return self.$x\nA().x\nA().$y\nclass B:\n"
+      "  __slots__ = ['x']\n  def __init__(self): self.$x = 1\nA().$z\n");
+  EXPECT_EQ(program.Definitions(0), (Words{"a.py:2:17"}));
+  EXPECT_EQ(program.References(0), (Words{"a.py:2:17", "a.py:3:28", "a.py:4:5"}));
+  EXPECT_EQ(program.Definitions(1), (Words{"a.py:2:22"}));
+  EXPECT_EQ(program.Definitions(2), (Words{"a.py:8:28"}));
+  EXPECT_EQ(program.References(2), (Words{"a.py:7:17", "a.py:8:28"}));
+  EXPECT_EQ(program.Definitions(3), Words());
+}
+
+TEST(References, InALibraryAreThoseOfTheFilesThatAreOpen) {
+  Program program({
+      {"a.py", "from lib import $total\ntotal()\n"},
+      {"library/lib.py", "def total(): pass\ntotal()\n"},
+      {"library/more.py", "from lib import total\ntotal()\n"},
+  });
+  EXPECT_EQ(program.References(), (Words{"library/lib.py:1:5", "a.py:1:17", "a.py:2:1"}));
+  program.Open("library/lib.py", "def total(): pass\ntotal()\n");
+  program.Open("library/more.py", "from lib import total\ntotal()\n");
+  EXPECT_EQ(program.References(), (Words{"library/lib.py:1:5", "library/lib.py:2:1", "library/more.py:1:17",
+                                         "library/more.py:2:1", "a.py:1:17", "a.py:2:1"}));
+}
+
+TEST(Definitions, OfKeysThatAreGotten) {
+  Program program(
+      "from typing import TypedDict\nclass M(TypedDict):\n  name: str\ndef f(m: M):\n  m.get('$name')\n  m['$name']\n"
+      "  m.get('$other')\n");
+  EXPECT_EQ(program.Definitions(0), (Words{"a.py:3:3"}));
+  EXPECT_EQ(program.Definitions(1), (Words{"a.py:3:3"}));
+  EXPECT_EQ(program.Definitions(2), Words());
+}
+
 // ---- renames ----
 
 Words Edited(Program& program, Text name, bool only_certain = true, size_t place = 0) {
@@ -419,6 +453,11 @@ TEST(Renames, RefuseWhatMayBeGivenByUnseenKeywords) {
   EXPECT_TRUE(handed->RenameTo(handed[0].file, handed[0].offset, "other", true).edits.empty());
   Program program("def f($a, *, b): return a\nf(a=1, b=2)\n");
   EXPECT_EQ(program->RenameTo(program[0].file, program[0].offset, "other", true).edits.size(), 3u);
+}
+
+TEST(Renames, ChangeNamesInSlots) {
+  Program program("class A:\n  __slots__ = 'x', 'y'\n  def m(self): self.$x = 1\n");
+  EXPECT_EQ(Edited(program, "new"), (Words{"a.py:2:16+1", "a.py:3:21+1"}));
 }
 
 TEST(Renames, ChangeWhatIsCertain) {
