@@ -5,6 +5,31 @@
 
 namespace quillet {
 
+// Of what binds a variable in its file; an import that is never reached counts where it is `asked` about.
+Inference::BoundEntities Inference::FindEntitiesOfVariable(const SourceFile& file, uint32_t variable, uint32_t asked) {
+  BoundEntities result;
+  const auto add = [&](const Entity& entity) {
+    if (std::ranges::find(result.found, entity) == result.found.end()) result.found.push_back(entity);
+  };
+  bool has_own = false;
+  for (const uint32_t i : file.occurrences().Of(variable)) {
+    const Occurrence& other = file.bindings.occurrences[i];
+    if (other.kind == NameKind::kNone) continue;
+    result.is_bound = true;
+    if (other.kind != NameKind::kImport) {
+      has_own = true;
+      continue;
+    }
+    if (!IsReachable(file, file.syntax.StatementAt(other.begin)) && i != asked) continue;
+    const Entities imported = EntitiesOfImport(file, other.begin);
+    if (imported.found.empty()) has_own = true;
+    for (const Entity& entity : imported.found) add(entity);
+    result.doubt |= imported.doubt;
+  }
+  if (has_own) add(EntityOfVariable(file, variable));
+  return result;
+}
+
 Entities Inference::EntitiesOf(const SourceFile& file, uint32_t index) {
   const Occurrence& occurrence = file.bindings.occurrences[index];
   const FileSyntax& syntax = file.syntax;
@@ -19,23 +44,23 @@ Entities Inference::EntitiesOf(const SourceFile& file, uint32_t index) {
   };
   const uint32_t variable = file.bindings.VariableOf(occurrence);
   if (variable != kNoIndex) {
-    const NameSymbol& owner = file.bindings.symbols[variable];
-    const Text plain = file.bindings.texts[owner.name];
-    bool is_bound = false, has_own = false;
-    for (const uint32_t i : file.occurrences().Of(variable)) {
-      const Occurrence& other = file.bindings.occurrences[i];
-      if (other.kind == NameKind::kNone) continue;
-      is_bound = true;
-      if (other.kind != NameKind::kImport) {
-        has_own = true;
-        continue;
-      }
-      if (!IsReachable(file, syntax.StatementAt(other.begin)) && i != index) continue;
-      const Entities imported = EntitiesOfImport(file, other.begin);
-      if (imported.found.empty()) has_own = true;
-      add_all(imported);
+    const Text plain = file.bindings.texts[file.bindings.symbols[variable].name];
+    const bool is_left_out =
+        occurrence.kind == NameKind::kImport && !IsReachable(file, syntax.StatementAt(occurrence.begin));
+    // What has many names is found once for all of them.
+    static constexpr size_t kMany = 64;
+    bool is_bound = false;
+    if (file.occurrences().Of(variable).size() < kMany) {
+      const BoundEntities found = FindEntitiesOfVariable(file, variable, is_left_out ? index : kNoIndex);
+      is_bound = found.is_bound;
+      add_all(found);
+    } else {
+      const BoundEntities& found =
+          entities_.Get(file.id, variable, [&] { return FindEntitiesOfVariable(file, variable, kNoIndex); });
+      is_bound = found.is_bound;
+      add_all(found);
+      if (is_left_out) add_all(EntitiesOfImport(file, occurrence.begin));
     }
-    if (has_own) add(EntityOfVariable(file, variable));
     if (is_bound) return result;
     // Nothing in the file binds it.
     const ModuleId own = NamesOfModule(file).stars.empty() ? kNoModule : modules_.OfFile(file.id);

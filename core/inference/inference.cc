@@ -25,6 +25,7 @@ void Inference::Clear() {
   frames_by_hash_.clear();
   for (Memos* memos : {&values_, &bindings_, &results_, &hints_, &guesses_}) *memos = {};
   reaching_ = {};
+  entities_ = {};
   own_bindings_ = {};
   is_definition_ = {};
   truths_.Clear();

@@ -479,6 +479,12 @@ class Inference {
   Value WithPuts(Value container, const Puts& puts);
   Value WithItemsPutInto(const SourceFile& file, ExprId target, Value held);
 
+  // ---- entities.cc ----
+  struct BoundEntities : Entities {
+    bool is_bound = false;  // by anything in its file
+  };
+  BoundEntities FindEntitiesOfVariable(const SourceFile& file, uint32_t variable, uint32_t asked);
+
   // ---- narrowing.cc ----
   class Narrowing;
   // What holds, or does not, where an expression stands.
@@ -627,6 +633,7 @@ class Inference {
     size_t ByteSize() const { return numbers.ByteSize() + found.size() * 2 * sizeof(T); }
   };
   FoundOnce<Reaching> reaching_;
+  FoundOnce<BoundEntities> entities_;     // by symbol
   FoundOnce<OwnBindings> own_bindings_;   // by symbol
   FoundOnce<bool> is_definition_;         // by symbol
   NumberMap<int8_t> truths_;              // of conditions, by file and expression

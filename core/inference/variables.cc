@@ -14,6 +14,12 @@ namespace {
 
 bool Binds(const Occurrence& occurrence) { return occurrence.kind != NameKind::kNone; }
 
+// A module's path, as far as paths of modules go.
+constexpr size_t kMaxPathParts = 64;
+std::string PathOf(const FileSyntax& syntax, ExprId path, size_t parts = SIZE_MAX) {
+  return syntax.DottedNameOf(path, std::min(parts, kMaxPathParts + 1));
+}
+
 // Scopes whose code runs where it stands.
 bool RunsInPlace(NameScopeKind kind) {
   return kind == NameScopeKind::kComprehension || kind == NameScopeKind::kClass ||
@@ -272,7 +278,7 @@ Entities Inference::EntitiesInFile(ModuleId module, FileId file_id, Text name, i
     for (const StmtId star : names.stars) {
       if (!IsReachable(*file, star)) continue;
       const ExprId path = file->syntax.ExprsOf(file->syntax.stmt(star))[0];
-      const ModuleId source = modules_.FindFrom(file_id, file->syntax[path].op, file->syntax.DottedNameOf(path));
+      const ModuleId source = modules_.FindFrom(file_id, file->syntax[path].op, PathOf(file->syntax, path));
       if (source == kNoModule) {
         found.doubt |= Value::kOpen;
         continue;
@@ -301,12 +307,14 @@ Entities Inference::EntitiesOfImport(const SourceFile& file, uint32_t offset, in
   if (stmt == kModuleStmt) return found;
   const auto exprs = syntax.ExprsOf(syntax.stmt(stmt));
   const auto add_module = [&](ExprId path, size_t parts) {
-    const ModuleId module = modules_.FindFrom(file.id, syntax[path].op, syntax.DottedNameOf(path, parts));
+    const ModuleId module = modules_.FindFrom(file.id, syntax[path].op, PathOf(syntax, path, parts));
     if (module != kNoModule) found.found.push_back({Entity::kModule, module, 0});
   };
   const auto whole = [&](ExprId path) { return syntax.ChildrenOf(path).size(); };
   if (parent != kNoExpr && syntax[parent].kind == ExprKind::kModulePath) {
-    const auto names = syntax.ChildrenOf(parent);
+    auto names = syntax.ChildrenOf(parent);
+    names = names.first(std::min(names.size(), kMaxPathParts));
+    if (std::ranges::find(names, named) == names.end()) return found;
     add_module(parent, static_cast<size_t>(std::ranges::find(names, named) - names.begin()) + 1);
     return found;
   }
@@ -318,7 +326,7 @@ Entities Inference::EntitiesOfImport(const SourceFile& file, uint32_t offset, in
   }
   const ExprId path = exprs[0];
   const Text name = syntax.NameOf(syntax.ChildOf(parent, 0));
-  return EntitiesOfImport(file.id, syntax[path].op, syntax.DottedNameOf(path, whole(path)), name, depth);
+  return EntitiesOfImport(file.id, syntax[path].op, PathOf(syntax, path), name, depth);
 }
 
 Entities Inference::EntitiesOfImport(FileId importer, int level, Text path, Text name, int depth) {
@@ -482,7 +490,7 @@ void Inference::DropImportsOfItself(const SourceFile& file, std::vector<uint32_t
     if (stmt.kind != StmtKind::kFromImport || exprs.empty()) return false;
     const Text name = file.syntax.NameOf(named);
     if (file.syntax.NameOf(file.syntax.ChildOf(alias, 0)) != name) return false;
-    const ModuleId module = modules_.FindFrom(file.id, file.syntax[exprs[0]].op, file.syntax.DottedNameOf(exprs[0]));
+    const ModuleId module = modules_.FindFrom(file.id, file.syntax[exprs[0]].op, PathOf(file.syntax, exprs[0]));
     return module != kNoModule && FileOfModule(module) == file.id && modules_.Child(module, name) == kNoModule;
   };
   std::vector<uint32_t> others;
@@ -596,9 +604,9 @@ std::string Inference::ForeignNameOf(const SourceFile& file, uint32_t offset) {
   if (syntax[parent].kind != ExprKind::kImportAlias) return {};
   const Stmt& stmt = syntax.stmt(syntax.StatementOf(named));
   const auto exprs = syntax.ExprsOf(stmt);
-  if (stmt.kind == StmtKind::kImport) return syntax.DottedNameOf(syntax.ChildOf(parent, 0));
+  if (stmt.kind == StmtKind::kImport) return PathOf(syntax, syntax.ChildOf(parent, 0));
   if (stmt.kind != StmtKind::kFromImport || exprs.empty() || syntax[exprs[0]].op != 0) return {};
-  const std::string module = syntax.DottedNameOf(exprs[0]);
+  const std::string module = PathOf(syntax, exprs[0]);
   if (modules_.FindFrom(file.id, 0, module) != kNoModule) return {};
   return module + "." + std::string(syntax.NameOf(syntax.ChildOf(parent, 0)));
 }

@@ -43,7 +43,12 @@ class Painter {
     if (occurrence.role == NameRole::kImport) return OfImport(occurrence.begin);
     if (!occurrence.is_attribute) return {};
     const uint32_t receiver = bindings_.ReceiverOf(index);
-    if (receiver != kNoIndex && IsModule(receiver)) {
+    return OfAttribute(index, receiver != kNoIndex && IsModule(receiver));
+  }
+
+  Colour OfAttribute(uint32_t index, bool is_of_module) {
+    const Occurrence& occurrence = bindings_.occurrences[index];
+    if (is_of_module) {
       const Entities entities = in_.inference.EntitiesOf(file_, index);
       if (!entities.found.empty()) return OfEntity(entities.found.front());
     }
@@ -52,11 +57,33 @@ class Painter {
     return colour;
   }
 
+  // Of a chain of attributes from its first one on: each is one where the one in front is.
   bool IsModule(uint32_t index) {
-    const Occurrence& occurrence = bindings_.occurrences[index];
-    if (occurrence.has_symbol)
-      return OfVariable(bindings_.VariableOf(occurrence), occurrence).kind == TokenKind::kNamespace;
-    return occurrence.is_attribute && ColourOf(index, occurrence).kind == TokenKind::kNamespace;
+    std::vector<uint32_t> chain;
+    bool is_module = false;
+    for (;;) {
+      const Occurrence& occurrence = bindings_.occurrences[index];
+      if (occurrence.has_symbol || occurrence.role == NameRole::kImport) {
+        is_module = (occurrence.has_symbol     ? OfVariable(bindings_.VariableOf(occurrence), occurrence)
+                     : occurrence.is_attribute ? OfImport(occurrence.begin)
+                                               : Colour{})
+                        .kind == TokenKind::kNamespace;
+        break;
+      }
+      if (!occurrence.is_attribute || occurrence.role == NameRole::kKeyword) break;
+      if (const auto known = is_module_.find(index); known != is_module_.end()) {
+        is_module = known->second;
+        break;
+      }
+      chain.push_back(index);
+      index = bindings_.ReceiverOf(index);
+      if (index == kNoIndex) break;
+    }
+    for (size_t i = chain.size(); i-- > 0;) {
+      is_module = is_module && OfAttribute(chain[i], true).kind == TokenKind::kNamespace;
+      is_module_.emplace(chain[i], is_module);
+    }
+    return is_module;
   }
 
   Colour OfVariable(uint32_t variable, const Occurrence& occurrence) {
@@ -160,6 +187,7 @@ class Painter {
   const Bindings& bindings_;
   std::unordered_map<uint32_t, Colour> variables_;
   std::unordered_map<uint32_t, Colour> imports_;
+  std::unordered_map<uint32_t, bool> is_module_;  // by the occurrences of attributes
 };
 
 }  // namespace

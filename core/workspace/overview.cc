@@ -1,5 +1,6 @@
 // Outlines, symbols of the project, calls and problems.
 #include <algorithm>
+#include <map>
 #include <optional>
 #include <span>
 #include <tuple>
@@ -30,6 +31,12 @@ Workspace::Impl::Body Workspace::Impl::BodyAround(const SourceFile& file, uint32
     body.lambda = expr;
     return body;
   }
+  return BodyOfStatementAt(file, offset);
+}
+
+Workspace::Impl::Body Workspace::Impl::BodyOfStatementAt(const SourceFile& file, uint32_t offset) {
+  const FileSyntax& syntax = file.syntax;
+  Body body;
   StmtId stmt = syntax.StatementAt(offset);
   if (stmt != kModuleStmt && syntax.stmt(stmt).kind == StmtKind::kDef && offset < syntax.stmt(stmt).end)
     stmt = syntax.stmt(stmt).parent;
@@ -183,6 +190,46 @@ std::vector<Location> Workspace::Impl::MembersBelow(const SourceFile& file, Expr
   return found;
 }
 
+namespace {
+
+// Finds the lambda in whose body a place lies, for who asks about many places of a file.
+class LambdaBodies {
+ public:
+  explicit LambdaBodies(const FileSyntax& syntax) {
+    for (ExprId expr = 1; expr < syntax.exprs.size(); ++expr) {
+      if (syntax[expr].kind != ExprKind::kLambda || syntax[expr].children_count == 0) continue;
+      bodies_.push_back({syntax[syntax.ChildrenOf(expr).back()].begin, syntax[expr].end, expr, kNoIndex});
+    }
+    // Each lies in one of those in front of it, or in none.
+    std::ranges::sort(bodies_, {}, [](const Body& body) { return std::pair(body.begin, ~body.end); });
+    for (uint32_t i = 1; i < bodies_.size(); ++i) bodies_[i].around = InnermostFrom(i - 1, bodies_[i].begin);
+  }
+
+  // kNoExpr where it lies in none.
+  ExprId At(uint32_t offset) const {
+    const auto behind = std::ranges::upper_bound(bodies_, offset, {}, &Body::begin);
+    if (behind == bodies_.begin()) return kNoExpr;
+    const uint32_t found = InnermostFrom(static_cast<uint32_t>(behind - bodies_.begin() - 1), offset);
+    return found == kNoIndex ? kNoExpr : bodies_[found].lambda;
+  }
+
+ private:
+  struct Body {
+    uint32_t begin, end;
+    ExprId lambda;
+    uint32_t around;
+  };
+
+  uint32_t InnermostFrom(uint32_t at, uint32_t offset) const {
+    while (at != kNoIndex && bodies_[at].end <= offset) at = bodies_[at].around;
+    return at;
+  }
+
+  std::vector<Body> bodies_;
+};
+
+}  // namespace
+
 std::vector<Call> Workspace::Callees(FileId id, uint32_t offset) {
   Impl& in = *impl_;
   in.Begin();
@@ -199,7 +246,13 @@ std::vector<Call> Workspace::Callees(FileId id, uint32_t offset) {
     begin = syntax.stmt(body.def).end;
     end = syntax.stmt(body.def).block_end;
   }
-  const auto is_here = [&](uint32_t at) { return at >= begin && at < end && in.BodyAround(*file, at) == body; };
+  const LambdaBodies lambdas(syntax);
+  const auto is_here = [&](uint32_t at) {
+    if (at < begin || at >= end) return false;
+    const ExprId lambda = lambdas.At(at);
+    return (lambda != kNoExpr ? Impl::Body{kModuleStmt, lambda} : in.BodyOfStatementAt(*file, at)) == body;
+  };
+  std::map<std::tuple<FileId, uint32_t, std::string>, size_t> places;  // in `found`
   const auto add = [&](ExprId at, const std::vector<Impl::Callee>& callees, bool only_project = false) {
     Location call;
     call.file = id;
@@ -209,17 +262,15 @@ std::vector<Call> Workspace::Callees(FileId id, uint32_t offset) {
     for (const Impl::Callee& callee : callees) {
       if (only_project && !in.IsProject(callee.binding.file)) continue;
       call.certainty = callee.certainty;
-      auto known = std::ranges::find_if(found, [&](const Call& other) {
-        return other.function.file == callee.binding.file && other.function.begin == callee.binding.offset &&
-               other.name == callee.name;
-      });
-      if (known == found.end()) {
+      const auto [place, is_new] =
+          places.try_emplace({callee.binding.file, callee.binding.offset, callee.name}, found.size());
+      if (is_new) {
         Call made;
         made.function = in.At(callee.binding, callee.certainty);
         made.name = callee.name;
         found.push_back(std::move(made));
-        known = found.end() - 1;
       }
+      Call* const known = &found[place->second];
       known->function.certainty = std::min(known->function.certainty, callee.certainty);
       known->calls.push_back(call);
     }

@@ -72,7 +72,8 @@ std::vector<Problem> Workspace::Problems(FileId id) {
       // Only the first part that is not there, and no name of a module that is not there.
       if (is_path) {
         const auto parts = file->syntax.ChildrenOf(file->syntax[named].parent);
-        const auto at = std::ranges::find(parts, named);
+        const auto at = std::ranges::lower_bound(parts, occurrence.begin, {},
+                                                 [&](ExprId part) { return file->syntax[part].begin; });
         if (at != parts.begin() && in.inference.EntitiesOfImport(*file, file->syntax[*(at - 1)].begin).found.empty())
           continue;
       } else {

@@ -96,8 +96,9 @@ Entities Workspace::Impl::Meant(const SourceFile& file, uint32_t index) {
   if (variable != kNoIndex) {
     for (const uint32_t i : file.occurrences().Of(variable)) {
       const Occurrence& other = file.bindings.occurrences[i];
-      if (other.kind == NameKind::kImport && other.role == NameRole::kDefinition)
-        meant.found.push_back({Entity::kVariable, file.id, variable});
+      if (other.kind != NameKind::kImport || other.role != NameRole::kDefinition) continue;
+      meant.found.push_back({Entity::kVariable, file.id, variable});
+      break;
     }
   }
   return meant;

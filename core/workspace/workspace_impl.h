@@ -173,6 +173,7 @@ class Workspace::Impl final : public CallerSource {
     friend bool operator==(const Body&, const Body&) = default;
   };
   Body BodyAround(const SourceFile& file, uint32_t offset);
+  Body BodyOfStatementAt(const SourceFile& file, uint32_t offset);  // lambdas aside
   Body BodyAt(const SourceFile& file, uint32_t offset);
 
   Settings settings;

@@ -98,6 +98,11 @@ const Shape kShapes[] = {
     {"not in a condition", "if ", "not ", "a: x = 1\nx\n"},
     {"blocks in blocks", "x = 0\n", "if a: ", "x = 1\nx\n"},
     {"loops in loops", "x = 0\n", "for a in b: ", "x = 1\nx\n"},
+    {"attributes", "x = a", ".b", "\nx\n"},
+    {"calls", "def f(): pass\nx = f", "()", "\nx\n"},
+    {"calls of many", "", "def f#(): f#()\n", "f0()\n"},
+    {"imports of one name", "", "import a# as b\n", "b\n"},
+    {"a long path", "import a", ".b", "\na\n"},
     {"definitions in definitions", "x = 0\n", "def f(): ", "x = 1\nx\n"},
 };
 
