@@ -12,7 +12,7 @@
 //   quillet_scaling --pairs             all pairs of fragments, repeated
 //   quillet_scaling --random N [SEED]   N random sequences of fragments, repeated, half of them behind a front
 //   --count N                           each unit of the list N times, once: whether it ends, whatever it costs
-//   --phase NAME                        this column alone
+//   --phases NAME,...                   these columns alone (output needs 3.12)
 //   --slow SECONDS                      names the questions to a workspace that take longer
 //   --seconds N                         ends an input of a count behind so many
 //   --size KIB, --stack KIB, --only TEXT, --list
@@ -748,8 +748,8 @@ void Ask(Text text) {
 // One measurement at a count, or two: at that of a size and of four times that size.
 struct Amount {
   size_t size;
-  size_t count;    // 0 stands for that of the size
-  int phase = -1;  // -1 stands for all
+  size_t count;           // 0 stands for that of the size
+  uint32_t phases = ~0u;  // bits by their numbers
 };
 
 Costs MeasureHere(const Shape& shape, Amount amount) {
@@ -781,7 +781,7 @@ Costs MeasureHere(const Shape& shape, Amount amount) {
           [&] { Ask(text); },
       };
       for (int phase = 0; phase < kPhases; ++phase) {
-        if (amount.phase != -1 && phase != amount.phase) continue;
+        if ((amount.phases >> phase & 1) == 0) continue;
         const double begin = ProcessorSeconds();
         costs.refused |= IsRefused(phases[phase]);
         costs.seconds[phase][step] = ProcessorSeconds() - begin;
@@ -838,7 +838,7 @@ std::string Measure(const Shape& shape, Amount amount, size_t stack, Costs& cost
 // ---- judging ----
 
 struct Limits {
-  Amount amount = {256 << 10, 0, -1};
+  Amount amount = {256 << 10, 0};
   size_t stack = 512 << 10;
   double growth = 2;          // of the cost of a byte, from a size to four times that size
   double least = 15;          // ns a byte: below it nothing but noise and caches make the growth
@@ -911,10 +911,12 @@ int Main(int argc, char** argv) {
       limits.stack = value() << 10;
     } else if (option == "--only" && i + 1 < argc) {
       only = argv[++i];
-    } else if (option == "--phase" && i + 1 < argc) {
-      const Text name = argv[++i];
-      const auto found = std::ranges::find(kPhaseNames, name, [](const char* each) { return Text(each); });
-      limits.amount.phase = static_cast<int>(found - std::begin(kPhaseNames));
+    } else if (option == "--phases" && i + 1 < argc) {
+      const std::string wanted = std::string(",") + argv[++i] + ",";
+      limits.amount.phases = 0;
+      for (int phase = 0; phase < kPhases; ++phase)
+        if (wanted.find(std::string(",") + kPhaseNames[phase] + ",") != std::string::npos)
+          limits.amount.phases |= 1u << phase;
     } else if (option == "--seconds") {
       g_most_seconds = static_cast<unsigned>(value());
     } else if (option == "--slow" && i + 1 < argc) {
@@ -925,7 +927,7 @@ int Main(int argc, char** argv) {
     } else {
       std::fprintf(stderr,
                    "usage: quillet_scaling [--pairs | --random N [SEED]] [--size KIB | --count N] [--stack KIB] "
-                   "[--only TEXT] [--phase NAME] [--slow SECONDS] [--seconds N] [--list]\n");
+                   "[--only TEXT] [--phases NAME,...] [--slow SECONDS] [--seconds N] [--list]\n");
       return 2;
     }
   }
