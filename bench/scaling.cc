@@ -15,6 +15,7 @@
 //   --phases NAME,...                   these columns alone (output needs 3.12)
 //   --slow SECONDS                      names the questions to a workspace that take longer
 //   --seconds N                         ends an input of a count behind so many
+//   --write PATH                        writes the input that --only names, at a count, and measures nothing
 //   --size KIB, --stack KIB, --only TEXT, --list
 //
 // Time is that of the processor. It is taken again where it looks bad, since other processes disturb it.
@@ -28,6 +29,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
+#include <fstream>
 #include <functional>
 #include <random>
 #include <string>
@@ -894,7 +896,7 @@ int Main(int argc, char** argv) {
   bool pairs = false;
   size_t random_count = 0;
   unsigned seed = 1;
-  std::string only;
+  std::string only, path;
   for (int i = 1; i < argc; ++i) {
     const std::string option = argv[i];
     const auto value = [&] { return i + 1 < argc ? std::strtoul(argv[++i], nullptr, 10) : 0; };
@@ -911,6 +913,8 @@ int Main(int argc, char** argv) {
       limits.stack = value() << 10;
     } else if (option == "--only" && i + 1 < argc) {
       only = argv[++i];
+    } else if (option == "--write" && i + 1 < argc) {
+      path = argv[++i];
     } else if (option == "--phases" && i + 1 < argc) {
       const std::string wanted = std::string(",") + argv[++i] + ",";
       limits.amount.phases = 0;
@@ -927,9 +931,15 @@ int Main(int argc, char** argv) {
     } else {
       std::fprintf(stderr,
                    "usage: quillet_scaling [--pairs | --random N [SEED]] [--size KIB | --count N] [--stack KIB] "
-                   "[--only TEXT] [--phases NAME,...] [--slow SECONDS] [--seconds N] [--list]\n");
+                   "[--only TEXT] [--phases NAME,...] [--slow SECONDS] [--seconds N] [--write PATH] [--list]\n");
       return 2;
     }
+  }
+  if (!path.empty()) {
+    const auto shape = std::ranges::find(Shapes(), only, &Shape::name);
+    if (shape == Shapes().end()) return 2;
+    std::ofstream(path, std::ios::binary) << Make(*shape, limits.amount.count);
+    return 0;
   }
   TheConsole().print_line = [](Text) {};
   TheConsole().report_exception = [](const std::exception_ptr&, bool) {};

@@ -32,6 +32,7 @@ void Inference::Clear() {
   reachable_clauses_.Clear();
   at_end_ = {};
   annotated_ = {};
+  definitions_ = {};
   conditions_ = {};
   module_names_.clear();
   writes_.clear();

@@ -232,6 +232,8 @@ class Inference {
   Entities EntitiesOf(const SourceFile& file, uint32_t occurrence);
   // The places that bind an entity, in order of files and offsets.
   std::vector<Binding> BindingsOf(const Entity& entity);
+  // Where `def` and `class` bind a variable: the first of these places, so many.
+  const std::vector<Binding>& DefinitionsOf(const SourceFile& file, uint32_t symbol);
   // The bindings that reach a name; empty for attributes.
   const std::vector<Binding>& BindingsReaching(const SourceFile& file, uint32_t occurrence,
                                                bool* may_be_unbound = nullptr);
@@ -640,6 +642,7 @@ class Inference {
   NumberMap<uint8_t> reachable_clauses_;  // by file and statement: bits of ClauseReach
   FoundOnce<std::vector<Binding>> at_end_;
   FoundOnce<std::vector<Binding>> annotated_;
+  FoundOnce<std::vector<Binding>> definitions_;
   FoundOnce<std::vector<Condition>> conditions_;
   std::unordered_map<FileId, ModuleNames> module_names_;
   std::unordered_map<FileId, std::unordered_map<Text, std::vector<ExprId>>> writes_;

@@ -375,6 +375,19 @@ std::vector<Binding> Inference::BindingsOf(const Entity& entity) {
   return found;
 }
 
+const std::vector<Binding>& Inference::DefinitionsOf(const SourceFile& file, uint32_t symbol) {
+  static constexpr size_t kMost = 64;
+  return definitions_.Get(file.id, symbol, [&] {
+    std::vector<Binding> found;
+    for (const uint32_t i : file.occurrences().Of(symbol)) {
+      const Occurrence& occurrence = file.bindings.occurrences[i];
+      const bool is_defined = Binds(occurrence) && file.syntax.StatementNamedAt(occurrence.begin) != kModuleStmt;
+      if (is_defined && found.size() < kMost) found.push_back({file.id, occurrence.begin});
+    }
+    return found;
+  });
+}
+
 // ---- what they give ----
 
 FrameId Inference::FrameFor(const SourceFile& file, uint32_t scope, FrameId frame) {

@@ -85,6 +85,7 @@ class DefinitionsMaker {
   static constexpr uint32_t kNotAsked = kNoIndex - 1;
 
   void Take(const Bindings& bindings, Text source) {
+    line_begin_ = SIZE_MAX;
     scopes_.assign(bindings.scopes.size(), kNotAsked);
     texts_.assign(bindings.texts.size(), kNoIndex);
     seen_.assign(bindings.symbols.size(), 0);
@@ -97,7 +98,7 @@ class DefinitionsMaker {
       const size_t line_begin = place.line == 0 ? 0 : occurrence.begin - static_cast<size_t>(place.col);
       const size_t end = occurrence.begin + bindings.TextOf(occurrence).size();
       definition.line = place.line + 1;
-      definition.column = IsAscii(source.substr(line_begin, end - line_begin)) ? place.col + 1 : 0;
+      definition.column = IsAscii(source, line_begin, end) ? place.col + 1 : 0;
       definition.role = occurrence.role;
       definition.kind = occurrence.kind;
       definition.of_self = occurrence.kind == NameKind::kNone;
@@ -115,8 +116,14 @@ class DefinitionsMaker {
     }
   }
 
-  static bool IsAscii(Text text) {
-    return std::ranges::all_of(text, [](char c) { return static_cast<unsigned char>(c) < 0x80; });
+  // From the beginning of a line: what was looked at of it is not looked at again.
+  bool IsAscii(Text source, size_t line_begin, size_t end) {
+    if (line_begin != line_begin_) {
+      line_begin_ = line_begin;
+      ascii_end_ = line_begin;
+    }
+    while (ascii_end_ < end && static_cast<unsigned char>(source[ascii_end_]) < 0x80) ++ascii_end_;
+    return ascii_end_ >= end;
   }
 
   static bool IsDefinition(const Bindings& bindings, const Occurrence& occurrence) {
@@ -157,6 +164,8 @@ class DefinitionsMaker {
   std::vector<uint32_t> texts_;
   std::vector<uint32_t> scopes_;
   std::vector<char> seen_;
+  size_t line_begin_ = SIZE_MAX;  // of the line looked at last
+  size_t ascii_end_ = 0;          // up to which it is ASCII
 };
 
 // ---- whether a text may define a member, without its analysis ----
@@ -267,8 +276,9 @@ bool MayDefineMember(Text source, Text name) {
 }  // namespace
 
 std::string DottedNameOf(const Bindings& bindings, uint32_t scope) {
+  static constexpr int kMaxScopes = 400;  // the innermost: no version runs what nests so deeply
   std::string name;
-  for (; scope != kNoIndex && scope != 0; scope = bindings.scopes[scope].parent) {
+  for (int i = 0; i < kMaxScopes && scope != kNoIndex && scope != 0; ++i, scope = bindings.scopes[scope].parent) {
     const NameScope& around = bindings.scopes[scope];
     if ((around.kind != NameScopeKind::kClass && around.kind != NameScopeKind::kFunction) || around.name == kNoIndex)
       continue;

@@ -144,7 +144,10 @@ std::vector<Workspace::Impl::Callee> Workspace::Impl::CalleesOf(const SourceFile
   const Entities entities = inference.EntitiesOf(file, at);
   for (const Entity& entity : entities.found) {
     if (entity.kind == Entity::kModule) continue;
-    for (const Binding& binding : inference.BindingsOf(entity)) {
+    const SourceFile* owner = entity.kind == Entity::kVariable ? Get(entity.a) : nullptr;
+    const std::vector<Binding> bindings =
+        owner != nullptr ? inference.DefinitionsOf(*owner, entity.b) : inference.BindingsOf(entity);
+    for (const Binding& binding : bindings) {
       const SourceFile* source = Get(binding.file);
       if (source == nullptr || source->syntax.StatementNamedAt(binding.offset) == kModuleStmt) continue;
       const Binding there = SourceOf(binding);

@@ -535,6 +535,17 @@ def test_what_is_no_file_is_told_in_one_line(tmp_path: Path, name: str, kind: st
     assert str(tmp_path.name) in only_line(result.stderr) or name in only_line(result.stderr)
 
 
+def test_a_named_pipe_is_told_without_waiting_for_it(tmp_path: Path) -> None:
+    (tmp_path / "a.py").write_text("x = 1\n")
+    os.mkfifo(tmp_path / "pipe")
+    for line in (("index", "pipe", "a.py", "-q"), ("report", "-o", "site", "pipe", "a.py")):
+        result = run(*line, cwd=tmp_path)
+        assert result.returncode == 1
+        assert "pipe: is a pipe" in result.stderr
+    assert "a.py:1:1" in run("find", "x", cwd=tmp_path).stdout
+    assert (tmp_path / "site" / "index.html").exists()
+
+
 def test_a_full_disk_leaves_the_old_index(tmp_path: Path) -> None:
     make_index(tmp_path, a="x = 1\n")
     before = index_path(tmp_path).read_bytes()

@@ -7,6 +7,7 @@ from __future__ import annotations
 import errno
 import os
 import re
+import stat
 from collections.abc import Iterable, Iterator, Sequence
 from typing import NamedTuple
 
@@ -42,6 +43,11 @@ def walk(
 
     arguments = [os.fsencode(path) for path in paths]
     yield from _host.FindFiles(arguments, gitignore, pattern_lines(exclude))
+
+
+def pipe_problem(mode: int) -> str | None:
+    """What keeps a file of this mode from being read more than once."""
+    return "is a pipe" if stat.S_ISFIFO(mode) else "is a socket" if stat.S_ISSOCK(mode) else None
 
 
 class Exclusion:

@@ -4,7 +4,7 @@ from __future__ import annotations
 
 import os
 
-from quillet.cli.files import find_files, problem_of
+from quillet.cli.files import find_files, pipe_problem, problem_of
 from quillet.cli.progress import Progress, say
 from quillet.cli.show import printable
 from quillet.report.folder import SiteProblem
@@ -43,7 +43,7 @@ def _sources(paths: tuple[str, ...], gitignore: bool, exclude: tuple[str, ...]) 
     sources: dict[str, Source] = {}
     lost = 0
     for found in find_files(paths, gitignore=gitignore, exclude=exclude):
-        problem = found.problem
+        problem = found.problem or _pipe_problem(found.path)
         if problem is not None:
             _say_of(found.path, problem)
             lost += 1
@@ -51,6 +51,14 @@ def _sources(paths: tuple[str, ...], gitignore: bool, exclude: tuple[str, ...]) 
         name = _name_of(found.path)
         sources.setdefault(name, Source(found.path, name))
     return sorted(sources.values(), key=lambda source: _parts(source.name)), lost
+
+
+def _pipe_problem(path: str) -> str | None:
+    """Of a path that is named; one that cannot be looked at says so where it is read."""
+    try:
+        return pipe_problem(os.stat(path).st_mode)
+    except (OSError, ValueError):
+        return None
 
 
 def _name_of(path: str) -> str:

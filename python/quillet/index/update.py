@@ -16,7 +16,7 @@ from contextlib import suppress
 from typing import Any, NamedTuple
 
 from quillet._languages import available_cores, decode_source, native_language_of
-from quillet.cli.files import problem_of, walk
+from quillet.cli.files import pipe_problem, problem_of, walk
 from quillet.index.git import keep_out_of_git
 from quillet.index.paths import full_path, is_below, prefix_of, stored_path, trusted_roots
 from quillet.index.store import IndexProblem, StaleIndex, Stored, read_index, settings_text
@@ -201,6 +201,9 @@ class _Run:
                     status = os.stat(name)
                 except (OSError, ValueError) as error:  # such as a NUL in the name
                     self._report(name, problem_of(error))
+                    continue
+                if problem := pipe_problem(status.st_mode):
+                    self._report(name, problem)
                     continue
                 size, mtime_ns = status.st_size, status.st_mtime_ns
                 stored = stored_path(name, self._base)
