@@ -305,6 +305,23 @@ std::vector<Location> Workspace::Impl::KeyDefinitions(const SourceFile& file, ui
   return found;
 }
 
+// Of a test's parameter the fixture that gives it.
+void Workspace::Impl::AddFixture(const SourceFile& file, uint32_t occurrence, std::vector<Location>& found) {
+  const uint32_t variable = file.bindings.VariableOf(file.bindings.occurrences[occurrence]);
+  const bool is_given = std::ranges::any_of(found, [](const Location& at) {
+    return at.kind == NameKindWords()[static_cast<size_t>(NameKind::kParameter) - 1];
+  });
+  if (variable == kNoIndex || !is_given) return;
+  const FunctionId function = inference.FunctionOfScope(file, file.bindings.symbols[variable].scope);
+  if (function == kNoId) return;
+  const FunctionId fixture =
+      inference.FixtureOf(inference.function(function), file.bindings.TextOf(file.bindings.occurrences[occurrence]));
+  const SourceFile* source = fixture == kNoId ? nullptr : Get(inference.function(fixture).file);
+  if (source == nullptr) return;
+  const StmtId stmt = inference.function(fixture).stmt;
+  found.push_back(At({source->id, source->syntax.stmt(stmt).name_begin}, Certainty::kLikely));
+}
+
 std::vector<Location> Workspace::Definitions(FileId id, uint32_t offset) {
   Impl& in = *impl_;
   in.Begin();
@@ -317,6 +334,7 @@ std::vector<Location> Workspace::Definitions(FileId id, uint32_t offset) {
   if (occurrence.has_symbol && occurrence.kind != NameKind::kNone && occurrence.kind != NameKind::kImport &&
       occurrence.role != NameRole::kRead) {
     found.push_back(in.AtOccurrence(*file, index, Certainty::kCertain));
+    in.AddFixture(*file, index, found);
     return found;
   }
   if (occurrence.has_symbol && occurrence.kind == NameKind::kNone) {
@@ -332,6 +350,7 @@ std::vector<Location> Workspace::Definitions(FileId id, uint32_t offset) {
     }
     if (!found.empty()) {
       in.Sort(found);
+      in.AddFixture(*file, index, found);
       return found;
     }
   }

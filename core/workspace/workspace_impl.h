@@ -96,6 +96,7 @@ class Workspace::Impl final : public CallerSource {
   Value ExpectedOf(const SourceFile& file, ExprId expr);
   // The field of a typed dictionary that a string names.
   std::vector<Location> KeyDefinitions(const SourceFile& file, uint32_t offset);
+  void AddFixture(const SourceFile& file, uint32_t occurrence, std::vector<Location>& found);
   Binding OtherSideOf(Binding binding);
   std::vector<Binding> OtherSidesOf(Binding binding);
   void Sort(std::vector<Location>& locations) const;

@@ -417,6 +417,17 @@ TEST(References, InALibraryAreThoseOfTheFilesThatAreOpen) {
                                          "library/more.py:2:1", "a.py:1:17", "a.py:2:1"}));
 }
 
+TEST(Definitions, OfParametersOfTestsAreTheirFixtures) {
+  Program program(
+      "import pytest\n@pytest.fixture\ndef shop(): pass\ndef test($shop, x):\n  $shop, $x\n  shop = 1\n  $shop\n"
+      "def plain($shop): pass\n");
+  EXPECT_EQ(program.Definitions(0), (Words{"a.py:4:10", "a.py:3:5 likely"}));
+  EXPECT_EQ(program.Definitions(1), (Words{"a.py:4:10", "a.py:3:5 likely"}));
+  EXPECT_EQ(program.Definitions(2), (Words{"a.py:4:16"}));
+  EXPECT_EQ(program.Definitions(3), (Words{"a.py:6:3"}));
+  EXPECT_EQ(program.Definitions(4), (Words{"a.py:8:11"}));
+}
+
 TEST(Definitions, OfKeysThatAreGotten) {
   Program program(
       "from typing import TypedDict\nclass M(TypedDict):\n  name: str\ndef f(m: M):\n  m.get('$name')\n  m['$name']\n"
