@@ -39,9 +39,9 @@ RecordTable RecordTableMaker::Make(const FileAnalyzer& file, const ScopeNames& s
   table.details.reserve(count);
   table.kinds.reserve(count);
   table.is_parameter.reserve(count);
-  // Those of the file before view what is gone.
-  names_.clear();
-  details_.clear();
+  // Those of the file before view what is gone. Most texts come more than once.
+  names_.Begin(count / 3);
+  details_.Begin(count / 3);
   placed.Begin(file, scopes);
   for (size_t row = 0; row < file.rows().size(); ++row) {
     file.CheckMemory(table.ByteSize());
@@ -61,10 +61,10 @@ RecordTable RecordTableMaker::Make(const FileAnalyzer& file, const ScopeNames& s
   return table;
 }
 
-uint32_t RecordTableMaker::NumberOf(Text text, Numbers& numbers, TextList& texts) {
-  const auto [found, is_new] = numbers.try_emplace(text, static_cast<uint32_t>(texts.size()));
-  if (is_new) texts.Add(text);
-  return found->second;
+uint32_t RecordTableMaker::NumberOf(Text text, TextNumbers& numbers, TextList& texts) {
+  const uint32_t number = numbers.NumberOf(text);
+  if (number == texts.size()) texts.Add(text);
+  return number;
 }
 
 void RecordTableMaker::AddDefinitions(const FileAnalyzer& file, const ScopeNames& scopes, RecordTable& table) {

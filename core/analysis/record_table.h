@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "analysis/placed_records.h"
+#include "foundations/text_numbers.h"
 
 namespace quillet {
 
@@ -69,15 +70,13 @@ class RecordTableMaker {
   RecordTable Make(const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed);
 
  private:
-  using Numbers = std::unordered_map<Text, uint32_t>;
-
-  static uint32_t NumberOf(Text text, Numbers& numbers, TextList& texts);
+  static uint32_t NumberOf(Text text, TextNumbers& numbers, TextList& texts);
   static void AddDefinitions(const FileAnalyzer& file, const ScopeNames& scopes, RecordTable& table);
   void SetOpens(RecordTable& table);
 
   // The texts of the file under way, which are the placed records'.
-  Numbers names_;
-  Numbers details_;
+  TextNumbers names_;
+  TextNumbers details_;
   std::unordered_map<uint64_t, RecordTable::Opens> opens_;  // by line and column
 };
 
