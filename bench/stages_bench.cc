@@ -2,6 +2,8 @@
 // tokenising, cutting into logical lines, parsing with discard, walking (hints included), all of it, and
 // binding names, alone and with all of it, and reading statements and expressions.
 //
+// `--passes exact 3`, or `complete`: nothing but so many analyses of all files, for `perf stat` or callgrind.
+//
 // Counters: ns per token, MB/s, physical lines/s. Before a stage is timed its result is checked: the
 // tokens cover the source in order, trees come out the same twice, recycled nodes give the records
 // that fresh ones give, a recycled binder and a recycled reader what fresh
@@ -268,6 +270,15 @@ BENCHMARK(BytesToRecords)->Unit(benchmark::kMillisecond);
 void BytesToRecordsCompletely(benchmark::State& state) { AnalyzeCorpus(state, true); }
 BENCHMARK(BytesToRecordsCompletely)->Unit(benchmark::kMillisecond);
 
+// Nothing but the analysis, for what counts all that a process does: two numbers of passes tell what one costs.
+int Pass(Text reading, const char* count) {
+  if (reading != "exact" && reading != "complete") return 2;
+  FileAnalyzer analyzer(AnalyzerOptions(reading == "complete"));
+  for (int passes = std::atoi(count); passes > 0; --passes)
+    for (const std::string& bytes : TheCorpus().files) analyzer.Analyze(bytes);
+  return 0;
+}
+
 bool SameNames(const Bindings& a, const Bindings& b) {
   if (a.occurrences.size() != b.occurrences.size() || a.symbols.size() != b.symbols.size()) return false;
   for (size_t i = 0; i < a.occurrences.size(); ++i) {
@@ -358,6 +369,7 @@ BENCHMARK(Syntax)->Unit(benchmark::kMillisecond);
 }  // namespace quillet::bench
 
 int main(int argc, char** argv) {
+  if (argc == 4 && std::string(argv[1]) == "--passes") return quillet::bench::Pass(argv[2], argv[3]);
   benchmark::Initialize(&argc, argv);
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 2;
   const auto& corpus = quillet::bench::TheCorpus();

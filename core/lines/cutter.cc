@@ -213,12 +213,21 @@ class Statement {
   TokenCode lead_;  // its code, or that of the word behind `async`
 };
 
-// `Unusual`: what looks at each token.
+// In the place of UnusualTokens for who does not want to know.
+struct NoUnusualTokens : SeesNoTokens {
+  explicit NoUnusualTokens(Version) {}
+  void SeePlace() {}
+  void SeeEndOfImport(const Token&) {}
+  uint8_t reasons() const { return 0; }
+  void Reset() {}
+};
+
+// `Unusual`: what looks at each token of a statement.
 template <class Unusual>
-class Cutter {
+class Cutter : public Unusual {
  public:
   Cutter(Version version, std::vector<LineRow>& rows, size_t most_memory)
-      : python2_(!version.AtLeast(3, 0)), rows_(rows), most_memory_(most_memory), unusual_(version) {}
+      : Unusual(version), python2_(!version.AtLeast(3, 0)), rows_(rows), most_memory_(most_memory) {}
 
   // ---- what the scanner calls ----
 
@@ -237,7 +246,7 @@ class Cutter {
   void BeginStatement(uint32_t indent, uint32_t bytes, const ScanOutput& out) {
     indent_ = indent;
     if (bytes != indent) [[unlikely]]
-      unusual_.SeePlace();
+      this->SeePlace();
     BeginPiece(false, out);
   }
 
@@ -267,7 +276,7 @@ class Cutter {
       }
     }
     facts_ = {};
-    unusual_.Reset();
+    this->Reset();
   }
 
   // Broken code: brackets that were never closed end in front of a line that is indented no deeper
@@ -288,19 +297,13 @@ class Cutter {
   void Colon(uint32_t index) { facts_.Colon(index); }
   void String(uint32_t index, bool formatted) { facts_.String(index, formatted); }
   void Comment(Text comment) { facts_.Comment(comment); }
-  void SeeName(TokenCode code) { unusual_.SeeName(code); }
-  void SeeUnderscore(const char* name) { unusual_.SeeUnderscore(name); }
-  void SeeOperator(char first, TokenCode code) { unusual_.SeeOperator(first, code); }
-  void SeeWalrus() { unusual_.SeeWalrus(); }
-  void SeeNumber(Text number) { unusual_.SeeNumber(number); }
-  void SeeString(Text string, TokenCode before) { unusual_.SeeString(string, before); }
 
  private:
   void BeginPiece(bool continues, const ScanOutput& out) {
     first_ = out.token_count();
     first_line_ = out.line();
     continues_ = continues;
-    if (continues) unusual_.SeePlace();
+    if (continues) this->SeePlace();
   }
 
   TokenCode LastSignificantCode(const ScanOutput& out) const {
@@ -331,7 +334,7 @@ class Cutter {
     const Statement statement(toks, first_, end, facts_, python2_);
     const uint32_t body = statement.IsDefinition() ? statement.InlineBody() : end;
     if (body == end) return AddRow(statement, toks, end, false, out);
-    unusual_.SeePlace();
+    this->SeePlace();
     const StatementFacts head_facts = FactsOf(toks, first_, body);
     AddRow(Statement(toks, first_, body, head_facts, python2_), toks, body, true, out);
     const StatementFacts body_facts = FactsOf(toks, body, end);
@@ -343,9 +346,9 @@ class Cutter {
 
   void AddRow(const Statement& statement, TokenSpan toks, uint32_t end, bool has_inline_body, const ScanOutput& out) {
     const LineKind kind = statement.Kind();
-    if (kind == LineKind::kFromImport) unusual_.SeeEndOfImport(toks[end - 1]);
+    if (kind == LineKind::kFromImport) this->SeeEndOfImport(toks[end - 1]);
     Add({first_, end - first_, first_line_, LastLine(toks, end, out), indent_, kind, continues_, has_inline_body,
-         statement.is_async(), statement.HasNoEmbedded(kind), unusual_.reasons()},
+         statement.is_async(), statement.HasNoEmbedded(kind), this->reasons()},
         out);
   }
 
@@ -367,7 +370,6 @@ class Cutter {
   std::vector<LineRow>& rows_;
   const size_t most_memory_;
   StatementFacts facts_;     // of the tokens since first_
-  Unusual unusual_;          // likewise
   uint32_t first_ = 0;       // the first token of the statement under way
   uint32_t first_line_ = 0;  // its line
   uint32_t indent_ = 0;

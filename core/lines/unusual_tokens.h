@@ -124,19 +124,4 @@ class UnusualTokens {
   uint8_t reasons_;
 };
 
-// In its place for who does not want to know.
-struct NoUnusualTokens {
-  explicit NoUnusualTokens(Version) {}
-  void SeeName(TokenCode) {}
-  void SeeUnderscore(const char*) {}
-  void SeeOperator(char, TokenCode) {}
-  void SeeWalrus() {}
-  void SeeNumber(Text) {}
-  void SeeString(Text, TokenCode) {}
-  void SeePlace() {}
-  void SeeEndOfImport(const Token&) {}
-  uint8_t reasons() const { return 0; }
-  void Reset() {}
-};
-
 }  // namespace quillet

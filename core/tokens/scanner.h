@@ -173,8 +173,18 @@ class ScanOutput {
   scanner::Appender<uint32_t> line_starts_;
 };
 
+// What a client is that looks at no token.
+struct SeesNoTokens {
+  void SeeName(TokenCode) {}
+  void SeeUnderscore(const char*) {}
+  void SeeOperator(char, TokenCode) {}
+  void SeeWalrus() {}
+  void SeeNumber(Text) {}
+  void SeeString(Text, TokenCode) {}
+};
+
 // The client that wants nothing but the tokens.
-struct TokensOnly {
+struct TokensOnly : SeesNoTokens {
   void BlankLine(uint32_t, const ScanOutput&) {}
   void CommentLine(uint32_t, const ScanOutput&) {}
   void BeginStatement(uint32_t, uint32_t, const ScanOutput&) {}
@@ -186,12 +196,6 @@ struct TokensOnly {
   void Colon(uint32_t) {}
   void String(uint32_t, bool) {}
   void Comment(Text) {}
-  void SeeName(TokenCode) {}
-  void SeeUnderscore(const char*) {}
-  void SeeOperator(char, TokenCode) {}
-  void SeeWalrus() {}
-  void SeeNumber(Text) {}
-  void SeeString(Text, TokenCode) {}
 };
 
 template <class Client>
