@@ -33,7 +33,7 @@ from syntax_agreement import PARTNERS, broken, statements_of
 BETWEEN = "\npass\n"
 ROUNDS = 9
 RUNS = 20
-WORDS_OF_PLACES = {"async", "await", "break", "class", "continue", "def", "nonlocal", "return", "yield"}
+WORDS_OF_PLACES = {"async", "await", "break", "class", "continue", "def", "global", "nonlocal", "return", "yield"}
 
 _ONCE = """
 import sys
