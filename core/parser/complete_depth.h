@@ -5,19 +5,20 @@
 
 namespace quillet {
 
-// One more level of rules for as long as it lives.
+// One more level of rules for as long as it lives, or more of them for what takes as much of the stack.
 class CompleteParser::Deeper {
  public:
-  explicit Deeper(CompleteParser& parser) : parser_(parser) {
+  explicit Deeper(CompleteParser& parser, int levels = 1) : parser_(parser), levels_(levels) {
     if (parser.depth_ >= kMaxDepth) parser.Fail("too many nested expressions");
-    ++parser.depth_;
+    parser.depth_ += levels;
   }
-  ~Deeper() { --parser_.depth_; }
+  ~Deeper() { parser_.depth_ -= levels_; }
   Deeper(const Deeper&) = delete;
   Deeper& operator=(const Deeper&) = delete;
 
  private:
   CompleteParser& parser_;
+  const int levels_;
 };
 
 // Inside of a bracket for as long as it lives.

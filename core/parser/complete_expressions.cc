@@ -193,14 +193,12 @@ void CompleteParser::CheckBetween(size_t start, size_t mark) {
 
 // The condition of a comprehension in front of 3.9.
 void CompleteParser::OldTest() {
-  if (Code() == word::kLambda && !Since(9)) {
-    const Deeper deeper(*this);
-    return Lambda();
-  }
+  if (Code() == word::kLambda && !Since(9)) return Lambda();
   Binary(kOrLevel);
 }
 
 void CompleteParser::Lambda() {
+  const Deeper deeper(*this, 2);
   const size_t mark = Mark();
   PushLeaf();
   const RestoredValue<const char*> comprehension(comprehension_, nullptr);
@@ -566,7 +564,7 @@ void CompleteParser::Backquotes() {
 
 void CompleteParser::Arguments() {
   const size_t mark = Mark();
-  const size_t first_name = names_.size();
+  DistinctNames keywords;
   bool has_keyword = false;
   bool has_unpacked_keywords = false;
   bool has_star = false;
@@ -595,10 +593,8 @@ void CompleteParser::Arguments() {
       if (!python3_ && Code() == word::kNone) Fail("cannot assign to None");
       if (!IsName(Code())) FailHere();
       const Text name = TokenAt(at_).view();
-      for (size_t i = first_name; i < names_.size(); ++i)
-        if (names_[i] == name) Postpone(at_, "keyword argument repeated: " + std::string(name), kCompiler);
+      if (!keywords.Add(name)) Postpone(at_, "keyword argument repeated: " + std::string(name), kCompiler);
       if (name == "__debug__") Postpone(at_, "cannot assign to __debug__", kCompiler);
-      names_.push_back(name);
       has_keyword = true;
       PushLeaf();
       PushLeaf();
@@ -649,7 +645,6 @@ void CompleteParser::Arguments() {
       FailAt(generator, "Generator expression must be parenthesized");
   }
   if (generator != kNowhere && count > 1) FailAt(generator, "Generator expression must be parenthesized");
-  names_.resize(first_name);
   Finish(symbols_.arglist, mark);
 }
 

@@ -11,12 +11,10 @@ namespace quillet {
 
 void CompleteParser::AddParameterName(size_t at) {
   const Text name = TokenAt(at).view();
-  for (const Text earlier : names_) {
-    if (earlier == name) Postpone(at, "duplicate argument '" + std::string(name) + "' in function definition");
-  }
+  const bool is_new = names_.Add(name);
+  if (!is_new) Postpone(at, "duplicate argument '" + std::string(name) + "' in function definition");
   if (name == "__debug__") Postpone(at, "cannot assign to __debug__", kCompiler);
   if (!python3_ && name == "None") FailAt(at, "cannot assign to None");
-  names_.push_back(name);
 }
 
 // A name, with its annotation where it may have one.
@@ -80,7 +78,7 @@ void CompleteParser::TupleParameter() {
 
 void CompleteParser::Parameters(bool is_lambda, TokenCode end) {
   const size_t mark = Mark();
-  const std::vector<Text> outer_names = std::exchange(names_, {});
+  DistinctNames outer_names = std::exchange(names_, {});
   bool has_slash = false;
   bool has_star = false;
   bool has_default = false;
@@ -138,7 +136,7 @@ void CompleteParser::Parameters(bool is_lambda, TokenCode end) {
     if (Code() == end && was_star && (!Since(6))) FailHere();
   }
   if (needs_name) FailAt(bare_star, "named arguments must follow bare *");
-  names_ = outer_names;
+  names_ = std::move(outer_names);
   Finish(is_lambda ? symbols_.varargslist : symbols_.typedargslist, mark);
 }
 

@@ -190,7 +190,8 @@ void CompleteParser::SetTokens(TokenSpan toks) {
   met_template_ = false;
   depth_ = 0;
   brackets_ = 0;
-  names_.clear();
+  names_ = {};
+  captures_ = {};
   in_field_ = false;
   in_annotation_ = false;
   in_iterable_ = false;

@@ -25,6 +25,7 @@
 #include "foundations/errors.h"
 #include "grammar/grammar.h"
 #include "lines/logical_line.h"
+#include "parser/distinct_names.h"
 #include "tree/factory.h"
 #include "tree/nodes.h"
 
@@ -305,7 +306,8 @@ class CompleteParser {
   const TokenCode* codes_ = nullptr;  // one of the two
   bool failed_ = false;
   std::vector<CNode*> nodes_;
-  std::vector<Text> names_;  // of the parameters, or what a pattern captures
+  DistinctNames names_;     // of the parameters
+  DistinctNames captures_;  // of a pattern
   size_t at_ = 0;
   StatementPlace place_;
   int depth_ = 0;

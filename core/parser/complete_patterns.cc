@@ -43,7 +43,7 @@ void CompleteParser::Case() {
   if (AtEnd()) Fail("expected ':'");
   Expect(tok::COLON, nullptr);
   if (!AtEnd()) SimpleStatement();
-  names_.clear();
+  captures_ = {};
   FinishBare<CCaseStmt>(mark);
 }
 
@@ -98,25 +98,20 @@ void CompleteParser::AsPattern() {
 
 void CompleteParser::OrPattern() {
   const size_t mark = Mark();
-  const size_t first_name = names_.size();
+  const size_t first_name = captures_.size();
   size_t alternatives = 1;
   const size_t start = at_;
   ClosedPattern();
   while (Code() == tok::VBAR) {
     // Only the last one may take whatever comes.
     if (irrefutable_ != kNowhere) Postpone(irrefutable_, UnreachableBehind(irrefutable_), kCompiler);
-    const std::vector<Text> before(names_.begin() + static_cast<ptrdiff_t>(first_name), names_.end());
-    names_.resize(first_name);
+    const std::vector<Text> before = captures_.SortedFrom(first_name);
+    captures_.Truncate(first_name);
     PushLeaf();
     ClosedPattern();
     ++alternatives;
-    std::vector<Text> now(names_.begin() + static_cast<ptrdiff_t>(first_name), names_.end());
-    const auto holds = [](const std::vector<Text>& in, Text name) {
-      return std::find(in.begin(), in.end(), name) != in.end();
-    };
-    bool same = now.size() == before.size();
-    for (const Text name : now) same = same && holds(before, name);
-    if (!same) Postpone(start, "alternative patterns bind different names", kCompiler);
+    if (captures_.SortedFrom(first_name) != before)
+      Postpone(start, "alternative patterns bind different names", kCompiler);
   }
   if (alternatives > 1) FinishBare<CPatternNode>(mark);
 }
@@ -129,10 +124,8 @@ std::string CompleteParser::UnreachableBehind(size_t at) const {
 void CompleteParser::CheckCapture(size_t at) {
   const Text name = TokenAt(at).view();
   if (name == "_") return;
-  for (const Text earlier : names_) {
-    if (earlier == name) Postpone(at, "multiple assignments to name '" + std::string(name) + "' in pattern", kCompiler);
-  }
-  names_.push_back(name);
+  if (!captures_.Add(name))
+    Postpone(at, "multiple assignments to name '" + std::string(name) + "' in pattern", kCompiler);
 }
 
 void CompleteParser::ClosedPattern() {
@@ -204,16 +197,15 @@ void CompleteParser::NumberPattern() {
 // Behind the "(" up to and with the ")".
 void CompleteParser::ClassArguments() {
   const InBracket in_bracket(*this);
-  std::vector<Text> keywords;
+  DistinctNames keywords;
   size_t last_positional = 0;
   bool is_misplaced = false;
   while (Code() != tok::RPAR) {
     if (IsName(Code()) && CodeAt(1) == tok::EQUAL) {
       const size_t mark = Mark();
       const Text name = TokenAt(at_).view();
-      if (std::find(keywords.begin(), keywords.end(), name) != keywords.end())
+      if (!keywords.Add(name))
         Postpone(at_, "attribute name repeated in class pattern: " + std::string(name), kCompiler);
-      keywords.push_back(name);
       PushLeaf();
       PushLeaf();
       AsPattern();
@@ -221,7 +213,7 @@ void CompleteParser::ClassArguments() {
     } else {
       last_positional = at_;
       AsPattern();
-      is_misplaced |= !keywords.empty();
+      is_misplaced |= keywords.size() != 0;
     }
     if (Code() != tok::COMMA) break;
     PushLeaf();

@@ -422,14 +422,14 @@ size_t CompleteParser::TypeParameters() {
   if (Code() == tok::RSQB) Fail("Type parameter list cannot be empty");
   size_t count = 0;
   bool has_default = false;
-  const std::vector<Text> outer_names = std::exchange(names_, {});
+  DistinctNames outer_names = std::exchange(names_, {});
   while (Code() != tok::RSQB) {
     TypeParameter(has_default);
     ++count;
     if (Code() != tok::COMMA) break;
     Skip();
   }
-  names_ = outer_names;
+  names_ = std::move(outer_names);
   if (Code() != tok::RSQB) FailHere();
   Skip();
   return count;
@@ -442,9 +442,7 @@ void CompleteParser::TypeParameter(bool& has_default) {
   if (star == tok::STAR || star == tok::DOUBLESTAR) PushLeaf();
   if (!IsName(Code())) FailHere();
   const Text name = TokenAt(at_).view();
-  for (const Text earlier : names_)
-    if (earlier == name) Postpone(at_, "duplicate type parameter '" + std::string(name) + "'");
-  names_.push_back(name);
+  if (!names_.Add(name)) Postpone(at_, "duplicate type parameter '" + std::string(name) + "'");
   PushLeaf();
   const RestoredValue<bool> in_annotation(in_annotation_, true);
   if (Code() == tok::COLON) {

@@ -10,6 +10,7 @@ namespace {
 
 // Deeper trees come of brackets that the language itself does not take.
 constexpr int32_t kMaxCompleteDepth = 1000;
+constexpr int32_t kDepthOfTrailers = 2;
 
 bool IsConstant(TokenCode code) { return code == word::kNone || code == word::kTrue || code == word::kFalse; }
 
@@ -46,6 +47,7 @@ void CNodeWalker::ReadCompletely() {
   is_complete_ = true;
   fMaxVisits = INT32_MAX;
   fMaxRecurseCount = kMaxCompleteDepth;
+  depth_of_trailers_ = kDepthOfTrailers;
   fToText.set_shows_exponents(true);
 }
 

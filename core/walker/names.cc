@@ -12,17 +12,18 @@
 namespace quillet {
 namespace {
 
-// Sets a flag and puts it back, on whatever way out.
+// Sets a value and puts the old one back, on whatever way out.
+template <class T>
 class Restored {
  public:
-  Restored(bool& flag, bool value) : flag_(flag), before_(flag) { flag = value; }
-  ~Restored() { flag_ = before_; }
+  Restored(T& value, T inside) : value_(value), before_(value) { value = inside; }
+  ~Restored() { value_ = before_; }
   Restored(const Restored&) = delete;
   Restored& operator=(const Restored&) = delete;
 
  private:
-  bool& flag_;
-  bool before_;
+  T& value_;
+  T before_;
 };
 
 // `.name`, and no keyword behind the dot.
@@ -213,6 +214,7 @@ void CNodeWalker::VisitAtomPlusTrailers(CNode* atom_node, std::span<CNode* const
 // where there is nothing in front but an atom that is no name.
 void CNodeWalker::VisitTrailers(CNode* atom_node, std::span<CNode* const> all_trailers, size_t start, Text view) {
   const size_t count = all_trailers.size();
+  const Restored deeper(fRecurseCount, fRecurseCount + depth_of_trailers_);
   Chain chain(*this, atom_node, all_trailers, start, view);
   Text previous = kNoText;  // the text of the last link that was read, as it is kept
   bool dotted = true;       // all trailers up to here are attributes

@@ -293,6 +293,7 @@ class CNodeWalker {
   CNode* TargetIn(CNode* node) const { return is_complete_ ? DropSimpleParens(node) : node; }
 
   bool is_complete_ = false;
+  int32_t depth_of_trailers_ = 0;  // what a chain counts for besides its visit, whose stack is several times as large
   bool met_doubtful_ = false;
   bool met_operator_text_ = false;
   LogicalLine* direct_ = nullptr;  // fLogical during a walk, unless the host set that: takes texts uncopied

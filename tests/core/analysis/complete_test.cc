@@ -1,6 +1,7 @@
 // Complete readings: every form of every version, whole and cut short at each token, by analyzers whose nodes
 // are recycled and by fresh ones.
 #include <gtest/gtest.h>
+#include <pthread.h>
 
 #include <string>
 #include <vector>
@@ -87,6 +88,71 @@ TEST(CompleteReading, DeepNestingIsAnErrorOrIsRead) {
   EXPECT_EQ(ResultOf(files, "x = " + repeated("(", 150) + "a" + repeated(")", 150) + "\n"), "x\t:s:\nx\ta\na\t:g:\n");
   EXPECT_NE(ResultOf(files, "x = = " + repeated("(", 250) + "a" + repeated(")", 250) + "\n").find("too many nested"),
             std::string::npos);
+}
+
+void* ReadTooDeep(void*) {
+  const auto repeated = [](const char* text) {
+    std::string all;
+    for (int i = 0; i < 3000; ++i) all += text;
+    return all;
+  };
+  for (const Version version : {Version::Of(2, 7), Version::Of(3, 13)}) {
+    FileAnalyzer files(CompleteOptions(version));
+    for (const char* open : {"lambda a=", "lambda: ", "isinstance(a, ", "f(a)(", "a[", "Literal[", "not ",
+                             "x if y else ", "[a for b in ", "f(*", "f(k=", "{a: ", "await "}) {
+      std::string closed = repeated(open) + "b";
+      const char bracket = open[std::string_view(open).find_first_of("([{") % std::string_view(open).size()];
+      closed += repeated(bracket == '(' ? ")" : bracket == '[' ? "]" : bracket == '{' ? "}" : "");
+      for (const std::string& inner : {repeated(open), closed})
+        for (const char* before : {"", "x = ", "x: ", "x = = "}) (void)ResultOf(files, before + inner + "\n");
+    }
+  }
+  return nullptr;
+}
+
+TEST(CompleteReading, DeepNestingFitsASmallStack) {
+  pthread_attr_t attributes;
+  pthread_attr_init(&attributes);
+#if defined(__SANITIZE_THREAD__) || defined(__SANITIZE_ADDRESS__) || !defined(NDEBUG)
+  pthread_attr_setstacksize(&attributes, size_t{4} << 20);  // frames are several times as large
+#else
+  pthread_attr_setstacksize(&attributes, size_t{512} << 10);
+#endif
+  pthread_t thread;
+  ASSERT_EQ(pthread_create(&thread, &attributes, &ReadTooDeep, nullptr), 0);
+  pthread_join(thread, nullptr);
+  pthread_attr_destroy(&attributes);
+}
+
+// Long lists of names are compared by a table.
+TEST(CompleteReading, ANameThatComesTwiceInALongListIsFound) {
+  FileAnalyzer files(CompleteOptions(Version::Of(3, 13)));
+  const auto names = [](const char* text, int first, int behind, const char* more = "") {
+    std::string all;
+    for (int i = first; i < behind; ++i) all += text + std::to_string(i) + more + ", ";
+    return all;
+  };
+  const auto error = [&files](const std::string& source) {
+    files.Analyze(source);
+    return files.errors().empty() ? "" : files.errors()[0].message();
+  };
+  for (const int count : {10, 40}) {
+    const std::string all = names("a", 0, count), keywords = names("a", 0, count, "=1");
+    EXPECT_EQ(error("def f(" + all + "): pass\n"), "");
+    EXPECT_EQ(error("def f(" + all + "a3): pass\n"), "duplicate argument 'a3' in function definition");
+    EXPECT_EQ(error("f(" + keywords + "**{})\n"), "");
+    EXPECT_EQ(error("f(" + keywords + "b=f(" + keywords + "))\n"), "");
+    EXPECT_EQ(error("f(" + keywords + "a3=1)\n"), "keyword argument repeated: a3");
+    EXPECT_EQ(error("type X[" + all + "a3] = int\n"), "duplicate type parameter 'a3'");
+    const std::string match = "match x:\n  case ";
+    EXPECT_EQ(error(match + "[" + all + "]: pass\n"), "");
+    EXPECT_EQ(error(match + "[" + all + "a3]: pass\n"), "multiple assignments to name 'a3' in pattern");
+    EXPECT_EQ(error(match + "[" + all + "] | (" + names("a", 1, count) + "a0): pass\n"), "");
+    EXPECT_EQ(error(match + "[" + all + "] | (" + names("a", 1, count) + "b): pass\n"),
+              "alternative patterns bind different names");
+    EXPECT_EQ(error(match + "A(" + names("a", 0, count, "=1") + "a3=2): pass\n"),
+              "attribute name repeated in class pattern: a3");
+  }
 }
 
 // Sources whose lines stand where nobody would put them.
