@@ -136,7 +136,10 @@ ExprId SyntaxReader::Impl::CommentHint(const Token& comment) {
 // The comments in front of the next token are those of the statement; the last one says what it is.
 void SyntaxReader::Impl::TakeComments(StmtId stmt) {
   for (; next_comment_ < comments_.size() && comments_[next_comment_].index <= Index(); ++next_comment_) {
-    const ExprId hint = CommentHint(comments_[next_comment_].token);
+    const Token& comment = comments_[next_comment_].token;
+    // One of what broke off in front of it is nobody's.
+    if (OffsetOf(comment) < out_->stmts[stmt].begin) continue;
+    const ExprId hint = CommentHint(comment);
     Stmt& of = out_->stmts[stmt];
     if (hint == kNoExpr || (of.hint != kNoExpr && (of.flags & kHintIsComment) == 0)) continue;
     const bool is_signature = out_->exprs[hint].kind == ExprKind::kSignatureHint;

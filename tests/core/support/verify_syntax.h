@@ -97,13 +97,15 @@ inline std::string VerifyStmts(const FileSyntax& file, size_t size) {
       return expr == kNoExpr ||
              (expr < file.exprs.size() && file[expr].parent == kNoExpr && file.StatementOf(expr) == i);
     };
+    const auto shown = [&] {
+      return ": " + std::string(WordOf(stmt.kind)) + " '" +
+             std::string(file.source + stmt.begin, stmt.end - stmt.begin) + "'";
+    };
     for (const ExprId expr : file.ExprsOf(stmt))
-      if (!check(expr))
-        return At("expression of statement", i) + ": " + std::string(WordOf(stmt.kind)) + " '" +
-               std::string(file.source + stmt.begin, stmt.end - stmt.begin) + "'";
+      if (!check(expr)) return At("expression of statement", i) + shown();
     // In what is broken a comment may stand where something else has begun.
     const bool may_stand_elsewhere = (stmt.flags & kStmtIsBroken) != 0 && (stmt.flags & kHintIsComment) != 0;
-    if (!check(stmt.hint) && !may_stand_elsewhere) return At("hint of statement", i);
+    if (!check(stmt.hint) && !may_stand_elsewhere) return At("hint of statement", i) + shown();
     if (stmt.name_end > stmt.name_begin && file.StatementNamedAt(stmt.name_begin) != i)
       return At("look-up of statement", i);
   }
