@@ -393,6 +393,7 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
   while (IsLink(syntax, root)) root = syntax.ChildOf(root, 0);
   const Text name = syntax.TextOf(syntax[root]);
   static constexpr size_t kMaxConditions = 512;
+  static constexpr size_t kMaxClauses = 64;  // of a comprehension
   static constexpr uint32_t kBytesOfALook = 16;
   size_t looks = 0;
   const auto may_look = [&] { return ++looks <= kMaxLooks && conditions.size() < kMaxConditions; };
@@ -415,7 +416,8 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
     } else if (syntax[parent].kind == ExprKind::kListComprehension ||
                syntax[parent].kind == ExprKind::kSetComprehension || syntax[parent].kind == ExprKind::kGenerator ||
                syntax[parent].kind == ExprKind::kDictComprehension) {
-      for (const ExprId clause : syntax.ChildrenOf(parent)) {
+      const auto clauses = syntax.ChildrenOf(parent);
+      for (const ExprId clause : clauses.first(std::min(clauses.size(), kMaxClauses))) {
         if (clause == at || !may_look() || syntax[clause].kind != ExprKind::kComprehensionFor) continue;
         const auto parts = syntax.ChildrenOf(clause);
         for (size_t i = 2; i < parts.size() && may_look(); ++i) add(parts[i], true);

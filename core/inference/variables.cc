@@ -681,16 +681,15 @@ Value Inference::FindValueOfBinding(const SourceFile& file, uint32_t offset, Fra
       const FunctionId function = FunctionOfScope(file, file.bindings.ScopeOf(occurrence));
       if (function == kNoId) return kUnknownValue;
       const auto parameters = ParametersOf(functions_[function]);
-      for (size_t i = 0; i < parameters.size(); ++i)
-        if (syntax[parameters[i]].name_begin == offset) return ValueOfParameter(function, i, frame);
+      const auto behind = std::ranges::upper_bound(parameters, offset, {},
+                                                   [&syntax](ExprId parameter) { return syntax[parameter].begin; });
+      if (behind == parameters.begin()) return kUnknownValue;
+      const auto i = static_cast<size_t>(behind - parameters.begin()) - 1;
+      if (syntax[parameters[i]].name_begin == offset) return ValueOfParameter(function, i, frame);
       // One of a tuple, as Python 2 has them.
-      for (size_t i = 0; i < parameters.size(); ++i) {
-        const ExprId tuple = syntax.ChildOf(parameters[i], 2), target = syntax.NamedAt(offset);
-        if (tuple == kNoExpr || target == kNoExpr || offset < syntax[tuple].begin || offset >= syntax[tuple].end)
-          continue;
-        return Unpack(file, target, tuple, ValueOfParameter(function, i, frame), {}, frame);
-      }
-      return kUnknownValue;
+      const ExprId tuple = syntax.ChildOf(parameters[i], 2), target = syntax.NamedAt(offset);
+      if (tuple == kNoExpr || target == kNoExpr || offset >= syntax[tuple].end) return kUnknownValue;
+      return Unpack(file, target, tuple, ValueOfParameter(function, i, frame), {}, frame);
     }
     case NameKind::kTypeParameter: {
       const ExprId parameter = syntax.NamedAt(offset);

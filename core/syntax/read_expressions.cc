@@ -545,6 +545,7 @@ ExprId SyntaxReader::Impl::Lambda() {
   Push(has_body ? Expression() : Missing());
   --lambdas_;
   const ExprId lambda = NodeOf(ExprKind::kLambda, begin, mark);
+  out_->has_lambdas = true;
   if (faults_ != faults) Flag(lambda, kIsBroken);
   return lambda;
 }

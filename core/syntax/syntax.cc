@@ -98,36 +98,38 @@ StmtId FileSyntax::StatementAt(uint32_t offset) const {
 }
 
 // `expr` or one in it, where it holds the place.
-ExprId FileSyntax::InnermostAt(ExprId expr, uint32_t offset) const {
+// The last of a list that begins there or in front, if it holds the place. Few are searched one by one, for the odd
+// one that is out of order: a hint in a comment.
+ExprId FileSyntax::HoldingAt(std::span<const ExprId> list, uint32_t offset) const {
   const auto holds = [this, offset](ExprId id) { return exprs[id].begin <= offset && offset <= exprs[id].end; };
-  if (!holds(expr)) return kNoExpr;
-  while (true) {
-    const std::span<const ExprId> children = ChildrenOf(expr);
-    size_t begin = 0;
-    size_t end = children.size();
-    // The last child that begins there or in front; few are searched one by one, for the odd one that is out
-    // of order: a hint in a comment.
-    constexpr size_t kFew = 8;
-    ExprId found = kNoExpr;
-    if (end > kFew) {
-      while (begin < end) {
-        const size_t middle = begin + (end - begin) / 2;
-        size_t at = middle;
-        while (at > begin && children[at] == kNoExpr) --at;
-        if (children[at] == kNoExpr || exprs[children[at]].begin <= offset) {
-          if (children[at] != kNoExpr) found = children[at];
-          begin = middle + 1;
-        } else {
-          end = at;
-        }
-      }
-      if (found != kNoExpr && !holds(found)) found = kNoExpr;
-    } else {
-      for (const ExprId child : children) {
-        if (child == kNoExpr || !holds(child)) continue;
-        if (found == kNoExpr || exprs[child].begin >= exprs[found].begin) found = child;
-      }
+  constexpr size_t kFew = 8;
+  ExprId found = kNoExpr;
+  if (list.size() <= kFew) {
+    for (const ExprId expr : list) {
+      if (expr == kNoExpr || !holds(expr)) continue;
+      if (found == kNoExpr || exprs[expr].begin >= exprs[found].begin) found = expr;
     }
+    return found;
+  }
+  size_t begin = 0;
+  size_t end = list.size();
+  while (begin < end) {
+    const size_t middle = begin + (end - begin) / 2;
+    size_t at = middle;
+    while (at > begin && list[at] == kNoExpr) --at;
+    if (list[at] == kNoExpr || exprs[list[at]].begin <= offset) {
+      if (list[at] != kNoExpr) found = list[at];
+      begin = middle + 1;
+    } else {
+      end = at;
+    }
+  }
+  return found != kNoExpr && holds(found) ? found : kNoExpr;
+}
+
+ExprId FileSyntax::InnermostAt(ExprId expr, uint32_t offset) const {
+  while (true) {
+    const ExprId found = HoldingAt(ChildrenOf(expr), offset);
     if (found == kNoExpr) return expr;
     expr = found;
   }
@@ -139,13 +141,8 @@ ExprId FileSyntax::ExpressionAt(uint32_t offset) const {
   // block and in front of its end.
   for (StmtId at = LastBegunAt(offset); at != kModuleStmt; at = stmts[at].parent) {
     const Stmt& stmt = stmts[at];
-    ExprId found = kNoExpr;
-    const auto consider = [&](ExprId expr) {
-      if (expr == kNoExpr || exprs[expr].begin > offset || offset > exprs[expr].end) return;
-      if (found == kNoExpr || exprs[expr].begin >= exprs[found].begin) found = expr;
-    };
-    for (const ExprId expr : ExprsOf(stmt)) consider(expr);
-    consider(stmt.hint);
+    const ExprId parts[] = {HoldingAt(ExprsOf(stmt), offset), stmt.hint};
+    const ExprId found = HoldingAt(parts, offset);
     if (found != kNoExpr) return InnermostAt(found, offset);
     if (offset > stmts[stmt.parent].end) break;
   }
@@ -202,6 +199,7 @@ void FileSyntax::Clear() {
   lists.clear();
   named.clear();
   source = nullptr;
+  has_lambdas = false;
 }
 
 }  // namespace quillet

@@ -197,6 +197,7 @@ struct FileSyntax {
   std::vector<ExprId> lists;  // children of expressions and expressions of statements
   std::vector<ExprId> named;  // the expressions with a name that is not empty, in order of their names
   const char* source = nullptr;
+  bool has_lambdas = false;
 
   const Expr& operator[](ExprId expr) const { return exprs[expr]; }
   const Stmt& stmt(StmtId stmt) const { return stmts[stmt]; }
@@ -249,7 +250,8 @@ struct FileSyntax {
  private:
   // The last statement that begins at a place or in front of it, decorators included.
   StmtId LastBegunAt(uint32_t offset) const;
-  ExprId InnermostAt(ExprId expr, uint32_t offset) const;
+  ExprId HoldingAt(std::span<const ExprId> list, uint32_t offset) const;
+  ExprId InnermostAt(ExprId expr, uint32_t offset) const;  // of one that holds it
 };
 
 // The words of the kinds, without their "k".

@@ -25,6 +25,7 @@ std::string Workspace::Impl::QualifiedName(const Binding& binding) {
 Workspace::Impl::Body Workspace::Impl::BodyAround(const SourceFile& file, uint32_t offset) {
   const FileSyntax& syntax = file.syntax;
   Body body;
+  if (!syntax.has_lambdas) return BodyOfStatementAt(file, offset);  // a long chain is not gone up for each of its names
   for (ExprId expr = syntax.ExpressionAt(offset); expr != kNoExpr; expr = syntax[expr].parent) {
     if (syntax[expr].kind != ExprKind::kLambda || syntax.ChildrenOf(expr).empty()) continue;
     if (offset < syntax[syntax.ChildrenOf(expr).back()].begin) continue;
