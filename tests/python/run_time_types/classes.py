@@ -259,11 +259,11 @@ sp = sk.pop()
 print(sp)
 NT = namedtuple("NT", "a b")
 nt = NT(1, "b")
-nt.a  # unknown
-nt.b  # unknown
+nt.a
+nt.b
 nt[1]
 na, nb = nt
-print(na, nb)  # unknown
+print(na, nb)
 nr = nt._replace(a=3)
 nd = nt._asdict()
 nm = NT._make([1, 2])
@@ -296,7 +296,7 @@ class NT3(namedtuple("NT3", ["u", "v"])):
 
 n3 = NT3(1, 2)
 n3.total()
-n3.u  # unknown
+n3.u
 
 
 class Desc:
