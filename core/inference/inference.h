@@ -471,7 +471,7 @@ class Inference {
   Value Unpack(const SourceFile& file, ExprId target, ExprId root, Value value, ExprPlace source, FrameId frame);
   Value ValueOfPattern(const SourceFile& file, ExprId pattern, FrameId frame);
   Value Entered(Value manager, bool is_async);
-  Value Caught(Value type);
+  Value Caught(Value type, int depth = 0);
   Value BuiltinNamed(Text name);
   Value Decorated(const SourceFile& file, StmtId stmt, Value value, FrameId frame, ExprId until = kNoExpr);
   const ModuleNames& NamesOfModule(const SourceFile& file);

@@ -751,16 +751,20 @@ Value Inference::Entered(Value manager, bool is_async) {
   return is_async ? EvaluateAwait(value) : value;
 }
 
-Value Inference::Caught(Value type) {
+// A class, or tuples and lists of classes. What goes on for ever, as a text does, which holds texts, catches nothing.
+Value Inference::Caught(Value type, int depth) {
+  static constexpr int kMaxNesting = 8;
   Value value{kNoTypes, type.doubt};
+  if (depth > kMaxNesting) return value;
   for (const TypeId id : types_.CopyOf(type.set)) {
     const Type t = types_[id];
     if (t.kind == TypeKind::kClass) value = types_.Union(value, Just(InstanceOf(t.a)));
     if (t.kind == TypeKind::kTuple) {
-      for (size_t i = 0; i < t.args_count; ++i) value = types_.Union(value, Caught({types_.ArgOf(id, i), 0}));
+      for (size_t i = 0; i < t.args_count; ++i)
+        value = types_.Union(value, Caught({types_.ArgOf(id, i), 0}, depth + 1));
     } else if (t.kind == TypeKind::kInstance) {
       const Value items = IterationOf(Just(id));
-      if (items.IsKnown()) value = types_.Union(value, Caught(items));
+      if (items.IsKnown()) value = types_.Union(value, Caught(items, depth + 1));
     }
   }
   return value;

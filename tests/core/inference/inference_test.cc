@@ -222,6 +222,8 @@ TEST(Inference, EntersManagersAndCatchesErrors) {
       {"class E(Exception):\n  def __init__(self, x): self.x = x\ntry: pass\nexcept E as e:\n  $e.x\n", {"a.E"}},
       {"es = (ValueError, KeyError)\ntry: pass\nexcept es as $e: pass\n", {"KeyError | ValueError"}},
       {"try: pass\nexcept* ValueError as $e: pass\n", {"ExceptionGroup[ValueError]"}},
+      {"try: pass\nexcept 'x' as $e: pass\n", {""}},
+      {"class A:\n  def __iter__(self): yield A()\ntry: pass\nexcept A() as $e: pass\n", {""}},
   });
 }
 
