@@ -62,7 +62,7 @@ nb::object AnalyzedSource::LogicalOf(size_t i) const {
 
 nb::object AnalyzedSource::ErrorOf(size_t i) const {
   if (result(i).error < 0) return nb::none();
-  return ExceptionFor(found_.whole_errors[static_cast<size_t>(result(i).error)]);
+  return ExceptionFor(found_.WholeErrorOf(i));
 }
 
 nb::object AnalyzedSource::RecordsOf(size_t i) const {

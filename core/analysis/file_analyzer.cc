@@ -42,6 +42,13 @@ size_t SizeOf(const std::vector<T>& items) {
   return items.size() * sizeof(T);
 }
 
+// The text of a statement, as an error in it shows it.
+std::string TextOfRow(const FileAnalyzer::Found& found, size_t row) {
+  LogicalLine line;
+  SetFromRow(line, found.source, found.rows[row]);
+  return TextFromTokens(line);
+}
+
 template <class T>
 void DropIfHuge(std::vector<T>& items) {
   if (items.capacity() * sizeof(T) > kKeptMemory) std::vector<T>().swap(items);
@@ -58,6 +65,14 @@ FileAnalyzer::Found FileAnalyzer::TakeFound() {
   Found fresh;
   fresh.source = SourceText::Copy(Text(""));
   return std::exchange(found_, std::move(fresh));
+}
+
+SyntaxError FileAnalyzer::Found::WholeErrorOf(size_t row) const {
+  if (const auto whole = whole_errors.find(row); whole != whole_errors.end()) return whole->second;
+  const Failure& failure = errors[static_cast<size_t>(results[row].error)];
+  SyntaxError error(failure.message(), "<string>", failure.place.line, failure.place.col, TextOfRow(*this, row));
+  error.error_class = failure.error_class;
+  return error;
 }
 
 FileAnalyzer::Analyzer& FileAnalyzer::AnalyzerForSource() {
@@ -79,7 +94,7 @@ void FileAnalyzer::Analyze(Text bytes, RowFilter* filter) {
   if (options_.reads_completely) typing_.Read(*found_.source, found_.rows, block_rules_.imports());
   Analyzer& analyzer_and_shapes = AnalyzerForSource();
   CPGenAnalyzerImpl& analyzer = analyzer_and_shapes.analyzer;
-  analyzer.set_spells_error_texts(options_.keeps_whole_errors);
+  analyzer.set_spells_error_texts(false);
   analyzer.set_explains_errors(true);
   const NodePool& pool = analyzer.logical_parser().factory().pool();
   const NodePool& other_pool = analyzer.type_hint_walker().hint_parser().factory().pool();
@@ -176,12 +191,12 @@ int32_t FileAnalyzer::AnalyzeLine(CPGenAnalyzerImpl& analyzer, size_t row, Logic
   const LinePlace& place = found_.results[row];
   if (!options_.reads_completely) {
     const auto error = analyzer.AnalyzeSingleLogical(line, place.in_async_def, place.first_in_def);
-    return error ? AddError(*error) : -1;
+    return error ? AddError(row, *error) : -1;
   }
   const auto error = analyzer.AnalyzeCompletely(line, place, typing_, is_doubtful);
   if (analyzer.was_rejected() || line.kind == LineKind::kCase) [[unlikely]]
     Note(analyzer, row);
-  return error ? AddError(*error) : -1;
+  return error ? AddError(row, *error) : -1;
 }
 
 void FileAnalyzer::Note(const CPGenAnalyzerImpl& analyzer, size_t row) {
@@ -199,7 +214,7 @@ void FileAnalyzer::AddFindings(CPGenAnalyzerImpl& analyzer) {
     SetFromRow(line, found_.source, found_.rows[finding.row]);
     SyntaxError error = analyzer.ErrorAt(finding.message, line, finding.place);
     error.error_class = finding.kind;
-    const int32_t added = AddError(error);
+    const int32_t added = AddError(finding.row, error);
     if (index < 0) {
       index = added;
       continue;
@@ -207,9 +222,6 @@ void FileAnalyzer::AddFindings(CPGenAnalyzerImpl& analyzer) {
     // In the place of what was found before.
     found_.errors[static_cast<size_t>(index)] = found_.errors.back();
     found_.errors.pop_back();
-    if (!options_.keeps_whole_errors) continue;
-    std::swap(found_.whole_errors[static_cast<size_t>(index)], found_.whole_errors.back());
-    found_.whole_errors.pop_back();
   }
   block_rules_.findings().clear();
 }
@@ -224,11 +236,14 @@ void FileAnalyzer::ApplyNameRules() {
   name_rules_->Check(*found_.source, found_.rows, block_rules_.findings());
 }
 
-int32_t FileAnalyzer::AddError(const SyntaxError& error) {
+int32_t FileAnalyzer::AddError(size_t row, const SyntaxError& error) {
   const std::string& text = *found_.error_texts.insert(error.message()).first;
   const auto from_1 = [](int64_t number) { return static_cast<int32_t>(std::max<int64_t>(number, 1)); };
-  found_.errors.push_back({&text, {from_1(error.lineno), from_1(error.offset)}});
-  if (options_.keeps_whole_errors) found_.whole_errors.push_back(error);
+  found_.errors.push_back({&text, {from_1(error.lineno), from_1(error.offset)}, error.error_class});
+  if (options_.keeps_whole_errors) {
+    found_.whole_errors.erase(row);
+    if (!error.text.empty() && error.text != TextOfRow(found_, row)) found_.whole_errors.emplace(row, error);
+  }
   return static_cast<int32_t>(found_.errors.size()) - 1;
 }
 

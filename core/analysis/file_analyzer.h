@@ -11,6 +11,7 @@
 #include <optional>
 #include <span>
 #include <string>
+#include <unordered_map>
 #include <unordered_set>
 #include <vector>
 
@@ -36,10 +37,11 @@ class FileAnalyzer {
  public:
   using LineResult = quillet::LineResult;
 
-  // What became of a statement that does not parse, without the text that nobody shows.
+  // What became of a statement that does not parse. Where every byte is one, what it takes decides.
   struct Failure {
     const std::string* text;  // one for all failures of a kind
     Position place;           // line and offset from 1, counted from the first line of the statement
+    SyntaxError::Kind error_class = SyntaxError::Kind::kSyntax;
 
     const std::string& message() const { return *text; }
   };
@@ -55,7 +57,7 @@ class FileAnalyzer {
     // no such switch.
     std::string print_function_grammar_file;
     size_t least_memory_limit = kLeastMemoryLimit;
-    // Whether errors are kept whole as well, with the texts of their lines.
+    // Whether errors that show another text than their statement's are kept whole as well.
     bool keeps_whole_errors = false;
     // What is asked about the names of a source that is read completely; null: nothing is.
     std::unique_ptr<NameRules> (*make_name_rules)(Version) = nullptr;
@@ -73,8 +75,11 @@ class FileAnalyzer {
     std::vector<LineResult> results;  // parallel to the rows
     RecordStore store;
     std::vector<Failure> errors;
-    std::unordered_set<std::string> error_texts;  // that those refer to
-    std::vector<SyntaxError> whole_errors;        // the same, where they are kept
+    std::unordered_set<std::string> error_texts;           // that those refer to
+    std::unordered_map<size_t, SyntaxError> whole_errors;  // by row: those that show texts of their own
+
+    // The error of a row, which must have one, with the text that it shows; of an analysis that keeps whole errors.
+    SyntaxError WholeErrorOf(size_t row) const;
   };
 
   // Results stand until the next call. The bytes are copied. OverflowError for a source that takes more
@@ -121,7 +126,7 @@ class FileAnalyzer {
   int32_t AnalyzeRow(Analyzer& analyzer, size_t row, LogicalLine& line);
   int32_t AnalyzeLine(CPGenAnalyzerImpl& analyzer, size_t row, LogicalLine& line, bool is_doubtful);
   // Returns its index.
-  int32_t AddError(const SyntaxError& error);
+  int32_t AddError(size_t row, const SyntaxError& error);
   // What the line that was just read has to say to those around it.
   void Note(const CPGenAnalyzerImpl& analyzer, size_t row);
   void AddFindings(CPGenAnalyzerImpl& analyzer);

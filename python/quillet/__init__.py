@@ -115,4 +115,6 @@ def __getattr__(name: str) -> object:
 
 
 def __dir__() -> list[str]:
-    return sorted({*globals(), *__all__})
+    # What a user can use: not what this file works with, and not the modules that the names above come from.
+    own = {"TYPE_CHECKING", "annotations"}
+    return sorted({*__all__, *(name for name in {*globals()} - own if name[0] != "_" or name.startswith("__"))})

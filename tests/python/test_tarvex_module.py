@@ -90,6 +90,17 @@ def test_every_name_is_declared_and_every_declared_name_is_there(module: str) ->
             assert missing == set(), name
 
 
+def test_the_package_shows_what_there_is_for_others() -> None:
+    script = "import quillet; before = dir(quillet); quillet.analyze('a'); print(before, dir(quillet), sep='\\n')"
+    result = subprocess.run([sys.executable, "-c", script], capture_output=True, text=True, check=True)
+    before, behind = ([n for n in ast.literal_eval(row) if n[:2] != "__"] for row in result.stdout.splitlines())
+    assert before == sorted(quillet.__all__)
+    modules = set(behind) - set(before)
+    assert modules  # those that the analysis loaded
+    assert all((PACKAGE / f"{name}.py").exists() or name == "tarvex" for name in modules)
+    assert all(hasattr(quillet, name) for name in dir(quillet))
+
+
 def test_an_analyzer_a_thread() -> None:
     source = "\n".join(f"name_{i} = call_{i}(arg, [x for x in y if x.{'a' * (i % 7 + 1)}])" for i in range(300))
     expected = None

@@ -83,10 +83,11 @@ TEST(Messages, SayWhatIsMissingWhereThatIsCertain) {
     FileAnalyzer file(Options(version));
     file.Analyze(source);
     ASSERT_EQ(file.errors().size(), 1u) << source;
-    const auto& [text, place] = file.errors()[0];
-    const std::string at = std::to_string(place.line) + ":" + std::to_string(place.col);
+    const FileAnalyzer::Failure& error = file.errors()[0];
+    const std::string at = std::to_string(error.place.line) + ":" + std::to_string(error.place.col);
     const size_t split = message.find(": ");
-    EXPECT_EQ(at + " " + *text, message.substr(0, split) + " invalid syntax" + message.substr(split)) << source;
+    EXPECT_EQ(at + " " + error.message(), message.substr(0, split) + " invalid syntax" + message.substr(split))
+        << source;
   }
 }
 
@@ -220,6 +221,50 @@ TEST(Memory, WhatIsMadeOfTheResultsCounts) {
   }
   EXPECT_NO_THROW(file.CheckMemory(0));
   EXPECT_THROW(file.CheckMemory(size_t{1} << 20), Error);
+}
+
+// ---- whole errors ----
+
+FileAnalyzer::Found FoundIn(Text source, bool reads_completely) {
+  FileAnalyzer::Options options = Options();
+  options.keeps_whole_errors = true;
+  options.reads_completely = reads_completely;
+  FileAnalyzer file(options);
+  file.Analyze(source);
+  return file.TakeFound();
+}
+
+TEST(WholeErrors, AreMadeFromTheirStatementsWhereThoseAreWhatTheyShow) {
+  // An error a byte is what the most of them can be.
+  const FileAnalyzer::Found separators = FoundIn(";;;", true);
+  ASSERT_EQ(separators.errors.size(), 3u);
+  EXPECT_TRUE(separators.whole_errors.empty());
+  for (size_t row = 0; row < 3; ++row) {
+    const SyntaxError error = separators.WholeErrorOf(row);
+    EXPECT_EQ(error.message(), "invalid syntax");
+    EXPECT_EQ(error.filename, "<string>");
+    EXPECT_EQ(error.text.substr(error.text.find_first_not_of(' ')), ";") << row;
+  }
+  const FileAnalyzer::Found hint = FoundIn("a = 1\nb = 2  # type: [\n", true);
+  ASSERT_EQ(hint.errors.size(), 1u);
+  EXPECT_TRUE(hint.whole_errors.empty());
+  EXPECT_EQ(hint.WholeErrorOf(1).text, "b = 2  # type: [");
+  EXPECT_EQ(hint.WholeErrorOf(1).offset, hint.errors[0].place.col);
+}
+
+TEST(WholeErrors, KeepATextOfTheirOwn) {
+  const FileAnalyzer::Found field = FoundIn("a = 1\nb = f'{c +}'\n", false);
+  ASSERT_EQ(field.errors.size(), 1u);
+  ASSERT_EQ(field.whole_errors.size(), 1u);
+  EXPECT_EQ(field.WholeErrorOf(1).text, field.whole_errors.at(1).text);
+  EXPECT_EQ(field.WholeErrorOf(1).text.find("b ="), std::string::npos);
+}
+
+TEST(WholeErrors, AreOfTheClassesThatBlocksGiveThem) {
+  const FileAnalyzer::Found blocks = FoundIn("if a:\nb = (\n", true);
+  ASSERT_GE(blocks.results[1].error, 0);
+  EXPECT_EQ(blocks.WholeErrorOf(1).error_class, SyntaxError::Kind::kIndentation);
+  EXPECT_EQ(blocks.WholeErrorOf(1).text.substr(0, 5), "b = (");
 }
 
 // ---- steps ----
