@@ -1,10 +1,10 @@
 """Inputs made to do harm, each unit a million times, through Python and the commands, on stacks of half a mebibyte.
 
 The inputs are those of bench/scaling.cc, which tries the core alone. Here each is a file: `quillet.analyze` takes it in
-a thread with a small stack and in the main thread of a process that has no larger one, and `index`, `find`, `outline`
-and `goto` are run on it. Processor time by the byte and the memory that a process takes beyond an idle one, by the
-byte, are said; named as faults are those that end by a signal, take too long, take more memory than the limit, or,
-with --interrupt, do not end within a second of Ctrl-C in the middle of their work. Exit code 1 where there are any.
+a thread with a small stack and in the main thread of a process that has no larger one, and `analyze`, `index`, `find`,
+`outline` and `goto` are run on it. Processor time by the byte and the memory that a process takes beyond an idle one,
+by the byte, are said; named as faults are those that end by a signal, take too long, take more memory than the limit,
+or, with --interrupt, do not end within a second of Ctrl-C in the middle of their work. Exit code 1 where there are any.
 
     python bench/bombs.py [--scaling build/release/bench/quillet_scaling] [--count N] [--most-bytes N] [--only TEXT]
 """
@@ -58,6 +58,7 @@ def ways(file: Path) -> list[Way]:
     return [
         Way("thread", [sys.executable, "-c", _IN_A_THREAD, str(file), str(_STACK)]),
         Way("main", [sys.executable, "-c", _IN_MAIN, str(file)]),
+        Way("analyze", [*quillet, "analyze", file.name]),
         Way("index", [*quillet, "index", ".", "-q"]),
         Way("find", [*quillet, "find", "a"]),
         Way("outline", [*quillet, "outline", file.name]),

@@ -5,13 +5,18 @@ from __future__ import annotations
 import json
 import sys
 from pathlib import Path
+from typing import Any
 
 import pytest
 
+import quillet
 from indexing import SHOP, found, make_index, run
+from quillet.cli.defs import facts_of
 from quillet.cli.find_options import OPTIONS, plain_parameters
 from quillet.cli.index_commands import find
+from quillet.cli.outline import _hints, _parameters
 from quillet.index.questions import match_of
+from quillet.index.store import FUNCTION
 
 
 @pytest.fixture
@@ -323,6 +328,32 @@ def long(%s): pass
 def test_outline_has_hints_of_comments(tmp_path: Path) -> None:
     (tmp_path / "a.py").write_text("def f(a, b=1, *c):  # type: (int, str, bytes) -> None\n    pass\n")
     assert run("outline", "a.py", cwd=tmp_path).stdout == "1 def f(a: int, b: str=1, *c: bytes) -> None\n"
+
+
+class Counting(list[Any]):
+    """Counts the items that it gives."""
+
+    given = 0
+
+    def __getitem__(self, index: Any) -> Any:
+        items = super().__getitem__(index)
+        self.given += len(items) if isinstance(index, slice) else 1
+        return items
+
+
+def test_outline_reads_no_more_for_a_signature_than_belongs_to_it(tmp_path: Path) -> None:
+    path = tmp_path / "a.py"
+    path.write_text("def f(a, b: int): pass\ndef g(c\n" * 100)
+    hits = Counting(facts_of(str(path), None, with_lines=False).hits)
+    heads = [place for place, hit in enumerate(hits) if hit.opens == FUNCTION]
+    assert [_hints(hits, place) for place in heads] == [{"b": "int"}] * 100
+    assert hits.given <= 6 * len(heads)
+    bindings = quillet.bind(path.read_bytes())
+    occurrences = Counting(bindings.occurrences)
+    names = [place for place, occurrence in enumerate(occurrences) if occurrence.text in ("f", "g")]
+    parameters = [list(_parameters(bindings, occurrences, place)) for place in names]
+    assert parameters == [["a", "b"], ["c"]] * 100
+    assert occurrences.given <= 6 * len(names)
 
 
 def test_outline_as_objects(tmp_path: Path) -> None:

@@ -125,8 +125,8 @@ def outline(facts: FileFacts, bindings: FileBindings, source: bytes) -> Iterator
             is_async = _ASYNC.search(source, start, start + occurrence.column - 1)
             kind = "async function" if is_async else "function"
             behind = start + occurrence.end_column - 1
-            head = source[behind : behind + _MOST_READ]
-            signature = _signature(head, hints, one_line=place is None)
+            tokens = _TOKEN.finditer(source, behind, behind + _MOST_READ)
+            signature = _signature(tokens, hints, one_line=place is None)
             if not signature:
                 signature = f"({', '.join(_parameters(bindings, occurrences, index))})"
         scopes = _scopes_around(bindings, occurrence)
@@ -152,7 +152,8 @@ def _parameters(bindings: FileBindings, occurrences: list[Occurrence], index: in
     they stand in front of any other definition.
     """
     function = None
-    for occurrence in occurrences[index + 1 :]:
+    for later in range(index + 1, len(occurrences)):
+        occurrence = occurrences[later]
         if occurrence.kind in ("class", "function") and occurrence.role == "definition":
             return
         if occurrence.kind == "parameter" and bindings.scopes[occurrence.scope].kind == "function":
@@ -168,7 +169,8 @@ def _hints(records: list[Hit], place: int) -> dict[str, str]:
         return {}
     inner = f"{function.scope}.{function.name}" if function.scope else function.name
     hints: dict[str, str] = {}
-    for hit in records[place + 1 :]:
+    for later in range(place + 1, len(records)):
+        hit = records[later]
         if hit.opens or hit.is_parameter != (hit.scope == inner):
             break
         if hit.is_parameter and hit.kind == "hint":
@@ -176,9 +178,9 @@ def _hints(records: list[Hit], place: int) -> dict[str, str]:
     return hints
 
 
-def _signature(head: bytes, hints: dict[str, str], *, one_line: bool) -> str:
-    """What stands in `head` in front of the colon, on one line, with `hints` for what has none there. It is empty
-    where `one_line` is asked for and the first line ends within brackets.
+def _signature(tokens: Iterator[re.Match[bytes]], hints: dict[str, str], *, one_line: bool) -> str:
+    """What the tokens in front of the colon say, on one line, with `hints` for what has none there. It is empty where
+    `one_line` is asked for and the first line ends within brackets.
     """
     shown: list[str] = []
     opened: list[bytes] = []
@@ -186,7 +188,7 @@ def _signature(head: bytes, hints: dict[str, str], *, one_line: bool) -> str:
     gap = False
     unsaid = ""  # the hint of the parameter just named, unless its own follows
     has_arrow = False
-    for match in _TOKEN.finditer(head):
+    for match in tokens:
         token = match[0]
         if match["gap"]:
             breaks = b"\n" in token or b"\r" in token
