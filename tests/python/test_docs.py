@@ -94,6 +94,24 @@ def test_what_the_readme_shows_can_be_pasted(language: str, tmp_path: Path) -> N
     assert len(blocks) > 1
 
 
+PROGRAM = re.compile(r"^```python\n((?:import|from) [^`]*?)^```$", re.MULTILINE)
+# They read what their reader has.
+ENGINES = ("pyspark", "ray", "dask", "sources.parquet")
+
+
+@pytest.mark.parametrize("path", [path for path in DOCUMENTS if path.name != "README.md"], ids=lambda path: path.name)
+def test_programs_in_the_documents_can_be_pasted(path: Path) -> None:
+    for text in PROGRAM.findall(path.read_text()):
+        if "quillet" not in text or any(engine in text for engine in ENGINES):
+            continue
+        done = subprocess.run([sys.executable, "-c", text], cwd=ROOT, capture_output=True, text=True)
+        if missing := re.search(r"No module named '(pyarrow|polars|duckdb)'", done.stderr):
+            warnings.warn(f"an example of {path.name} was not run: no {missing[1]}", stacklevel=1)
+            continue
+        assert done.returncode == 0, f"{text}\n{done.stderr}"
+        assert done.stdout, text
+
+
 def test_every_record_kind_is_documented() -> None:
     from quillet import RecordKind
 

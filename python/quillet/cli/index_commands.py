@@ -128,7 +128,7 @@ def defs(file: str, imports: bool, as_json: bool, index: str | None) -> None:
     The file is read as it is now; an index need not know it.
 
     \b
-        quillet defs src/shop.py
+        quillet defs examples/shop.py
     """
     from quillet.cli.defs import run
 
@@ -143,7 +143,7 @@ def outline(file: str, as_json: bool, index: str | None) -> None:
     """Shows the classes and functions of FILE as a tree, with parameters and hints.
 
     \b
-        quillet outline src/shop.py
+        quillet outline examples/shop.py
     """
     from quillet.cli.outline import run
 

@@ -67,7 +67,7 @@ def goto(**parameters: Any) -> None:
     The column counts bytes from 1, as in all output.
 
     \b
-        quillet goto src/shop.py:12:9
+        quillet goto examples/shop.py:10:14
     """
     _run("goto", parameters)
 
@@ -81,8 +81,8 @@ def references(**parameters: Any) -> None:
     Those that nothing but their name speaks for are marked, as are those that are likely.
 
     \b
-        quillet references src/shop.py:12:9
-        quillet references src/shop.py:12:9 --at-least certain
+        quillet references examples/shop.py:7:14
+        quillet references examples/shop.py:7:14 --at-least certain
     """
     _run("references", parameters)
 
@@ -93,7 +93,7 @@ def type_command(**parameters: Any) -> None:
     """Shows what the expression at a place may be.
 
     \b
-        quillet type src/shop.py:12:9
+        quillet type examples/shop.py:10:14
     """
     _run("type", parameters)
 
@@ -104,7 +104,7 @@ def hover(**parameters: Any) -> None:
     """Shows the declaration and the documentation of what is at a place.
 
     \b
-        quillet hover src/shop.py:12:9
+        quillet hover examples/shop.py:10:20
     """
     _run("hover", parameters)
 
@@ -115,7 +115,7 @@ def complete(**parameters: Any) -> None:
     """Shows what may be written at a place, the best first.
 
     \b
-        quillet complete src/shop.py:12:14
+        quillet complete examples/shop.py:10:20
     """
     _run("complete", parameters)
 
@@ -126,7 +126,7 @@ def callers(**parameters: Any) -> None:
     """Shows who calls the function that is named at a place.
 
     \b
-        quillet callers src/shop.py:12:9
+        quillet callers examples/shop.py:6:9
     """
     _run("callers", parameters)
 
@@ -140,8 +140,8 @@ def rename(target: str, new_name: str, write: bool, likely: bool, **parameters: 
     """Gives what is named at a place another name, everywhere in the program, and shows the changes as a diff.
 
     \b
-        quillet rename src/shop.py:12:9 sum_up
-        quillet rename src/shop.py:12:9 sum_up --write
+        quillet rename examples/shop.py:9:9 put
+        quillet rename examples/shop.py:9:9 put --write
     """
     from quillet.cli.questions import Settings
     from quillet.cli.questions import rename as run
