@@ -58,6 +58,16 @@ class InputTable : public ColumnTable {
     return *this;
   }
 
+  // Values of a fixed size, as their bytes.
+  InputTable& AddFixed(std::string name, const std::string& layout, const std::vector<std::string>& values) {
+    size_ = values.size();
+    schema_.push_back({std::move(name), layout, {}});
+    std::string& bytes = bytes_.emplace_back();
+    for (const std::string& value : values) bytes += value;
+    buffers_.push_back({{bytes.data()}});
+    return *this;
+  }
+
   size_t size() const override { return size_; }
   std::vector<ColumnBuffers> Buffers() const override { return buffers_; }
   const std::vector<Column>& schema() const { return schema_; }

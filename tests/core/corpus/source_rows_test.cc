@@ -188,6 +188,34 @@ TEST(SourceRows, CountsWhatItSaw) {
   EXPECT_EQ(rows.TakeFiles(), nullptr);
 }
 
+TEST(SourceRows, CarriesValuesOfEveryFixedSize) {
+  const std::pair<const char*, size_t> layouts[] = {
+      {"c", 1},    {"C", 1},   {"s", 2},      {"S", 2},        {"e", 2},          {"i", 4},   {"I", 4},
+      {"f", 4},    {"l", 8},   {"L", 8},      {"g", 8},        {"w:3", 3},        {"tdD", 4}, {"tts", 4},
+      {"ttm", 4},  {"tiM", 4}, {"tdm", 8},    {"ttu", 8},      {"ttn", 8},        {"tiD", 8}, {"tin", 16},
+      {"tsu:", 8}, {"tDs", 8}, {"d:5,2", 16}, {"d:5,2,64", 8}, {"d:5,2,256", 32},
+  };
+  for (const auto& [layout, width] : layouts) {
+    std::string first, second;
+    for (size_t i = 0; i < width; ++i) {
+      first += static_cast<char>('a' + i);
+      second += static_cast<char>('A' + i);
+    }
+    auto table = Table({"x\n", "y\n"});
+    table->AddFixed("kept", layout, {first, second});
+    SourceRows::Options options = Options();
+    options.kept_columns = {"kept"};
+    SourceRows rows(std::move(options));
+    rows.Begin(BatchOf(table));
+    ASSERT_EQ(rows.Next(), nullptr) << layout;
+    const auto made = rows.Finish();
+    ASSERT_EQ(made->size(), 2u) << layout;
+    EXPECT_EQ(made->Schema()[0].format, layout);
+    const std::vector<ColumnBuffers> buffers = made->Buffers();
+    EXPECT_EQ(std::string(static_cast<const char*>(buffers[0].values[0]), 2 * width), first + second) << layout;
+  }
+}
+
 TEST(SourceRows, RefusesColumnsThatDoNotFit) {
   SourceRows rows(Options());
   auto numbers = std::make_shared<InputTable>();

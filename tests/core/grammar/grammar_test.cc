@@ -228,6 +228,14 @@ TEST(GrammarText, HostileTextsAreErrorsAndNoCrash) {
   std::string doubling = "a: (NAME | NUMBER)* NAME";
   for (int i = 0; i < 20; ++i) doubling += " (NAME | NUMBER)";
   EXPECT_EQ(ErrorOf(doubling + "\n"), "g:1: rule 'a' is too large");
+  // Each of many states can be followed by each of many rules that begin with a word of their own.
+  std::string paths = "a:", rules = "b:";
+  for (int i = 0; i < 400; ++i) paths += " b";
+  for (int i = 0; i < 200; ++i) {
+    rules += (i > 0 ? " | c" : " c") + std::to_string(i);
+  }
+  for (int i = 0; i < 200; ++i) rules += "\nc" + std::to_string(i) + ": 'k" + std::to_string(i) + "' NAME";
+  EXPECT_EQ(ErrorOf(paths + "\n" + rules + "\n"), "g:1: the grammar is too large for its tables");
   std::string keywords = "a: 'k0'";
   for (int i = 1; i < 256; ++i) keywords += " | 'k" + std::to_string(i) + "'";
   EXPECT_EQ(ErrorOf(keywords + "\n"), "g:1: too many kinds of tokens");

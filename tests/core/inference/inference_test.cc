@@ -287,6 +287,34 @@ TEST(Inference, KnowsNamedTuplesTypedDictsAndEnums) {
   });
 }
 
+TEST(Inference, FollowsConditionsOfWhatACallHandsOver) {
+  Check({
+      {"def f(a, b):\n  if a is None or b is None: return 1\n  return 'a'\n$x = f(0, None)\n$y = f(0, 0)\n$z = f(None, "
+       "0)\n",
+       {"int", "str", "int"}},
+      {"def f(a, b):\n  if a is None and b is None: return 1\n  return 'a'\n$x = f(None, None)\n$y = f(None, 0)\n",
+       {"int", "str"}},
+      {"def f(a, b):\n  if not (a is None and not b is None): return 1\n  return 'a'\n$x = f(None, 0)\n$y = f(0, 0)\n",
+       {"str", "int"}},
+  });
+}
+
+TEST(Inference, TakesWhatHasTheMembersForAProtocolAlone) {
+  // The first overload that takes the argument says what the call gives.
+  const std::string head =
+      "from typing import Any, NamedTuple, Protocol, TypedDict, overload\n"
+      "class P(Protocol):\n  def m(self) -> int: ...\n"
+      "class N(NamedTuple):\n  def m(self) -> int: ...\n"
+      "class D(TypedDict):\n  def m(self) -> int: ...\n"
+      "class A:\n  def m(self) -> int: return 1\nclass B: pass\n";
+  for (const auto& [name, given] : {std::pair("P", "int"), std::pair("N", "str"), std::pair("D", "str")}) {
+    const std::string text = head + "@overload\ndef f(x: " + name +
+                             ") -> int: ...\n@overload\ndef f(x: object) -> str: ...\ndef f(x): ...\n"
+                             "$a = f(A())\n$b = f(B())\n";
+    Check({{text.c_str(), {given, "str"}}});
+  }
+}
+
 TEST(Inference, NarrowsByConditions) {
   Check({
       {"def f(x: int | None):\n  if x is None:\n    $x\n  else:\n    $x\n  if x is not None:\n    $x\n  $x\n",

@@ -202,6 +202,16 @@ TEST(Index, DefinitionsStandByNameWithTheirScopes) {
   EXPECT_NE(site.Places().find("1:[\"f\",[2,0,0,0,0,0,0,0,0],[0,2,\"A\"],"), std::string::npos);
 }
 
+TEST(Index, AttributesOfAFileAreToldFromThoseOfTheFileInFront) {
+  // The same names, met in another order.
+  const Site site({"class A:\n  def f(self): self.c = self.c = self.d = 1\n",
+                   "class B:\n  def f(self): self.d = self.c = self.e = self.e = 1\n"});
+  EXPECT_EQ(site.index->DefinitionsScript(),
+            "quillet.take([\"\",\"A\",\"B\"],[\n[\"A\",\"c\",0,0,1],\n[\"f\",\"ff\",1,0,2,2,1,2],\n[\"c\",\"aa\",1,0,2,"
+            "2,1,2],"
+            "\n[\"d\",\"aa\",1,0,2,2,1,2],\n[\"B\",\"c\",0,1,1],\n[\"e\",\"a\",2,1,2]]);\n");
+}
+
 TEST(Index, AnAttributeIsDefinedInMethodsAlone) {
   EXPECT_EQ(Site({"def f(self): self.x = 1\n"}).index->DefinitionsScript(),
             "quillet.take([\"\"],[\n[\"f\",\"f\",0,0,1]]);\n");

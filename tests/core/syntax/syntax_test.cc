@@ -322,6 +322,17 @@ TEST(Syntax, AnExpressionKnowsItsStatement) {
   EXPECT_EQ(statement_of("e\n"), "Assign");
 }
 
+TEST(Syntax, AnExpressionOfABrokenStatementBelongsToIt) {
+  for (const Text source : {"if a:\n  b c(mark, d\n", "def f():\n  x = y z mark\n", "class A:\n  ) + mark\n"}) {
+    const ReadSource read(source);
+    const ExprId mark = read.file.NamedAt(static_cast<uint32_t>(source.find("mark")));
+    ASSERT_NE(mark, kNoExpr) << source;
+    const StmtId stmt = read.file.StatementOf(mark);
+    EXPECT_EQ(stmt, read.file.StatementAt(static_cast<uint32_t>(source.find("mark")))) << source;
+    EXPECT_NE(stmt, 1u) << source << " (that is the head)";
+  }
+}
+
 TEST(Syntax, WhatIsMissingBelongsInFrontOfWhatFollows) {
   for (const Text source : {"x:class A: pass", "x =]", "if x=:y"}) {
     const ReadSource read(source);

@@ -621,6 +621,12 @@ TEST(Signatures, KnowTheActiveParameter) {
   EXPECT_EQ(program->Signatures(program[0].file, program[0].offset)[0].documentation, "Words.");
 }
 
+TEST(Signatures, AreNotThoseOfACallThatAnotherStatementLeftOpen) {
+  Program program("def f(a): pass\nf(1,\nimport os\nos.path $\nf(1, $\n");
+  EXPECT_TRUE(program->Signatures(program[0].file, program[0].offset).empty());
+  EXPECT_EQ(program->Signatures(program[1].file, program[1].offset).size(), 1u);
+}
+
 TEST(Signatures, AreThoseOfEveryOverload) {
   Program program(
       "from typing import overload\n@overload\ndef f(x: int) -> int: ...\n@overload\ndef f(x: str, y: int) -> str: "
