@@ -71,6 +71,57 @@ TEST(CompleteReading, WhateverIsCutShortIsReadAlikeByRecycledNodes) {
   }
 }
 
+TEST(CompleteReading, AFormOfANewerVersionHasItsNamesWhereverItStands) {
+  // The subscript is one that no table reads, so that its statement is not either.
+  const struct {
+    const char* statement;
+    const char* names;  // of its records
+  } cases[] = {
+      {"if x[*a, b]: pass", "x a b"},
+      {"while x[*a, b]: pass", "x a b"},
+      {"for i in x[*a, b]: pass", "i i x a b"},
+      {"with x[*a, b] as i: pass", "i i x a b"},
+      {"return x[*a, b]", "return x a b"},
+      {"assert x[*a, b], c", "x a b c"},
+      {"del x[*a, b]", "x a b"},
+      {"raise x[*a, b] from c", "x a b c"},
+      {"class A(x[*a, b], k=c): pass", "A x a b c"},
+      {"def f(p=x[*a, b]) -> c: pass", "f x a b c p p return"},
+      {"async for i in x[*a, b]: pass", "i i x a b"},
+      {"i = x[*a, b]", "i i x a b"},
+      {"i += x[*a, b]", "i x a b"},
+      {"i: x[*a, b] = c", "i i x a b c i"},
+      {"x[*a, b] = c", "x[*a, b] x a b c"},
+      {"lambda p=x[*a, b]: c", "x a b c p"},
+      {"yield x[*a, b]", "yield x a b"},
+      {"await x[*a, b]", "x a b"},
+      {"[x[*a, b] for i in c if x[*a, b]]", "x a b c i"},
+      {"f(x[*a, b], *c, **d)", "f x a b c d"},
+      {"type T = x[*a, b]", "T T x a b"},
+      {"not x[*a, b] or c", "x a b c"},
+      {"x[*a, b] if c else d", "x a b c d"},
+      {"-x[*a, b] ** c", "x a b c"},
+      {"c < x[*a, b] <= d", "c x a b d"},
+      {"(x[*a, b])[c].d", "x a b c (x[*a, b])[c].d"},
+      {"{x[*a, b]: c}", "x a b c"},
+      {"(i := x[*a, b])", "i i x a b"},
+  };
+  FileAnalyzer files(CompleteOptions(Version::Of(3, 12)));
+  for (const auto& [statement, expected] : cases) {
+    files.Analyze(std::string("async def g():\n ") + statement + "\n");
+    ASSERT_EQ(files.errors().size(), 0u) << statement;
+    std::string names;
+    for (const auto* rows : {&files.store().rows, &files.store().arg_rows}) {
+      for (const Record& record : *rows) {
+        if (&record == &files.store().rows[0]) continue;  // of the head
+        if (!names.empty()) names += ' ';
+        names += record.name();
+      }
+    }
+    EXPECT_EQ(names, expected) << statement;
+  }
+}
+
 TEST(CompleteReading, DeepNestingIsAnErrorOrIsRead) {
   FileAnalyzer files(CompleteOptions(Version::Of(3, 13)));
   const auto repeated = [](const char* text, int count) {

@@ -342,6 +342,9 @@ TEST(Names, LinksApartInTheSourceAreJoined) {
   Check({
       {"(a .\n b # c\n .c . d)", {"a :g:", "a.b :g:", "a.b.c :g:", "a.b.c.d :g:"}},
       {"a .b(c) .d", {"a.b :c:(c)", "a :g:", "a.b :g:", "c :g:", "a.b(c).d :g:"}},
+      {"( a+b )[ c + d ].e", {"a :g:", "b :g:", "c :g:", "d :g:", "(a + b)[c + d].e :g:"}},
+      {"( a+b )[ c*d ].e[ f+g ].h = 1",
+       {"(a + b)[c * d].e[f + g].h :l:int: 1", "c :g:", "d :g:", "(a + b)[c * d].e :g:", "f :g:", "g :g:"}},
       {"a(b,c).d.e", {"a :c:(b,c)", "a :g:", "b :g:", "c :g:", "a(b, c).d :g:", "a(b, c).d.e :g:"}},
   });
 }
