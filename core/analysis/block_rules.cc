@@ -40,9 +40,8 @@ constexpr auto kFactsOfKinds = [] {
   set({LineKind::kBlankLine}, Role::kBlank);
   set({LineKind::kComment}, Role::kComment);
   set({LineKind::kStringExpression, LineKind::kAssignment, LineKind::kPass, LineKind::kRaise, LineKind::kAssert,
-       LineKind::kReturn, LineKind::kPrint, LineKind::kDelete, LineKind::kTypeStatement},
+       LineKind::kReturn, LineKind::kPrint, LineKind::kDelete, LineKind::kTypeStatement, LineKind::kUnknown},
       Role::kPlain);
-  set({LineKind::kUnknown}, Role::kMaybePlain);
   set({LineKind::kImport, LineKind::kFromImport}, Role::kImport);
   set({LineKind::kWith}, Role::kHead);
   set({LineKind::kIfBeginning}, Role::kHead, Head::kPlain, Clauses::kElif);
@@ -62,6 +61,17 @@ constexpr Role RoleOf(LineKind kind) { return kFactsOfKinds[static_cast<size_t>(
 bool IsHeadKind(LineKind kind) { return RoleOf(kind) >= Role::kHead; }
 
 bool IsDefinitionKind(LineKind kind) { return kind == LineKind::kFunctionDef || kind == LineKind::kClassDef; }
+
+// What begins so, and is no head, may be something else than one more statement. Few do: one look at the table is
+// foreseen where a look at the kind of each statement is not.
+constexpr auto kUnplainBeginnings = [] {
+  std::array<bool, 256> table{};
+  for (const TokenCode code :
+       {TokenCode{word::kBreak}, TokenCode{word::kContinue}, TokenCode{word::kFrom}, TokenCode{word::kGlobal},
+        TokenCode{word::kImport}, TokenCode{word::kNonlocal}, tok::AT, tok::COMMENT, tok::BACKSLASH})
+    table[code] = true;
+  return table;
+}();
 
 // The last token that the grammar sees, or the size.
 size_t LastSignificant(TokenSpan toks) {
@@ -160,19 +170,19 @@ size_t BlockRules::GoOn(size_t index) {
     }
     if ((row->unusual & UnusualTokens::kPlace) != 0) break;
     const Token* const toks = tokens + row->first_token;
+    const bool is_unplain = kUnplainBeginnings[toks->code];
     Clauses plain = Clauses::kNone;
     if (facts.role >= Role::kHead) {
       if (facts.role >= Role::kMatch || toks[row->token_count - 1].code != tok::COLON) break;
-    } else if (facts.role == Role::kMaybePlain) {
-      const TokenCode first = toks->code;
-      if (first == word::kGlobal || first == word::kNonlocal || IsSkipCode(first)) break;
-      if (first == tok::AT) {
+    } else if (is_unplain) {
+      if (facts.role == Role::kImport) {
+        if (row->token_count < 2 || toks[1].length == kFuture.size()) break;
+      } else {
         // What stands behind a decorator on its line is in no row.
-        if (!IsLineEnd(*toks[row->token_count - 1].end())) break;
+        if (toks->code != tok::AT || row->kind != LineKind::kUnknown || !IsLineEnd(*toks[row->token_count - 1].end()))
+          break;
         plain = Clauses::kDecorated;
       }
-    } else if (facts.role != Role::kPlain) {
-      if (facts.role != Role::kImport || row->token_count < 2 || toks[1].length == kFuture.size()) break;
     }
 
     const uint32_t column = row->indent;
@@ -192,7 +202,7 @@ size_t BlockRules::GoOn(size_t index) {
       const Clauses before = block->clauses;
       if (before >= Clauses::kTry && (before != Clauses::kDecorated || plain != Clauses::kDecorated)) break;
       block->clauses = plain;
-      if (facts.role == Role::kImport) imports_.push_back(static_cast<uint32_t>(row - rows));
+      if (is_unplain && facts.role == Role::kImport) imports_.push_back(static_cast<uint32_t>(row - rows));
       head_row = nullptr;
     } else {
       if (!TakesHead(*row, toks, *block)) break;

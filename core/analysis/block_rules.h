@@ -51,8 +51,7 @@ class BlockRules {
     kBlank,
     kComment,
     kOther,  // jumps
-    kPlain,  // a statement that holds no others
-    kMaybePlain,
+    kPlain,  // a statement that holds no others, or a decorator
     kImport,
     kHead,
     kDefinitionHead,

@@ -5,6 +5,7 @@
 #pragma once
 
 #include <algorithm>
+#include <array>
 #include <cstdint>
 #include <cstring>
 
@@ -57,8 +58,12 @@ class UnusualTokens {
   void SeeNumber(Text number) {
     if (!IsPlainNumber(number)) reasons_ |= kOther;
   }
-  // And the code of the token in front.
+  // In a string under way, which may turn out not to be one.
+  void SeeEscape(const char* backslash) { saw_odd_escape_ |= kMayBeOdd[static_cast<unsigned char>(backslash[1])]; }
+  bool saw_odd_escape() const { return saw_odd_escape_; }
+  // One with a prefix, or an odd escape, and the code of the token in front.
   void SeeString(Text string, TokenCode before) {
+    saw_odd_escape_ = false;
     if (!IsPlainString(string) && !ArePlainBytes(string, before)) reasons_ |= kOther;
   }
   void SeePlace() { reasons_ |= kPlace; }
@@ -92,6 +97,12 @@ class UnusualTokens {
 
  private:
   static constexpr Text kDebug = "__debug__";
+  // By the letter behind the backslash: where more has to follow it (see HasPlainEscapes).
+  static constexpr auto kMayBeOdd = [] {
+    std::array<bool, 256> table{};
+    for (const char letter : {'N', 'U', 'u', 'x'}) table[static_cast<unsigned char>(letter)] = true;
+    return table;
+  }();
 
   static constexpr uint64_t Bit(TokenCode code) { return uint64_t{1} << code; }
 
@@ -122,6 +133,7 @@ class UnusualTokens {
   const uint8_t at_first_;    // of versions that lack so much that each statement is looked at, a reason
   const uint64_t operators_;  // a bit a code
   uint8_t reasons_;
+  bool saw_odd_escape_ = false;
 };
 
 }  // namespace quillet

@@ -180,6 +180,8 @@ struct SeesNoTokens {
   void SeeOperator(char, TokenCode) {}
   void SeeWalrus() {}
   void SeeNumber(Text) {}
+  void SeeEscape(const char*) {}
+  bool saw_odd_escape() const { return false; }
   void SeeString(Text, TokenCode) {}
 };
 
@@ -234,7 +236,7 @@ class Scanner : private ScanOutput {
   }
 
   // Line starts within a token that holds line ends.
-  void AddLineStartsWithin(const char* at, const char* token_end) {
+  [[gnu::always_inline]] void AddLineStartsWithin(const char* at, const char* token_end) {
     while ((at = FindAny<'\n', '\r'>(at, token_end)) < token_end) at = StepLineEnd(at);
   }
 
@@ -455,6 +457,7 @@ class Scanner : private ScanOutput {
     Unclosed& unclosed = unclosed_single_[*quote == '"'];
     bool crosses_lines = false;
     while (stop < end_ && *stop == '\\') {
+      client_.SeeEscape(stop);
       ++stop;
       if (stop < end_ && IsLineEnd(*stop)) {
         crosses_lines = true;
@@ -468,7 +471,7 @@ class Scanner : private ScanOutput {
     }
     if (stop < end_ && *stop == *quote) {
       if (crosses_lines) AddLineStartsWithin(quote, stop);
-      SeeString(at, stop + 1);
+      if (quote != at || client_.saw_odd_escape()) SeeString(at, stop + 1);
       return Emit(at, stop + 1, tok::STRING);
     }
     if (crosses_lines) unclosed = {quote, stop};
@@ -478,10 +481,10 @@ class Scanner : private ScanOutput {
   const char* ScanTripleString(const char* at, const char* quote) {
     bool& unclosed = unclosed_triple_[*quote == '"'];
     if (!unclosed) {
-      if (const char* string_end = TripleStringEnd(quote, end_)) {
+      const char* string_end = TripleStringEnd(quote, end_, [this](const char* escape) { client_.SeeEscape(escape); });
+      if (string_end != nullptr) {
         AddLineStartsWithin(quote, string_end);
-        if (quote != at || std::memchr(quote, '\\', static_cast<size_t>(string_end - quote)) != nullptr)
-          SeeString(at, string_end);
+        if (quote != at || client_.saw_odd_escape()) SeeString(at, string_end);
         return Emit(at, string_end, tok::STRING);
       }
       // Whatever closed a later string of this kind would have closed this one.

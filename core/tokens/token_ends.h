@@ -125,13 +125,14 @@ inline bool IsTemplatePrefix(Text name) {
 
 inline bool IsTripleQuote(const char* quote) { return quote[1] == quote[0] && quote[2] == quote[0]; }
 
-template <char kQuote>
-inline const char* TripleStringEndOf(const char* at, const char* end) {
+template <char kQuote, class SeeEscape>
+inline const char* TripleStringEndOf(const char* at, const char* end, SeeEscape see_escape) {
   at += 3;
   for (;;) {
     at = FindAny<kQuote, '\\'>(at, end);
     if (at >= end) return nullptr;
     if (*at == '\\') {
+      see_escape(at);
       at += 2;
     } else if (IsTripleQuote(at)) {
       return at + 3;
@@ -141,9 +142,14 @@ inline const char* TripleStringEndOf(const char* at, const char* end) {
   }
 }
 
-// Behind the triple-quoted string whose quotes stand at `at`; null if it does not end.
+// Behind the triple-quoted string whose quotes stand at `at`; null if it does not end. `see_escape` gets each
+// backslash.
+template <class SeeEscape>
+inline const char* TripleStringEnd(const char* at, const char* end, SeeEscape see_escape) {
+  return *at == '"' ? TripleStringEndOf<'"'>(at, end, see_escape) : TripleStringEndOf<'\''>(at, end, see_escape);
+}
 inline const char* TripleStringEnd(const char* at, const char* end) {
-  return *at == '"' ? TripleStringEndOf<'"'>(at, end) : TripleStringEndOf<'\''>(at, end);
+  return TripleStringEnd(at, end, [](const char*) {});
 }
 
 // The first quote, backslash or line end in a string of one line, or `end`.

@@ -706,9 +706,9 @@ uint8_t UnusualIn(Text statement, Version version = Version::Of(3, 12)) {
 }
 
 TEST(Unusual, IsWhatOnlySomeVersionsTake) {
-  for (const char* statement :
-       {"a.b = c[1] + 0.5, 0x1F, 1e5, None", R"(f('x\n', "'\\x", r'\x', *a, **b))", "x != y / z - 1 | w",
-        "from a import (b, c,)", "import a.b as __name__", "debug = __debug", R"(x = [b'a\x4f', 'b'])"})
+  for (const char* statement : {"a.b = c[1] + 0.5, 0x1F, 1e5, None", R"(f('x\n', "'\\x", r'\x', *a, **b))",
+                                R"(x = '\\N\x41' + """\u0041\\U""")", "x != y / z - 1 | w", "from a import (b, c,)",
+                                "import a.b as __name__", "debug = __debug", R"(x = [b'a\x4f', 'b'])"})
     EXPECT_EQ(UnusualIn(statement), 0) << statement;
   for (const char* statement :
        {"x = 0777",       "x = 1L",        "x = 1if y else z", R"(x = '\xZ')",    R"(x = """\N{a}""")", R"(x = b'\x4')",
