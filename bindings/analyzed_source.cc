@@ -33,7 +33,7 @@ nb::object ShownName(Text name) {
 }  // namespace
 
 AnalyzedSource::AnalyzedSource(Language& language, Text bytes, nb::handle record_class, const nb::tuple& kinds)
-    : store_(std::make_shared<SharedStore>()), record_class_(nb::borrow(record_class)), kinds_(kinds) {
+    : record_class_(nb::borrow(record_class)), kinds_(kinds) {
   CheckRowClass(record_class);
   if (kinds.size() != RecordKindWords().size()) ThrowError(ErrorKind::kValueError, "an object a kind is needed");
   const Language::Analyzer files(language);
@@ -44,7 +44,8 @@ AnalyzedSource::AnalyzedSource(Language& language, Text bytes, nb::handle record
     files->Analyze(bytes);
   }
   found_ = files->TakeFound();
-  store_->store = std::move(found_.store);
+  cut_ = new SharedCut(found_.source);
+  cut_->store = std::move(found_.store);
   for (size_t i = 0; i < found_.results.size(); ++i) {
     if (found_.results[i].error >= 0) rows_with_error_.push_back(i);
   }
@@ -54,7 +55,7 @@ bool AnalyzedSource::has_print_function() const { return ImportsPrintFunction(*f
 
 nb::object AnalyzedSource::LogicalOf(size_t i) const {
   const FileAnalyzer::LineResult& of_line = result(i);
-  nb::object logical = NewLineObject(found_.source, row(i), store_);
+  nb::object logical = NewLineObject(cut_, row(i));
   LineOf(logical).SetAnalyzed(of_line.record_begin, of_line.record_end, of_line.arg_record_begin,
                               of_line.arg_record_end);
   return logical;
@@ -80,9 +81,9 @@ nb::object AnalyzedSource::RecordsOf(size_t i) const {
     records.Add(made.TakePlain());
   };
   // Copies: the lines of the source share the store, and one that is analysed again prolongs it.
-  for (uint32_t at = of_line.record_begin; at < of_line.record_end; ++at) add(Record(store_->store.rows[at]), false);
+  for (uint32_t at = of_line.record_begin; at < of_line.record_end; ++at) add(Record(cut_->store.rows[at]), false);
   for (uint32_t at = of_line.arg_record_begin; at < of_line.arg_record_end; ++at)
-    add(Record(store_->store.arg_rows[at]), true);
+    add(Record(cut_->store.arg_rows[at]), true);
   return records.TakePlain();
 }
 

@@ -5,7 +5,6 @@
 // memory.
 #pragma once
 
-#include <memory>
 #include <vector>
 
 #include "analysis/file_analyzer.h"
@@ -40,7 +39,7 @@ class AnalyzedSource {
 
  private:
   FileAnalyzer::Found found_;
-  std::shared_ptr<SharedStore> store_;
+  Ref<SharedCut> cut_;
   std::vector<size_t> rows_with_error_;
   nb::object record_class_;
   nb::tuple kinds_;

@@ -1,6 +1,9 @@
 // CPGenAnalyzerImpl and CreateSyntaxError.
 #include <algorithm>
+#include <exception>
 #include <limits>
+#include <optional>
+#include <vector>
 
 #include "analysis/analyzer.h"
 #include "bindings/bindings.h"
@@ -63,7 +66,7 @@ class AnalyzerUse {
 // readable: texts of the line's source, and those of hints, which stand with the line's records.
 class Retained {
  public:
-  Retained(CPGenAnalyzerImpl& analyzer, const Ref<SourceText>& source)
+  Retained(CPGenAnalyzerImpl& analyzer, SourceText* source)
       : hint_pool_(analyzer.type_hint_walker().hint_parser().factory().pool()) {
     PinSource(analyzer.logical_parser().factory().pool(), source);
   }
@@ -81,13 +84,12 @@ nb::object Analyze(AnalyzerObject& self, Any logical, Truth in_async_def, Truth 
   if (line.parsed) return nb::none();
   const AnalyzerUse use(*self.analyzer);
   object.BeginAnalysis();
-  std::optional<SyntaxError> error;
-  {
+  const std::optional<SyntaxError> error = [&] {
     const Retained retained(*self.analyzer, line.source);
-    error = self.shapes == nullptr || self.is_looked_into
-                ? self.analyzer->AnalyzeSingleLogical(line, in_async_def, first_in_def)
-                : self.shapes->AnalyzeSingleLogical(line, in_async_def, first_in_def);
-  }
+    return self.shapes == nullptr || self.is_looked_into
+               ? self.analyzer->AnalyzeSingleLogical(line, in_async_def, first_in_def)
+               : self.shapes->AnalyzeSingleLogical(line, in_async_def, first_in_def);
+  }();
   object.EndWriting();
   if (!error) [[likely]] {
     return nb::none();
@@ -95,6 +97,38 @@ nb::object Analyze(AnalyzerObject& self, Any logical, Truth in_async_def, Truth 
   nb::object raised = TakeHostSyntaxError(*error);
   return raised.is_valid() ? raised : ExceptionFor(*error);
 }
+
+// The operation as it was bound, for all but plain calls.
+PyObject* g_bound_analyze;
+
+// A host calls it for every statement. A call with its arguments in order, and with truths that are plain, is taken as
+// it comes.
+PyObject* AnalyzeSingleLogical(PyObject* self, PyObject* const* args, Py_ssize_t count, PyObject* names) {
+  const auto is_plain = [](PyObject* truth) { return truth == Py_True || truth == Py_False; };
+  const bool is_plain_call = names == nullptr && (count == 2 || count == 3) && is_plain(args[1]) &&
+                             is_plain(args[count - 1]) && nb::inst_ready(self);
+  if (!is_plain_call) [[unlikely]] {
+    std::vector<PyObject*> all{self};
+    all.insert(all.end(), args, args + count + (names == nullptr ? 0 : PyTuple_GET_SIZE(names)));
+    return PyObject_Vectorcall(g_bound_analyze, all.data(), static_cast<size_t>(count) + 1, names);
+  }
+  try {
+    const Operation under_way;
+    return Analyze(*nb::inst_ptr<AnalyzerObject>(self), {args[0]}, {args[1] == Py_True},
+                   {count == 3 && args[2] == Py_True})
+        .release()
+        .ptr();
+  } catch (...) {
+    SetHostError(std::current_exception());
+    return nullptr;
+  }
+}
+
+PyMethodDef kAnalyzeSingleLogical = {"AnalyzeSingleLogical",
+                                     reinterpret_cast<PyCFunction>(reinterpret_cast<void (*)()>(AnalyzeSingleLogical)),
+                                     METH_FASTCALL | METH_KEYWORDS,
+                                     "AnalyzeSingleLogical($self, logical, in_async_def, first_in_def=False)\n--\n\n"
+                                     "Analyses a line once and gives the exception that describes a failure, or None."};
 
 bool Inspect(AnalyzerObject& self, Any logical, Truth in_async_def, Truth in_embedded_expression, Truth first_in_def) {
   LineObject& object = LineOf(logical);
@@ -123,7 +157,7 @@ nb::object SyntaxErrorFor(Any msg, Any logical, Any context, Any pos_info_in_tok
     in_token.col = Int32Of(nb::object(pos_info_in_tok.attr("utf8_col")));
   }
   const Position* place = pos_info_in_tok.is_none() ? nullptr : &in_token;
-  if (LineObject* object = InstanceOf<LineObject>(logical)) {
+  if (LineObject* object = LineOrNull(logical)) {
     LogicalLine& line = object->line();
     const Context where = line.token_count == 0 ? Context::Index(0) : ErrorContext(context);
     return ExceptionFor(CreateSyntaxError(std::string(message.text()), line, where, place));
@@ -135,7 +169,7 @@ nb::object SyntaxErrorFor(Any msg, Any logical, Any context, Any pos_info_in_tok
   if (line.token_count != 0) {
     where = ErrorContext(context);
     if (where.IsIndex()) {
-      line.source = SourceOfTokens(TupleOf(nb::object(logical.attr("fToks"))));
+      line.HoldSource(SourceOfTokens(TupleOf(nb::object(logical.attr("fToks")))));
       line.toks = line.source->tokens;
       line.SetPositions(PositionsOf(TupleOf(nb::object(logical.attr("fPositions")))));
     }
@@ -157,6 +191,9 @@ void BindAnalysis(nb::module_& tarvex) {
   DefOperation(cls, "AnalyzeSingleLogical", &Analyze, nb::arg("logical"), nb::arg("in_async_def"),
                nb::arg("first_in_def") = false,
                "Analyses a line once and gives the exception that describes a failure, or None.");
+  g_bound_analyze = nb::object(cls.attr("AnalyzeSingleLogical")).release().ptr();
+  cls.attr("AnalyzeSingleLogical") =
+      nb::steal(PyDescr_NewMethod(reinterpret_cast<PyTypeObject*>(cls.ptr()), &kAnalyzeSingleLogical));
   DefOperation(cls, "_InspectSingleLogical", &Inspect, nb::arg("logical"), nb::arg("in_async_def"),
                nb::arg("in_embedded_expression") = false, nb::arg("first_in_def") = false,
                "Parses and walks a line; raises what AnalyzeSingleLogical returns.");

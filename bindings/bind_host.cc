@@ -2,7 +2,6 @@
 #include <nanobind/stl/string.h>
 #include <nanobind/stl/vector.h>
 
-#include <memory>
 #include <vector>
 
 #include "bindings/analyzed_source.h"
@@ -11,30 +10,9 @@
 #include "bindings/language_object.h"
 #include "bindings/line_object.h"
 #include "bindings/signals.h"
-#include "lines/cutter.h"
-#include "lines/scopes.h"
 
 namespace quillet::host {
 namespace {
-
-// The lines of a source, not yet analysed, with their places: for hosts that do that themselves.
-nb::list CutSource(Any source, Any version_triple) {
-  const HostText text = HostText::FromBytes(source);
-  const Version version = VersionOf(version_triple);
-  const Ref<SourceText> held = SourceText::Copy(text.text());
-  const auto store = std::make_shared<SharedStore>();
-  std::vector<LineRow> rows;
-  CutLines(*held, version, rows);
-  nb::list lines;
-  ScopeTracker scopes;
-  for (const LineRow& row : rows) {
-    LinePlace place;
-    scopes.Next(row, place);
-    lines.append(nb::make_tuple(NewLineObject(held, row, store), row.first_line, row.last_line, row.indent,
-                                place.in_async_def, place.first_in_def));
-  }
-  return lines;
-}
 
 void BindLanguage(nb::module_& host) {
   nb::class_<Language>(host, "Language", "What an analyzer is built from. Grammar files are absolute paths.")
@@ -51,9 +29,7 @@ void BindHost(nb::module_& tarvex) {
   InstallInterrupts();
   BindLanguage(host);
   BindAnalyzedLine(host);
-  host.def("CutSource", &CutSource, nb::arg("source"), nb::arg("version_triple"),
-           "The lines of a UTF-8 source, not yet analysed: (logical, first_line, last_line, indent, in_async_def, "
-           "first_in_def), with lines from 0.");
+  BindCutSource(host);
   nb::class_<AnalyzedSource>(host, "AnalyzedSource",
                              "A UTF-8 source: its logical lines, and what each was found to say.")
       .def(

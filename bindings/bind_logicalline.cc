@@ -1,7 +1,6 @@
-// CLogicalLine and the operations of the sibling module logicalline.
+// The fields and operations of CLogicalLine (line_type.cc), and the operations of the sibling module logicalline.
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
-#include "bindings/errors.h"
 #include "bindings/line_class.h"
 #include "bindings/line_object.h"
 #include "lines/cutter.h"
@@ -9,26 +8,6 @@
 
 namespace quillet::host {
 namespace {
-
-void InitLine(nb::pointer_and_handle<LineObject> self, Any type, Any toks, Any positions, Any tok_types, Any parsed,
-              Any first_line, Any token_count) {
-  auto* object = new (self.p) LineObject();
-  try {
-    object->SetType(type);
-    object->SetPositions(positions);
-    object->SetToks(toks);
-    if (!tok_types.is_none()) object->SetTokTypes(tok_types);
-    const int truth = PyObject_IsTrue(parsed.ptr());
-    if (truth < 0) throw nb::python_error();
-    object->line().parsed = truth != 0;
-    object->line().first_line = Int32Of(first_line);
-    if (!token_count.is_none()) object->SetTokenCount(Int32Of(token_count));
-    object->Attach(self.h.ptr());
-  } catch (...) {
-    object->~LineObject();
-    throw;
-  }
-}
 
 void RememberOperation(LineClass::Operation& operation, nb::handle type, const char* name) {
   operation.name = PyUnicode_InternFromString(name);
@@ -70,12 +49,9 @@ void BindLogicalline(nb::module_& tarvex) {
 #include "lines/line_kinds.def"
   m.attr("kErrorTokenPrefix") = "error";
 
-  nb::class_<LineObject> cls(m, "CLogicalLine",
-                             "One logical line of Python: its tokens, and what analysis recorded on it.");
-  g_line_class.line_type = (PyTypeObject*)cls.ptr();
-  cls.def("__init__", &InitLine, nb::arg("type") = nb::str("unknown"), nb::arg("toks") = nb::tuple(),
-          nb::arg("positions") = nb::tuple(), nb::arg("tok_types") = nb::none(), nb::arg("parsed") = false,
-          nb::arg("first_line") = 0, nb::arg("token_count") = nb::none());
+  // Only to define what it has.
+  auto cls = nb::borrow<nb::class_<LineInstance>>(MakeLineClass());
+  m.attr("CLogicalLine") = cls;
   cls.def_prop_rw(
       "fType", [](LineObject& self) { return self.GetType(); },
       [](LineObject& self, Any value) { self.SetType(value); });
@@ -97,13 +73,6 @@ void BindLogicalline(nb::module_& tarvex) {
   cls.def_prop_rw(
       "fTokenCount", [](LineObject& self) { return self.GetTokenCount(); },
       [](LineObject& self, Any value) { self.SetTokenCount(Int32Of(value)); });
-  cls.def_prop_rw(
-      "fTypeEquivs", [](LineObject& self) { return self.GetTypeEquivs(); },
-      [](LineObject& self, Any value) { self.SetTypeEquivs(value); }, nb::arg("value"));
-  cls.def_prop_rw(
-      "fArgTypeEquivs", [](LineObject& self) { return self.GetArgTypeEquivs(); },
-      [](LineObject& self, Any value) { self.SetArgTypeEquivs(value); }, nb::arg("value"));
-
   cls.def(
       "GetTokType", [](LineObject& self, Any i) { return self.BuiltinGetTokType(Int64Of(i)); }, nb::arg("i"),
       "The token type id of token `i`.");

@@ -78,7 +78,7 @@ nb::object Step(MatchcaseObject& self, Operation&& operation) {
   RequireTokens(self);
   if (!self.positions.is_valid()) ThrowError(ErrorKind::kTypeError, "'NoneType' object is not subscriptable");
   const Ref<SourceText> source = self.source;
-  PinSource(PoolOf(self), source);
+  PinSource(PoolOf(self), source.get());
   return Wrap(self.parser->Run(operation), source);
 }
 
@@ -169,7 +169,7 @@ nb::object ParseStatement(MatchcaseObject& self, Any toks, Any positions) {
     if (!PyTuple_Check(half.ptr())) ThrowExpected("tuple", half);
   const Ref<SourceText> source = SourceOfTokens(TupleOf(kept.toks));
   const std::vector<Position> places = PositionsOf(TupleOf(kept.positions));
-  PinSource(PoolOf(self), source);
+  PinSource(PoolOf(self), source.get());
   CMatchCaseStatementParser& parser = *self.parser;
   CNode* node = parser.Run([&] {
     struct Clear {

@@ -117,7 +117,7 @@ void InitParser(nb::pointer_and_handle<ParserObject> self, Any version_triple, A
 template <class Parse>
 nb::object Parsed(CPGenParserImpl& parser, const Ref<SourceText>& source, Parse&& parse) {
   const OneThread use(parser.thread_use, kTheParser);
-  PinSource(parser.factory().pool(), source);
+  PinSource(parser.factory().pool(), source.get());
   return Wrap(parse(), source);
 }
 
@@ -142,7 +142,7 @@ nb::object ParseTokenListToNode(CPGenParserImpl& parser, nb::handle toks, bool i
 nb::object GetTypeParameterNodes(CPGenParserImpl& parser, nb::handle toks) {
   TokensArg tokens(toks);
   const OneThread use(parser.thread_use, kTheParser);
-  PinSource(parser.factory().pool(), tokens.source);
+  PinSource(parser.factory().pool(), tokens.source.get());
   return WrapList(parser.GetTypeParameterNodes(tokens.toks()), tokens.source);
 }
 
@@ -205,7 +205,7 @@ void BindFeeding(nb::class_<ParserObject, AnalyzerBase>& cls) {
         TokensArg tokens(tok_list);
         const int32_t index = Int32Of(context);
         const OneThread use(object.parser->thread_use, kTheParser);
-        PinSource(object.parser->factory().pool(), tokens.source);
+        PinSource(object.parser->factory().pool(), tokens.source.get());
         // To the engine that the host sets up and finishes.
         HostEngine engine(object, EngineOf(self));
         const FeedingEngine feeding(object, engine);
@@ -269,7 +269,7 @@ void BindSpecialCases(nb::class_<ParserObject, AnalyzerBase>& cls) {
         TokensArg tokens(toks);
         PositionsArg places(positions);
         const OneThread use(self.parser->thread_use, kTheParser);
-        PinSource(self.parser->factory().pool(), tokens.source);
+        PinSource(self.parser->factory().pool(), tokens.source.get());
         return WrapList(self.parser->NodesForTypeParameters(tokens.toks(), in_async_def, places.view(), Int64Of(start),
                                                             Int64Of(end), raise_errors),
                         tokens.source);

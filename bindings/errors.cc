@@ -6,6 +6,7 @@
 #include <typeinfo>
 
 #include "bindings/convert.h"
+#include "bindings/line_class.h"
 
 namespace quillet::host {
 namespace {
@@ -175,7 +176,8 @@ void SetHostError(const std::exception_ptr& exception) {
 void ThrowExpected(const char* want, nb::handle got) {
   const char* name = Py_TYPE(got.ptr())->tp_name;
   // A bound class has its module's name in front with some versions of the interpreter only.
-  if (const char* dot = std::strrchr(name, '.'); dot != nullptr && nb::type_check(got.type())) name = dot + 1;
+  const bool is_bound = nb::type_check(got.type()) || Py_TYPE(got.ptr()) == g_line_class.line_type;
+  if (const char* dot = std::strrchr(name, '.'); dot != nullptr && is_bound) name = dot + 1;
   PyErr_Format(PyExc_TypeError, "Expected %s, got %.200s", want, name);
   throw nb::python_error();
 }

@@ -55,9 +55,9 @@ void LineObject::UpdateHooks() {
   line_->hooks = seen ? this : nullptr;
 }
 
-void LineObject::SetRow(const Ref<SourceText>& source, const LineRow& row, std::shared_ptr<SharedStore> shared) {
-  SetFromRow(*line_, source, row);
-  shared_ = std::move(shared);
+void LineObject::SetRow(const Ref<SharedCut>& cut, const LineRow& row) {
+  SetFromRow(*line_, *cut->source, row);
+  cut_ = cut;
 }
 
 nb::object LineObject::GetType() const {
@@ -89,7 +89,7 @@ void LineObject::SetToks(nb::handle sequence) {
   // Records may refer to the old source, and so may positions.
   if (!line_->has_stored_positions()) SetPositions(GetPositions());
   MoveToOwnStore();
-  LetGo(std::exchange(line_->source, source));
+  LetGo(line_->HoldSource(source));
   line_->toks = source->tokens;
   line_->no_embedded = false;
   if (!token_count_is_set_) line_->token_count = static_cast<int32_t>(source->tokens.size());
@@ -193,7 +193,7 @@ void LineObject::SetArgTypeEquivs(nb::handle list) {
 }
 
 bool LineObject::IsAtEndOfStore() const {
-  const RecordStore& store = shared_->store;
+  const RecordStore& store = cut_->store;
   const auto ends_at = [](std::span<const Record> rows, const std::vector<Record>& all) {
     return rows.data() + rows.size() == all.data() + all.size();
   };
@@ -201,13 +201,13 @@ bool LineObject::IsAtEndOfStore() const {
 }
 
 void LineObject::MoveToOwnStore() {
+  if (cut_ && line_->source == cut_->source.get()) LetGo(line_->HoldSource(cut_->source));
   const bool is_empty = line_->type_equivs().empty() && line_->arg_type_equivs().empty();
-  if (is_empty && !writes_to_shared_) {
-    LetGo(std::move(shared_));
-    shared_.reset();  // the line makes a store of its own at its first record
+  if (is_empty && !writes_to_cut_) {
+    LetGo(std::move(cut_));  // the line makes a store of its own at its first record
     return;
   }
-  auto own = std::make_shared<SharedStore>();
+  const Ref<SharedCut> own(new SharedCut({}));
   const std::span<const Record> rows = line_->type_equivs();
   const std::span<const Record> arg_rows = line_->arg_type_equivs();
   const std::vector<Record> kept(rows.begin(), rows.end());
@@ -217,8 +217,8 @@ void LineObject::MoveToOwnStore() {
   for (const Record& row : kept) line_->DirectAppend(copy(row.name()), copy(row.info()));
   for (const Record& row : kept_args) line_->DirectAppendArg(copy(row.name()), copy(row.info()));
   // The store is private now, so the line is at its end for good.
-  LetGo(std::exchange(shared_, std::move(own)));
-  writes_to_shared_ = true;
+  LetGo(std::exchange(cut_, own));
+  writes_to_cut_ = true;
 }
 
 void LineObject::BeginAnalysis() {
@@ -228,17 +228,17 @@ void LineObject::BeginAnalysis() {
     arg_equivs_ = {};
     UpdateHooks();
   }
-  if (shared_) {
-    line_->WriteTo(&shared_->store);
-    writes_to_shared_ = true;
+  if (cut_) {
+    line_->WriteTo(&cut_->store);
+    writes_to_cut_ = true;
   }
 }
 
 void LineObject::BeginWriting() {
-  if (!shared_) return;
-  if (!writes_to_shared_) {
-    line_->WriteTo(&shared_->store);
-    writes_to_shared_ = true;
+  if (!cut_) return;
+  if (!writes_to_cut_) {
+    line_->WriteTo(&cut_->store);
+    writes_to_cut_ = true;
   } else if (!IsAtEndOfStore()) {
     MoveToOwnStore();
   }
@@ -290,13 +290,13 @@ void LineObject::BuiltinAppendArg(Text name, Text info) {
 void LineObject::BuiltinClearDerivedInfo() {
   equivs_ = {};
   arg_equivs_ = {};
-  if (IsUnderWay() && !writes_to_shared_) {
+  if (IsUnderWay() && !writes_to_cut_) {
     // What the core has in hand may stand among the texts of the line's own store.
-    if (!shared_) shared_ = std::make_shared<SharedStore>();
-    writes_to_shared_ = true;
+    if (!cut_) cut_ = new SharedCut({});
+    writes_to_cut_ = true;
   }
-  if (writes_to_shared_) {
-    line_->WriteTo(&shared_->store);
+  if (writes_to_cut_) {
+    line_->WriteTo(&cut_->store);
   } else {
     line_->DirectClearDerivedInfo();
   }
@@ -324,44 +324,39 @@ Recording::~Recording() {
 
 // ---- instances ----
 
-LineObject& LineOf(nb::handle object) {
-  LineObject* line = InstanceOf<LineObject>(object);
-  if (line == nullptr) ThrowExpected("CLogicalLine", object);
-  return *line;
-}
-
 namespace {
 
-template <class... Args>
-nb::object NewInstance(Args&&... args) {
-  nb::object instance = nb::inst_alloc(nb::handle((PyObject*)g_line_class.line_type));
-  LineObject* object = nb::inst_ptr<LineObject>(instance);
-  new (object) LineObject(std::forward<Args>(args)...);
-  nb::inst_mark_ready(instance);
-  object->Attach(instance.ptr());
-  return instance;
+// A new instance, whose line `construct` makes in its place.
+template <class Construct>
+nb::object NewInstance(Construct&& construct) {
+  auto* instance = PyObject_New(LineInstance, g_line_class.line_type);
+  if (instance == nullptr) throw nb::python_error();
+  construct(&instance->line);
+  auto* const self = reinterpret_cast<PyObject*>(instance);
+  instance->line.Attach(self);
+  return nb::steal(self);
 }
 
 }  // namespace
 
-nb::object NewLineObject(std::unique_ptr<LogicalLine> made) { return NewInstance(std::move(made)); }
+nb::object NewLineObject(std::unique_ptr<LogicalLine> made) {
+  return NewInstance([&made](void* place) { new (place) LineObject(std::move(made)); });
+}
 
-nb::object NewLineObject(const Ref<SourceText>& source, const LineRow& row,
-                         const std::shared_ptr<SharedStore>& shared) {
-  nb::object instance = NewInstance();
-  nb::inst_ptr<LineObject>(instance)->SetRow(source, row, shared);
-  return instance;
+nb::object NewLineObject(const Ref<SharedCut>& cut, const LineRow& row) {
+  // Without parentheses, which would have all of it filled with zeros beforehand.
+  return NewInstance([&](void* place) { (new (place) LineObject)->SetRow(cut, row); });
 }
 
 nb::object CutToTuple(const Ref<SourceText>& source, Version version) {
   std::vector<LineRow> rows;
   CutLines(*source, version, rows);
-  auto shared = std::make_shared<SharedStore>();
+  const Ref<SharedCut> cut(new SharedCut(source));
   const WithoutCollector all_at_once;
   nb::object tuple = nb::steal(PyTuple_New(static_cast<Py_ssize_t>(rows.size())));
   if (!tuple.is_valid()) throw nb::python_error();
   for (size_t i = 0; i < rows.size(); ++i)
-    PyTuple_SET_ITEM(tuple.ptr(), i, NewLineObject(source, rows[i], shared).release().ptr());
+    PyTuple_SET_ITEM(tuple.ptr(), i, NewLineObject(cut, rows[i]).release().ptr());
   return tuple;
 }
 

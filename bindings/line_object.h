@@ -1,5 +1,5 @@
 // The object behind a CLogicalLine of the host: a logical line of the core, and what the host has
-// read of it or put in its place.
+// read of it or put in its place. The class itself is in line_type.cc.
 //
 // Token tuples, positions and record lists are made when the host reads them. A record list that
 // was read stays the same object as long as nothing is cleared, and is extended by later reads; a
@@ -16,15 +16,30 @@
 
 #include "bindings/bindings.h"
 #include "bindings/convert.h"
+#include "bindings/errors.h"
+#include "bindings/line_class.h"
+#include "foundations/ref.h"
 #include "lines/cutter.h"
 #include "lines/logical_line.h"
 
 namespace quillet::host {
 
-// The records of all lines cut out of one source. Lines write to its end one after another; one
-// that is written to out of turn moves to a store of its own.
-struct SharedStore {
+// What the lines cut out of one source have in common: the source, and the records of all of them. Lines write to the
+// end of the store one after another; one that is written to out of turn moves to a store of its own.
+//
+// Every line counts here, and only with the interpreter lock held: the counter is a plain one.
+struct SharedCut {
+  explicit SharedCut(Ref<SourceText> of) : source(std::move(of)) {}
+
+  void AddRef() const { ++refs; }
+  void Release() const {
+    if (--refs == 0) delete this;
+  }
+  bool IsUnique() const { return refs == 1; }
+
+  const Ref<SourceText> source;
   RecordStore store;
+  mutable size_t refs = 0;
 };
 
 class LineObject final : public LineHooks {
@@ -39,19 +54,20 @@ class LineObject final : public LineHooks {
 
   LogicalLine& line() { return *line_; }
 
-  // Binds the object to the host's instance around it and finds out whether that may override.
+  // Binds the object to the host's instance around it, which from then on serves as a line, and finds out whether that
+  // may override.
   void Attach(PyObject* self);
   PyObject* self() const { return self_; }
   bool is_python_subclass() const { return is_python_subclass_; }
 
   // Fills the line from a row of a cut source.
-  void SetRow(const Ref<SourceText>& source, const LineRow& row, std::shared_ptr<SharedStore> shared);
+  void SetRow(const Ref<SharedCut>& cut, const LineRow& row);
 
   // Says that the row was analysed already, and which records of the shared store are its.
   void SetAnalyzed(uint32_t begin, uint32_t end, uint32_t arg_begin, uint32_t arg_end) {
-    line_->ReadFrom(&shared_->store, begin, end, arg_begin, arg_end);
+    line_->ReadFrom(&cut_->store, begin, end, arg_begin, arg_end);
     line_->parsed = true;
-    writes_to_shared_ = true;
+    writes_to_cut_ = true;
   }
 
   // ---- fields ----
@@ -112,12 +128,14 @@ class LineObject final : public LineHooks {
   LogicalLine own_;
   LogicalLine* line_ = &own_;
   std::unique_ptr<LogicalLine> made_;
-  std::shared_ptr<SharedStore> shared_;
+  // The line's source is that of the cut, or one that the line holds; its records are in the cut's store, or in one of
+  // its own.
+  Ref<SharedCut> cut_;
   PyObject* self_ = nullptr;
   bool is_python_subclass_ = false;
   bool token_count_is_set_ = false;
   bool has_host_tok_types_ = false;
-  bool writes_to_shared_ = false;
+  bool writes_to_cut_ = false;
   nb::object type_;  // a kind of the host's own
   nb::object toks_;  // tuples, made or given
   nb::object positions_;
@@ -143,16 +161,59 @@ class Recording {
   LineObject* line_;
 };
 
+// An instance of CLogicalLine or of a class of the host's that derives from it.
+struct LineInstance {
+  PyObject_HEAD;
+  LineObject line;
+};
+
 // A new CLogicalLine of the host around a line of the core.
 nb::object NewLineObject(std::unique_ptr<LogicalLine> made);
 // One for a row of a cut source.
-nb::object NewLineObject(const Ref<SourceText>& source, const LineRow& row, const std::shared_ptr<SharedStore>& shared);
+nb::object NewLineObject(const Ref<SharedCut>& cut, const LineRow& row);
 // All logical lines of a source, as a tuple of CLogicalLine.
 nb::object CutToTuple(const Ref<SourceText>& source, Version version);
-// The object behind a CLogicalLine; TypeError "Expected CLogicalLine, got ..." for anything else.
-LineObject& LineOf(nb::handle object);
+// The object behind a CLogicalLine; null for anything else, and for an instance of a host's class whose __init__ did
+// not call that of its base.
+inline LineObject* LineOrNull(nb::handle object) {
+  if (!PyObject_TypeCheck(object.ptr(), g_line_class.line_type)) return nullptr;
+  LineObject& line = reinterpret_cast<LineInstance*>(object.ptr())->line;
+  return line.self() != nullptr ? &line : nullptr;
+}
+// The same; TypeError "Expected CLogicalLine, got ..." for anything else.
+inline LineObject& LineOf(nb::handle object) {
+  LineObject* const line = LineOrNull(object);
+  if (line == nullptr) [[unlikely]]
+    ThrowExpected("CLogicalLine", object);
+  return *line;
+}
+
+// Makes the class CLogicalLine, which has its constructor and the record lists so far.
+nb::object MakeLineClass();
+// Adds the class CutSource.
+void BindCutSource(nb::module_& host);
 
 // Records of the host that are pairs: unpacked strictly.
 std::pair<nb::object, nb::object> UnpackPair(nb::handle pair);
 
 }  // namespace quillet::host
+
+namespace nanobind::detail {
+
+template <>
+struct type_caster<quillet::host::LineObject> {
+  static constexpr auto Name = const_name("CLogicalLine");
+  template <class>
+  using Cast = quillet::host::LineObject&;
+
+  bool from_python(handle src, uint8_t, cleanup_list*) noexcept {
+    line_ = quillet::host::LineOrNull(src);
+    return line_ != nullptr;
+  }
+  operator quillet::host::LineObject&() { return *line_; }  // NOLINT(google-explicit-constructor): as casters are
+
+ private:
+  quillet::host::LineObject* line_ = nullptr;
+};
+
+}  // namespace nanobind::detail

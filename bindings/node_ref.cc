@@ -245,11 +245,11 @@ void RehomeTexts(NodePool& pool) {
   NodeRegistry::Get().RehomeTexts(pool);
 }
 
-void PinSource(NodePool& pool, const Ref<SourceText>& source) {
+void PinSource(NodePool& pool, SourceText* source) {
   if (pool.host_views == 0 && !pool.MayHoldStrays()) [[likely]]
     return;
   NodeRegistry::Get().TidyBeforeParse(&pool);
-  if (pool.host_views != 0 && source) NodeRegistry::Get().Pin(&pool, source);
+  if (pool.host_views != 0 && source != nullptr) NodeRegistry::Get().Pin(&pool, source);
 }
 
 }  // namespace quillet::host

@@ -136,7 +136,7 @@ UsedArgList UsedArgsOf(nb::handle list);
 ArgList ArgListOf(nb::handle list);
 
 // At the start of an operation that makes nodes of the pool from a source.
-void PinSource(NodePool& pool, const Ref<SourceText>& source);
+void PinSource(NodePool& pool, SourceText* source);
 
 // Gives the texts of all nodes that wrappers of the pool may reach to the pool: for texts that are
 // about to go.

@@ -716,7 +716,7 @@ StatementShapes::Plan StatementShapes::Learn(const Key& key, const LogicalLine& 
   const MadeUp statement(key);
   made_up_records_.Reset();
   LogicalLine made_up;
-  made_up.source = statement.source();
+  made_up.source = statement.source().get();
   made_up.toks = statement.toks();
   made_up.kind = line.kind;
   made_up.no_embedded = true;

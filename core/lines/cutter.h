@@ -44,16 +44,21 @@ void CutLinesCompletely(SourceText& source, Version version, std::vector<LineRow
 // Only the tokens, for measuring and for checks; NEWLINE is not among them.
 void TokenizeOnly(SourceText& source, Version version);
 
-// Points `line` at a row: tokens, kind, first line. Records are left as they are.
-inline void SetFromRow(LogicalLine& line, const Ref<SourceText>& source, const LineRow& row) {
-  if (line.source.get() != source.get()) line.source = source;
-  line.toks = TokenSpan(source->tokens).subspan(row.first_token, row.token_count);
+// Points `line` at a row: tokens, kind, first line. Records are left as they are. The source is kept by others.
+inline void SetFromRow(LogicalLine& line, SourceText& source, const LineRow& row) {
+  line.source = &source;
+  line.toks = TokenSpan(source.tokens).subspan(row.first_token, row.token_count);
   line.kind = row.kind;
   line.parsed = false;
   line.no_embedded = row.no_embedded;
   line.first_line = static_cast<int32_t>(row.first_line);
   line.token_count = static_cast<int32_t>(row.token_count);
   if (line.has_stored_positions()) line.UseSourcePositions();
+}
+// The same for a line that holds the source.
+inline void SetFromRow(LogicalLine& line, const Ref<SourceText>& source, const LineRow& row) {
+  if (line.source != source.get()) line.HoldSource(source);
+  SetFromRow(line, *source, row);
 }
 
 }  // namespace quillet

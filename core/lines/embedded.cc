@@ -133,7 +133,7 @@ void EmbeddedExpressions::Show(size_t index, LogicalLine& line) {
   const Found& found = found_[index];
   line.ClearDerivedInfo();
   if (line.has_stored_positions()) line.UseSourcePositions();
-  line.source = inner_;
+  line.HoldSource(inner_);
   line.toks = TokenSpan(inner_->tokens).subspan(found.begin, found.end - found.begin);
   line.token_count = static_cast<int32_t>(line.toks.size());
   line.kind = found.kind;

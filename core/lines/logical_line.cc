@@ -52,7 +52,7 @@ PositionView PositionView::Slice(size_t begin, size_t end) const {
 
 PositionView LogicalLine::positions() const {
   if (has_stored_positions_) return PositionView(stored_positions_);
-  return PositionView(source.get(), toks, first_line);
+  return PositionView(source, toks, first_line);
 }
 
 std::vector<Position> LogicalLine::SetPositions(std::vector<Position> positions) {

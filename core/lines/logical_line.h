@@ -1,7 +1,7 @@
 // A logical line: one statement or statement head as tokens, and what analysis wrote on it.
 //
 // This is the record that the host's CLogicalLine shows. It borrows its tokens from a SourceText,
-// which it keeps alive, and writes its records to a RecordStore: its own, or that of a file, of
+// which it or whoever made it keeps alive, and writes its records to a RecordStore: its own, or that of a file, of
 // which it then owns a range at the end (lines that share a store are analysed one after another).
 // Where a Python subclass overrides an operation, `hooks` dispatches to it; without one every
 // operation is direct.
@@ -9,6 +9,7 @@
 
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "foundations/errors.h"
@@ -89,7 +90,7 @@ class LogicalLine {
   LogicalLine& operator=(const LogicalLine&) = delete;
 
   // ---- what the cutter (or the host) sets ----
-  Ref<SourceText> source;
+  SourceText* source = nullptr;  // kept by others, unless the line holds it
   TokenSpan toks;
   LineKind kind = LineKind::kUnknown;
   bool parsed = false;
@@ -99,6 +100,13 @@ class LogicalLine {
   int32_t first_line = 0;  // in the coordinates of the enclosing text, from 0
   int32_t token_count = 0;
   LineHooks* hooks = nullptr;
+
+  // Makes it the source, for as long as the line has it. Gives the one that was held before, which tokens and texts
+  // that are in use may stand in.
+  Ref<SourceText> HoldSource(Ref<SourceText> held) {
+    source = held.get();
+    return std::exchange(held_source_, std::move(held));
+  }
 
   // Positions of the tokens relative to first_line.
   PositionView positions() const;
@@ -206,6 +214,7 @@ class LogicalLine {
   uint32_t row_begin_ = 0, row_count_ = 0;
   uint32_t arg_row_begin_ = 0, arg_row_count_ = 0;
   bool has_stored_positions_ = false;
+  Ref<SourceText> held_source_;
   std::vector<Position> stored_positions_;
   std::unique_ptr<RecordStore> own_store_;
 };

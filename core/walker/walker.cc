@@ -38,7 +38,7 @@ void CNodeWalker::Walk(CNode* node, LogicalLine* logical) {
   direct_ = own_texts_used_ ? nullptr : logical;
   fLoadNameContext = true;
   fStoreWithinSubExpr = false;
-  if (const SourceText* source = logical != nullptr ? logical->source.get() : nullptr) {
+  if (const SourceText* source = logical != nullptr ? logical->source : nullptr) {
     source_begin_ = reinterpret_cast<uintptr_t>(source->begin());
     source_size_ = source->size();
   }

@@ -1,4 +1,4 @@
-from collections.abc import Callable, Iterable, Sequence
+from collections.abc import Callable, Iterable, Iterator, Sequence
 from typing import Any, ClassVar, Final, Protocol, TypeVar
 
 from quillet._records import Record
@@ -651,8 +651,10 @@ def CreateSyntaxError(
 # ---- for the package itself ----
 
 class _host:  # a module at run time
-    @staticmethod
-    def CutSource(source: bytes, version_triple: _Version) -> list[tuple[CLogicalLine, int, int, int, bool, bool]]: ...
+    class CutSource(Iterator[tuple[CLogicalLine, int, int, int, bool, bool]]):
+        def __init__(self, source: bytes, version_triple: _Version) -> None: ...
+        def __next__(self) -> tuple[CLogicalLine, int, int, int, bool, bool]: ...
+
     @staticmethod
     def SyntaxLines(version: _Version, source: bytes) -> str: ...
 

@@ -19,6 +19,7 @@ from quillet import RecordKind, SourceEncodingError, analyze
 from quillet.config import GetNorvaFilename
 from quillet.logicalline import GetLogicalsFromText
 from quillet.optpgen import ParserGenerator
+from quillet.tarvex import _host
 
 
 def records_of(source: str | bytes, version: tuple[int, ...] | None = None) -> list[tuple[str, str, str, bool]]:
@@ -247,6 +248,41 @@ def test_lines_have_their_place_in_the_source() -> None:
         (15, 15, 0),
         (15, 15, 0),
     ]
+
+
+def test_a_source_can_be_cut_for_hosts_that_analyse_by_themselves() -> None:
+    analyzer = quillet.analyzer_for((3, 8))
+    cut = _host.CutSource(SOURCE.encode(), (3, 8, 0))
+    assert iter(cut) is cut
+    lines = analyze(SOURCE, version=(3, 8), exact=True).lines
+    found = list(cut)
+    assert next(cut, None) is None
+    assert [(*place, first) for _, *place, first in found] == [
+        (line.first_line - 1, line.last_line - 1, line.indent, line.in_async_def, line.first_in_def) for line in lines
+    ]
+    del cut
+    for (logical, *_, in_async_def, first_in_def), line in zip(found, lines, strict=True):
+        assert analyzer.AnalyzeSingleLogical(logical, in_async_def, first_in_def) is None
+        assert logical.fTypeEquivs == line.logical.fTypeEquivs
+        assert logical.fArgTypeEquivs == line.logical.fArgTypeEquivs
+
+
+def test_lines_of_a_cut_may_be_let_go_of_one_by_one() -> None:
+    analyzer = quillet.analyzer_for((3, 8))
+    records = 0
+    for logical, *_, in_async_def, first_in_def in _host.CutSource(SOURCE.encode(), (3, 8, 0)):
+        analyzer.AnalyzeSingleLogical(logical, in_async_def, first_in_def)
+        records += len(logical.fTypeEquivs or ()) + len(logical.fArgTypeEquivs or ())
+    assert records == sum(len(line.records) for line in analyze(SOURCE, version=(3, 8), exact=True).lines) > 0
+
+
+def test_what_cannot_be_cut_is_a_type_error() -> None:
+    with pytest.raises(TypeError):
+        _host.CutSource(SOURCE, (3, 8, 0))  # type: ignore[arg-type]
+    with pytest.raises(TypeError):
+        _host.CutSource(b"x", 3)  # type: ignore[arg-type]
+    with pytest.raises(TypeError):
+        next(_host.CutSource.__new__(_host.CutSource))
 
 
 def test_a_line_knows_the_async_def_that_it_stands_in() -> None:

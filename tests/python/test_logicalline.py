@@ -219,14 +219,55 @@ def test_a_subclass_that_overrides_nothing_behaves_as_its_base() -> None:
     assert line.fTypeEquivs == [(b"x", b":g:")]
 
 
-@pytest.mark.filterwarnings("ignore:nanobind. attempted to access an uninitialized instance:RuntimeWarning")
 def test_an_uninitialised_line_is_a_type_error() -> None:
     class Line(CLogicalLine):
         def __init__(self) -> None:
             pass
 
+    line = Line()
+    for use in (
+        lambda: analyzer().AnalyzeSingleLogical(line, False),
+        lambda: line.fTypeEquivs,
+        lambda: setattr(line, "fArgTypeEquivs", None),
+        lambda: line.fToks,
+        lambda: line.ClearDerivedInfo(),
+    ):
+        with pytest.raises(TypeError):
+            use()
+
+
+def test_what_its_constructor_does_not_take_is_a_type_error() -> None:
     with pytest.raises(TypeError):
-        analyzer().AnalyzeSingleLogical(Line(), False)
+        CLogicalLine(kind="unknown")  # type: ignore[call-arg]
+    with pytest.raises(TypeError):
+        CLogicalLine("unknown", (), (), None, False, 0, None, None)  # type: ignore[call-arg]
+    with pytest.raises(TypeError, match="Expected str, got int"):
+        CLogicalLine(3)  # type: ignore[arg-type]
+
+
+def test_a_record_list_cannot_be_deleted() -> None:
+    line = CLogicalLine()
+    with pytest.raises(AttributeError):
+        del line.fTypeEquivs
+    with pytest.raises(AttributeError):
+        del line.fArgTypeEquivs
+
+
+def test_a_line_keeps_its_source_when_the_others_are_gone() -> None:
+    untouched, written_to = GetLogicalsFromText("first = 'some text'\nsecond = first.name\nthird\n", (3, 12))[:2]
+    analyzer().AnalyzeSingleLogical(untouched, False)
+    written_to.AppendTypeEquiv(b"host", b":g:")
+    written_to.AppendTypeEquiv(b"moves", b":g:")
+    untouched.AppendTypeEquiv(b"moves", b":g:")  # out of turn
+    assert untouched.fToks == ("first", "=", "'some text'")
+    assert untouched.fPositions == ((0, 0), (0, 6), (0, 8))
+    assert untouched.fTypeEquivs == [(b"first", b":s:"), (b"first", b":l:str: 'some text'"), (b"moves", b":g:")]
+    del untouched
+    assert written_to.fToks == ("second", "=", "first", ".", "name")
+    assert written_to.fTypeEquivs == [(b"host", b":g:"), (b"moves", b":g:")]
+    assert analyzer().AnalyzeSingleLogical(written_to, False) is None
+    assert written_to.fTypeEquivs is not None
+    assert written_to.fTypeEquivs[:2] == [(b"second", b":s:"), (b"second", b"first.name")]
 
 
 def test_text_is_cut_alike_from_str_and_bytes() -> None:

@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import logging
+from collections.abc import Callable
 from types import TracebackType
 
 import pytest
@@ -55,6 +56,54 @@ def test_a_second_call_returns_none_even_after_an_error() -> None:
     assert (error.lineno, error.offset) == (1, 5)
     assert (error.filename, error.text) == ("<string>", "x = = y")
     assert analyzer().AnalyzeSingleLogical(line, False) is None
+
+
+@pytest.mark.parametrize(
+    "analyze",
+    [
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical(line, True),
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical(line, True, False),
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical(line, 1, []),
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical(line, in_async_def=True),
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical(first_in_def=0, in_async_def="yes", logical=line),
+        lambda analyzer, line: CPGenAnalyzerImpl.AnalyzeSingleLogical(analyzer, line, True),
+    ],
+)
+def test_a_call_may_name_its_arguments_and_give_any_truth(analyze: Callable[..., SyntaxError | None]) -> None:
+    line = line_of("await x")
+    assert analyze(analyzer((3, 6)), line) is None
+    assert line.fTypeEquivs == [(b"x", kGetPrefix)]
+
+
+@pytest.mark.parametrize(
+    "analyze",
+    [
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical(),
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical(line),
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical(line, True, False, False),
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical(line, True, logical=line),
+        lambda analyzer, line: analyzer.AnalyzeSingleLogical("await x", True),
+        lambda analyzer, line: CPGenAnalyzerImpl.AnalyzeSingleLogical(line, line, True),
+    ],
+)
+def test_a_call_with_other_arguments_is_a_type_error(analyze: Callable[..., object]) -> None:
+    line = line_of("await x")
+    with pytest.raises(TypeError):
+        analyze(analyzer((3, 6)), line)
+    assert not line.fParsed
+
+
+def test_a_truth_that_cannot_be_told_is_raised() -> None:
+    class Neither:
+        def __bool__(self) -> bool:
+            raise LookupError("neither")
+
+    line = line_of("x")
+    with pytest.raises(LookupError, match="neither"):
+        analyzer().AnalyzeSingleLogical(line, Neither())  # type: ignore[arg-type]
+    with pytest.raises(LookupError, match="neither"):
+        analyzer().AnalyzeSingleLogical(line, False, Neither())  # type: ignore[arg-type]
+    assert not line.fParsed
 
 
 def test_a_parsed_line_is_left_alone() -> None:

@@ -538,6 +538,25 @@ TEST(LogicalLines, ShowARow) {
   EXPECT_EQ(TextFromTokens(line), "b = [1,\n  2]");
 }
 
+TEST(LogicalLines, HoldTheirSourceOrLeaveItToOthers) {
+  const Cut cut("a");
+  const Ref<SourceText> other = SourceText::Copy("b");
+  LogicalLine line;
+  SetFromRow(line, *cut.source, cut.rows[0]);
+  EXPECT_TRUE(cut.source->IsUnique());
+  {
+    LogicalLine holding;
+    SetFromRow(holding, cut.source, cut.rows[0]);
+    EXPECT_FALSE(cut.source->IsUnique());
+    EXPECT_EQ(holding.HoldSource(other).get(), cut.source.get());
+    EXPECT_EQ(holding.source, other.get());
+    EXPECT_FALSE(other->IsUnique());
+  }
+  EXPECT_TRUE(cut.source->IsUnique());
+  EXPECT_TRUE(other->IsUnique());
+  EXPECT_EQ(line.source, cut.source.get());
+}
+
 TEST(LogicalLines, PositionsOfTheHostReplaceThoseOfTheSource) {
   const Cut cut("a b\nc");
   LogicalLine line;
