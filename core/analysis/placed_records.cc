@@ -53,12 +53,13 @@ void PlacedRecords::Add(size_t row, const Record& record, bool is_parameter) {
   SetPlace(file_->rows()[row], name, placed);
   const RecordInWords words = DecodeInfo(record.info(), buffer_);
   placed.kind = words.kind;
-  placed.detail = words.detail.data() == buffer_.data() ? texts_.Copy(words.detail) : words.detail;
+  Text detail = words.detail;  // in two registers: a copy as one piece would wait for both halves to be written
+  if (detail.data() == buffer_.data()) detail = texts_.Copy(detail);
   if (in_signature_ && placed.kind == RecordKind::kHint) placed.is_parameter = true;
   if (name.starts_with(kArgPrefix)) [[unlikely]]
     name = ShownArgument(name);
   placed.name = Shown(Cut(name));
-  placed.detail = Shown(Cut(placed.detail));
+  placed.detail = Shown(Cut(detail));
 }
 
 void PlacedRecords::SetPlace(const LineRow& row, Text name, PlacedRecord& placed) {

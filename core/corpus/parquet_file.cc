@@ -107,29 +107,38 @@ class RunLengths {
   template <class NumberAt>
   void Append(size_t count, const NumberAt& number_at) {
     size_t packed = 0;  // the first one that is not written
-    for (size_t i = 0; i < count;) {
-      const uint32_t number = number_at(i);
-      size_t end = i + 1;
-      while (end < count && number_at(end) == number) ++end;
-      const size_t to_full_group = (8 - (i - packed) % 8) % 8;
-      if (end - i >= to_full_group + kFewestRepeated) {
-        AppendPacked(packed, i + to_full_group, number_at);
-        AppendVarint((end - i - to_full_group) << 1);
-        AppendLow(number);
-        packed = end;
+    for (size_t at = 0; at + kFewestRepeated <= count;) {
+      const uint32_t number = number_at(at);
+      const auto is_repeated = [&](size_t i) { return number_at(i) == number; };
+      size_t end = at + kFewestRepeated;
+      // What is not sorted differs at the end already.
+      if (!is_repeated(end - 1) || !AreAll(at + 1, end - 1, is_repeated)) {
+        at += kGroup;
+        continue;
       }
-      i = end;
+      while (end < count && is_repeated(end)) ++end;
+      AppendPacked(packed, at, number_at);
+      AppendVarint((end - at) << 1);
+      AppendLow(number);
+      packed = at = end;
     }
     AppendPacked(packed, count, number_at);
   }
 
  private:
+  static constexpr size_t kGroup = 8;
   static constexpr size_t kFewestRepeated = 16;
+
+  template <class Test>
+  static bool AreAll(size_t begin, size_t end, const Test& test) {
+    while (begin < end && test(begin)) ++begin;
+    return begin == end;
+  }
 
   template <class NumberAt>
   void AppendPacked(size_t begin, size_t end, const NumberAt& number_at) {
     if (begin == end) return;
-    const size_t groups = (end - begin + 7) / 8;
+    const size_t groups = (end - begin + kGroup - 1) / kGroup;
     AppendVarint(groups << 1 | 1);
     const size_t at = out_.size();
     out_.resize(at + groups * bits_);  // in bytes, zeros

@@ -9,14 +9,15 @@ namespace quillet {
 namespace {
 
 constexpr uint32_t kNoPlace = UINT32_MAX;
+constexpr size_t kFetchedAhead = 16;
 
 // A text and its first bytes as a number, which nearly always decides.
 struct RankedText {
   uint64_t head;
   Text text;
-  uint32_t number;
+  size_t number;  // so wide that nothing of it is left out when it is moved
 
-  RankedText(Text of, uint32_t its_number) : head(0), text(of), number(its_number) {
+  RankedText(Text of, size_t its_number) : head(0), text(of), number(its_number) {
     for (size_t i = 0; i < 8; ++i) head = head << 8 | (i < of.size() ? static_cast<unsigned char>(of[i]) : 0u);
   }
   friend bool operator<(const RankedText& a, const RankedText& b) {
@@ -79,7 +80,7 @@ void SortedRun::Sort() {
     const uint8_t* bytes;
     size_t bit;
   };
-  std::vector<BitSource> bits;
+  std::vector<BitSource> bits;  // in the order of their places
   std::vector<const uint32_t*> words;
   std::vector<const uint64_t*> long_words;
   for (size_t i = 0; i < schema_.size(); ++i) {
@@ -94,12 +95,19 @@ void SortedRun::Sort() {
       bits.push_back({static_cast<const uint8_t*>(buffers_[i].validity->data()), layout_[i].validity});
   }
   const size_t bit_words = row_words_ - words.size() - 2 * long_words.size();
-  rows_.resize(size * row_words_);
+  rows_ = std::make_unique_for_overwrite<uint32_t[]>(size * row_words_);
   for (size_t row = 0; row < size; ++row) {
-    uint32_t* out = rows_.data() + next[keys[row]]++ * row_words_;
-    for (const BitSource& source : bits)
-      out[source.bit / 32] |= (source.bytes[row / 8] >> row % 8 & 1u) << source.bit % 32;
-    out += bit_words;
+    // Rows go all over the table: where the next ones go is fetched by then.
+    if (row + kFetchedAhead < size)
+      __builtin_prefetch(rows_.get() + next[keys[row + kFetchedAhead]] * row_words_, /*to be written*/ 1);
+    uint32_t* out = rows_.get() + next[keys[row]]++ * row_words_;
+    const BitSource* source = bits.data();
+    for (size_t end = 32; end <= 32 * bit_words; end += 32) {
+      uint32_t word = 0;
+      for (; source < bits.data() + bits.size() && source->bit < end; ++source)
+        word |= (source->bytes[row / 8] >> row % 8 & 1u) << source->bit % 32;
+      *out++ = word;
+    }
     for (const uint32_t* const from : words) *out++ = from[row];
     for (const uint64_t* const from : long_words) {
       std::memcpy(out, from + row, sizeof *from);
@@ -164,7 +172,7 @@ ParquetColumn SortedRun::Gather(size_t column, size_t begin, size_t end, Gathere
 template <class Take>
 size_t SortedRun::ForEachValue(Place place, size_t begin, size_t end, const Take& take) const {
   const size_t step = row_words_;
-  const uint32_t* at = rows_.data() + begin * step + place.at;
+  const uint32_t* at = rows_.get() + begin * step + place.at;
   if (place.validity == kNone) {
     for (size_t i = 0; i < end - begin; ++i, at += step) take(i, at);
     return end - begin;
@@ -177,8 +185,7 @@ size_t SortedRun::ForEachValue(Place place, size_t begin, size_t end, const Take
 }
 
 void SortedRun::GatherBits(size_t bit, size_t begin, size_t end, Bits& bits) const {
-  bits = Bits();
-  for (size_t row = begin; row < end; ++row) bits.Add(BitAt(row, bit));
+  bits.Assign(end - begin, [&](size_t i) { return BitAt(begin + i, bit); });
 }
 
 void SortedRun::GatherTexts(size_t column, size_t begin, size_t end, Gathered& gathered) {

@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -58,7 +59,7 @@ class SortedRun {
   std::vector<bool> is_missing_;  // in all rows
   size_t row_words_ = 0;
   // In order. A row is together, since rows come from all over the table.
-  std::vector<uint32_t> rows_;
+  std::unique_ptr<uint32_t[]> rows_;
   std::vector<uint32_t> places_;  // of texts in the dictionary that is being made
 };
 

@@ -2,6 +2,8 @@
 // until the reader has released them all.
 #pragma once
 
+#include <algorithm>
+#include <bit>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -36,6 +38,20 @@ class Bits {
     size_ += count / 8 * 8;
     false_count_ += value ? 0 : count / 8 * 8;
     for (count %= 8; count > 0; --count) Add(value);
+  }
+  // So many, the ith of which is bit_at(i).
+  template <class BitAt>
+  void Assign(size_t size, const BitAt& bit_at) {
+    bytes_.resize((size + 7) / 8);
+    size_ = size;
+    false_count_ = size;
+    for (size_t at = 0; at < size; at += 8) {
+      const size_t count = std::min<size_t>(size - at, 8);
+      uint32_t byte = 0;
+      for (size_t i = 0; i < count; ++i) byte |= static_cast<uint32_t>(bit_at(at + i)) << i;
+      bytes_[at / 8] = static_cast<uint8_t>(byte);
+      false_count_ -= static_cast<size_t>(std::popcount(byte));
+    }
   }
   void Truncate(size_t size);
   const void* data() const { return bytes_.data(); }

@@ -131,10 +131,10 @@ class CPGenParserImpl {
   // as removed, without a copy that says so.
   struct TokenRun {
     TokenSpan toks;
-    int32_t base = 0;
+    int64_t base = 0;  // as wide as what it is copied with
 
     int64_t count() const { return static_cast<int64_t>(toks.size()); }
-    int32_t IndexOf(int64_t i) const { return base + static_cast<int32_t>(i); }
+    int32_t IndexOf(int64_t i) const { return static_cast<int32_t>(base + i); }
   };
   // How the engine takes a token, by code; one table where async and await are names, one where
   // they are keywords. kNoLabel: a token that needs a closer look.
