@@ -276,6 +276,33 @@ def test_lines_of_a_cut_may_be_let_go_of_one_by_one() -> None:
     assert records == sum(len(line.records) for line in analyze(SOURCE, version=(3, 8), exact=True).lines) > 0
 
 
+def test_what_a_cut_gives_is_told_apart_by_its_hash() -> None:
+    cut = _host.CutSource(b"a\nb\n", (3, 8, 0))
+    hashes = [hash(place) for place in cut]
+    cut = _host.CutSource(b"a\nb\n", (3, 8, 0))
+    kept = list(cut)
+    assert hash(kept[0][1:]) != hash(kept[1][1:])
+    assert len(set(hashes)) == 2
+
+
+def test_a_cut_serves_code_that_runs_when_its_lines_go() -> None:
+    cut = _host.CutSource(b"a\nb\nc\nd\n", (3, 8, 0))
+    taken = []
+
+    class Nosy:
+        def __del__(self) -> None:
+            taken.append(next(cut))
+
+    next(cut)[0].fTypeEquivs = [Nosy()]
+    logical, first_line, *_ = next(cut)
+    assert (logical.fToks, first_line) == (("b",), 1)
+    [(logical, first_line, *_)] = taken
+    assert (logical.fToks, first_line) == (("c",), 2)
+    kept = next(cut)
+    assert next(cut, None) is None
+    assert (kept[0].fToks, kept[1:]) == (("d",), (3, 3, 0, False, False))
+
+
 def test_what_cannot_be_cut_is_a_type_error() -> None:
     with pytest.raises(TypeError):
         _host.CutSource(SOURCE, (3, 8, 0))  # type: ignore[arg-type]
