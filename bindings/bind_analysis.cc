@@ -69,6 +69,7 @@ class Retained {
   Retained(CPGenAnalyzerImpl& analyzer, SourceText* source)
       : hint_pool_(analyzer.type_hint_walker().hint_parser().factory().pool()) {
     PinSource(analyzer.logical_parser().factory().pool(), source);
+    FreeRetiredArrays(hint_pool_);
   }
   ~Retained() { RehomeTexts(hint_pool_); }
   Retained(const Retained&) = delete;

@@ -169,6 +169,7 @@ void NodeRef::SetChildren(nb::handle list) {
     if (!item.is_none()) nodes[i] = CheckedRef(item, NodeKind::kCNode).node();
   }
   const Operation operation;
+  FreeRetiredArrays(*pool_);
   auto replaced = registry.TakeList(self);
   std::copy(nodes.begin(), nodes.end(), pool_->ResizeChildren(self, static_cast<uint32_t>(count)));
   registry.KeepList(self, source_, nb::borrow(list), std::move(nodes));
@@ -245,7 +246,12 @@ void RehomeTexts(NodePool& pool) {
   NodeRegistry::Get().RehomeTexts(pool);
 }
 
+void FreeRetiredArrays(NodePool& pool) {
+  if (!IsAnotherUnderWay()) pool.FreeRetiredArrays();
+}
+
 void PinSource(NodePool& pool, SourceText* source) {
+  FreeRetiredArrays(pool);
   if (pool.host_views == 0 && !pool.MayHoldStrays()) [[likely]]
     return;
   NodeRegistry::Get().TidyBeforeParse(&pool);

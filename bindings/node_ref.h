@@ -135,6 +135,9 @@ CArgInfo ArgOf(nb::handle object);
 UsedArgList UsedArgsOf(nb::handle list);
 ArgList ArgListOf(nb::handle list);
 
+// At the start of an operation that may put arrays of children of the pool's nodes out of use: those that earlier
+// operations did can go.
+void FreeRetiredArrays(NodePool& pool);
 // At the start of an operation that makes nodes of the pool from a source.
 void PinSource(NodePool& pool, SourceText* source);
 

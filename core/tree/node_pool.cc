@@ -175,7 +175,7 @@ void NodePool::ReclaimNow(CNode* root) {
   if (pending_.capacity() > kKeptPending) std::vector<CNode*>().swap(pending_);
 }
 
-void NodePool::FreeRetiredArrays() {
+void NodePool::FreeAllRetiredArrays() {
   for (const auto& [array, capacity] : retired_arrays_) FreeArray(array, capacity);
   retired_arrays_.clear();
 }

@@ -126,6 +126,11 @@ class NodePool : public RefCounted {
   // host's change or discard puts out of use then stays as it is until the operation is over. Null: there
   // is no host.
   static inline bool (*is_core_waiting)() = nullptr;
+  // Frees those arrays. To be called while nothing works with nodes of the pool.
+  void FreeRetiredArrays() {
+    if (!retired_arrays_.empty()) [[unlikely]]
+      FreeAllRetiredArrays();
+  }
 
   size_t node_count() const { return node_count_; }
 
@@ -146,7 +151,7 @@ class NodePool : public RefCounted {
   void ReclaimNow(CNode* root);
   void ReclaimAllWaiting();
   void FreeArray(CNode** array, uint32_t capacity);
-  void FreeRetiredArrays();
+  void FreeAllRetiredArrays();
   void MarkNodesAtRest();
   void TakeBack(CNode* node);
   std::byte* NewNodeStorage();

@@ -235,6 +235,31 @@ def test_trees_that_nobody_gives_back_take_no_memory(
     assert held is None or held.GetChild(0).fText == "held"
 
 
+def analyse_list(analyzer: CPGenAnalyzerImpl) -> None:
+    assert analyzer.AnalyzeSingleLogical(line_of(f"x = [{'a, ' * 1000}]"), False) is None
+
+
+def analyse_hint(analyzer: CPGenAnalyzerImpl) -> None:
+    assert analyzer.AnalyzeSingleLogical(line_of(f"x = y  # type: Tuple[{'a, ' * 1000}b]"), False) is None
+
+
+def give_back(analyzer: CPGenAnalyzerImpl) -> None:
+    parser = analyzer._fLogicalParser
+    parser.DiscardNode(parser.ParseToNode(line_of(f"x = [{'a, ' * 1000}]"), False))
+
+
+@pytest.mark.skipif(not STATM.exists(), reason="the system does not tell the memory of a process")
+@pytest.mark.parametrize("once", [analyse_list, analyse_hint, give_back])
+def test_long_lists_of_children_go_with_their_statement(once: Callable[[CPGenAnalyzerImpl], None]) -> None:
+    analyzer = CPGenAnalyzerImpl((3, 12))
+    for _ in range(100):
+        once(analyzer)
+    before = resident_bytes()
+    for _ in range(1000):
+        once(analyzer)
+    assert resident_bytes() - before < 3_000_000
+
+
 def test_what_a_wrapper_reaches_is_no_stray() -> None:
     analyzer = CPGenAnalyzerImpl((3, 12))
     line = line_of("first = second(third, fourth)[fifth] + sixth")
