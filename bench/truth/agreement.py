@@ -4,6 +4,10 @@ A name counts where both answer. They agree where the best place of the workspac
 as well. A place outside the project (typeshed's stubs, which each carries a copy of) is compared by its module and by
 the name that stands there. What is called certain and is none of the server's places is counted apart.
 
+Where two servers are asked, names that both answer are counted once more: those on which the two agree, and of the
+others with which of them the workspace is. No answer agrees with both where they have no place in common, so the
+rest of a table is to be read against what they leave room for.
+
 Where a server does not know an attribute it may name the function of the call around it. So of its places for an
 attribute those count that are of a module or have the attribute's name.
 
@@ -83,6 +87,27 @@ def AddTo(commands: argparse._SubParsersAction[argparse.ArgumentParser]) -> None
     parser.set_defaults(run=Run)
 
 
+def HoldAgainstBoth(
+    title: str, names: list[Name], own: list[set[str]], peers: dict[str, list[set[str]]], failures: bool
+) -> None:
+    """Counts where two servers agree with each other, and what the workspace says there; of the rest, whose side it
+    takes. Each list has what identifies the places of an answer: the best one of the workspace's.
+    """
+    (first, firsts), (second, seconds) = peers.items()
+    tally = Tally(f"{title}, held against {first} and {second} where both answer", failures=failures)
+    for name, best, one, other in zip(names, own, firsts, seconds, strict=True):
+        if not (best and one and other):
+            continue
+        key = f"{name.place.path}:{name.place.line}:{name.place.column} {name.text}"
+        if one & other:
+            tally.Add(f"{name.group} on which they agree", key, bool(best & one & other), one & other, best)
+            continue
+        sides = [peer for peer, answer in ((first, one), (second, other)) if best & answer]
+        tally.Note(f"{name.group} on which they do not")
+        tally.Note(f"{name.group} on which they do not, {' '.join(sides) or 'neither'} with the workspace")
+    tally.Report()
+
+
 def Run(options: argparse.Namespace) -> int:
     status = 0
     for project in options.projects:
@@ -91,12 +116,16 @@ def Run(options: argparse.Namespace) -> int:
         engine = ENGINES[options.engine]([folder])
         given = [engine.Definitions(name.place) for name in names]
         identity = Identity(folder)
+        best = [{identity.Of(Answer(own)[0])} if own else set() for own in given]
+        by_peer: dict[str, list[set[str]]] = {}
         for peer in options.peers:
             answers = PeerAnswers(peer, folder, names, options.answers)
             tally = Tally(f"Definitions in {folder.name}, held against {peer}", _TARGETS, failures=options.failures)
+            by_peer[peer] = []
             for name, own, answer in zip(names, given, answers, strict=True):
                 other = [each for each in answer if identity.IsOf(each, name)]
                 expected = {identity.Of(each) for each in other}
+                by_peer[peer].append(expected)
                 shown = [f"{identity.Of(each)} ({each.certainty})" for each in own]
                 key = f"{Path(name.place.path).relative_to(folder)}:{name.place.line}:{name.place.column} {name.text}"
                 if own and other:
@@ -112,4 +141,6 @@ def Run(options: argparse.Namespace) -> int:
                 else:
                     tally.Note(f"{name.group} that neither answers")
             status |= tally.Report()
+        if len(by_peer) == 2:
+            HoldAgainstBoth(f"Definitions in {folder.name}", names, best, by_peer, options.failures)
     return status
