@@ -1,7 +1,9 @@
 """Renames of random symbols of a real project.
 
-For each symbol: what is written by the edits compiles, and the edits are just the references that are certain. All
-renames can also be done one after the other in a copy of the project, whose own tests then have to pass (`--tests`).
+For each symbol: what is written by the edits compiles, and the edits are just the references that are certain, and
+those of what has to keep one name with it: a method that overrides it or is overridden, or what a reference means as
+well. Of such an edit all that is certain has to be edited, too, and how many there are is told. All renames can also be
+done one after the other in a copy of the project, whose own tests then have to pass (`--tests`).
 """
 
 from __future__ import annotations
@@ -101,13 +103,26 @@ def _Check(tally: Tally, engine: Engine, folder: Path, symbol: Name) -> None:
     tally.Note("edits", len(changes))
     problems = [f"{path}: {problem}" for path, text in Apply(changes).items() if (problem := Compiles(text))]
     tally.Add("the result compiles", key, not problems, "", problems)
-    references = {each.place for each in engine.References(symbol.place) if each.certainty == "certain"}
     edited = {Place(each.path, each.line, each.column) for each in changes}
-    missing = [f"not {place}" for place in references - edited] + [f"also {place}" for place in edited - references]
+    references = _Certain(engine, symbol.place)
+    missing = [f"not {place}" for place in references - edited]
+    # What goes along has references of its own, none of which is left.
+    more = edited - references
+    tally.Note("edits of what goes along, such as overrides", len(more))
+    while more:
+        place = min(more)
+        its = _Certain(engine, place)
+        missing += [f"not {other}, of {place}" for other in its - edited]
+        missing += [f"also {place}"] if place not in its else []
+        more -= its | {place}
     tally.Add("just the certain references", key, not missing, "", missing)
     wrong = [each for each in changes if _Old(each) != symbol.text]
     if wrong:
         tally.Fault("edits of what is another name", key, wrong)
+
+
+def _Certain(engine: Engine, place: Place) -> set[Place]:
+    return {each.place for each in engine.References(place) if each.certainty == "certain"}
 
 
 def _Old(change: Change) -> str:

@@ -42,6 +42,15 @@ Workspace::Impl::Impl(Settings given)
       defined(files),
       inference(files, modules) {
   inference.set_callers(this);
+  for (const std::string& folder : settings.libraries)
+    if ((folder.ends_with("/site-packages") || folder.ends_with("/dist-packages")) && IsBelowRoot(folder))
+      package_folders_.push_back(folder);
+}
+
+bool Workspace::Impl::IsBelowRoot(const std::string& path) const {
+  return std::ranges::any_of(settings.roots, [&](const std::string& root) {
+    return path.starts_with(root) && (path.size() == root.size() || root.ends_with('/') || path[root.size()] == '/');
+  });
 }
 
 void Workspace::Impl::Forget() {
@@ -118,9 +127,11 @@ Workspace::Impl::Visit Workspace::Impl::VisitAll::At(size_t i) {
 
 bool Workspace::Impl::IsProject(FileId file) {
   const std::string& path = files.PathOf(file);
-  return std::ranges::any_of(settings.roots, [&](const std::string& root) {
-    return path.starts_with(root) && (path.size() == root.size() || root.ends_with('/') || path[root.size()] == '/');
-  });
+  // An environment's folder of packages is none of the program's where it lies in a root.
+  const auto is_in = [&](const std::string& folder) {
+    return path.size() > folder.size() && path.starts_with(folder) && path[folder.size()] == '/';
+  };
+  return IsBelowRoot(path) && std::ranges::none_of(package_folders_, is_in);
 }
 
 // The calls of a function by its name, in the files that hold it: the first of them, so many.

@@ -1,4 +1,4 @@
-// Uses of a name, everywhere, and what renaming it changes.
+// Uses of a name, everywhere.
 #include <algorithm>
 #include <array>
 #include <optional>
@@ -44,8 +44,10 @@ bool Workspace::Impl::Meets(const Entities& use, const std::vector<Entity>& targ
       }
       if (entity.kind != Entity::kMember || target.kind != Entity::kMember || entity.b != target.b) continue;
       if (!inference.IsSubclass(entity.a, target.a) && !inference.IsSubclass(target.a, entity.a)) continue;
-      // What methods of both classes give their instances is one attribute; what a class defines anew is another.
+      // What methods of both classes give their instances is one attribute; what a class defines anew is another, and
+      // so is a private name, which is of the class that it stands in.
       const Text name = inference.NameOfNumber(entity.b);
+      if (IsPrivateName(name)) continue;
       const auto is_written = [&](ClassId cls) {
         const ClassInfo& info = inference.MembersOf(cls);
         return !info.symbols.contains(name) && info.self_attributes.contains(name);
@@ -56,8 +58,10 @@ bool Workspace::Impl::Meets(const Entities& use, const std::vector<Entity>& targ
   return has_met;
 }
 
-// Whether all is known of what an attribute is taken from: what has no such attribute then is not meant.
-bool Workspace::Impl::IsReceiverKnown(const SourceFile& file, const Occurrence& occurrence) {
+// Whether all is known of what an attribute is taken from: what has no such attribute then is not meant, unless classes
+// below have it. `classes` gets those of the project that lack it.
+bool Workspace::Impl::IsReceiverKnown(const SourceFile& file, const Occurrence& occurrence,
+                                      std::vector<ClassId>* classes) {
   const ExprId named = file.syntax.NamedAt(occurrence.begin);
   if (named == kNoExpr || file.syntax[named].kind != ExprKind::kAttribute) return false;
   const Value receiver = inference.ValueOf(file.id, file.syntax.ChildOf(named, 0));
@@ -67,6 +71,7 @@ bool Workspace::Impl::IsReceiverKnown(const SourceFile& file, const Occurrence& 
     const ClassId cls = t.kind == TypeKind::kClass ? t.a : inference.ClassOfType(type);
     if (cls == kNoId || inference.InfoOf(cls).open_from != SIZE_MAX || inference.FindMember(cls, "__getattr__"))
       return false;
+    if (classes != nullptr && IsProject(inference.InfoOf(cls).file)) classes->push_back(cls);
   }
   return true;
 }
@@ -144,12 +149,21 @@ void Workspace::Impl::LeaveOutOtherImports(std::vector<FileId>& candidates, Text
   candidates.resize(kept);
 }
 
-std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, uint32_t index, bool everywhere) {
+std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, uint32_t index, bool everywhere,
+                                                        Family* family) {
   std::vector<Hit> hits;
   const Occurrence occurrence = file.bindings.occurrences[index];
   const FileId own = file.id;
   const std::string name(file.bindings.TextOf(occurrence));
-  Entities wanted = Meant(file, index);
+  const auto find_wanted = [&] {
+    Entities found = Meant(*Get(own), index);
+    if (found.found.empty()) return found;
+    AddOtherSides(found);
+    if (family != nullptr)
+      for (const KeptEntity& kept : family->members) AddNew(found.found, EntityOf(kept, name));
+    return found;
+  };
+  Entities wanted = find_wanted();
   if (wanted.found.empty()) {
     // An attribute of what is not known: every one of its name.
     if (!occurrence.is_attribute) return hits;
@@ -159,7 +173,6 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
     }
   }
   const bool is_by_name = wanted.found.empty();
-  AddOtherSides(wanted);
   bool is_local = !is_by_name;
   bool has_member = is_by_name;
   for (const Entity& entity : wanted.found) {
@@ -202,14 +215,16 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
     location.role = location.kind = "module";
     if (location.file != kNoFile) hits.push_back({location, location.file, kNoIndex});
   }
-  // Strings in `__slots__`, which say the attribute.
+  // Strings that say the attribute: in `__slots__`, and in the call that makes a class.
   for (const Entity& entity : wanted.found) {
     if (entity.kind != Entity::kMember) continue;
     const ClassInfo& info = inference.MembersOf(entity.a);
-    const SourceFile* source = info.symbols.contains("__slots__") ? Get(info.file) : nullptr;
+    const bool has_slots = info.symbols.contains("__slots__");
+    const SourceFile* source = has_slots || info.call != kNoExpr ? Get(info.file) : nullptr;
     if (source == nullptr || (!everywhere && info.file != file.id)) continue;
-    for (const MadeField& slot : inference.SlotsOf(*source, info.stmt)) {
-      if (slot.name != name) continue;
+    for (const MadeField& slot : has_slots ? inference.SlotsOf(*source, info.stmt) : info.fields) {
+      const bool is_spelled = source->text().substr(slot.offset, name.size()) == Text(name);
+      if (slot.name != name || !is_spelled || source->OccurrenceBeginningAt(slot.offset) != kNoIndex) continue;
       Location location;
       location.file = source->id;
       location.begin = slot.offset;
@@ -226,8 +241,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
     const FileId id = candidates[next];
     if (IsMuchRemembered()) {
       ForgetFound();
-      wanted = Meant(*Get(own), index);  // classes have other numbers now
-      AddOtherSides(wanted);
+      wanted = find_wanted();  // classes have other numbers now
     }
     const Visit visit = visits.At(next);
     const SourceFile* source = visit.file;
@@ -264,19 +278,34 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
           certainty = known->second.certainty;
         } else {
           Entities use = inference.EntitiesOf(*source, i);
+          const size_t count = use.found.size();
           use.found.push_back({Entity::kVariable, id, variable});
           meets = Meets(use, wanted.found, certainty);
+          use.found.resize(count);
+          if (meets && family != nullptr) AddBeside(*source, i, use, wanted.found, *family);
           variables.emplace(variable, Known{meets, certainty});
         }
       } else {
         const Entities use = inference.EntitiesOf(*source, i);
         meets = Meets(use, wanted.found, certainty);
-        if (!meets && use.found.empty() && has_member && !IsReceiverKnown(*source, other) &&
-            (other.is_attribute || other.role == NameRole::kKeyword)) {
-          if (other.is_attribute) {
-            Location location = AtOccurrence(*source, i, Certainty::kByName);
-            unknown.push_back({location, id, i});
+        if (meets && family != nullptr) AddBeside(*source, i, use, wanted.found, *family);
+        if (!meets && use.found.empty() && has_member && other.is_attribute) {
+          std::vector<ClassId> without;
+          if (!IsReceiverKnown(*source, other, &without)) {
+            unknown.push_back({AtOccurrence(*source, i, Certainty::kByName), id, i});
+            continue;
           }
+          // `self.total()` in a class that leaves it to those below.
+          std::erase_if(without, [&](ClassId cls) {
+            return std::ranges::none_of(wanted.found, [&](const Entity& entity) {
+              return entity.kind == Entity::kMember && inference.IsSubclass(entity.a, cls);
+            });
+          });
+          if (without.empty()) continue;
+          hits.push_back({AtOccurrence(*source, i, Certainty::kLikely), id, i, true});
+          if (family == nullptr) continue;
+          for (const ClassId cls : without)
+            if (const auto kept = KeptOf({Entity::kMember, cls, 0})) AddNew(family->above, *kept);
           continue;
         }
       }
@@ -327,30 +356,6 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
   return hits;
 }
 
-// A call of a parameter's function that is given keywords which its place does not spell, such as `f(**options)`.
-Binding Workspace::Impl::CallWithUnseenKeywords(const Entity& entity) {
-  const SourceFile* owner = entity.kind == Entity::kVariable ? Get(entity.a) : nullptr;
-  if (owner == nullptr || (owner->bindings.symbols[entity.b].uses & NameSymbol::kParameter) == 0) return {};
-  const FunctionId function = inference.FunctionOfScope(*owner, owner->bindings.symbols[entity.b].scope);
-  if (function == kNoId) return {};
-  const FunctionInfo info = inference.function(function);
-  const auto parameters = inference.ParametersOf(info);
-  const Text name = owner->bindings.texts[owner->bindings.symbols[entity.b].name];
-  for (size_t i = 0; i < parameters.size(); ++i) {
-    const Expr& parameter = owner->syntax[parameters[i]];
-    if (owner->syntax.NameOf(parameters[i]) != name) continue;
-    const bool is_receiver = i == 0 && info.cls != kNoId && (info.flags & kIsStatic) == 0;
-    if (is_receiver || parameter.op != static_cast<uint8_t>(ParameterKind::kPlain)) return {};
-  }
-  for (const ExprPlace& call : CallsOf(info)) {
-    const SourceFile* file = Get(call.file);
-    if (file == nullptr || file->syntax[call.expr].kind != ExprKind::kCall) continue;
-    for (const ExprId argument : file->syntax.ChildrenOf(call.expr).subspan(1))
-      if (file->syntax[argument].kind == ExprKind::kDoubleStarred) return {call.file, file->syntax[argument].begin};
-  }
-  return {};
-}
-
 std::vector<Location> Workspace::References(FileId id, uint32_t offset, bool everywhere) {
   Impl& in = *impl_;
   if (everywhere) {
@@ -366,120 +371,6 @@ std::vector<Location> Workspace::References(FileId id, uint32_t offset, bool eve
   for (const Impl::Hit& hit : in.Uses(*file, index, everywhere)) found.push_back(hit.location);
   in.Sort(found);
   return found;
-}
-
-Rename Workspace::RenameTo(FileId id, uint32_t offset, Text name, bool only_certain) {
-  Impl& in = *impl_;
-  in.BeginAnew();
-  Rename rename;
-  const SourceFile* file = in.Get(id);
-  const uint32_t index = file == nullptr ? kNoIndex : in.OccurrenceAt(*file, offset);
-  if (index == kNoIndex) {
-    rename.problem = "there is no name here";
-    return rename;
-  }
-  const bool is_identifier = !name.empty() && CodeOfText(name) == tok::NAME;
-  if (!is_identifier) {
-    rename.problem = "'" + std::string(name) + "' is no name that code can use";
-    return rename;
-  }
-  const Occurrence occurrence = file->bindings.occurrences[index];
-  const std::string old_name(file->bindings.TextOf(occurrence));
-  Entities wanted = in.inference.EntitiesOf(*file, index);
-  in.AddOtherSides(wanted);
-  if (wanted.found.empty()) {
-    rename.problem = "nothing is known of what '" + old_name + "' stands for here";
-    return rename;
-  }
-  bool is_bound = false;
-  if (old_name.starts_with("__") && old_name.ends_with("__")) {
-    rename.problem = "'" + old_name + "' is a name that the language uses";
-    return rename;
-  }
-  for (const Entity& entity : wanted.found) {
-    if (entity.kind == Entity::kMember) {
-      // What a library calls by its name keeps it.
-      const std::vector<BaseClass> order = in.inference.InfoOf(entity.a).order;
-      for (const BaseClass& base : order) {
-        const ClassInfo& info = in.inference.MembersOf(base.cls);
-        if (in.IsProject(info.file) || !info.symbols.contains(old_name)) continue;
-        rename.problem = "'" + old_name + "' overrides what '" + in.inference.QualifiedName(base.cls) +
-                         "' defines outside of the project";
-        return rename;
-      }
-    }
-    if (entity.kind == Entity::kModule) {
-      rename.problem = "'" + old_name + "' is a module: rename its file";
-      return rename;
-    }
-    for (const Binding& binding : in.inference.BindingsOf(entity)) {
-      is_bound = true;
-      if (!in.IsProject(binding.file)) {
-        rename.problem = "'" + old_name + "' is defined outside of the project, in " + in.files.PathOf(binding.file);
-        return rename;
-      }
-    }
-  }
-  if (!is_bound) {
-    rename.problem = "nothing is known of what '" + old_name + "' stands for here";
-    return rename;
-  }
-  if (only_certain) {
-    for (const Entity& entity : wanted.found) {
-      const Binding call = in.CallWithUnseenKeywords(entity);
-      const SourceFile* source = call.file == kNoFile ? nullptr : in.Get(call.file);
-      if (source == nullptr) continue;
-      rename.problem = "'" + std::string(old_name) + "' may be given by '**' in " + source->path + ", at line " +
-                       std::to_string(source->PlaceOf(call.offset).line);
-      return rename;
-    }
-  }
-  std::vector<Impl::Hit> hits = in.Uses(*file, index, true);
-  std::optional<Impl::Visit> visit;  // of the file of the hits that follow each other
-  FileId visited = kNoFile;
-  for (const Impl::Hit& hit : hits) {
-    if (only_certain && hit.location.certainty != Certainty::kCertain) {
-      const SourceFile* source = hit.occurrence == kNoIndex ? nullptr : in.Get(hit.file);
-      // What is handed on by keyword fails without it.
-      if (source == nullptr || source->bindings.occurrences[hit.occurrence].role != NameRole::kKeyword) continue;
-      rename.problem = "'" + std::string(old_name) + "' may be given by keyword in " + source->path + ", at line " +
-                       std::to_string(source->PlaceOf(hit.location.begin).line);
-      rename.edits.clear();
-      return rename;
-    }
-    if (!in.IsProject(hit.file) || hit.location.role == "module") continue;
-    if (visited != hit.file) visit.emplace(in, hit.file);
-    visited = hit.file;
-    const SourceFile* source = visit->file;
-    const Text there(source->text().data() + hit.location.begin, hit.location.end - hit.location.begin);
-    if (there != old_name) continue;
-    // A name that the scope has already would be taken for this one.
-    if (hit.occurrence != kNoIndex && source->bindings.occurrences[hit.occurrence].has_symbol) {
-      const uint32_t scope = source->bindings.ScopeOf(source->bindings.occurrences[hit.occurrence]);
-      const uint32_t variable = source->bindings.VariableOf(source->bindings.occurrences[hit.occurrence]);
-      const uint32_t owner = source->bindings.symbols[variable].scope;
-      for (const uint32_t at : {scope, owner}) {
-        for (uint32_t symbol = source->bindings.scopes[at].first_symbol; symbol != kNoIndex;
-             symbol = source->bindings.symbols[symbol].next) {
-          if (source->bindings.texts[source->bindings.symbols[symbol].name] != name) continue;
-          const Position place = source->PlaceOf(hit.location.begin);
-          rename.problem = "'" + std::string(name) + "' means something else already in " + source->path +
-                           ", at line " + std::to_string(place.line);
-          rename.edits.clear();
-          return rename;
-        }
-      }
-    }
-    rename.edits.push_back({hit.file, hit.location.begin, hit.location.end, std::string(name)});
-  }
-  std::ranges::sort(rename.edits, [&](const TextEdit& a, const TextEdit& b) {
-    if (a.file != b.file) return in.files.PathOf(a.file) < in.files.PathOf(b.file);
-    return a.begin < b.begin;
-  });
-  const auto is_same = [](const TextEdit& a, const TextEdit& b) { return a.file == b.file && a.begin == b.begin; };
-  rename.edits.erase(std::unique(rename.edits.begin(), rename.edits.end(), is_same), rename.edits.end());
-  if (rename.edits.empty()) rename.problem = "nothing that is certain is to be renamed";
-  return rename;
 }
 
 }  // namespace quillet

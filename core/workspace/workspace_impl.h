@@ -1,9 +1,11 @@
 // The parts that questions share: the program, and how its answers are put together.
 #pragma once
 
+#include <algorithm>
 #include <chrono>
 #include <functional>
 #include <map>
+#include <optional>
 #include <set>
 #include <span>
 #include <string>
@@ -83,7 +85,7 @@ class Workspace::Impl final : public CallerSource {
     placed_source_of = kNoFile;
     placed_source.clear();
   }
-  // Whether a file lies below a root of the project.
+  // Whether a file lies below a root of the project, and is not of an environment there.
   bool IsProject(FileId file);
 
   // ---- locations.cc ----
@@ -110,18 +112,54 @@ class Workspace::Impl final : public CallerSource {
     Location location;
     FileId file;
     uint32_t occurrence;
+    bool is_below = false;  // taken from what has no such attribute, while a class below it has the one asked for
   };
-  std::vector<Hit> Uses(const SourceFile& file, uint32_t occurrence, bool everywhere);
+  // What an entity is, by its place: numbers of classes are others once what was found is forgotten.
+  struct KeptEntity {
+    Entity::Kind kind = Entity::kVariable;
+    FileId file = kNoFile;
+    uint32_t at = kNoIndex;  // the symbol, or the statement of a member's class
+    friend auto operator<=>(const KeptEntity&, const KeptEntity&) = default;
+  };
+  // What keeps one name, so that a program goes on doing the same.
+  struct Family {
+    std::vector<KeptEntity> members;  // beside what the name asked about means itself
+    std::vector<KeptEntity> above;    // classes that lack the attribute, and use what those below have
+    // What a certain use of a member means as well, and the use: found by Uses.
+    struct Beside {
+      Entity entity;
+      std::optional<KeptEntity> kept;  // none for a class that a call makes, or for a module
+      FileId file;
+      uint32_t offset;
+    };
+    std::vector<Beside> beside;
+  };
+  std::vector<Hit> Uses(const SourceFile& file, uint32_t occurrence, bool everywhere, Family* family = nullptr);
   // What the name of an occurrence stands for, for its uses.
   Entities Meant(const SourceFile& file, uint32_t occurrence);
   // How a use's entities meet those asked for: nothing, or a certainty.
   bool Meets(const Entities& use, const std::vector<Entity>& targets, Certainty& certainty);
   bool IsCommonAttribute(Text name);
   void AddOtherSides(Entities& entities);
-  Binding CallWithUnseenKeywords(const Entity& entity);
-  bool IsReceiverKnown(const SourceFile& file, const Occurrence& occurrence);
+  void AddBeside(const SourceFile& file, uint32_t occurrence, const Entities& use, const std::vector<Entity>& wanted,
+                 Family& family);
+  std::optional<KeptEntity> KeptOf(const Entity& entity);
+  Entity EntityOf(const KeptEntity& kept, Text name);
+  bool IsReceiverKnown(const SourceFile& file, const Occurrence& occurrence, std::vector<ClassId>* classes = nullptr);
   // Leaves out files which import something else under the name of variables of modules.
   void LeaveOutOtherImports(std::vector<FileId>& candidates, Text name, const std::vector<Entity>& wanted);
+
+  // ---- rename.cc ----
+  Binding CallWithUnseenKeywords(const Entity& entity);
+  std::vector<KeptEntity> ClassesWith(Text name);
+  void AddRelated(const std::vector<KeptEntity>& definers, const std::vector<KeptEntity>& above,
+                  std::vector<KeptEntity>& classes);
+  std::vector<KeptEntity> AllBelow(const std::vector<KeptEntity>& classes);
+  std::string AddOverrides(const Entities& meant, Text name, Text new_name, Family& family);
+  std::string AddOthersMeant(Text name, Family& family, bool& has_grown);
+  void AddParametersOfOverrides(const Entities& meant, Text name, Family& family);
+  std::string WhyNot(const Entities& meant, Text name);
+  uint32_t TakenAt(const SourceFile& file, uint32_t symbol, Text name);
 
   // ---- describe.cc ----
   std::string TextOfType(TypeId type, bool is_short = false, int depth = 0);
@@ -200,6 +238,9 @@ class Workspace::Impl final : public CallerSource {
   // Gives files back where more is held than may be.
   void GiveBack();
 
+  bool IsBelowRoot(const std::string& path) const;
+
+  std::vector<std::string> package_folders_;  // of an environment that lies in a root
   std::chrono::steady_clock::time_point last_refresh_{};
   std::chrono::steady_clock::duration last_look_{};  // how long it took
   std::map<std::pair<std::string, FileId>, std::vector<ExprPlace>> calls_by_name_;
@@ -211,6 +252,14 @@ inline uint32_t NumberOfText(const Bindings& bindings, Text name) {
   for (uint32_t i = 0; i < bindings.texts.size(); ++i)
     if (bindings.texts[i] == name) return i;
   return kNoIndex;
+}
+
+// A name that the language changes by the class it stands in.
+inline bool IsPrivateName(Text name) { return name.starts_with("__") && !name.ends_with("__"); }
+
+template <class T>
+void AddNew(std::vector<T>& all, const T& one) {
+  if (std::ranges::find(all, one) == all.end()) all.push_back(one);
 }
 
 inline Certainty CertaintyOf(uint8_t doubt) { return doubt == 0 ? Certainty::kCertain : Certainty::kLikely; }

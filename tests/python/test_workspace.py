@@ -325,6 +325,20 @@ def test_a_name_that_is_none_is_refused(project: Path, name: str) -> None:
 # ---- renames ----
 
 
+def test_an_environment_in_the_project_is_none_of_it(project: Path) -> None:
+    site = project / ".venv" / "lib" / "python3.9" / "site-packages"
+    site.mkdir(parents=True)
+    (site / "thing.py").write_text("class Thing:\n    def make(self): pass\n")
+    (project / ".venv" / "pyvenv.cfg").write_text("version = 3.9.1\n")
+    main = project / "main.py"
+    main.write_text("import thing\nthing.Thing().make()\nclass Own(thing.Thing):\n    def make(self): pass\n")
+    workspace = Workspace(project)
+    with pytest.raises(RenameError, match="is defined outside of the project"):
+        workspace.rename(main, 2, 15, "other")
+    with pytest.raises(RenameError, match=r"overrides what 'thing\.Thing' defines outside of the project"):
+        workspace.rename(main, 4, 9, "other")
+
+
 def test_a_rename_changes_all_files(project: Path) -> None:
     workspace = Workspace(project)
     edits = workspace.rename(project / "src" / "shop" / "cart.py", 15, 9, "sum_up")

@@ -480,6 +480,116 @@ TEST(Renames, ChangeWhatIsCertain) {
   EXPECT_EQ(Edited(program, "new", false), (Words{"a.py:2:7+4", "b.py:2:5+4", "b.py:3:13+4"}));
 }
 
+// The rename of the first place of one file, or why it cannot be.
+Words EditedIn(Text text, Text name = "new") {
+  Program program(text);
+  return Edited(program, name);
+}
+
+TEST(Renames, TakeOverridesAlong) {
+  const Words all{"a.py:2:7+1", "a.py:4:7+1", "a.py:4:24+1", "a.py:5:5+1", "a.py:6:5+1"};
+  EXPECT_EQ(EditedIn("class A:\n  def $m(self): pass\nclass B(A):\n  def m(self): super().m()\nB().m()\nA().m()\n"),
+            all);
+  EXPECT_EQ(EditedIn("class A:\n  def m(self): pass\nclass B(A):\n  def $m(self): super().m()\nB().m()\nA().m()\n"),
+            all);
+  // Attributes, too, and what stands beside in another class of the same base.
+  EXPECT_EQ(EditedIn("class A:\n  x = None\nclass B(A):\n  $x = 'b'\nclass C(A):\n  def f(self): self.x = 1\nA.x\n"),
+            (Words{"a.py:2:3+1", "a.py:4:3+1", "a.py:6:21+1", "a.py:7:3+1"}));
+  // By way of a class that has none itself.
+  Program far({{"a.py", "class A:\n  def $m(self): pass\n"},
+               {"b.py", "from a import A\nclass B(A): pass\n"},
+               {"c.py", "import b\nclass C(b.B):\n  def m(self): pass\n"},
+               {"d.py", "class D:\n  def m(self): pass\n"}});
+  EXPECT_EQ(Edited(far, "new"), (Words{"a.py:2:7+1", "c.py:3:7+1"}));
+  // Two that a third derives from are one: what either calls is the other's.
+  Program joined({{"a.py", "class A:\n  def $m(self): pass\n"},
+                  {"b.py", "class B:\n  def m(self): pass\n"},
+                  {"c.py", "import a, b\nclass C(a.A, b.B): pass\n"}});
+  EXPECT_EQ(Edited(joined, "new"), (Words{"a.py:2:7+1", "b.py:2:7+1"}));
+  // References leave them out.
+  EXPECT_EQ(far.References(), Words{"a.py:2:7"});
+}
+
+TEST(Renames, LeavePrivateNamesOfOtherClasses) {
+  EXPECT_EQ(EditedIn("class A:\n  def f(self): self.$__x = 1\nclass B(A):\n  def g(self): self.__x = 2\n", "__y"),
+            Words{"a.py:2:21+3"});
+}
+
+TEST(Renames, TakeAlongWhatElseAPlaceMeans) {
+  EXPECT_EQ(EditedIn("class A:\n  def $m(self): pass\nclass B:\n  def m(self): pass\ndef f(x: A | B): x.m()\n"),
+            (Words{"a.py:2:7+1", "a.py:4:7+1", "a.py:5:20+1"}));
+  Program tried({{"a.py", "def $f(): pass\n"},
+                 {"b.py", "def f(): pass\n"},
+                 {"c.py", "try:\n  from a import f\nexcept ImportError:\n  from b import f\nf()\n"}});
+  EXPECT_EQ(Edited(tried, "new"), (Words{"a.py:1:5+1", "b.py:1:5+1", "c.py:2:17+1", "c.py:4:17+1", "c.py:5:1+1"}));
+  // What is outside of the project has to keep its name.
+  Program outside({{"a.py", "def $f(): pass\n"},
+                   {"c.py", "try:\n  from lib import f\nexcept ImportError:\n  from a import f\n"},
+                   {"library/lib.py", "def f(): pass\n"}});
+  const Words said = Edited(outside, "new");
+  ASSERT_EQ(said.size(), 1u);
+  EXPECT_TRUE(said[0].starts_with("'f' is something else as well, which cannot be renamed, in ")) << said[0];
+  EXPECT_TRUE(said[0].ends_with("c.py, at line 2")) << said[0];
+  EXPECT_EQ(Edited(outside, "new", false).size(), 3u);
+}
+
+TEST(Renames, TakeAlongWhatClassesLeaveToThoseBelow) {
+  const std::string text =
+      "class M:\n  def go(self): self.m()\nclass A(M):\n  def $m(self): pass\nclass B(M):\n  def m(self): pass\n";
+  EXPECT_EQ(Program(text).References(), (Words{"a.py:2:22 likely", "a.py:4:7"}));
+  EXPECT_EQ(EditedIn(text), (Words{"a.py:2:22+1", "a.py:4:7+1", "a.py:6:7+1"}));
+}
+
+TEST(Renames, TakeParametersOfOverridesAlongThatKeywordsName) {
+  const std::string head = "class A:\n  def m(self, $b): return b\nclass B(A):\n  def m(self, b): return b\n";
+  EXPECT_EQ(EditedIn(head + "A().m(b=1)\n"),
+            (Words{"a.py:2:15+1", "a.py:2:26+1", "a.py:4:15+1", "a.py:4:26+1", "a.py:5:7+1"}));
+  EXPECT_EQ(EditedIn(head + "A().m(1)\n"), (Words{"a.py:2:15+1", "a.py:2:26+1"}));
+  // Who makes an object knows its class.
+  EXPECT_EQ(EditedIn("class A:\n  def __init__(self, $b): pass\nclass B(A):\n  def __init__(self, b): pass\nA(b=1)\n"),
+            (Words{"a.py:2:22+1", "a.py:5:3+1"}));
+}
+
+TEST(Renames, RefuseWhatALibraryCallsByItsName) {
+  const auto said = [](Text text) {
+    Program program({{"a.py", text}, {"library/lib.py", "class L:\n  def m(self): pass\n"}});
+    return Edited(program, "new");
+  };
+  const Words refused{"'m' overrides what 'lib.L' defines outside of the project"};
+  EXPECT_EQ(said("import lib\nclass A(lib.L):\n  def $m(self): pass\n"), refused);
+  EXPECT_EQ(said("import lib\nclass A(lib.L):\n  def m(self): pass\nclass B(A):\n  def $m(self): pass\n"), refused);
+  EXPECT_EQ(said("import lib\nclass A:\n  def $m(self): pass\nclass B(A, lib.L): pass\n"), refused);
+  EXPECT_EQ(said("import lib\nclass A:\n  def $m(self): pass\nclass B(A):\n  def n(self): pass\n"),
+            Words{"a.py:3:7+1"});
+}
+
+TEST(Renames, RefuseNamesThatMeanSomethingElseThere) {
+  // Above or below in the order of bases.
+  EXPECT_EQ(EditedIn("class A:\n  def $m(self): pass\nclass B(A):\n  def new(self): pass\n"),
+            Words{"'new' means something else already in 'a.B'"});
+  EXPECT_EQ(EditedIn("class A:\n  def new(self): pass\nclass B(A):\n  def $m(self): pass\n"),
+            Words{"'new' means something else already in 'a.A'"});
+  const auto taken_at = [](Text text) {
+    const Words said = EditedIn(text);
+    const size_t line = said.empty() ? std::string::npos : said[0].find(", at line ");
+    return line == std::string::npos ? std::string("not") : said[0].substr(line + 10);
+  };
+  // A function in between has it, or an inner one means that of outside.
+  EXPECT_EQ(taken_at("$x = 1\ndef f():\n  new = 2\n  def g(): return x\n"), "3");
+  EXPECT_EQ(taken_at("new = 1\ndef f():\n  $x = 2\n  def g(): return new\n"), "4");
+  EXPECT_EQ(taken_at("$x = 1\ndef f(): return new\n"), "2");
+  EXPECT_EQ(taken_at("def f($x):\n  def g():\n    new = 1\n  return x\n"), "not");
+  EXPECT_EQ(taken_at("def f($x):\n  def g():\n    global new\n    new = 1\n  return x\n"), "not");
+  EXPECT_EQ(taken_at("class A:\n  $x = 1\n  def m(self): return new\n"), "not");
+  EXPECT_EQ(taken_at("$x = 1\nclass A:\n  new = 1\n  def m(self): return x\n"), "not");
+  EXPECT_EQ(taken_at("$x = 1\nclass A:\n  new = x\n"), "3");
+}
+
+TEST(Renames, ChangeStringsThatNameFields) {
+  EXPECT_EQ(EditedIn("from collections import namedtuple\nP = namedtuple('P', 'x y')\nP(1, y=2).$x\nP(x=1, y=2)\n"),
+            (Words{"a.py:2:22+1", "a.py:3:11+1", "a.py:4:3+1"}));
+}
+
 TEST(Renames, LeaveOtherNamesOfImports) {
   Program program({
       {"a.py", "class $A: pass\n__all__ = ['A']\n"},
