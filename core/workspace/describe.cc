@@ -9,7 +9,16 @@
 
 namespace quillet {
 
+// What holds the same sets many times over, one in another, is put together of the texts of those.
 std::string Workspace::Impl::TextOfSet(TypeSetId set, bool is_short, int depth) {
+  const std::tuple key(set, is_short, depth);
+  if (const auto known = texts_of_sets_.find(key); known != texts_of_sets_.end()) return known->second;
+  std::string text = FindTextOfSet(set, is_short, depth);
+  texts_of_sets_.emplace(key, text);
+  return text;
+}
+
+std::string Workspace::Impl::FindTextOfSet(TypeSetId set, bool is_short, int depth) {
   if (WithoutOpen(set) == kNoTypes) return is_short ? "Any" : "typing.Any";
   std::vector<std::string> parts;
   bool has_none = false;

@@ -81,6 +81,7 @@ void Workspace::Impl::Begin() {
   GiveBack();
   if (IsMuchRemembered()) ForgetFound();
   inference.Begin();
+  texts_of_sets_.clear();
   ForgetPlaces();
   is_bounded = false;
 }
@@ -93,6 +94,7 @@ void Workspace::Impl::BeginAnew() {
 
 void Workspace::Impl::ForgetFound() {
   inference.Clear();
+  texts_of_sets_.clear();
   ForgetCalls();
 #if defined(__GLIBC__)
   malloc_trim(0);  // small pieces between others that are in use, which the system does not get back otherwise

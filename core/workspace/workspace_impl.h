@@ -9,6 +9,7 @@
 #include <set>
 #include <span>
 #include <string>
+#include <tuple>
 #include <unordered_set>
 #include <vector>
 
@@ -164,6 +165,7 @@ class Workspace::Impl final : public CallerSource {
   // ---- describe.cc ----
   std::string TextOfType(TypeId type, bool is_short = false, int depth = 0);
   std::string TextOfSet(TypeSetId set, bool is_short = false, int depth = 0);
+  std::string FindTextOfSet(TypeSetId set, bool is_short, int depth);
   std::vector<std::string> TextsOf(Value value, bool is_short = false);
   // Types by where they are defined: their numbers say what was met first.
   std::vector<TypeId> InOrder(TypeSetId set);
@@ -237,6 +239,8 @@ class Workspace::Impl final : public CallerSource {
  private:
   // Gives files back where more is held than may be.
   void GiveBack();
+
+  std::map<std::tuple<TypeSetId, bool, int>, std::string> texts_of_sets_;  // by depth; of this question
 
   bool IsBelowRoot(const std::string& path) const;
 
