@@ -72,39 +72,36 @@ TEST(CompleteReading, WhateverIsCutShortIsReadAlikeByRecycledNodes) {
 }
 
 TEST(CompleteReading, AFormOfANewerVersionHasItsNamesWhereverItStands) {
-  // The subscript is one that no table reads, so that its statement is not either.
+  // The set is one that no table reads, so that its statement is not either.
   const struct {
     const char* statement;
     const char* names;  // of its records
   } cases[] = {
-      {"if x[*a, b]: pass", "x a b"},
-      {"while x[*a, b]: pass", "x a b"},
-      {"for i in x[*a, b]: pass", "i i x a b"},
-      {"with x[*a, b] as i: pass", "i i x a b"},
-      {"return x[*a, b]", "return x a b"},
-      {"assert x[*a, b], c", "x a b c"},
-      {"del x[*a, b]", "x a b"},
-      {"raise x[*a, b] from c", "x a b c"},
-      {"class A(x[*a, b], k=c): pass", "A x a b c"},
-      {"def f(p=x[*a, b]) -> c: pass", "f x a b c p p return"},
-      {"async for i in x[*a, b]: pass", "i i x a b"},
-      {"i = x[*a, b]", "i i x a b"},
-      {"i += x[*a, b]", "i x a b"},
-      {"i: x[*a, b] = c", "i i x a b c i"},
-      {"x[*a, b] = c", "x[*a, b] x a b c"},
-      {"lambda p=x[*a, b]: c", "x a b c p"},
-      {"yield x[*a, b]", "yield x a b"},
-      {"await x[*a, b]", "x a b"},
-      {"[x[*a, b] for i in c if x[*a, b]]", "x a b c i"},
-      {"f(x[*a, b], *c, **d)", "f x a b c d"},
-      {"type T = x[*a, b]", "T T x a b"},
-      {"not x[*a, b] or c", "x a b c"},
-      {"x[*a, b] if c else d", "x a b c d"},
-      {"-x[*a, b] ** c", "x a b c"},
-      {"c < x[*a, b] <= d", "c x a b d"},
-      {"(x[*a, b])[c].d", "x a b c (x[*a, b])[c].d"},
-      {"{x[*a, b]: c}", "x a b c"},
-      {"(i := x[*a, b])", "i i x a b"},
+      {"if {a := x, b}: pass", "a a x b"},
+      {"while {a := x, b}: pass", "a a x b"},
+      {"for i in {a := x, b}: pass", "a a i x b"},
+      {"with {a := x, b} as i: pass", "i i a a x b"},
+      {"return {a := x, b}", "a a return x b"},
+      {"assert {a := x, b}, c", "a a x b c"},
+      {"raise {a := x, b} from c", "a a x b c"},
+      {"class A({a := x, b}, k=c): pass", "A a a x b c"},
+      {"def f(p={a := x, b}) -> c: pass", "f a a x b c p p return"},
+      {"async for i in {a := x, b}: pass", "a a i x b"},
+      {"i = {a := x, b}", "i i a a x b"},
+      {"i += {a := x, b}", "a a i x b"},
+      {"i: {a := x, b} = c", "a a i i x b c i"},
+      {"lambda p={a := x, b}: c", "a a x b c p"},
+      {"yield {a := x, b}", "a a yield x b"},
+      {"await {a := x, b}", "a a x b"},
+      {"[{a := x, b} for i in c if {a := x, b}]", "a a a a x b c i"},
+      {"f({a := x, b}, *c, **d)", "a a f x b c d"},
+      {"not {a := x, b} or c", "a a x b c"},
+      {"{a := x, b} if c else d", "a a x b c d"},
+      {"-{a := x, b} ** c", "a a x b c"},
+      {"c < {a := x, b} <= d", "a a c x b d"},
+      {"({a := x, b})[c].d", "a a x b c ({a := x, b})[c].d"},
+      {"{{a := x, b}: c}", "a a x b c"},
+      {"(i := {a := x, b})", "i i a a x b"},
   };
   FileAnalyzer files(CompleteOptions(Version::Of(3, 12)));
   for (const auto& [statement, expected] : cases) {
