@@ -3,11 +3,11 @@
 //   quillet_digest PATH...    files, and folders with all that lies below them
 //
 // Each file is taken as it is and with some of its lines spoilt, always the same ones in the same way, as
-// 2.7, 3.8 and 3.12: tokens and rows, trees with their contexts and texts, records and errors, what is
-// printed and reported, the lines of each format, names and what they are bound to, statements and expressions,
-// the words of an index, answers to questions, and the page of a site; as 3.12, what a workspace with a small library
-// answers at some of its names. Two builds that print the same numbers tell nobody apart by this corpus.
-// scripts/mutate.py asks it about changes that no test noticed.
+// 2.7, 3.8 and 3.12: tokens and rows, trees with their contexts and texts, records and errors, those of a complete
+// reading, too, what is printed and reported, the lines of each format, names and what they are bound to, statements
+// and expressions, the words of an index, answers to questions, and the page of a site; as 3.12, what a workspace with
+// a small library answers at some of its names. Two builds that print the same numbers tell nobody apart by this
+// corpus. scripts/mutate.py asks it about changes that no test noticed.
 #include <algorithm>
 #include <cstdint>
 #include <cstdio>
@@ -25,6 +25,7 @@
 #include "index/question.h"
 #include "index/words.h"
 #include "names/binder.h"
+#include "names/scope_rules.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
 #include "site/pages.h"
@@ -59,7 +60,7 @@ class Digest {
 };
 
 struct Digests {
-  Digest tokens, trees, records, output, names, syntax, index, site, answers;
+  Digest tokens, trees, records, complete, output, names, syntax, index, site, answers;
 };
 
 Digests digests;
@@ -119,10 +120,15 @@ void AddTree(CPGenParserImpl& parser, LogicalLine& line, bool in_async_def) {
 
 class Analysis {
  public:
-  explicit Analysis(Version version) : version_(version), file_(OptionsOf(version)), parser_(OptionsOf(version)) {}
+  explicit Analysis(Version version)
+      : version_(version),
+        file_(OptionsOf(version)),
+        complete_file_(CompletelyOf(version)),
+        parser_(OptionsOf(version)) {}
 
   void Add(const std::string& bytes) {
     file_.Analyze(bytes);
+    complete_file_.Analyze(bytes);
     LogicalLine line;
     const Ref<SourceText> source = SourceText::Copy(bytes);
     std::vector<LineRow> rows;
@@ -141,7 +147,8 @@ class Analysis {
       SetFromRow(line, source, row);
       AddTree(parser_.logical_parser(), line, file_.results()[i].in_async_def);
     }
-    AddRecords();
+    AddRecords(file_, digests.records);
+    AddRecords(complete_file_, digests.complete);
     AddOutput();
     AddNames(bytes);
     AddSyntax(*source, rows);
@@ -157,22 +164,29 @@ class Analysis {
     return options;
   }
 
-  void AddRecords() {
-    for (const auto* rows : {&file_.store().rows, &file_.store().arg_rows}) {
+  static FileAnalyzer::Options CompletelyOf(Version version) {
+    FileAnalyzer::Options options = OptionsOf(version);
+    options.reads_completely = true;
+    options.make_name_rules = MakeScopeRules;
+    return options;
+  }
+
+  static void AddRecords(const FileAnalyzer& file, Digest& digest) {
+    for (const auto* rows : {&file.store().rows, &file.store().arg_rows}) {
       for (const Record& record : *rows) {
-        digests.records.Add(record.name());
-        digests.records.Add(record.info());
+        digest.Add(record.name());
+        digest.Add(record.info());
       }
     }
-    for (size_t i = 0; i < file_.results().size(); ++i) {
-      const FileAnalyzer::LineResult& result = file_.results()[i];
-      digests.records.Add(result.record_end);
-      digests.records.Add(result.arg_record_end);
-      digests.records.Add(result.in_async_def + 2 * result.first_in_def);
+    for (size_t i = 0; i < file.results().size(); ++i) {
+      const FileAnalyzer::LineResult& result = file.results()[i];
+      digest.Add(result.record_end);
+      digest.Add(result.arg_record_end);
+      digest.Add(result.in_async_def + 2 * result.first_in_def);
       if (result.error < 0) continue;
-      digests.records.Add(file_.errors()[static_cast<size_t>(result.error)].message());
-      digests.records.Add(file_.ErrorPosition(i).line);
-      digests.records.Add(file_.ErrorPosition(i).col);
+      digest.Add(file.errors()[static_cast<size_t>(result.error)].message());
+      digest.Add(file.ErrorPosition(i).line);
+      digest.Add(file.ErrorPosition(i).col);
     }
   }
 
@@ -266,6 +280,7 @@ class Analysis {
 
   Version version_;
   FileAnalyzer file_;
+  FileAnalyzer complete_file_;
   CPGenAnalyzerImpl parser_;
   NameBinder binder_{version_};
   SyntaxReader syntax_{version_};
@@ -274,7 +289,7 @@ class Analysis {
 // What is answered about a text that an editor has open, all of it by one workspace.
 class Answers {
  public:
-  Answers() : workspace_({.roots = {folder_.path()}, .typeshed = testing::SmallLibrary(), .version = kVersion}) {
+  Answers() : workspace_(SettingsFor(folder_.path())) {
     folder_.Write("b.py", "class B:\n  x = 1\n  def f(self, y: int = 2) -> str: ...\n");
   }
 
@@ -304,6 +319,13 @@ class Answers {
   static constexpr Version kVersion = Version::Of(3, 12);
   static constexpr size_t kPlaces = 30;
 
+  static Workspace::Settings SettingsFor(const std::string& root) {
+    Workspace::Settings settings;
+    settings.roots = {root};
+    settings.typeshed = testing::SmallLibrary();
+    settings.version = kVersion;
+    return settings;
+  }
   static void AddNumbers(std::initializer_list<int64_t> numbers) {
     for (const int64_t number : numbers) digests.answers.Add(number);
   }
@@ -389,6 +411,7 @@ int main(int argc, char** argv) {
   for (const auto& [name, digest] : {std::pair("tokens", &digests.tokens),
                                      {"trees", &digests.trees},
                                      {"records", &digests.records},
+                                     {"complete", &digests.complete},
                                      {"output", &digests.output},
                                      {"names", &digests.names},
                                      {"syntax", &digests.syntax},
