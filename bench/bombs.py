@@ -3,8 +3,10 @@
 The inputs are those of bench/scaling.cc, which tries the core alone. Here each is a file: `quillet.analyze` takes it in
 a thread with a small stack and in the main thread of a process that has no larger one, and `analyze`, `index`, `find`,
 `outline` and `goto` are run on it. Processor time by the byte and the memory that a process takes beyond an idle one,
-by the byte, are said; named as faults are those that end by a signal, take too long, take more memory than the limit,
+by the byte, are said; named as faults are those that end by a signal, take too long, take more memory than they may,
 or, with --interrupt, do not end within a second of Ctrl-C in the middle of their work. Exit code 1 where there are any.
+`quillet.analyze`, whose result is kept in memory, may take --most-memory for each byte; a command a gibibyte, or ten
+times the size of the file where that is more.
 
     python bench/bombs.py [--scaling build/release/bench/quillet_scaling] [--count N] [--most-bytes N] [--only TEXT]
 """
@@ -23,6 +25,9 @@ from pathlib import Path
 from typing import NamedTuple
 
 _STACK = 512 << 10
+# What a file may take of a command.
+_COMMAND_MEMORY = 1 << 30
+_COMMAND_MEMORY_PER_BYTE = 10
 _IN_A_THREAD = """
 import sys, threading, quillet
 text = open(sys.argv[1], 'rb').read().decode('utf-8', 'surrogateescape')
@@ -50,6 +55,12 @@ class Way(NamedTuple):
 
     name: str
     command: list[str]
+
+    def most_memory(self, size: int, in_python: float) -> float:
+        """How many bytes it may take for so many bytes."""
+        if self.name in ("thread", "main"):
+            return in_python * size
+        return max(_COMMAND_MEMORY, _COMMAND_MEMORY_PER_BYTE * size)
 
 
 def ways(file: Path) -> list[Way]:
@@ -109,14 +120,14 @@ def run(way: Way, folder: Path, most_seconds: float, interrupt_after: float | No
         return Cost(usage.ru_utime + usage.ru_stime, usage.ru_maxrss << 10, process.returncode, late, said)
 
 
-def faults_of(cost: Cost, size: int, idle: int, most_memory: float) -> str:
+def faults_of(cost: Cost, idle: int, most_memory: float) -> str:
     """What is wrong with a run; empty where nothing is."""
     if cost.status < 0:
         return f"ended by signal {-cost.status}"
     if "Traceback" in cost.said:
         return "traceback"
-    memory = (cost.memory - idle) / size
-    return f"{memory:.0f} bytes of memory a byte" if memory > most_memory else ""
+    memory = cost.memory - idle
+    return f"{memory >> 20} MiB of memory" if memory > most_memory else ""
 
 
 def main() -> int:
@@ -124,15 +135,16 @@ def main() -> int:
     parser.add_argument("--scaling", default="build/release/bench/quillet_scaling")
     parser.add_argument("--count", type=int, default=1_000_000)
     parser.add_argument("--most-bytes", type=int, default=50_000_000, help="of an input, which is repeated less often")
-    parser.add_argument("--most-memory", type=float, default=1000.0, help="bytes a byte")
+    parser.add_argument("--most-memory", type=float, default=400.0, help="bytes a byte, in Python")
     parser.add_argument("--most-seconds", type=float, default=600.0)
     parser.add_argument("--interrupt", action="store_true", help="also ends each in the middle by Ctrl-C")
     parser.add_argument("--only", default="", metavar="TEXT")
+    parser.add_argument("--skip", type=int, default=0, help="so many of the inputs, as after a run that was stopped")
     parser.add_argument("--ways", default="", metavar="NAME,...")
     arguments = parser.parse_args()
     scaling = str(Path(arguments.scaling).resolve())
     listed = subprocess.run([scaling, "--list"], capture_output=True, text=True, check=True).stdout.splitlines()
-    names = [line[:44].strip() for line in listed if arguments.only in line[:44]]
+    names = [line[:44].strip() for line in listed if arguments.only in line[:44]][arguments.skip :]
     bad = 0
     with tempfile.TemporaryDirectory() as name:
         folder = Path(name)
@@ -154,7 +166,7 @@ def main() -> int:
             for way in wanted:
                 cost = run(way, folder, arguments.most_seconds)
                 cells.append(f"{cost.seconds / size * 1e9:7.0f} {(cost.memory - idle[way.name]) / size:6.0f}")
-                fault = faults_of(cost, size, idle[way.name], arguments.most_memory)
+                fault = faults_of(cost, idle[way.name], way.most_memory(size, arguments.most_memory))
                 if not fault and arguments.interrupt and cost.seconds > 1:
                     ended = run(way, folder, arguments.most_seconds, cost.seconds / 2)
                     fault = f"ends {ended.late:.1f} s behind Ctrl-C" if ended.late > 1 else ""

@@ -43,6 +43,9 @@ class ThreadStopQuestion {
 // Asks at once: for what waits.
 void AskWhetherToStop();
 
+// So many bytes that are written cost a step.
+inline constexpr int64_t kBytesAStep = 16;
+
 // How many steps a loop may do between two calls of CountSteps.
 inline constexpr int64_t kStepsBetweenQuestions = int64_t{1} << 16;
 

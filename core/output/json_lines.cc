@@ -4,6 +4,7 @@
 #include <array>
 #include <charconv>
 
+#include "foundations/stop.h"
 #include "foundations/utf8.h"
 
 namespace quillet {
@@ -78,6 +79,7 @@ class JsonLinesWriter : public FileWriter {
     placed.Begin(file, scopes);
     for (size_t row = 0; row < file.rows().size(); ++row) {
       file.CheckMemory(out.size());
+      const size_t size_before = out.size();
       const FileAnalyzer::LineResult& result = file.results()[row];
       const bool has_records =
           result.record_begin != result.record_end || result.arg_record_begin != result.arg_record_end;
@@ -86,6 +88,7 @@ class JsonLinesWriter : public FileWriter {
       AppendRecords(placed.OfRow(row), out);
       if (result.error >= 0) AppendError(file, row, out);
       out += "}\n";
+      CountSteps(static_cast<int64_t>(out.size() - size_before) / kBytesAStep);
     }
   }
 

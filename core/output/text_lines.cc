@@ -6,6 +6,7 @@
 #include <unordered_map>
 
 #include "foundations/char_tables.h"
+#include "foundations/stop.h"
 #include "foundations/utf8.h"
 
 namespace quillet {
@@ -101,9 +102,9 @@ Text Stripped(Text text) {
   return begin < end ? text.substr(begin, end - begin) : Text();
 }
 
-// The parts of a line that are looked at: more than is shown, and bounded, since a line may hold any
-// number of statements.
-constexpr size_t kMostBytes = 1024;
+// The parts of a line that are looked at: more characters than are shown, whatever these take, and bounded, since a
+// line may hold any number of statements.
+constexpr size_t kMostBytes = 4 * (kWindow + 2);
 
 Text FirstBytes(Text line) {
   size_t size = std::min(line.size(), kMostBytes);
@@ -144,11 +145,13 @@ class TextLinesWriter : public FileWriter {
     placed.Begin(file, scopes);
     for (size_t row = 0; row < file.rows().size(); ++row) {
       file.CheckMemory(out.size());
+      const size_t size_before = out.size();
       if (file.results()[row].error >= 0) {
         AppendError(file, row, out);
       } else if (!options_.errors_only) {
         AppendStatement(file, row, placed.OfRow(row), out);
       }
+      CountSteps(static_cast<int64_t>(out.size() - size_before) / kBytesAStep);
     }
   }
 

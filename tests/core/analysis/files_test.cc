@@ -316,6 +316,27 @@ void OnSmallStack(std::function<void()> function) {
 }
 
 // `quillet_scaling` of bench/ tries hundreds of these at a million.
+TEST(Steps, AreCountedWhileOutputIsWritten) {
+  FileAnalyzer file(Options());
+  // Errors alone, which have no records, and statements that are shown with much of their line.
+  for (const std::string& source :
+       {Repeat(";", 50'000), "f('" + Repeat("b", 120) + "')" + Repeat("; a", 50'000) + "\n"}) {
+    file.Analyze(source);
+    ScopeNames scopes;
+    scopes.Build(file);
+    PlacedRecords placed;
+    for (const bool json : {false, true}) {
+      const std::unique_ptr<FileWriter> writer = json ? MakeJsonLinesWriter({}) : MakeTextLinesWriter({});
+      std::string out;
+      size_t questions = 0;
+      const ThreadStopQuestion count([&questions] { ++questions; });
+      writer->Write({"a.py", {}, {}}, file, scopes, placed, out);
+      EXPECT_GE(questions, out.size() / (32 * kStepsBetweenQuestions)) << source.substr(0, 8) << json;
+      EXPECT_GE(out.size(), 64 * kStepsBetweenQuestions);
+    }
+  }
+}
+
 TEST(Stack, NothingNestsOnTheMachineStackWithoutABound) {
   constexpr size_t kDepth = 20'000;
   const std::vector<std::vector<std::string>> nests = {
