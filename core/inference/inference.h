@@ -316,7 +316,7 @@ class Inference {
   // found surely for their sake, end much earlier.
   static constexpr uint32_t kMaxSteps = 20'000;
   static constexpr uint32_t kMaxGuessSteps = 3'000;
-  static constexpr uint32_t kMaxStepsOfAll = 1'000'000;  // of the parts of a question, a second or two
+  static constexpr uint32_t kMaxStepsOfAll = 2'000'000;  // of the parts of a question, some seconds
   static constexpr int kMaxDepth = 150;
   static constexpr size_t kMaxFrames = 500'000;  // a question begins with far fewer (ByteSize)
   static constexpr int kMaxFrameDepth = 10;
