@@ -7,6 +7,7 @@
 
 #include "bindings/convert.h"
 #include "bindings/line_class.h"
+#include "bindings/signals.h"
 
 namespace quillet::host {
 namespace {
@@ -162,7 +163,11 @@ void SetHostError(const std::exception_ptr& exception) {
     std::rethrow_exception(exception);
   } catch (nb::python_error& error) {
     error.restore();
+  } catch (const Stopped&) {
+    SetStopped(exception);
   } catch (const Error&) {
+    SetNativeError(exception, nullptr);
+  } catch (const std::bad_cast&) {
     SetNativeError(exception, nullptr);
   } catch (const std::bad_alloc&) {
     PyErr_NoMemory();

@@ -32,6 +32,8 @@ void EndWhereInterrupted() {
   if (PyOS_InterruptOccurred()) throw Interrupted();
 }
 
+}  // namespace
+
 void SetStopped(const std::exception_ptr& exception, void*) {
   try {
     std::rethrow_exception(exception);
@@ -41,8 +43,6 @@ void SetStopped(const std::exception_ptr& exception, void*) {
     PyErr_SetNone(PyExc_KeyboardInterrupt);
   }
 }
-
-}  // namespace
 
 void HandleSignals() {
   const Locked lock;

@@ -27,6 +27,9 @@ void HandleSignals();
 // The question of a thread that works on objects of its own: HandleSignals, at most ten times a second.
 StopQuestion HandlesSignals();
 
+// Sets the host's error indicator for a Stopped.
+void SetStopped(const std::exception_ptr& exception, void* = nullptr);
+
 // Makes interrupts end the operations of quillet.tarvex.
 void InstallInterrupts();
 
