@@ -2,11 +2,11 @@
 //
 // Inputs are made to do harm: one text that repeats (nested, left open, cut apart in the middle), at a
 // size and at four times that size. Each is analysed as 3.12 and as 2.7, cut into records and written in
-// each format, in a process of its own, on a thread with a small stack. What costs more a byte at the
-// larger size, costs more than any honest input does, or ends the process, is named; exit code 1 then.
-// The last phases make the tree and the text of each statement, and the lines embedded in it; the statements and
-// expressions of all of it at once; the occurrences of its names; and the answers of a workspace of this file alone,
-// asked at places from its beginning to its end.
+// each format and as an index's words, in a process of its own, on a thread with a small stack. What costs more a byte
+// at the larger size, costs more than any honest input does, or ends the process, is named; exit code 1 then. The last
+// phases make the tree and the text of each statement, and the lines embedded in it; the statements and expressions of
+// all of it at once; the occurrences of its names; and the answers of a workspace of this file alone, asked at places
+// from its beginning to its end.
 //
 //   quillet_scaling                     the list below
 //   quillet_scaling --pairs             all pairs of fragments, repeated
@@ -36,6 +36,7 @@
 #include <vector>
 
 #include "foundations/console.h"
+#include "index/words.h"
 #include "names/binder.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
@@ -624,6 +625,7 @@ struct Tools {
   FileAnalyzer whole{OptionsFor(true, true)};
   std::unique_ptr<FileWriter> json = MakeJsonLinesWriter({});
   std::unique_ptr<FileWriter> text = MakeTextLinesWriter({});
+  std::unique_ptr<FileWriter> words = MakeWordsWriter(Version::Of(3, 12));
   RecordTableMaker tables;
   CPGenAnalyzerImpl analyzer{OptionsFor(true)};
 };
@@ -658,6 +660,10 @@ void WriteAll(const FileAnalyzer& file) {
   {
     std::string out;
     tools.text->Write(input, file, scopes, placed, out);
+  }
+  {
+    std::string out;
+    tools.words->Write(input, file, scopes, placed, out);
   }
   (void)tools.tables.Make(file, scopes, placed);
 }

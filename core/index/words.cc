@@ -35,14 +35,19 @@ bool EndsRaised(Text behind) {
   return behind.starts_with("from") && (behind.size() == 4 || !IsWordByte(behind[4]));
 }
 
+// Nothing that anybody raises stands behind more of them. Each attribute of a chain may be asked for what it begins
+// with.
+constexpr int kMostReceivers = 30;
+
 // Whether `raise` stands in front of a name, or of what it is an attribute of.
 bool IsRaised(const Occurrence& occurrence, const Bindings& bindings, Text text) {
   constexpr Text kRaise = "raise";
   if (!EndsRaised(text.substr(bindings.EndOf(occurrence)))) return false;
   const Occurrence* root = &occurrence;
-  while (true) {
+  for (int receivers = 0;; ++receivers) {
     const uint32_t receiver = bindings.ReceiverOf(static_cast<uint32_t>(root - bindings.occurrences.data()));
     if (receiver == kNoIndex) break;
+    if (receivers == kMostReceivers) return false;
     root = &bindings.occurrences[receiver];
   }
   const Text before = text.substr(0, root->begin);

@@ -93,6 +93,22 @@ TEST(Words, OfAFileHaveTheUsesOfTheirRecords) {
   EXPECT_FALSE(ReadFileWords(written + "x", words));
 }
 
+// The beginning of a chain is looked for from each of its attributes, but not from afar.
+TEST(Words, OfAChainOnManyLinesHaveTheirUses) {
+  const auto writer = MakeWordsWriter(testing::kPy3);
+  const auto uses_of_last = [&](size_t lines) {
+    std::string source = "raise (a";
+    for (size_t i = 0; i < lines; ++i) source += "\n.b";
+    const std::string written = Written(*writer, source + ")\n");
+    FileWords words;
+    EXPECT_TRUE(ReadFileWords(written, words));
+    const auto found = std::ranges::find(words.words, "b", &WordTable::Entry::word);
+    return found != words.words.end() ? found->uses : Uses{0};
+  };
+  EXPECT_NE(uses_of_last(30) & kRaiseUse, 0u);
+  EXPECT_NE(uses_of_last(200'000) & UseOfRole(NameRole::kRead), 0u);
+}
+
 TEST(Bytes, ReadersNeverLeaveTheirBytes) {
   std::string bytes;
   for (const uint64_t value : {uint64_t{0}, uint64_t{127}, uint64_t{128}, uint64_t{1} << 40, UINT64_MAX})
