@@ -6,9 +6,29 @@
 
 #include "program/name_imports.h"
 #include "program/two_threads.h"
+#include "tokens/byte_scan.h"
 #include "workspace/workspace_impl.h"
 
 namespace quillet {
+
+namespace {
+
+// Whether something in a text may be given under a name, as in `f(name=1)`.
+bool MayHoldKeyword(Text text, Text name) {
+  constexpr Text kBlanks = " \t\f\r\n\\";
+  // What is not ASCII may be spelled in other ways.
+  if (std::ranges::any_of(name, [](char c) { return static_cast<unsigned char>(c) >= 0x80; })) return true;
+  for (size_t at = 0; (at = text.find(name, at)) != Text::npos; at += name.size()) {
+    const size_t behind = text.find_first_not_of(kBlanks, at + name.size());
+    if (behind == Text::npos) return false;
+    // Nobody knows how far a comment goes.
+    const bool is_given = text[behind] == '=' ? !text.substr(behind + 1).starts_with('=') : text[behind] == '#';
+    if (is_given && (at == 0 || !IsAsciiIdentifierByte(text[at - 1]))) return true;
+  }
+  return false;
+}
+
+}  // namespace
 
 // Whether a type that every program uses has an attribute of this name.
 bool Workspace::Impl::IsCommonAttribute(Text name) {
@@ -149,6 +169,27 @@ void Workspace::Impl::LeaveOutOtherImports(std::vector<FileId>& candidates, Text
   candidates.resize(kept);
 }
 
+bool Workspace::Impl::IsParameter(const Entity& entity) {
+  const SourceFile* owner = entity.kind == Entity::kVariable ? Get(entity.a) : nullptr;
+  return owner != nullptr && (owner->bindings.symbols[entity.b].uses & NameSymbol::kParameter) != 0;
+}
+
+void Workspace::Impl::LeaveOutFilesWithoutKeyword(std::vector<FileId>& candidates, Text name,
+                                                  const std::vector<Entity>& parameters) {
+  static constexpr size_t kFilesWorthIt = 32;
+  std::vector<uint8_t> is_kept(candidates.size());
+  std::array<std::string, 2> memories;
+  ForEachByThreads(candidates.size(), kFilesWorthIt, memories, [&](size_t i, std::string& memory) {
+    const bool is_owner =
+        std::ranges::any_of(parameters, [&](const Entity& entity) { return entity.a == candidates[i]; });
+    is_kept[i] = is_owner || MayHoldKeyword(files.SourceOf(candidates[i], memory), name);
+  });
+  size_t kept = 0;
+  for (size_t i = 0; i < candidates.size(); ++i)
+    if (is_kept[i] != 0) candidates[kept++] = candidates[i];
+  candidates.resize(kept);
+}
+
 std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, uint32_t index, bool everywhere,
                                                         Family* family) {
   std::vector<Hit> hits;
@@ -184,12 +225,14 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
     const SourceFile* owner = Get(entity.a);
     if (owner == nullptr) continue;
     const NameScopeKind kind = owner->bindings.scopes[owner->bindings.symbols[entity.b].scope].kind;
-    const bool is_parameter = (owner->bindings.symbols[entity.b].uses & NameSymbol::kParameter) != 0;
+    const bool is_parameter = IsParameter(entity);
     if (entity.a != file.id ||
         (kind != NameScopeKind::kFunction && kind != NameScopeKind::kLambda && kind != NameScopeKind::kComprehension) ||
         is_parameter)
       is_local = false;
   }
+  const bool are_parameters =
+      !is_by_name && std::ranges::all_of(wanted.found, [this](const Entity& entity) { return IsParameter(entity); });
   std::vector<FileId> candidates;
   if (is_local || !everywhere) {
     candidates.push_back(file.id);
@@ -207,6 +250,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
       if (!IsProject(buffer) && files.Holds(buffer, name) && std::ranges::find(candidates, buffer) == candidates.end())
         candidates.push_back(buffer);
     LeaveOutOtherImports(candidates, name, wanted.found);
+    if (are_parameters) LeaveOutFilesWithoutKeyword(candidates, name, wanted.found);
   }
   for (const Entity& entity : wanted.found) {
     if (entity.kind != Entity::kModule) continue;
@@ -254,9 +298,12 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
       Certainty certainty;
     };
     std::unordered_map<uint32_t, Known> variables;
+    // Parameters are only given something there.
+    const bool is_elsewhere =
+        are_parameters && std::ranges::none_of(wanted.found, [id](const Entity& entity) { return entity.a == id; });
     for (uint32_t i = 0; i < bindings.occurrences.size(); ++i) {
       const Occurrence& other = bindings.occurrences[i];
-      if (other.text != number) continue;
+      if (other.text != number || (is_elsewhere && other.role != NameRole::kKeyword)) continue;
       inference.BeginPart();
       const uint32_t variable = bindings.VariableOf(other);
       Certainty certainty = Certainty::kCertain;

@@ -149,6 +149,9 @@ class Workspace::Impl final : public CallerSource {
   bool IsReceiverKnown(const SourceFile& file, const Occurrence& occurrence, std::vector<ClassId>* classes = nullptr);
   // Leaves out files which import something else under the name of variables of modules.
   void LeaveOutOtherImports(std::vector<FileId>& candidates, Text name, const std::vector<Entity>& wanted);
+  bool IsParameter(const Entity& entity);
+  // Leaves out files other than those of the parameters that give nothing under their name.
+  void LeaveOutFilesWithoutKeyword(std::vector<FileId>& candidates, Text name, const std::vector<Entity>& parameters);
 
   // ---- rename.cc ----
   Binding CallWithUnseenKeywords(const Entity& entity);

@@ -365,6 +365,18 @@ TEST(References, OfKeywordsAreThoseOfTheFunctionThatIsCalled) {
             (Words{"a.py:4:3", "a.py:5:3", "a.py:5:8"}));
 }
 
+TEST(References, OfParametersAreWhatIsGivenToThemInOtherFiles) {
+  const std::string import = "from a import f\n";
+  Program program({{"a.py", "def f($x): return x\n"},
+                   {"b.py", import + "f(x=1)\n"},
+                   {"c.py", import + "f(x = 1)\n"},
+                   {"d.py", import + "f(x  # why\n  =1)\n"},
+                   {"e.py", import + "f(x\\\n=1)\n"},
+                   {"g.py", import + "x = 1\ny.x = f(x == 1)\n"},
+                   {"h.py", import + "f(xx=1, x)\n"}});
+  EXPECT_EQ(program.References(), (Words{"a.py:1:7", "a.py:1:18", "b.py:2:3", "c.py:2:3", "d.py:2:3", "e.py:2:3"}));
+}
+
 TEST(References, OfModulesAreWhatImportsThem) {
   Program program({
       {"main.py", "import pack.$a\nfrom pack import a as other\nfrom pack.a import x\npack.a.x\nother.x\n"},
