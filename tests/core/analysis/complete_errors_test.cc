@@ -6,6 +6,7 @@
 
 #include "analysis/file_analyzer.h"
 #include "tests/core/support/analyzer_helper.h"
+#include "tests/core/support/errors_text.h"
 
 namespace quillet {
 namespace {
@@ -15,20 +16,6 @@ FileAnalyzer::Options Options() {
   static_cast<CPGenAnalyzerImpl::Options&>(options) = testing::AnalyzerOptions(Version::Of(3, 12));
   options.reads_completely = true;
   return options;
-}
-
-std::string ErrorsOf(FileAnalyzer& files, const char* source) {
-  files.Analyze(Text(source));
-  std::string errors;
-  for (size_t row = 0; row < files.rows().size(); ++row) {
-    const int32_t error = files.results()[row].error;
-    if (error < 0) continue;
-    const Position place = files.ErrorPosition(row);
-    if (!errors.empty()) errors += "; ";
-    errors += std::to_string(place.line + 1) + ":" + std::to_string(place.col + 1) + " ";
-    errors += files.errors()[static_cast<size_t>(error)].message();
-  }
-  return errors;
 }
 
 TEST(CompleteErrors, AreWhereAndWhatTheyAre) {
@@ -222,7 +209,7 @@ TEST(CompleteErrors, AreWhereAndWhatTheyAre) {
       {"break x\n", "1:7 invalid syntax"},
   };
   FileAnalyzer files(Options());
-  for (const Case& one : cases) EXPECT_EQ(ErrorsOf(files, one.source), one.errors) << one.source;
+  for (const Case& one : cases) EXPECT_EQ(testing::ErrorsOf(files, one.source), one.errors) << one.source;
 }
 
 TEST(CompleteErrors, AreNoneInWhatOnlyLooksBroken) {
@@ -313,7 +300,7 @@ TEST(CompleteErrors, AreNoneInWhatOnlyLooksBroken) {
       "def f(): return 1; yield\n",
   };
   FileAnalyzer files(Options());
-  for (const char* source : sources) EXPECT_EQ(ErrorsOf(files, source), "") << source;
+  for (const char* source : sources) EXPECT_EQ(testing::ErrorsOf(files, source), "") << source;
 }
 
 }  // namespace

@@ -8,6 +8,7 @@
 
 #include "analysis/file_analyzer.h"
 #include "tests/core/support/analyzer_helper.h"
+#include "tests/core/support/errors_text.h"
 
 namespace quillet {
 namespace {
@@ -23,20 +24,6 @@ FileAnalyzer AnalyzerFor(Version version) {
   options.reads_completely = true;
   options.make_name_rules = MakeScopeRules;
   return FileAnalyzer(options);
-}
-
-std::string ErrorsOf(FileAnalyzer& files, const char* source) {
-  files.Analyze(Text(source));
-  std::string errors;
-  for (size_t row = 0; row < files.rows().size(); ++row) {
-    const int32_t error = files.results()[row].error;
-    if (error < 0) continue;
-    const Position place = files.ErrorPosition(row);
-    if (!errors.empty()) errors += "; ";
-    errors += std::to_string(place.line + 1) + ":" + std::to_string(place.col + 1) + " ";
-    errors += files.errors()[static_cast<size_t>(error)].message();
-  }
-  return errors;
 }
 
 TEST(ScopeRules, OfPython3) {
@@ -98,7 +85,7 @@ TEST(ScopeRules, OfPython3) {
       {"async def f():\n  return\n  yield\n", ""},
       {"async def f():\n  return 1\n  lambda: (yield)\n", ""},
   };
-  for (const Case& one : cases) EXPECT_EQ(ErrorsOf(files, one.source), one.errors) << one.source;
+  for (const Case& one : cases) EXPECT_EQ(testing::ErrorsOf(files, one.source), one.errors) << one.source;
 }
 
 TEST(ScopeRules, OfPython2) {
@@ -130,7 +117,7 @@ TEST(ScopeRules, OfPython2) {
       {"def f():\n  class A:\n    def g(self): return x\n  del x\n",
        "4:7 can not delete variable 'x' referenced in nested scope"},
   };
-  for (const Case& one : cases) EXPECT_EQ(ErrorsOf(files, one.source), one.errors) << one.source;
+  for (const Case& one : cases) EXPECT_EQ(testing::ErrorsOf(files, one.source), one.errors) << one.source;
 }
 
 }  // namespace
