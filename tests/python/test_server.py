@@ -409,6 +409,30 @@ def test_certainty_leaves_out(folder: Path) -> None:
         assert "market.py:15:18-23" in client.shown(found)
 
 
+def test_settings_that_come_later_leave_the_first_ones_they_do_not_name(tmp_path: Path) -> None:
+    (tmp_path / "a.py").write_text("class A:\n    def f(self): pass\n\ndef g(x):\n    x.f()\n\nunbound\n")
+    given = {"initializationOptions": {"certainty": "certain", "diagnostics": ["syntax"]}}
+    with Client(tmp_path.resolve(), given=given, settings={"quillet": {"diagnostics": ["unbound-name"]}}) as client:
+        client.open("a.py")
+        client.Wait(
+            lambda told: (
+                told.get("method") == "textDocument/publishDiagnostics"
+                and [at["code"] for at in told["params"]["diagnostics"]] == ["unbound-name"]
+            )
+        )
+        found = client.ask("references", "a.py", "f(self)", context={"includeDeclaration": True})
+        assert client.shown(found) == ["a.py:1:8-9"]
+        client.settings["quillet"] = {"certainty": "by name", "diagnostics": []}
+        client.Tell("workspace/didChangeConfiguration", {"settings": {}})
+        client.Wait(
+            lambda told: (
+                told.get("method") == "textDocument/publishDiagnostics" and not told["params"]["diagnostics"]
+            )
+        )
+        found = client.ask("references", "a.py", "f(self)", context={"includeDeclaration": True})
+        assert client.shown(found) == ["a.py:1:8-9", "a.py:4:6-7"]
+
+
 def test_python_2_and_type_comments(tmp_path: Path) -> None:
     text = "print 'old'\nx = u'a' <> 3L\ndef f(a, b):\n    # type: (int, str) -> str\n    return b\nf(1, '').upper()\n"
     (tmp_path / "pyproject.toml").write_text('[tool.quillet]\nversion = "2.7"\n')

@@ -8,11 +8,15 @@ that led there, and where none is open in that of the project that it lies in.
 from __future__ import annotations
 
 import os
-from collections.abc import Callable, Iterable, Mapping
-from typing import Any
 
-from quillet._workspace import Columns, Workspace
 from quillet.settings import Settings, SettingsError, load_settings
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable, Iterable, Mapping
+    from typing import Any
+
+    from quillet._workspace import Columns, Workspace
 
 CLIENT = "the editor's settings"
 
@@ -37,6 +41,8 @@ class Projects:
         self._complain = complain
         self._is_changed = is_changed
         self._folders: list[str] = []
+        # What the client said first holds wherever its settings say nothing else later.
+        self._first: Mapping[str, Any] = {}
         self._client: Mapping[str, Any] = {}
         self._projects: list[Project] = []
         self._last: Project | None = None
@@ -76,7 +82,7 @@ class Projects:
 
     def start(self, folders: Iterable[str], client: Mapping[str, Any]) -> None:
         self._folders = list(dict.fromkeys(folders))
-        self._client = client
+        self._first = self._client = client
         self.reload()
 
     def change_folders(self, added: Iterable[str], removed: Iterable[str]) -> None:
@@ -85,6 +91,7 @@ class Projects:
         self.reload()
 
     def change_client(self, client: Mapping[str, Any]) -> None:
+        client = {**self._first, **client}
         if client != self._client:
             self._client = client
             self.reload()
