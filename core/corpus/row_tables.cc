@@ -284,7 +284,7 @@ class OccurrenceRows : public RowTable {
              column + static_cast<int32_t>(bindings.TextOf(occurrence).size()));
     AddShown(bindings.TextOf(occurrence), texts_);
     roles_.Add(NameRoleWords()[static_cast<size_t>(occurrence.role)]);
-    if (occurrence.kind != NameKind::kNone)
+    if (occurrence.binds())
       kinds_.Add(NameKindWords()[static_cast<size_t>(occurrence.kind) - 1]);
     else
       kinds_.AddNone();

@@ -241,7 +241,7 @@ void Inference::FindMembers(ClassId cls) {
     if (bindings.symbols[symbol].variable != symbol) continue;
     for (const uint32_t i : file->occurrences().Of(symbol)) {
       const Occurrence& occurrence = bindings.occurrences[i];
-      if (occurrence.kind == NameKind::kNone) continue;
+      if (!occurrence.binds()) continue;
       info.symbols.emplace(Kept(bindings.TextOf(occurrence)), symbol);  // as spelled: attributes are not mangled
       break;
     }
@@ -416,8 +416,7 @@ void Inference::FindOutsideWrites(ClassId cls) {
     if (variable == kNoIndex || std::ranges::find(made, variable) != made.end()) continue;
     // One that is given nothing else.
     size_t count = 0;
-    for (const uint32_t other : file->occurrences().Of(variable))
-      count += bindings.occurrences[other].kind != NameKind::kNone;
+    for (const uint32_t other : file->occurrences().Of(variable)) count += bindings.occurrences[other].binds();
     if (count == 1) made.push_back(variable);
   }
   for (const uint32_t variable : made) add(variable, false);

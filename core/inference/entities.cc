@@ -14,7 +14,7 @@ Inference::BoundEntities Inference::FindEntitiesOfVariable(const SourceFile& fil
   bool has_own = false;
   for (const uint32_t i : file.occurrences().Of(variable)) {
     const Occurrence& other = file.bindings.occurrences[i];
-    if (other.kind == NameKind::kNone) continue;
+    if (!other.binds()) continue;
     result.is_bound = true;
     if (other.kind != NameKind::kImport) {
       has_own = true;

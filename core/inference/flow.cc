@@ -241,7 +241,6 @@ bool Flow::IsSure(uint32_t binding, uint32_t place, bool holds) {
       case ExprKind::kCompare:
         if (!holds_place && syntax_.ChildOf(parent, 0) != expr && syntax_.ChildOf(parent, 1) != expr) return false;
         break;
-      case ExprKind::kComprehensionFor:
       case ExprKind::kListComprehension:
       case ExprKind::kSetComprehension:
       case ExprKind::kDictComprehension:

@@ -287,7 +287,7 @@ void Inference::FindCallsOfName(const SourceFile& file, uint32_t occurrence, std
   size_t count = 0;
   for (const uint32_t i : file.occurrences().Of(variable)) {
     const Occurrence& use = file.bindings.occurrences[i];
-    if (use.kind != NameKind::kNone || ++count > kMaxUses) continue;
+    if (use.binds() || ++count > kMaxUses) continue;
     const ExprId named = file.syntax.NamedAt(use.begin);
     if (named != kNoExpr) FindCallsOfUse(file, named, calls, depth);
   }

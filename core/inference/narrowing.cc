@@ -324,7 +324,7 @@ Value Inference::Assigned(const SourceFile& file, ExprId expr, Value value, Fram
   if (uses.size() > kMaxLooks) return value;
   for (const uint32_t i : uses) {
     const Occurrence& other = file.bindings.occurrences[i];
-    if (other.kind != NameKind::kNone) {
+    if (other.binds()) {
       if (other.kind != NameKind::kParameter) offsets.push_back(other.begin);
       continue;
     }
@@ -496,7 +496,7 @@ std::vector<Inference::Condition> Inference::ConditionsOn(const SourceFile& file
         last_bound = other.begin;
         break;
       }
-      if (other.kind != NameKind::kNone && other.kind != NameKind::kParameter) {
+      if (other.binds() && other.kind != NameKind::kParameter) {
         const ExprId named = syntax.NamedAt(other.begin);
         const bool is_walrus = named != kNoExpr && syntax[named].parent != kNoExpr &&
                                syntax[syntax[named].parent].kind == ExprKind::kNamed;

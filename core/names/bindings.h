@@ -67,6 +67,9 @@ struct Occurrence {
   uint32_t is_attribute : 1;
   uint32_t has_symbol : 1;
   uint32_t receiver_distance : 18;  // how many occurrences in front the receiver stands; 0 for none
+
+  // Whether the name is given something here: uses have no kind.
+  bool binds() const { return kind != NameKind::kNone; }
 };
 static_assert(sizeof(Occurrence) == 16, "every name of a source has one");
 

@@ -185,7 +185,7 @@ class OccurrenceColumns : public ResultTable {
     end_columns_.push_back(column + static_cast<uint32_t>(bindings.TextOf(occurrence).size()));
     AddShown(bindings.TextOf(occurrence), texts_);
     roles_.push_back(static_cast<int8_t>(occurrence.role));
-    have_kinds_.Add(occurrence.kind != NameKind::kNone);
+    have_kinds_.Add(occurrence.binds());
     kinds_.push_back(static_cast<int8_t>(std::max(static_cast<int>(occurrence.kind) - 1, 0)));
     for (size_t bit = 0; bit < flags_.size(); ++bit) flags_[bit].Add((occurrence.flags >> bit & 1) != 0);
     const uint32_t receiver = bindings.ReceiverOf(i);

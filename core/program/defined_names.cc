@@ -91,7 +91,7 @@ class DefinitionsMaker {
     seen_.assign(bindings.symbols.size(), 0);
     for (uint32_t i = 0; i < bindings.occurrences.size(); ++i) {
       const Occurrence& occurrence = bindings.occurrences[i];
-      if (occurrence.kind == NameKind::kNone ? !IsOfSelf(bindings, i) : !IsDefinition(bindings, occurrence)) continue;
+      if (!occurrence.binds() ? !IsOfSelf(bindings, i) : !IsDefinition(bindings, occurrence)) continue;
       Definition definition{};
       definition.begin = occurrence.begin;
       const Position place = bindings.PositionOf(occurrence.begin);
@@ -101,7 +101,7 @@ class DefinitionsMaker {
       definition.column = IsAscii(source, line_begin, end) ? place.col + 1 : 0;
       definition.role = occurrence.role;
       definition.kind = occurrence.kind;
-      definition.of_self = occurrence.kind == NameKind::kNone;
+      definition.of_self = !occurrence.binds();
       const uint32_t scope = bindings.ScopeOf(occurrence);
       definition.in_class = bindings.scopes[scope].kind == NameScopeKind::kClass;
       definition.name = NumberOf(bindings, occurrence.text);

@@ -27,8 +27,7 @@ class Painter {
   ColouredName Of(uint32_t index) {
     const Occurrence& occurrence = bindings_.occurrences[index];
     Colour colour = ColourOf(index, occurrence);
-    if (occurrence.kind != NameKind::kNone && occurrence.role == NameRole::kDefinition)
-      colour.modifiers |= kTokenDeclaration;
+    if (occurrence.binds() && occurrence.role == NameRole::kDefinition) colour.modifiers |= kTokenDeclaration;
     if (occurrence.role == NameRole::kWrite || occurrence.role == NameRole::kDelete)
       colour.modifiers |= kTokenModification;
     if ((occurrence.flags & kNameDecorator) != 0 && colour.kind == TokenKind::kFunction)
@@ -100,7 +99,7 @@ class Painter {
     bool is_bound = false;
     for (const uint32_t at : file_.occurrences().Of(variable)) {
       const Occurrence& occurrence = bindings_.occurrences[at];
-      if (occurrence.kind == NameKind::kNone) continue;
+      if (!occurrence.binds()) continue;
       const Colour colour = OfBinding(occurrence);
       if (!is_bound) found = colour;
       is_bound = true;

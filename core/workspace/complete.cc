@@ -171,7 +171,7 @@ void Workspace::Impl::AddModuleNames(ModuleId module, Text prefix, std::vector<C
       bool binds = false, is_import = false, is_re_export = !file->is_stub;
       for (const uint32_t i : file->occurrences().Of(symbol)) {
         const Occurrence& occurrence = bindings.occurrences[i];
-        if (occurrence.kind == NameKind::kNone) continue;
+        if (!occurrence.binds()) continue;
         if (!inference.IsReachable(*file, file->syntax.StatementAt(occurrence.begin))) continue;
         binds = true;
         if (occurrence.kind == NameKind::kImport) is_import = true;
@@ -240,7 +240,7 @@ void Workspace::Impl::AddNames(const SourceFile& file, uint32_t offset, Text pre
       const Text name = bindings.texts[bindings.symbols[symbol].name];
       if (!Fits(name, prefix)) continue;
       const bool binds = std::ranges::any_of(file.occurrences().Of(symbol), [&](uint32_t i) {
-        return bindings.occurrences[i].kind != NameKind::kNone && bindings.occurrences[i].begin != begin_of_name;
+        return bindings.occurrences[i].binds() && bindings.occurrences[i].begin != begin_of_name;
       });
       if (!binds || !seen.insert(std::string(name)).second) continue;
       found.push_back({std::string(name), KindOfSymbol(file, symbol, false), {}, {}, Certainty::kCertain});

@@ -317,7 +317,7 @@ std::string Workspace::Impl::KindOf(TypeId type, bool is_member) {
 Value Workspace::Impl::ValueAt(const SourceFile& file, uint32_t index) {
   const Occurrence& occurrence = file.bindings.occurrences[index];
   const FileSyntax& syntax = file.syntax;
-  if (occurrence.kind != NameKind::kNone || (occurrence.is_attribute && occurrence.role == NameRole::kWrite)) {
+  if (occurrence.binds() || (occurrence.is_attribute && occurrence.role == NameRole::kWrite)) {
     if (occurrence.kind == NameKind::kParameter || occurrence.kind == NameKind::kVariable ||
         occurrence.kind == NameKind::kClass || occurrence.kind == NameKind::kFunction || occurrence.is_attribute) {
       const Value value = inference.ValueOfBinding({file.id, occurrence.begin});

@@ -29,7 +29,7 @@ Location Workspace::Impl::AtOccurrence(const SourceFile& file, uint32_t index, C
   location.begin = occurrence.begin;
   location.end = file.bindings.EndOf(occurrence);
   location.role = NameRoleWords()[static_cast<size_t>(occurrence.role)];
-  if (occurrence.kind != NameKind::kNone) location.kind = NameKindWords()[static_cast<size_t>(occurrence.kind) - 1];
+  if (occurrence.binds()) location.kind = NameKindWords()[static_cast<size_t>(occurrence.kind) - 1];
   location.certainty = certainty;
   return location;
 }
@@ -331,13 +331,13 @@ std::vector<Location> Workspace::Definitions(FileId id, uint32_t offset) {
   if (index == kNoIndex) return in.KeyDefinitions(*file, offset);
   const Occurrence& occurrence = file->bindings.occurrences[index];
   std::vector<Location> found;
-  if (occurrence.has_symbol && occurrence.kind != NameKind::kNone && occurrence.kind != NameKind::kImport &&
+  if (occurrence.has_symbol && occurrence.binds() && occurrence.kind != NameKind::kImport &&
       occurrence.role != NameRole::kRead) {
     found.push_back(in.AtOccurrence(*file, index, Certainty::kCertain));
     in.AddFixture(*file, index, found);
     return found;
   }
-  if (occurrence.has_symbol && occurrence.kind == NameKind::kNone) {
+  if (occurrence.has_symbol && !occurrence.binds()) {
     for (const Binding& binding : in.inference.BindingsReaching(*file, index)) {
       const uint32_t at = file->OccurrenceBeginningAt(binding.offset);
       if (at != kNoIndex && file->bindings.occurrences[at].kind == NameKind::kImport) {

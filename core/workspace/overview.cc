@@ -614,8 +614,8 @@ std::vector<Location> Workspace::Named(Text dotted) {
       const Occurrence& occurrence = file->bindings.occurrences[i];
       if (file->bindings.TextOf(occurrence) != last) continue;
       const bool is_self = occurrence.is_attribute && occurrence.role == NameRole::kWrite;
-      if (!is_self && (occurrence.kind == NameKind::kNone || occurrence.kind == NameKind::kImport ||
-                       occurrence.kind == NameKind::kParameter))
+      if (!is_self &&
+          (!occurrence.binds() || occurrence.kind == NameKind::kImport || occurrence.kind == NameKind::kParameter))
         continue;
       uint32_t scope = file->bindings.ScopeOf(occurrence);
       if (is_self) scope = file->bindings.scopes[scope].parent;

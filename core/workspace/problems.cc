@@ -89,7 +89,7 @@ std::vector<Problem> Workspace::Problems(FileId id) {
                           (is_path ? "no module named '" : "nothing is named '") + name + (is_path ? "'" : "' there")});
       continue;
     }
-    if (!occurrence.has_symbol || has_star || occurrence.kind != NameKind::kNone ||
+    if (!occurrence.has_symbol || has_star || occurrence.binds() ||
         (occurrence.flags & (kNameString | kNameComment)) != 0 ||
         (occurrence.role != NameRole::kRead && occurrence.role != NameRole::kCall))
       continue;
@@ -98,8 +98,7 @@ std::vector<Problem> Workspace::Problems(FileId id) {
     if (is_new) {
       const Text name = bindings.texts[bindings.symbols[variable].name];
       const bool is_bound = std::ranges::any_of(file->occurrences().Of(variable), [&](uint32_t at) {
-        return bindings.occurrences[at].kind != NameKind::kNone ||
-               bindings.occurrences[at].role == NameRole::kDeclaration;
+        return bindings.occurrences[at].binds() || bindings.occurrences[at].role == NameRole::kDeclaration;
       });
       known->second = !is_bound && std::ranges::find(kModuleNames, name) == kModuleNames.end() &&
                       builtins != kNoModule && !in.inference.IsBuiltin(name);

@@ -308,7 +308,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
       const uint32_t variable = bindings.VariableOf(other);
       Certainty certainty = Certainty::kCertain;
       bool meets = false;
-      if (has_member && variable != kNoIndex && other.kind != NameKind::kNone) {
+      if (has_member && variable != kNoIndex && other.binds()) {
         const uint32_t scope = bindings.ScopeOf(other);
         if (bindings.scopes[scope].kind == NameScopeKind::kClass) definers.emplace(id, scope);
       }
@@ -357,8 +357,7 @@ std::vector<Workspace::Impl::Hit> Workspace::Impl::Uses(const SourceFile& file, 
         }
       }
       const bool is_foreign = id != own && !IsProject(id) && !files.IsOpen(id);
-      if (meets &&
-          (!is_foreign || other.kind != NameKind::kNone || (other.is_attribute && other.role == NameRole::kWrite)))
+      if (meets && (!is_foreign || other.binds() || (other.is_attribute && other.role == NameRole::kWrite)))
         hits.push_back({AtOccurrence(*source, i, certainty), id, i});
     }
     // Names in `__all__`.
