@@ -56,7 +56,7 @@ bool IsUnusualNumber(const Token& number, const Token* next, bool underscores_ar
   const Text text = number.view();
   const char last = static_cast<char>(text.back() | 0x20);
   if (last == 'l') return true;
-  if (text[0] == '0' && IsAsciiDigit(text[1])) return true;
+  if (text[0] == '0' && (IsAsciiDigit(text[1]) || text[1] == '_')) return true;
   return !underscores_are_known && text.find('_') != Text::npos;
 }
 
@@ -181,6 +181,12 @@ uint8_t CloserLook::DoubtOf(const LogicalLine& line) const {
   return doubt;
 }
 
+bool CloserLook::MayBeInScope(TokenSpan toks, size_t i) const {
+  return std::ranges::any_of(toks.first(i), [this](const Token& token) {
+    return token.code == word::kLambda || (minor_ >= 14 && (token.code == tok::COLON || token.code == tok::RARROW));
+  });
+}
+
 uint8_t CloserLook::DoubtOfToken(const LogicalLine& line, size_t i) const {
   const Token& token = line.toks[i];
   const Token* const next = i + 1 < line.toks.size() ? &line.toks[i + 1] : nullptr;
@@ -195,11 +201,12 @@ uint8_t CloserLook::DoubtOfToken(const LogicalLine& line, size_t i) const {
       if (python3_ && i > 0 && line.toks[i - 1].code == tok::LPAR) return kEverywhere;
       return next != nullptr && next->code == word::kFrom ? kOutsideOfFunction | kInAsync : kOutsideOfFunction;
     case word::kAwait:
-      // A comprehension in another could not wait before 3.11.
-      return minor_ < 11 ? kEverywhere : kOutsideOfAsync;
+      // A comprehension in another could not wait before 3.11, and nor can a lambda, or an annotation from 3.14 on.
+      return minor_ < 11 || MayBeInScope(line.toks, i) ? kEverywhere : kOutsideOfAsync;
     case word::kAsync: {
       const bool is_waiting = next != nullptr && (next->code == word::kFor || next->code == word::kWith);
-      return static_cast<uint8_t>((minor_ < 11 ? kInAsync : kNowhere) | (is_waiting ? kOutsideOfAsync : kNowhere));
+      const bool is_odd = minor_ < 11 || MayBeInScope(line.toks, i);
+      return static_cast<uint8_t>((is_odd ? kInAsync : kNowhere) | (is_waiting ? kOutsideOfAsync : kNowhere));
     }
     case word::kNonlocal:
       return kInModule;

@@ -46,6 +46,8 @@ class CloserLook {
                                 (place.in_async_def ? kInAsync : kOutsideOfAsync));
   }
   uint8_t DoubtOf(const LogicalLine& line) const;
+  // Whether a token may stand in a lambda or an annotation, by those in front of it.
+  bool MayBeInScope(TokenSpan toks, size_t i) const;
   uint8_t DoubtOfToken(const LogicalLine& line, size_t i) const;
 
   const bool python3_;

@@ -53,8 +53,6 @@ std::optional<SyntaxError> CPGenAnalyzerImpl::AnalyzeCompletely(LogicalLine& log
   rejection_.reset();
   was_rejected_ = true;
   try {
-    if (logical.has_records()) [[unlikely]]
-      logical.ClearDerivedInfo();
     InspectCompletely(logical, place, is_doubtful);
     if (rejection_) [[unlikely]] {
       logical.ClearDerivedInfo();

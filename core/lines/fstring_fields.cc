@@ -133,11 +133,21 @@ class FieldScan {
     return next < end_ && (*next == '}' || *next == ':' || (*next == '!' && (next + 1 == end_ || next[1] != '=')));
   }
 
-  // Over blanks, line ends and comments behind an expression.
+  // Over blanks, line ends and comments behind an expression; those that tell templates from names know of joined
+  // lines.
   const char* SkipToTail(const char* at) const {
-    while ((at = SkipBlanksAndLineEnds(at, end_)) < end_ && *at == '#') at = FindAny<'\n', '\r'>(at, end_);
-    return at;
+    for (;;) {
+      at = SkipBlanksAndLineEnds(at, end_);
+      if (at < end_ && *at == '#')
+        at = FindAny<'\n', '\r'>(at, end_);
+      else if (templates_ && IsJoin(at))
+        ++at;
+      else
+        return at;
+    }
   }
+
+  bool IsJoin(const char* at) const { return at + 1 < end_ && *at == '\\' && IsLineEnd(at[1]); }
 
   bool HasExpression() const {
     return std::any_of(tokens_.begin() + static_cast<ptrdiff_t>(field_begin_), tokens_.end(),
@@ -147,7 +157,12 @@ class FieldScan {
   // "=", "!r" and the end of the field or ":"; false where something else follows, which then is
   // scanned behind an error token.
   bool ScanFieldTail() {
-    if (*at_ == '=') at_ = SkipToTail(at_ + 1);
+    if (*at_ == '=') {
+      const char* const sign = at_;
+      at_ = SkipToTail(at_ + 1);
+      for (const char* at = sign; templates_ && at < at_; ++at)
+        if (IsJoin(at)) tokens_.push_back({at, 1, tok::BACKSLASH});
+    }
     if (*at_ == '!') {
       const char* sign = at_++;
       const char* name = at_;

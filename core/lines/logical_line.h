@@ -181,7 +181,6 @@ class LogicalLine {
     return store_ ? std::span<const Record>(store_->arg_rows.data() + arg_row_begin_, arg_row_count_)
                   : std::span<const Record>();
   }
-  bool has_records() const { return (row_count_ | arg_row_count_) != 0; }
   // Where text that records refer to may be composed.
   TextArena& texts() { return store().texts; }
 

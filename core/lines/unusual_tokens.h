@@ -125,7 +125,8 @@ class UnusualTokens {
     const char next = *(number.data() + number.size());
     if (IsAsciiIdentifierByte(next) || static_cast<unsigned char>(next) >= 0x80) return false;
     if (number.size() == 1) return true;
-    if ((number.back() | 0x20) == 'l' || (number[0] == '0' && IsAsciiDigit(number[1]))) return false;
+    if ((number.back() | 0x20) == 'l' || (number[0] == '0' && (IsAsciiDigit(number[1]) || number[1] == '_')))
+      return false;
     return python3_ || number.find('_') == Text::npos;
   }
 

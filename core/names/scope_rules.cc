@@ -120,6 +120,8 @@ class ScopeRules : public NameRules {
       const Occurrence& occurrence = names_->occurrences[number];
       if (!occurrence.has_symbol || occurrence.place != symbol || occurrence.is_attribute) continue;
       if ((occurrence.flags & (kNameComment | kNameString)) != 0) continue;
+      // From 3.14 on none is of the scope it stands in.
+      if (version_.AtLeast(3, 14) && (occurrence.flags & kNameAnnotation) != 0) continue;
       switch (occurrence.role) {
         case NameRole::kRead:
         case NameRole::kCall:

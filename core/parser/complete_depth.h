@@ -53,18 +53,30 @@ bool CompleteParser::Try(Rule&& rule) {
   const size_t mark = nodes_.size();
   const size_t start = at_;
   const size_t waits = waits_.size();
+  const size_t assigned = assigned_.size();
+  const size_t banned = banned_.size();
+  const RestoredValue<std::optional<ParseError>> postponed(postponed_, postponed_);
+  const RestoredValue<Judge> judge(judge_, judge_);
   const RestoredValue<bool> trying(is_trying_, true);
   rule();
   const bool is_read = !failed_;
-  failed_ = false;
-  failure_.reset();
-  codes_ = code_.data();
-  for (size_t i = mark; i < nodes_.size(); ++i) factory_.pool().Reclaim(nodes_[i]);
-  nodes_.resize(mark);
-  waits_.resize(std::min(waits, waits_.size()));
   furthest_ = std::max(furthest_, at_);
+  waits_.resize(std::min(waits, waits_.size()));
+  assigned_.resize(assigned);
+  banned_.erase(banned_.begin() + static_cast<ptrdiff_t>(std::min(banned, banned_.size())), banned_.end());
+  Revive(mark);
   at_ = start;
   return is_read;
+}
+
+template <class Rule>
+void CompleteParser::InTypeScope(const char* name, Rule&& rule) {
+  if (name == nullptr) return rule();
+  const RestoredValue<const char*> type_scope(type_scope_, name);
+  const size_t banned = banned_.size();
+  const size_t waits = waits_.size();
+  rule();
+  JudgeTypeScope(banned, waits);
 }
 
 template <class T>

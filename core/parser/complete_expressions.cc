@@ -33,8 +33,6 @@ enum Level : int {
   kNoLevel
 };
 
-constexpr char kAsyncComprehensionOutside[] = "asynchronous comprehension outside of an asynchronous function";
-
 bool IsBytesLiteral(Text text) {
   for (const char c : text) {
     if (c == '"' || c == '\'') return false;
@@ -52,6 +50,7 @@ void CompleteParser::TestOrStar() {
   if (!Since(0)) FailHere();
   const size_t mark = Mark();
   PushLeaf();
+  if (brackets_ > 0 && !BeginsExpression(Code())) Fail("Invalid star expression");
   Binary(kBitOrLevel);
   Finish(symbols_.star_expr, mark);
 }
@@ -77,13 +76,14 @@ void CompleteParser::TargetList(TargetUse use) {
   const size_t mark = Mark();
   const size_t start = at_;
   const auto one = [this] {
-    if (Code() == tok::STAR) return TestOrStar();
-    Binary(kBitOrLevel);
+    if (Code() != tok::STAR) return Binary(kBitOrLevel);
+    if (!BeginsExpression(CodeAt(1))) FailGeneric(at_ + 1);
+    TestOrStar();
   };
   one();
   while (Code() == tok::COMMA) {
     PushLeaf();
-    if (!BeginsExpression(Code()) && Code() != tok::STAR) break;
+    if (!BeginsExpression(Code() == tok::STAR ? CodeAt(1) : Code())) break;
     one();
   }
   Finish(symbols_.exprlist, mark);
@@ -103,6 +103,7 @@ void CompleteParser::TargetList(TargetUse use) {
     StarExpressions(symbols_.exprlist);
   }
   CheckTarget(Top(), use, false);
+  if (comprehension_ != nullptr && python3_) FailAt(stopped, "'in' expected after for-loop variables");
   FailGeneric(stopped);
 }
 
@@ -112,9 +113,7 @@ void CompleteParser::NamedTest() {
   Test();
   if (Code() == tok::COLONEQUAL) {
     if (!Since(8)) RequireAt(at_, 8, "Assignment expressions are");
-    if (at_ != start + 1 || !IsName(code_[start])) {
-      FailAtNode(Top(), std::string("cannot use assignment expressions with ") + NameOfExpression(Top()));
-    }
+    if (at_ != start + 1 || !IsName(code_[start])) FailAtAssigned();
     CheckWalrus(start);
     PushLeaf();
     Test();
@@ -122,6 +121,13 @@ void CompleteParser::NamedTest() {
   } else if (Code() == tok::EQUAL) {
     FailAtEqual(start, mark);
   }
+}
+
+// At the ":=" behind what is no name.
+void CompleteParser::FailAtAssigned() {
+  const bool is_assignment = Try([&] { Skip(), Test(); });
+  if (!is_assignment) FailHere();
+  FailAtNode(Top(), std::string("cannot use assignment expressions with ") + NameOfExpression(Top()));
 }
 
 // `if x = 1:` and `(f() = 1)`.
@@ -157,13 +163,16 @@ void CompleteParser::Test() {
       CheckBetween(start, mark);
     return;
   }
+  const size_t end = end_;
   PushLeaf();
   Binary(kOrLevel);
   if (Code() != word::kElse) {
+    if (!failed_) end_ = end;
     if (Code() == tok::COLON) FailHere();
     FailAtNode(nodes_[mark], "expected 'else' after 'if' expression");
   }
   PushLeaf();
+  if (python3_ && !BeginsExpression(Code())) Fail("expected expression after 'else', but statement is given");
   Test();
   Finish(symbols_.test, mark);
 }
@@ -177,18 +186,38 @@ void CompleteParser::CheckBetween(size_t start, size_t mark) {
       first == word::kMatch || first == word::kCase || first == word::kUnderscore || first == word::kType;
   const bool is_prefix = IsNameCode(first) && code_[start + 1] == tok::STRING;
   if (!is_legacy && (is_soft || is_prefix)) return;
-  const bool is_read = Try([&] {
-    if (is_legacy)
-      StarExpressions(symbols_.testlist_star_expr);
-    else
-      Test();
-  });
-  if (!is_read) return;
-  if (is_legacy) {
+  if (is_legacy && Try([&] { StarExpressions(symbols_.testlist_star_expr); })) {
     const std::string name(TokenAt(start).view());
     FailAt(start, "Missing parentheses in call to '" + name + "'. Did you mean " + name + "(...)?");
   }
+  if (is_legacy) return;
+  if (python3_ && first == tok::STRING && code_[start + 1] != tok::STRING) {
+    size_t behind = start + 1;
+    do behind = EndOfExpression(behind);
+    while (behind != kNowhere && code_[behind] != tok::STRING);
+    if (behind != kNowhere) FailAt(start + 1, "invalid syntax. Is this intended to be part of the string?");
+  }
+  if (EndOfExpression(second) == kNowhere) return;
   if (brackets_ > 0) FailAtNode(nodes_[mark], "invalid syntax. Perhaps you forgot a comma?");
+  // Where they stand in no brackets the second one may say more.
+  const bool says_more = code_[second] == word::kPrint || code_[second] == word::kExec || code_[second] == tok::STRING;
+  if (!python3_ || !says_more || !BeginsExpression(code_[second + 1])) return;
+  Skip();
+  CheckBetween(second, mark);
+}
+
+// As far as one can be read, whatever follows.
+size_t CompleteParser::EndOfExpression(size_t from) {
+  const size_t start = at_;
+  const RestoredValue<int> level(end_level_, brackets_);
+  const RestoredValue<size_t> end(end_, kNowhere);
+  at_ = from;
+  Try([this] {
+    Test();
+    if (!failed_) end_ = at_;
+  });
+  at_ = start;
+  return end_;
 }
 
 // The condition of a comprehension in front of 3.9.
@@ -206,9 +235,12 @@ void CompleteParser::Lambda() {
   if (Code() != tok::COLON) Parameters(/*is_lambda=*/true, tok::COLON);
   Expect(tok::COLON, nullptr);
   const RestoredValue<StatementPlace> place(place_, {StatementPlace::Scope::kFunction});
+  const RestoredValue<const char*> type_scope(type_scope_, nullptr);
   const size_t outer_waits = waits_.size();
+  const size_t body = at_;
   Test();
   JudgeWaits(outer_waits);
+  DropBanned(body);
   yield_at_ = kNowhere;
   Finish(symbols_.lambdef, mark);
 }
@@ -260,7 +292,8 @@ void CompleteParser::Operator(int level) {
     return PushLeaf();
   }
   const size_t mark = Mark();
-  if (Code() == tok::NOTEQUAL && python3_ && TokenAt(at_).view() == "<>") FailHere();
+  if (Code() == tok::NOTEQUAL && python3_ && TokenAt(at_).view() == "<>")
+    Fail("invalid syntax.  Maybe you meant '!=' instead of '<>'?");
   const TokenCode code = Code();
   PushLeaf();
   if (code == word::kNot || (code == word::kIs && Code() == word::kNot)) {
@@ -316,7 +349,11 @@ void CompleteParser::AtomExpression() {
     Skip();
   }
   Atom();
-  while (Code() == tok::DOT || Code() == tok::LPAR || Code() == tok::LSQB) Trailer();
+  NoteEnd();
+  while (Code() == tok::DOT || Code() == tok::LPAR || Code() == tok::LSQB) {
+    Trailer();
+    NoteEnd();
+  }
   Finish(symbols_.atom_expr, mark);
 }
 
@@ -364,10 +401,19 @@ void CompleteParser::Atom() {
     case word::kFalse:
       return PushLeaf();
     default:
-      if (!IsName(Code())) FailHere();
+      if (!IsName(Code())) FailAtNoExpression();
       if (CodeAt(1) == tok::STRING && Since(14) && IsTemplateString(TokenAt(at_), TokenAt(at_ + 1))) return Templates();
       return PushLeaf();
   }
+}
+
+void CompleteParser::FailAtNoExpression() {
+  if (Code() == word::kPass || Code() == word::kBreak || Code() == word::kContinue) {
+    if (CodeAt(1) == word::kIf && python3_) Fail("expected expression before 'if', but statement is given");
+    // The language looks at what follows.
+    furthest_ = std::max(furthest_, at_ + 1);
+  }
+  FailHere();
 }
 
 void CompleteParser::Strings() {
@@ -392,6 +438,7 @@ void CompleteParser::Templates() {
   while (Code() == tok::NAME && CodeAt(1) == tok::STRING && IsTemplateString(TokenAt(at_), TokenAt(at_ + 1))) {
     const Token& prefix = TokenAt(at_);
     const Text text(prefix.text, static_cast<size_t>(TokenAt(at_ + 1).end() - prefix.text));
+    if (std::string wrong = WrongEscape(text, python3_); !wrong.empty()) Fail(std::move(wrong));
     nodes_.push_back(factory_.NewKeywordNode(text, Context::Index(index_[at_])));
     Skip();
     Skip();
@@ -562,7 +609,7 @@ void CompleteParser::Backquotes() {
 
 // ---- arguments and subscripts ----
 
-void CompleteParser::Arguments() {
+void CompleteParser::Arguments(bool is_of_class) {
   const size_t mark = Mark();
   DistinctNames keywords;
   bool has_keyword = false;
@@ -570,6 +617,7 @@ void CompleteParser::Arguments() {
   bool has_star = false;
   size_t count = 0;
   size_t generator = kNowhere;
+  size_t generator_for = kNowhere;
   while (Code() != tok::RPAR) {
     const size_t start = at_;
     const size_t argument = Mark();
@@ -581,6 +629,7 @@ void CompleteParser::Arguments() {
         FailAt(start, "iterable argument unpacking follows keyword argument unpacking");
       (is_star ? has_star : has_unpacked_keywords) = true;
       PushLeaf();
+      if (is_star && python3_ && !BeginsExpression(Code())) Fail("Invalid star expression");
       Test();
       if (Code() == tok::EQUAL) {
         FailAt(start, is_star ? "cannot assign to iterable argument unpacking"
@@ -609,25 +658,26 @@ void CompleteParser::Arguments() {
       Test();
       if (Code() == tok::COLONEQUAL) {
         if (!Since(8)) RequireAt(at_, 8, "Assignment expressions are");
-        if (at_ != start + 1 || !IsName(code_[start]))
-          FailAtNode(Top(), std::string("cannot use assignment expressions with ") + NameOfExpression(Top()));
+        if (at_ != start + 1 || !IsName(code_[start])) FailHere();
         CheckWalrus(start);
         PushLeaf();
         Test();
         if (Since(9) && IsComprehension()) {
           Finish(symbols_.namedexpr_test, argument);
+          generator_for = at_;
           Comprehension("generator expression", start);
           if (generator == kNowhere) generator = start;
         }
         Finish(symbols_.argument, argument);
         if (has_unpacked_keywords || has_keyword) FailPositional(has_unpacked_keywords);
       } else if (IsComprehension()) {
+        generator_for = at_;
         Comprehension("generator expression", start);
         Finish(symbols_.argument, argument);
         if (generator == kNowhere) generator = start;
       } else if (Code() == tok::EQUAL) {
         const bool was_taken = !Since(8) && isa<CAtom>(Top()) && IsNameInBrackets(Top());
-        if (!was_taken) FailAt(start, "expression cannot contain assignment, perhaps you meant \"==\"?");
+        if (!was_taken) FailAtNode(Top(), "expression cannot contain assignment, perhaps you meant \"==\"?");
         has_keyword = true;
         PushLeaf();
         Test();
@@ -644,6 +694,8 @@ void CompleteParser::Arguments() {
     if (generator != kNowhere && (Code() != tok::RPAR || Since(7)))
       FailAt(generator, "Generator expression must be parenthesized");
   }
+  // It is no list of bases.
+  if (generator != kNowhere && is_of_class && count == 1 && Since(7) && Code() == tok::RPAR) FailGeneric(generator_for);
   if (generator != kNowhere && count > 1) FailAt(generator, "Generator expression must be parenthesized");
   Finish(symbols_.arglist, mark);
 }
@@ -681,6 +733,7 @@ void CompleteParser::Subscript() {
     // Unlike the one in a list it takes all that an expression is.
     if (!Since(11)) FailHere();
     PushLeaf();
+    if (!BeginsExpression(Code())) Fail("Invalid star expression");
     Test();
     return Finish(symbols_.star_expr, mark);
   }
@@ -690,8 +743,7 @@ void CompleteParser::Subscript() {
     Test();
     if (Code() == tok::COLONEQUAL) {
       RequireAt(at_, 10, "Assignment expressions in subscripts are");
-      if (at_ != start + 1 || !IsName(code_[start]))
-        FailAtNode(Top(), std::string("cannot use assignment expressions with ") + NameOfExpression(Top()));
+      if (at_ != start + 1 || !IsName(code_[start])) FailAtAssigned();
       CheckWalrus(start);
       PushLeaf();
       Test();
@@ -727,6 +779,13 @@ void CompleteParser::Comprehension(const char* what, size_t start) {
   CheckAssignedWithin(
       static_cast<size_t>(std::find_if(assigned_.begin(), assigned_.end(), is_within) - assigned_.begin()));
   iterated_.resize(outer_names);
+  DropBanned(start);
+}
+
+void CompleteParser::DropBanned(size_t start) {
+  std::erase_if(banned_, [&](const Banned& banned) {
+    return banned.at >= start && (banned.at < first_iterable_begin_ || banned.at >= first_iterable_end_);
+  });
 }
 
 // What waits in the comprehension that was read, from `start` on, makes it asynchronous; what is in its first
@@ -763,14 +822,38 @@ void CompleteParser::JudgeWaits(size_t first) {
 
 // The names assigned to from the `first` on stand in the comprehension that was read.
 void CompleteParser::CheckAssignedWithin(size_t first) {
+  std::string type_scope;
+  if (type_scope_ == kGeneric || (type_scope_ != nullptr && in_generic_))
+    type_scope = std::string("within ") + kGeneric;
+  else if (type_scope_ != nullptr && type_scope_ != kAnnotation)
+    type_scope = std::string("in ") + (type_scope_ == kAlias ? kAlias : kBound);
   for (size_t i = first; i < assigned_.size(); ++i) {
     const Text name = TokenAt(assigned_[i]).view();
+    const bool is_iterated = assigned_[i] >= first_iterable_begin_ && assigned_[i] < first_iterable_end_;
+    if (!type_scope.empty() && !is_iterated)
+      Postpone(assigned_[i], "assignment expression within a comprehension cannot be used " + type_scope);
     if (place_.scope == StatementPlace::Scope::kClass)
       Postpone(assigned_[i], "assignment expression within a comprehension cannot be used in a class body");
     if (std::find(iterated_.begin(), iterated_.end(), name) != iterated_.end()) {
       Postpone(assigned_[i],
                "assignment expression cannot rebind comprehension iteration variable '" + std::string(name) + "'");
     }
+  }
+}
+
+// The names of a target from `target` on: what an assignment in it, or in a condition in front of it, binds.
+void CompleteParser::CheckRebound(size_t target, bool is_first) {
+  const auto tell = [this](size_t at) {
+    Postpone(at, "comprehension inner loop cannot rebind assignment expression target '" +
+                     std::string(TokenAt(at).view()) + "'");
+  };
+  for (const size_t name : assigned_) {
+    if (name >= target) tell(name);
+    if (is_first || name < first_iterable_end_) continue;
+    for (size_t at = target; at < at_; ++at)
+      if (TokenAt(at).view() == TokenAt(name).view() &&
+          std::ranges::any_of(iterated_, [&](Text text) { return text.data() == TokenAt(at).text; }))
+        tell(at);
   }
 }
 
@@ -792,8 +875,10 @@ void CompleteParser::ComprehensionTail(bool is_first) {
   }
   const size_t clause = Mark();
   PushLeaf();
+  const size_t target = at_;
   TargetList(TargetUse::kFor);
   AddIterated(Top());
+  CheckRebound(target, is_first);
   PushLeaf();
   const bool is_list = !python3_ && comprehension_[0] == 'l';
   {
@@ -844,6 +929,7 @@ void CompleteParser::Yield() {
   const size_t start = at_;
   using Scope = StatementPlace::Scope;
   yield_at_ = start;
+  if (type_scope_ != nullptr) banned_.push_back({start, "yield expression"});
   if (comprehension_ != nullptr && Since(8))
     Postpone(start, std::string("'yield' inside ") + comprehension_);
   else if (place_.scope == Scope::kModule || place_.scope == Scope::kClass)
@@ -868,7 +954,10 @@ void CompleteParser::Yield() {
 
 void CompleteParser::CheckWalrus(size_t name) {
   assigned_.push_back(name);
-  if (in_iterable_) Postpone(name, "assignment expression cannot be used in a comprehension iterable expression");
+  if (type_scope_ != nullptr) banned_.push_back({name, "named expression"});
+  const bool is_in_type_scope_itself = type_scope_ != nullptr && comprehension_ == nullptr;
+  if (in_iterable_ && !is_in_type_scope_itself)
+    Postpone(name, "assignment expression cannot be used in a comprehension iterable expression");
   if (TokenAt(name).view() == "__debug__") Postpone(name, "cannot assign to __debug__", kCompiler);
 }
 

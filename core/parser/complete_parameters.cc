@@ -33,13 +33,11 @@ void CompleteParser::Parameter(bool is_lambda, bool is_starred) {
   if (is_lambda || Code() != tok::COLON) return;
   if (!python3_) FailHere();
   PushLeaf();
-  const RestoredValue<bool> in_annotation(in_annotation_, true);
-  if (Code() == tok::STAR && is_starred) {
+  InTypeScope(AnnotationScope(), [&] {
+    if (Code() != tok::STAR || !is_starred) return Test();
     if (!Since(11)) FailHere();
     TestOrStar();
-  } else {
-    Test();
-  }
+  });
   Finish(symbols_.tfpdef, mark);
 }
 
@@ -48,7 +46,8 @@ bool CompleteParser::IsNamesInBrackets() const {
   size_t at = at_ + 1;
   while (IsName(code_[at])) {
     ++at;
-    if (code_[at] == tok::COMMA) ++at;
+    if (code_[at] != tok::COMMA) break;
+    ++at;
   }
   return at > at_ + 1 && code_[at] == tok::RPAR;
 }

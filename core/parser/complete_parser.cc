@@ -193,7 +193,9 @@ void CompleteParser::SetTokens(TokenSpan toks) {
   names_ = {};
   captures_ = {};
   in_field_ = false;
-  in_annotation_ = false;
+  type_scope_ = nullptr;
+  in_generic_ = false;
+  banned_.clear();
   in_iterable_ = false;
   comprehension_ = nullptr;
   yield_at_ = kNowhere;
@@ -230,6 +232,8 @@ void CompleteParser::CheckTokens() {
         return FailAt(at, "invalid decimal literal");
     } else if (code == tok::STRING) {
       CheckString(token, index_[at]);
+    } else if (code == tok::NAME && token.length <= 3 && code_[at + 1] == tok::STRING && python3_) {
+      if (TokenAt(at + 1).text == token.end()) CheckPrefix(token, index_[at]);
     } else if (code == tok::ERRORTOKEN) {
       if (in_field_) return FailAt(at, "f-string: invalid syntax");
       const Text text = token.view();
@@ -255,7 +259,7 @@ void CompleteParser::CheckNumber(const Token& token, int32_t index) {
   const Text text = token.view();
   if (text.size() == 1) return;
   const char last = static_cast<char>(text.back() | 0x20);
-  const bool is_based = text[0] == '0' && (text[1] | 0x20) >= 'a' && (text[1] | 0x20) != 'e' &&
+  const bool is_based = text[0] == '0' && IsAsciiLetter(text[1]) && (text[1] | 0x20) != 'e' &&
                         (text[1] | 0x20) != 'j' && (text[1] | 0x20) != 'l';
   if (text.find('_') != Text::npos && !Since(6)) {
     return FailAtToken(index, python3_ ? "Underscores in numeric literals are only supported in Python 3.6 and greater"
@@ -268,6 +272,18 @@ void CompleteParser::CheckNumber(const Token& token, int32_t index) {
       text.find_first_not_of("0_") != Text::npos) {
     return FailAtToken(
         index, "leading zeros in decimal integer literals are not permitted; use an 0o prefix for octal integers");
+  }
+}
+
+// Letters in front of a string that are a prefix each, and none together.
+void CompleteParser::CheckPrefix(const Token& token, int32_t index) {
+  const auto holds = [&](char letter) {
+    return std::ranges::count_if(token.view(), [&](char c) { return (c | 0x20) == letter; }) == 1;
+  };
+  if (static_cast<size_t>(std::ranges::count_if(Text("ubrft"), holds)) != token.length) return;
+  for (const Text pair : {"ub", "ur", "uf", "ut", "bf", "bt", "ft"}) {
+    if (!holds(pair[0]) || !holds(pair[1])) continue;
+    return FailAtToken(index, std::string("'") + pair[0] + "' and '" + pair[1] + "' prefixes are incompatible");
   }
 }
 
@@ -284,7 +300,7 @@ void CompleteParser::CheckString(const Token& token, int32_t index) {
     is_formatted |= letter == 'f';
   }
   if (is_formatted && !Since(6)) return FailAtToken(index, "invalid syntax");
-  if (python3_ && is_unicode && quote > 1) return FailAtToken(index, "invalid syntax");
+  if (python3_ && is_unicode && quote > 1) return FailAtToken(index, "'u' and 'r' prefixes are incompatible");
   // `ur` and `br`, and not the other way round.
   if (!python3_ && quote == 2 && (text[0] | 0x20) == 'r') return FailAtToken(index, "invalid syntax");
   if (!python3_ || !is_bytes) return;
@@ -333,7 +349,7 @@ void CompleteParser::FailAtToken(int32_t token, std::string message) {
                    Context::Index(token));
 }
 
-void CompleteParser::FailGeneric(size_t at) { FailAt(at, in_field_ ? "f-string: invalid syntax" : "invalid syntax"); }
+void CompleteParser::FailGeneric(size_t at) { FailAt(at, in_field_ ? "f-string: invalid syntax" : kInvalidSyntax); }
 
 void CompleteParser::FailAtNode(const CNode* node, std::string message) {
   if (failed_) return;
@@ -365,6 +381,15 @@ void CompleteParser::RequireAt(size_t at, int minor, const char* what) {
   if (Since(minor)) return;
   if (!python3_) FailGeneric(at);
   Postpone(at, std::string(what) + " only supported in Python 3." + std::to_string(minor) + " and greater");
+}
+
+void CompleteParser::Revive(size_t mark) {
+  failed_ = false;
+  failure_.reset();
+  codes_ = code_.data();
+  for (size_t i = mark; i < nodes_.size(); ++i) factory_.pool().Reclaim(nodes_[i]);
+  nodes_.resize(mark);
+  at_ = 0;
 }
 
 // ---- nodes ----
@@ -485,6 +510,7 @@ CNode* CompleteParser::ParseField(const LogicalLine& line, StatementPlace place)
       Yield();
     else
       StarExpressions(symbols_.testlist_star_expr);
+    CheckNoLoneStar(Top());
   });
 }
 

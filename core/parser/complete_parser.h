@@ -97,8 +97,20 @@ class CompleteParser {
     size_t at;
     bool is_comprehension;
   };
+  // Of a type scope: an assignment or a yield within it.
+  struct Banned {
+    size_t at;
+    const char* what;
+  };
   class Deeper;
   class InBracket;
+  // Type scopes that are told from the others.
+  static constexpr char kInvalidSyntax[] = "invalid syntax";
+  static constexpr char kAnnotation[] = "an annotation";
+  static constexpr char kAlias[] = "a type alias";
+  static constexpr char kBound[] = "a TypeVar bound";
+  static constexpr char kGeneric[] = "the definition of a generic";
+  static constexpr char kAsyncComprehensionOutside[] = "asynchronous comprehension outside of an asynchronous function";
   static constexpr size_t kNowhere = SIZE_MAX;
   // Of the operators, that of "|": what binds as tight may be a target.
   static constexpr int kTargetLevel = 4;
@@ -112,6 +124,7 @@ class CompleteParser {
   // What the language's tokeniser rejects, in front of all else.
   void CheckTokens();
   void CheckNumber(const Token& token, int32_t index);
+  void CheckPrefix(const Token& token, int32_t index);
   void CheckString(const Token& token, int32_t index);
   // The innermost bracket that stands open at the end, or -1.
   int32_t OpenBracket() const;
@@ -128,6 +141,8 @@ class CompleteParser {
   int32_t FirstTokenOf(const CNode* node) const;
   // A form that came with a later version: the statement is understood all the same.
   void RequireAt(size_t at, int minor, const char* what);
+  // As if nothing had failed, or been read, since the mark; from the first token on.
+  void Revive(size_t mark);
   // Reads by a rule and gives it up again; whether it could be read.
   template <class Rule>
   bool Try(Rule&& rule);
@@ -169,16 +184,19 @@ class CompleteParser {
 
   // ---- statements (complete_statements.cc) ----
   void Statement(LineKind kind);
+  template <class Rule>
+  void ExplainHead(Rule&& rule);
   void SimpleStatement();
   void Suite();
   void Colon();
+  bool EndsAtSemicolon() const;
   void ForcedColon();
   void IfOrWhile(int symbol);
   void Else();
   void TryClause();
   void Finally();
   void Except();
-  void ExceptTypes();
+  void ExceptTypes(bool is_star);
   void For();
   void With();
   bool WithItemsInBrackets();
@@ -192,6 +210,11 @@ class CompleteParser {
   void TypeParameter(bool& has_default);
   void FinishWithTypeParameters(int symbol, size_t mark, size_t parameters, size_t count);
   void TypeStatement();
+  // Reads by a rule what is a scope of its own in which nothing is assigned, yielded or awaited; of that name, or none.
+  template <class Rule>
+  void InTypeScope(const char* name, Rule&& rule);
+  void JudgeTypeScope(size_t first_banned, size_t first_wait);
+  const char* AnnotationScope() const;
   void Decorator();
   bool IsDottedDecorator() const;
   void ExpressionStatement();
@@ -223,10 +246,16 @@ class CompleteParser {
   void TestOrStar();
   void NamedOrStar();
   void NamedTest();
+  void FailAtAssigned();
   void FailAtEqual(size_t start, size_t mark);
   void Test();
   // Where two expressions stand side by side, the first of which is the node at `mark`: says so where that
   // explains something.
+  // Where the expression that begins there ends; kNowhere where there is none.
+  size_t EndOfExpression(size_t from);
+  void NoteEnd() {
+    if (!failed_ && brackets_ == end_level_) end_ = at_;
+  }
   void CheckBetween(size_t start, size_t mark);
   void OldTest();
   void Lambda();
@@ -238,6 +267,7 @@ class CompleteParser {
   void AtomExpression();
   void Trailer();
   void Atom();
+  void FailAtNoExpression();
   void Strings();
   void Templates();
   void Group();
@@ -248,7 +278,7 @@ class CompleteParser {
   void DictValue();
   void FailAtTarget(size_t start);
   void Backquotes();
-  void Arguments();
+  void Arguments(bool is_of_class = false);
   void FailAtTargetOf(size_t mark);
   void FailPositional(bool behind_unpacked);
   void Subscripts();
@@ -264,6 +294,9 @@ class CompleteParser {
   void JudgeWaits(size_t first);
   void CheckWalrus(size_t name);
   void CheckAssignedWithin(size_t first);
+  // Those from `start` on belong to a function or to a comprehension that was read.
+  void DropBanned(size_t start);
+  void CheckRebound(size_t target, bool is_first);
   void AddIterated(const CNode* target);
 
   // ---- targets (complete_targets.cc) ----
@@ -272,19 +305,27 @@ class CompleteParser {
   const CNode* InvalidTarget(const CNode* node, TargetUse use) const;
   const char* NameOfExpression(const CNode* node) const;
   bool IsBracketed(const CNode* node) const;
+  // What stands in brackets that only group it.
+  static const CNode* WithoutBrackets(const CNode* node);
   bool IsNameInBrackets(const CNode* node) const;
   bool IsBitwiseOr(const CNode* node) const;
+  bool BeginsWithBracketedTarget(const CNode* node) const;
+  // In the subscript that a chain ends with.
+  void CheckSubscriptStars(const CNode* node);
   void CheckNoLoneStar(const CNode* node);
   void CheckNoStars(const CNode* node);
 
   // ---- patterns (complete_patterns.cc) ----
   void Match();
+  void Subject();
   void Case();
+  void PatternsAndGuard();
   void Patterns();
   void MaybeStarPattern();
   void AsPattern();
   void OrPattern();
   void ClosedPattern();
+  void DottedValue();
   void NumberPattern();
   void ClassArguments();
   void SequencePattern(TokenCode close);
@@ -315,15 +356,19 @@ class CompleteParser {
   const LogicalLine* line_ = nullptr;  // where it is known
   size_t furthest_ = 0;                // the last token that was looked at in a reading that was given up
   bool is_trying_ = false;             // a reading that may be given up, which explains nothing
+  int end_level_ = -1;  // in how many brackets an expression stands whose end is looked for, and where it may be
+  size_t end_ = kNowhere;
   bool met_template_ = false;
   bool in_field_ = false;
-  bool in_annotation_ = false;
+  const char* type_scope_ = nullptr;     // what the language calls the one around, if any
+  bool in_generic_ = false;              // the head of a definition with type parameters
   bool in_iterable_ = false;             // of a comprehension
   const char* comprehension_ = nullptr;  // what the one around is called
   std::vector<size_t> assigned_;         // where names are assigned to within expressions
   std::vector<Text> iterated_;           // the names that the comprehensions around bind
   size_t yield_at_ = kNowhere;           // the last yield that was read
   std::vector<Wait> waits_;              // that no comprehension took yet
+  std::vector<Banned> banned_;           // what would be wrong if the type scope around held it itself
   bool has_async_for_ = false;           // the comprehension around
   size_t first_iterable_begin_ = 0;      // of the comprehension around
   size_t first_iterable_end_ = 0;

@@ -3,16 +3,29 @@
 // Captures are leaves, and every group is a node of a pattern, so that a walk tells what is bound by the
 // class alone; a dotted value is a chain as in any expression, which reads its links.
 #include <algorithm>
+#include <unordered_set>
 
 #include "parser/complete_depth.h"
 #include "parser/complete_parser.h"
+#include "parser/key_literal.h"
 
 namespace quillet {
+
+namespace {
+constexpr char kManyStars[] = "multiple starred names in sequence pattern";
+}  // namespace
 
 void CompleteParser::Match() {
   const size_t mark = Mark();
   RequireAt(at_, 10, "Pattern matching is");
   PushLeaf();
+  Subject();
+  if (AtEnd()) Fail("expected ':'");
+  Expect(tok::COLON, nullptr);
+  FinishBare<CMatchStmt>(mark);
+}
+
+void CompleteParser::Subject() {
   const size_t subject = Mark();
   // A lone star needs its comma.
   NamedOrStar();
@@ -23,15 +36,21 @@ void CompleteParser::Match() {
   }
   Finish(symbols_.testlist_comp, subject);
   if (isa<CStarExpression>(Top())) FailHere();
-  if (AtEnd()) Fail("expected ':'");
-  Expect(tok::COLON, nullptr);
-  FinishBare<CMatchStmt>(mark);
 }
 
 void CompleteParser::Case() {
   const size_t mark = Mark();
   RequireAt(at_, 10, "Pattern matching is");
   PushLeaf();
+  PatternsAndGuard();
+  if (AtEnd()) Fail("expected ':'");
+  Expect(tok::COLON, nullptr);
+  if (!AtEnd()) SimpleStatement();
+  captures_ = {};
+  FinishBare<CCaseStmt>(mark);
+}
+
+void CompleteParser::PatternsAndGuard() {
   Patterns();
   if (irrefutable_ != kNowhere && Code() != word::kIf) irrefutable_words_ = UnreachableBehind(irrefutable_);
   if (Code() == word::kIf) {
@@ -40,17 +59,14 @@ void CompleteParser::Case() {
     NamedTest();
     FinishBare<CNode>(guard);
   }
-  if (AtEnd()) Fail("expected ':'");
-  Expect(tok::COLON, nullptr);
-  if (!AtEnd()) SimpleStatement();
-  captures_ = {};
-  FinishBare<CCaseStmt>(mark);
 }
 
 // What stands behind "case": one pattern, or a sequence without brackets.
 void CompleteParser::Patterns() {
   const size_t mark = Mark();
+  const size_t start = at_;
   const bool is_star = Code() == tok::STAR;
+  int stars = is_star;
   MaybeStarPattern();
   if (Code() != tok::COMMA) {
     if (is_star) FailHere();
@@ -61,6 +77,7 @@ void CompleteParser::Patterns() {
   while (Code() == tok::COMMA) {
     PushLeaf();
     if (Code() == tok::COLON || Code() == word::kIf) break;
+    if (Code() == tok::STAR && ++stars == 2) Postpone(start, kManyStars, kCompiler);
     MaybeStarPattern();
   }
   irrefutable_ = kNowhere;
@@ -155,12 +172,24 @@ void CompleteParser::ClosedPattern() {
       break;
   }
   if (!IsName(Code())) FailHere();
-  if (CodeAt(1) != tok::DOT && CodeAt(1) != tok::LPAR) {
+  // The wildcard is nothing else.
+  const bool is_wildcard = Code() == word::kUnderscore;
+  if (is_wildcard || (CodeAt(1) != tok::DOT && CodeAt(1) != tok::LPAR)) {
     CheckCapture(at_);
     irrefutable_ = at_;
     return PushLeaf();
   }
   // A dotted value, or a class.
+  DottedValue();
+  if (Code() != tok::LPAR) return;
+  PushLeaf();
+  ClassArguments();
+  irrefutable_ = kNowhere;
+  FinishBare<CClassPatternNode>(mark);
+}
+
+void CompleteParser::DottedValue() {
+  const size_t mark = Mark();
   PushLeaf();
   while (Code() == tok::DOT) {
     const size_t trailer = Mark();
@@ -169,11 +198,6 @@ void CompleteParser::ClosedPattern() {
     Finish(symbols_.trailer, trailer);
   }
   Finish(symbols_.atom_expr, mark);
-  if (Code() != tok::LPAR) return;
-  PushLeaf();
-  ClassArguments();
-  irrefutable_ = kNowhere;
-  FinishBare<CClassPatternNode>(mark);
 }
 
 void CompleteParser::NumberPattern() {
@@ -233,7 +257,7 @@ void CompleteParser::SequencePattern(TokenCode close) {
   const size_t start = at_;
   while (Code() != close) {
     has_star = Code() == tok::STAR;
-    if (has_star && ++stars == 2) Postpone(start - 1, "multiple starred expressions in sequence pattern", kCompiler);
+    if (has_star && ++stars == 2) Postpone(start - 1, kManyStars, kCompiler);
     MaybeStarPattern();
     if (Code() != tok::COMMA) break;
     has_comma = true;
@@ -248,7 +272,9 @@ void CompleteParser::SequencePattern(TokenCode close) {
 void CompleteParser::MappingPattern() {
   const InBracket in_bracket(*this);
   const size_t mark = Mark();
+  const size_t start = at_;
   PushLeaf();
+  std::unordered_set<std::string> keys;
   while (Code() != tok::RBRACE) {
     if (Code() == tok::DOUBLESTAR) {
       PushLeaf();
@@ -263,7 +289,17 @@ void CompleteParser::MappingPattern() {
     // A key is a literal or a dotted value.
     if (IsName(Code()) && CodeAt(1) != tok::DOT) FailHere();
     if (Code() == tok::LPAR || Code() == tok::LSQB || Code() == tok::LBRACE) FailHere();
-    ClosedPattern();
+    const size_t key = at_;
+    if (Code() == word::kUnderscore)
+      DottedValue();
+    else
+      ClosedPattern();
+    if (!failed_ && !IsName(code_[key])) {
+      const auto first = static_cast<size_t>(index_[key]);
+      const KeyLiteral literal(toks_.subspan(first, static_cast<size_t>(index_[at_]) - first));
+      if (!keys.insert(literal.value()).second)
+        Postpone(start, "mapping pattern checks duplicate key (" + literal.Shown() + ")", kCompiler);
+    }
     if (isa<CClassPatternNode>(Top())) FailHere();
     Expect(tok::COLON, nullptr);
     AsPattern();

@@ -61,14 +61,34 @@ void CompleteParser::Statement(LineKind kind) {
       break;
     case word::kMatch:
       if (kind == LineKind::kMatch) return Match();
-      break;
+      SimpleStatement();
+      return ExplainHead([this] { Subject(); });
     case word::kCase:
       if (kind == LineKind::kCase) return Case();
-      break;
+      SimpleStatement();
+      return ExplainHead([this] { PatternsAndGuard(); });
     default:
       break;
   }
   SimpleStatement();
+}
+
+// Of a statement that begins with a word that may begin a head as well, and was read as if it did not.
+template <class Rule>
+void CompleteParser::ExplainHead(Rule&& rule) {
+  ExpectEnd();
+  if (!failed_ || !Since(10)) return;
+  const ParseError failure = *failure_;
+  const size_t furthest = std::exchange(furthest_, 0);
+  Revive(0);
+  Skip();
+  rule();
+  if (!failed_ && AtEnd()) return Fail("expected ':'");
+  ExpectEnd();
+  // What came less far explains less.
+  if (furthest_ > furthest) return;
+  furthest_ = furthest;
+  failure_ = failure;
 }
 
 // The body behind a head: a statement on its line, or the placeholder.
@@ -79,8 +99,17 @@ void CompleteParser::Suite() {
 
 void CompleteParser::Colon() {
   if (Code() == tok::COLON) return PushLeaf();
-  if (AtEnd()) Fail("expected ':'");
+  if (AtEnd() && !EndsAtSemicolon()) Fail("expected ':'");
   FailHere();
+}
+
+// The ";" that ends a statement belongs to none.
+bool CompleteParser::EndsAtSemicolon() const {
+  if (line_ == nullptr || !line_->source || toks_.empty()) return false;
+  const char* at = toks_.back().end();
+  if (!line_->source->Holds(at)) return false;
+  while (at < line_->source->end() && (*at == ' ' || *at == '\t')) ++at;
+  return at < line_->source->end() && *at == ';';
 }
 
 // Where the language says so whatever stands in the colon's place.
@@ -174,14 +203,14 @@ void CompleteParser::Except() {
     Skip();
     if (Code() == tok::COLON || AtEnd()) Fail("expected one or more exception types");
   }
-  if (Code() != tok::COLON && !AtEnd()) ExceptTypes();
+  if (Code() != tok::COLON && !AtEnd()) ExceptTypes(is_star);
   Finish(symbols_.except_clause, clause);
   Colon();
   Suite();
   Finish(symbols_.try_stmt, mark);
 }
 
-void CompleteParser::ExceptTypes() {
+void CompleteParser::ExceptTypes(bool is_star) {
   const size_t types = Mark();
   const size_t start = at_;
   const size_t clause = start - 1;
@@ -222,7 +251,8 @@ void CompleteParser::ExceptTypes() {
   if (!Try([&] { Test(); })) FailGeneric(name);
   Test();
   if (Code() == tok::COLON && !isa<CNameLiteral>(Top()))
-    FailAt(name, std::string("cannot use except statement with ") + NameOfExpression(Top()));
+    FailAt(name,
+           std::string("cannot use except") + (is_star ? "*" : "") + " statement with " + NameOfExpression(Top()));
   FailHere();
 }
 
@@ -356,6 +386,7 @@ void CompleteParser::Definition() {
   PushLeaf();
   const size_t parameters = Mark();
   const size_t parameter_count = Code() == tok::LSQB ? TypeParameters() : 0;
+  in_generic_ = parameter_count != 0;
   const size_t list = Mark();
   if (Code() != tok::LPAR) {
     if (python3_) Fail("expected '('");
@@ -370,11 +401,16 @@ void CompleteParser::Definition() {
   Finish(symbols_.parameters, list);
   if (Code() == tok::RARROW && TokenAt(at_).view() == "->") {
     if (!python3_) FailHere();
-    if (!BeginsExpression(CodeAt(1))) Fail("expected ':'");
+    const size_t arrow = at_;
     PushLeaf();
-    const RestoredValue<bool> in_annotation(in_annotation_, true);
-    Test();
+    InTypeScope(AnnotationScope(), [this] { Test(); });
+    if (failed_ && failure_->message() == kInvalidSyntax) {
+      Revive(Mark());
+      const size_t end = EndOfExpression(arrow + 1);
+      FailAt(end == kNowhere ? arrow : end, "expected ':'");
+    }
   }
+  in_generic_ = false;
   ForcedColon();
   Suite();
   FinishWithTypeParameters(symbols_.funcdef, mark, parameters, parameter_count);
@@ -404,7 +440,7 @@ void CompleteParser::Class() {
     const InBracket in_bracket(*this);
     if (Code() != tok::RPAR) {
       if (python3_)
-        Arguments();
+        InTypeScope(parameter_count != 0 ? kGeneric : nullptr, [this] { Arguments(/*is_of_class=*/true); });
       else
         StarExpressions(symbols_.testlist_star_expr);
     }
@@ -443,8 +479,8 @@ void CompleteParser::TypeParameter(bool& has_default) {
   if (!IsName(Code())) FailHere();
   const Text name = TokenAt(at_).view();
   if (!names_.Add(name)) Postpone(at_, "duplicate type parameter '" + std::string(name) + "'");
+  CheckBound(at_, start);
   PushLeaf();
-  const RestoredValue<bool> in_annotation(in_annotation_, true);
   if (Code() == tok::COLON) {
     const size_t colon = at_;
     if (star == tok::STAR || star == tok::DOUBLESTAR) {
@@ -455,32 +491,56 @@ void CompleteParser::TypeParameter(bool& has_default) {
                         (star == tok::STAR ? "TypeVarTuple" : "ParamSpec"));
     }
     PushLeaf();
-    Test();
+    InTypeScope(kBound, [this] { Test(); });
   }
   if (Code() == tok::EQUAL) {
     RequireAt(at_, 13, "Type parameter defaults are");
     has_default = true;
     PushLeaf();
     if (star == tok::STAR)
-      TestOrStar();
+      InTypeScope("a TypeVarTuple default", [this] { TestOrStar(); });
     else
-      Test();
+      InTypeScope(star == tok::DOUBLESTAR ? "a ParamSpec default" : "a TypeVar default", [this] { Test(); });
   } else if (has_default) {
     Postpone(start, "non-default type parameter '" + std::string(name) + "' follows default type parameter");
   }
   FinishBare<CTypeParameter>(mark);
 }
 
+const char* CompleteParser::AnnotationScope() const {
+  return Since(14) ? kAnnotation : in_generic_ ? kGeneric : nullptr;
+}
+
+// Of what stands in a type scope itself the first is told.
+void CompleteParser::JudgeTypeScope(size_t first_banned, size_t first_wait) {
+  for (size_t i = first_wait; i < waits_.size(); ++i) {
+    if (waits_[i].is_comprehension)
+      Postpone(waits_[i].at, kAsyncComprehensionOutside, kCompiler);
+    else
+      banned_.push_back({waits_[i].at, "await expression"});
+  }
+  waits_.resize(std::min(first_wait, waits_.size()));
+  const auto begin = banned_.begin() + static_cast<ptrdiff_t>(std::min(first_banned, banned_.size()));
+  const auto first =
+      std::min_element(begin, banned_.end(), [](const Banned& a, const Banned& b) { return a.at < b.at; });
+  if (first != banned_.end()) {
+    const bool is_constraint = type_scope_ == kBound && IsBracketed(Top()) && Top()->ChildIs(0, tok::LPAR);
+    Postpone(first->at, std::string(first->what) + " cannot be used within " +
+                            (is_constraint ? "a TypeVar constraint" : type_scope_));
+  }
+  banned_.erase(begin, banned_.end());
+}
+
 void CompleteParser::TypeStatement() {
   const size_t mark = Mark();
   RequireAt(at_, 12, "Type statement is");
   Skip();
+  CheckBound(at_, at_);
   PushLeaf();
   const size_t parameters = Mark();
   const size_t parameter_count = Code() == tok::LSQB ? TypeParameters() : 0;
   Expect(tok::EQUAL, nullptr);
-  const RestoredValue<bool> in_annotation(in_annotation_, true);
-  Test();
+  InTypeScope(kAlias, [this] { Test(); });
   FinishWithTypeParameters(symbols_.expr_stmt, mark, parameters, parameter_count);
 }
 
@@ -557,7 +617,8 @@ void CompleteParser::ExpressionStatement() {
       StarExpressions(symbols_.testlist_star_expr);
     if (!Since(8)) CheckNoStars(Top());
     CheckNoLoneStar(Top());
-    const bool is_sequence = isa<CTestListStarExpr>(target) || isa<CStarExpression>(target) || IsBracketed(target);
+    const bool is_sequence =
+        isa<CTestListStarExpr>(target) || isa<CStarExpression>(target) || IsBracketed(WithoutBrackets(target));
     if (is_sequence || InvalidTarget(target, TargetUse::kAugment) != nullptr) {
       FailAtNode(target,
                  std::string("'") + NameOfExpression(target) + "' is an illegal expression for augmented assignment");
@@ -609,22 +670,30 @@ void CompleteParser::Annotation(size_t mark, size_t start) {
   CNode* target = Top();
   const size_t colon = at_;
   const size_t annotation = Mark();
+  const bool is_target = InvalidTarget(target, TargetUse::kAnnotate) == nullptr && !isa<CStarExpression>(target);
+  // Nobody looks behind the colon of what is neither a target nor would be one with a type there.
+  if (!is_target && !Try([&] { Skip(), Test(); })) FailGeneric(colon);
   PushLeaf();
   if (AtEnd()) FailHere();
-  {
-    const RestoredValue<bool> in_annotation(in_annotation_, true);
-    const size_t waits = waits_.size();
-    Test();
-    // In a function it is never evaluated, and nothing in it waits.
-    if (place_.scope == StatementPlace::Scope::kFunction && Since(7)) waits_.resize(waits);
+  const size_t waits = waits_.size();
+  const bool was_compiled = judge_ <= kCompiler;
+  InTypeScope(AnnotationScope(), [this] { Test(); });
+  using Scope = StatementPlace::Scope;
+  // In a function it is never evaluated, and nothing in it waits.
+  if (place_.scope == Scope::kFunction && Since(7)) waits_.resize(std::min(waits, waits_.size()));
+  const bool is_in_function = place_.scope == Scope::kFunction || place_.is_in_async();
+  if (is_in_function && Since(9) && !Since(14) && !was_compiled && judge_ == kCompiler) {
+    postponed_.reset();
+    judge_ = kNobody;
   }
   if (isa<CTestListStarExpr>(target)) FailAt(start, "only single target (not tuple) can be annotated");
   if (isa<CStarExpression>(target)) FailGeneric(colon);
-  if (IsBracketed(target)) {
-    FailAt(start, target->ChildIs(0, tok::LSQB) ? "only single target (not list) can be annotated"
-                                                : "only single target (not tuple) can be annotated");
+  if (const CNode* inner = WithoutBrackets(target); IsBracketed(inner)) {
+    FailAtNode(inner, inner->ChildIs(0, tok::LSQB) ? "only single target (not list) can be annotated"
+                                                   : "only single target (not tuple) can be annotated");
   }
-  if (InvalidTarget(target, TargetUse::kAnnotate) != nullptr) FailAt(start, "illegal target for annotation");
+  if (!is_target || (Since(9) && BeginsWithBracketedTarget(target)))
+    FailAtNode(target, "illegal target for annotation");
   if (!Since(6)) RequireAt(colon, 6, "Variable annotation syntax is");
   CheckTargetNames(target, TargetUse::kAnnotate);
   if (Code() == tok::EQUAL) {
@@ -639,6 +708,8 @@ void CompleteParser::Annotation(size_t mark, size_t start) {
       }
     }
     CheckNoLoneStar(Top());
+  } else {
+    CheckSubscriptStars(WithoutBrackets(target));
   }
   Finish(symbols_.annassign, annotation);
   Finish(symbols_.expr_stmt, mark);
@@ -655,7 +726,7 @@ void CompleteParser::Delete() {
     TestOrStar();
   }
   Finish(symbols_.exprlist, list);
-  if (!AtEnd()) FailHere();
+  if (InvalidTarget(Top(), TargetUse::kDelete) == nullptr && !AtEnd()) FailHere();
   CheckTarget(Top(), TargetUse::kDelete, false);
   Finish(symbols_.del_stmt, mark);
 }
@@ -745,7 +816,7 @@ void CompleteParser::Import() {
     if (Code() == word::kAs) {
       PushLeaf();
       ImportTarget(statement);
-    } else if (at_ == start + 1) {
+    } else if (at_ == start + 1 || Since(9)) {
       CheckBound(start, statement);
     }
     Finish(symbols_.dotted_as_name, one);
@@ -767,7 +838,6 @@ void CompleteParser::ImportTarget(size_t statement) {
   if (!BeginsExpression(Code())) FailHere();
   if (!Try([&] { Test(); })) FailGeneric(name);
   Test();
-  if (isa<CNameLiteral>(Top())) FailHere();
   FailAt(name, std::string("cannot use ") + NameOfExpression(Top()) + " as import target");
 }
 
@@ -808,7 +878,7 @@ void CompleteParser::FromImport() {
     if (Code() != tok::COMMA) break;
     PushLeaf();
     if (is_bracketed && Code() == tok::RPAR) break;
-    if (!is_bracketed && AtEnd()) FailAt(at_ - 1, "trailing comma not allowed without surrounding parentheses");
+    if (!is_bracketed && AtEnd()) Fail("trailing comma not allowed without surrounding parentheses");
   }
   Finish(symbols_.import_as_names, names);
   if (is_bracketed) Expect(tok::RPAR, nullptr);

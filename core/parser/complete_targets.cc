@@ -43,6 +43,8 @@ bool CompleteParser::IsBracketed(const CNode* node) const {
   return node->ChildIs(0, tok::LPAR) && (node->child_count == 2 || isa<CTestListStarExpr>(node->children[1]));
 }
 
+const CNode* CompleteParser::WithoutBrackets(const CNode* node) { return CompleteInnermost(node); }
+
 bool CompleteParser::IsNameInBrackets(const CNode* node) const { return isa<CNameLiteral>(CompleteInnermost(node)); }
 
 // Whether the expression binds at least as tight as "|".
@@ -129,7 +131,7 @@ const CNode* CompleteParser::InvalidTarget(const CNode* node, TargetUse use) con
     const CNode* trailer = chain->LastChild();
     return trailer->ChildIs(0, tok::DOT) || trailer->ChildIs(0, tok::LSQB) ? nullptr : node;
   }
-  if (!node->IsLeaf() || !IsNameCode(node->code)) return node;
+  if (!node->IsLeaf() || !IsNameCode(node->code) || node->code == word::kYield) return node;
   const bool is_constant = node->code == word::kNone || node->code == word::kTrue || node->code == word::kFalse;
   // 2 has one constant that is no name, and lets it be deleted.
   if (is_constant && (python3_ || (node->code == word::kNone && use != TargetUse::kDelete))) return node;
@@ -155,10 +157,12 @@ void CompleteParser::CheckTargetNames(const CNode* node, TargetUse use) {
   if (const auto* star = dyn_cast<CStarExpression>(node)) return CheckTargetNames(star->children[1], use);
   if (const auto* chain = dyn_cast<CAtomExpr>(node)) {
     const CNode* trailer = chain->LastChild();
-    if (!trailer->ChildIs(0, tok::DOT) || use == TargetUse::kDelete) return;
+    if (!trailer->ChildIs(0, tok::DOT)) return;
+    if (use == TargetUse::kDelete ? !Since(14) : use == TargetUse::kAugment && Since(9) && !Since(14)) return;
     const Text name = trailer->GetChildText(1);
     if (name == "__debug__" || (!python3_ && name == "None"))
-      PostponeAtNode(chain, "cannot assign to " + std::string(name), kCompiler);
+      PostponeAtNode(chain, (use == TargetUse::kDelete ? "cannot delete " : "cannot assign to ") + std::string(name),
+                     kCompiler);
     return;
   }
   if (node->IsLeaf()) {
@@ -183,6 +187,22 @@ void CompleteParser::CheckTargetNames(const CNode* node, TargetUse use) {
       PostponeAtNode(node, "multiple starred expressions in assignment", kCompiler);
     CheckTargetNames(child, use);
   }
+}
+
+// `(a).b`, whose brackets the language takes for those around a whole target.
+bool CompleteParser::BeginsWithBracketedTarget(const CNode* node) const {
+  if (!isa<CAtomExpr>(node)) return false;
+  const CNode* inner = WithoutBrackets(node->children[0]);
+  return inner != node->children[0] && !IsBracketed(inner) && !isa<CStarExpression>(inner) &&
+         InvalidTarget(inner, TargetUse::kAnnotate) == nullptr;
+}
+
+void CompleteParser::CheckSubscriptStars(const CNode* node) {
+  if (!isa<CAtomExpr>(node) || !node->LastChild()->ChildIs(0, tok::LSQB)) return;
+  const CNode* subscripts = node->LastChild()->children[1];
+  if (isa<CStarExpression>(subscripts)) return CheckNoLoneStar(subscripts);
+  for (const CNode* child : subscripts->fChildren())
+    if (isa<CStarExpression>(child)) return CheckNoLoneStar(child);
 }
 
 // A star that stands alone, where a list of expressions may stand.

@@ -29,7 +29,7 @@ LiteralParts PartsOf(Text literal) {
     parts.is_bytes |= letter == 'b';
     parts.is_raw |= letter == 'r';
     parts.is_unicode |= letter == 'u';
-    parts.is_formatted |= letter == 'f';
+    parts.is_formatted |= letter == 'f' || letter == 't';
   }
   if (quote == literal.size()) return parts;
   const size_t width = literal.size() >= quote + 6 && IsTripleQuote(literal.data() + quote) ? 3 : 1;

@@ -44,16 +44,16 @@ CompareOperator CompareOperatorOf(TokenCode code) {
 
 // ---- lists and conditionals ----
 
-ExprId SyntaxReader::Impl::Expressions() {
+ExprId SyntaxReader::Impl::OneOrTuple(ExprId (Impl::*read)()) {
   const uint32_t begin = Begin();
-  const ExprId first = StarExpression();
+  const ExprId first = (this->*read)();
   if (!Is(tok::COMMA)) return first;
   const size_t mark = scratch_.size();
   Push(first);
   bool has_trailing_comma = false;
   while (!has_trailing_comma && Take(tok::COMMA)) {
     has_trailing_comma = !BeginsExpression();
-    if (!has_trailing_comma) Push(StarExpression());
+    if (!has_trailing_comma) Push((this->*read)());
   }
   const ExprId tuple = NodeOf(ExprKind::kTuple, begin, mark);
   if (has_trailing_comma) Flag(tuple, kTrailingComma);
@@ -608,22 +608,6 @@ void SyntaxReader::Impl::Clause(bool takes_commas) {
 }
 
 // ---- targets ----
-
-ExprId SyntaxReader::Impl::Targets() {
-  const uint32_t begin = Begin();
-  const ExprId first = Target();
-  if (!Is(tok::COMMA)) return first;
-  const size_t mark = scratch_.size();
-  Push(first);
-  bool has_trailing_comma = false;
-  while (!has_trailing_comma && Take(tok::COMMA)) {
-    has_trailing_comma = !BeginsExpression();
-    if (!has_trailing_comma) Push(Target());
-  }
-  const ExprId tuple = NodeOf(ExprKind::kTuple, begin, mark);
-  if (has_trailing_comma) Flag(tuple, kTrailingComma);
-  return tuple;
-}
 
 // A value that is assigned.
 ExprId SyntaxReader::Impl::Target() {

@@ -190,14 +190,15 @@ class SyntaxReader::Impl {
   bool BeginsStatement() const;
 
   // ---- expressions (read_expressions.cc) ----
-  // A list with commas, as it stands without brackets.
-  ExprId Expressions();
+  // One, or a tuple of those that commas part, as they stand without brackets.
+  ExprId OneOrTuple(ExprId (Impl::*read)());
+  ExprId Expressions() { return OneOrTuple(&Impl::StarExpression); }
   ExprId StarExpression();
   ExprId Expression();
   // Without a conditional and ":=": operators that bind at least so tightly.
   ExprId Operators(uint8_t least);
   ExprId Conditional(ExprId value, uint32_t begin);
-  ExprId Targets();
+  ExprId Targets() { return OneOrTuple(&Impl::Target); }
   ExprId Target();
   ExprId Primary();
   ExprId Atom();

@@ -64,8 +64,8 @@ void CNodeWalker::VisitAnnotatedAssign(CExprStmt* node) {
   CNode* const target = node->GetInitialTestExpr();
   if (is_complete_) {
     DoubtTarget(target);
-    // A list of targets takes no annotation, which a single one does in any brackets.
-    met_doubtful_ |= isa<CTestListStarExpr>(target) || isa<CAtom>(target);
+    // A list of targets takes no annotation, which a single one does in any brackets, but not with some in front.
+    met_doubtful_ |= isa<CTestListStarExpr>(target) || isa<CAtom>(target) || RequireLogical().toks[0].code == tok::LPAR;
   }
   VisitStoreContextNode(target);
   CAnnotatedAssignNode* const annotation = node->GetAnnotatedAssignNode();

@@ -20,6 +20,7 @@ void CNodeWalker::VisitCall(CNode* atom, std::span<CNode* const> prev_trailers, 
 void CNodeWalker::ProcessCallOf(Text func_name, CNode* arglist) {
   const ListStack<UsedArgList>::Lease list(used_lists_);
   GetUsedArgInfoList(arglist, *list);
+  DoubtComma(arglist, *list);
   ProcessFunctionCall(func_name, *list);
 }
 

@@ -3,6 +3,7 @@
 //
 // Nothing is judged here. A doubt costs a second parse by the parser that knows every rule, so it is raised
 // where the common shapes of a target, of arguments and of parameters end.
+#include "lines/token_search.h"
 #include "walker/walker.h"
 
 namespace quillet {
@@ -59,6 +60,28 @@ void CNodeWalker::DoubtTarget(const CNode* target) {
     return;
   }
   met_doubtful_ |= !IsPlainTuple(target);
+}
+
+void CNodeWalker::DoubtLambda(const CNode* node) {
+  const Context first = node->children[0]->fContext;
+  const TokenSpan toks = RequireLogical().toks;
+  if (!first.IsIndex() || first.value <= 0 || static_cast<size_t>(first.value) >= toks.size()) return;
+  met_doubtful_ |= toks[static_cast<size_t>(first.value) - 1].code == word::kIf;
+}
+
+// `{**a for b in c}`
+void CNodeWalker::DoubtElement(const CNode* clause) {
+  while (clause->child_count != 0 && clause->children[0] != nullptr) clause = clause->children[0];
+  const TokenSpan toks = RequireLogical().toks;
+  if (!clause->fContext.IsIndex() || static_cast<size_t>(clause->fContext.value) >= toks.size()) return;
+  int depth = 0;
+  for (auto i = static_cast<size_t>(clause->fContext.value); i-- > 0;) {
+    if (IsClosingBracket(toks[i].code)) ++depth;
+    if (!IsOpeningBracket(toks[i].code) || depth-- > 0) continue;
+    const size_t first = NextSignificant(toks, i + 1, toks.size());
+    met_doubtful_ |= toks[i].code == tok::LBRACE && first < toks.size() && toks[first].code == tok::DOUBLESTAR;
+    return;
+  }
 }
 
 void CNodeWalker::DoubtNamedArguments(const UsedArgList& arg_list) {

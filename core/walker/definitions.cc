@@ -80,6 +80,7 @@ void CNodeWalker::ProcessDefiningArg(const CArgInfo& arg) {
 }
 
 void CNodeWalker::VisitLambdaExpr(CLambdaExpr* node) {
+  if (is_complete_) DoubtLambda(node);
   if (CNode* arguments = node->GetArgumentsNode()) {
     const ListStack<ArgList>::Lease list(defining_lists_);
     GetDefiningArgInfoList(arguments, *list);
@@ -104,7 +105,11 @@ void CNodeWalker::VisitClassdef(CClassdefStmt* node) {
     const ListStack<UsedArgList>::Lease list(used_lists_);
     GetUsedArgInfoList(bases, *list);
     if (is_complete_) DoubtArguments(*list);
-    for (const CArgInfo& arg : *list) VisitNode(arg.value);
+    for (const CArgInfo& arg : *list) {
+      // It may be no list of bases.
+      met_doubtful_ |= isa<CSingleUsedArgumentNode>(arg.value);
+      VisitNode(arg.value);
+    }
   }
 }
 
@@ -114,7 +119,10 @@ void CNodeWalker::VisitSingleDecorator(CSingleDecorator* node) {
   VisitNode(dotted);
   const ListStack<UsedArgList>::Lease list(used_lists_);
   (*list).clear();
-  if (CNode* args = node->GetUsedArgsNode()) GetUsedArgInfoList(args, *list);
+  if (CNode* args = node->GetUsedArgsNode()) {
+    GetUsedArgInfoList(args, *list);
+    DoubtComma(args, *list);
+  }
   const Text name = fToText.TextForNode(dotted);
   ProcessFunctionCall(IsNone(name) ? kNoText : Keep(name), *list);
 }

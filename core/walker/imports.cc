@@ -56,6 +56,8 @@ void CNodeWalker::VisitFromImport(CFromImportStmt* node) {
   // A host that sees a record may ask the walker for anything, so the text is out of the way of that;
   // its memory is used again.
   std::string from = std::move(from_buffer_);
+  // Behind a head its place and its end were not looked at.
+  met_doubtful_ |= is_complete_ && RequireLogical().kind != LineKind::kFromImport;
   from.assign(kFromImportPrefix);
   AppendTextForImportName(node->FromNodes(), from);
   from.append(" ");

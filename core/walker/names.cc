@@ -251,7 +251,10 @@ void CNodeWalker::VisitTrailers(CNode* atom_node, std::span<CNode* const> all_tr
 void CNodeWalker::VisitCompForNode(CCompForNode* node) {
   // Targets live in the scope of the comprehension. The element in front of the clause was walked
   // before it, so the names bound here also count as read.
-  if (is_complete_) DoubtTarget(node->GetTargetNode());
+  if (is_complete_) {
+    DoubtTarget(node->GetTargetNode());
+    DoubtElement(node);
+  }
   VisitStoreContextNode(node->GetTargetNode(), /*within_sub_expr=*/true);
   VisitNode(node->GetInNode());
   if (CNode* iter = node->GetCompIterNode()) VisitNode(iter);

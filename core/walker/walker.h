@@ -287,6 +287,15 @@ class CNodeWalker {
     for (const CArgInfo& arg : arg_list)
       if (arg.name != nullptr || !IsNone(arg.prefix)) return DoubtNamedArguments(arg_list);
   }
+  // A generator expression alone, and a comma behind it.
+  void DoubtComma(const CNode* arglist, const UsedArgList& arg_list) {
+    if (arg_list.size() == 1 && isa<CUsedArglistNode>(arglist))
+      met_doubtful_ |= isa<CSingleUsedArgumentNode>(arg_list[0].value);
+  }
+  // One that may be the condition of a comprehension.
+  void DoubtLambda(const CNode* node);
+  // Of a comprehension, by its clause.
+  void DoubtElement(const CNode* clause);
   void DoubtNamedArguments(const UsedArgList& arg_list);
   void DoubtParameters(const ArgList& arg_list);
   // What stands in brackets that only group it.

@@ -220,7 +220,74 @@ ERRORS = [
     ((3, 13), "print 'x'", "1:1 Missing parentheses in call to 'print'. Did you mean print(...)?"),
     ((3, 13), "except A, B:", "1:8 multiple exception types must be parenthesized"),
     ((3, 13), "x = 0777", None),
-    ((3, 13), "x <> y", "1:3 invalid syntax"),
+    ((3, 13), "x <> y", "1:3 invalid syntax.  Maybe you meant '!=' instead of '<>'?"),
+    (
+        (3, 13),
+        "def f(): (yield) = 1",
+        "1:11 cannot assign to yield expression here. Maybe you meant '==' instead of '='?",
+    ),
+    ((3, 13), "def f(): (yield): int", "1:11 illegal target for annotation"),
+    ((3, 13), "def f(): g((yield)=1)", '1:13 expression cannot contain assignment, perhaps you meant "=="?'),
+    ((3, 13), "f(a): pass", "1:5 invalid syntax"),
+    ((3, 13), "class A(x for x in y): pass", "1:11 invalid syntax"),
+    ((3, 13), "f(x for x in y,)", "1:3 Generator expression must be parenthesized"),
+    ((3, 13), "@f(x for x in y,)", "1:4 Generator expression must be parenthesized"),
+    ((3, 13), "match x", "1:8 expected ':'"),
+    ((3, 13), "match x y", "1:9 invalid syntax"),
+    ((3, 13), "case 1", "1:8 expected ':'"),
+    ((3, 13), "case {**a} if b", "1:17 expected ':'"),
+    ((3, 13), "case 1 x", "1:9 invalid syntax"),
+    ((3, 13), "case {1: a, 1: b}:", "1:7 mapping pattern checks duplicate key (1)"),
+    ((3, 13), "case _.a:", "1:8 invalid syntax"),
+    ((3, 13), "case _():", "1:8 invalid syntax"),
+    ((3, 13), "case *a, *b:", "1:7 multiple starred names in sequence pattern"),
+    ((3, 13), "del f(a) b", "1:5 cannot delete function call"),
+    ((3, 13), "def f() -> a | b (: pass", "1:18 expected ':'"),
+    ((3, 13), "def f() -> lambda None: pass", "1:9 expected ':'"),
+    ((3, 13), "def f((a b)): pass", "1:7 invalid syntax"),
+    ((3, 13), "if x;", "1:5 invalid syntax"),
+    ((3, 13), "from a import b,", "1:17 trailing comma not allowed without surrounding parentheses"),
+    ((3, 13), "f(*)", "1:4 Invalid star expression"),
+    ((3, 13), "f(1 := 2)", "1:5 invalid syntax"),
+    ((3, 13), "[x for x y]", "1:10 'in' expected after for-loop variables"),
+    ((3, 13), "f(a b.)", "1:3 invalid syntax. Perhaps you forgot a comma?"),
+    ((3, 13), "a print b", "1:3 Missing parentheses in call to 'print'. Did you mean print(...)?"),
+    (
+        (3, 13),
+        "[i for i in a if (j := i) for j in b]",
+        "1:31 comprehension inner loop cannot rebind assignment expression target 'j'",
+    ),
+    (NEWEST, "x = 'a' b 'c'", "1:9 invalid syntax. Is this intended to be part of the string?"),
+    (NEWEST, "x = 'a' + b 'c'", "1:9 invalid syntax. Is this intended to be part of the string?"),
+    (NEWEST, "x = a if b else pass", "1:17 expected expression after 'else', but statement is given"),
+    (NEWEST, "x = pass if b else c", "1:5 expected expression before 'if', but statement is given"),
+    (NEWEST, "def f(a: pass", "1:6 '(' was never closed"),
+    (NEWEST, "x = bu''", "1:5 'u' and 'b' prefixes are incompatible"),
+    (NEWEST, "except* E as 1:", "1:14 cannot use except* statement with literal"),
+    (NEWEST, "x = t'\\x4'", None),
+    (NEWEST, "del x.__debug__", "1:5 cannot delete __debug__"),
+    (NEWEST, "type __debug__ = 1", "1:6 cannot assign to __debug__"),
+    ((3, 13), "type T = {a := x}", "1:11 named expression cannot be used within a type alias"),
+    ((3, 13), "type T = (yield)", "1:11 yield expression cannot be used within a type alias"),
+    ((3, 13), "type T = (await x)", "1:11 await expression cannot be used within a type alias"),
+    ((3, 13), "def f[T: (y := 1)](): pass", "1:11 named expression cannot be used within a TypeVar bound"),
+    ((3, 13), "def f[T: ((y := 1), x)](): pass", "1:12 named expression cannot be used within a TypeVar constraint"),
+    ((3, 13), "def f[**T = (y := 1)](): pass", "1:14 named expression cannot be used within a ParamSpec default"),
+    ((3, 13), "class A[T](y := 1): pass", "1:12 named expression cannot be used within the definition of a generic"),
+    ((3, 13), "def f[T](x: (y := 1)): pass", "1:14 named expression cannot be used within the definition of a generic"),
+    (
+        (3, 13),
+        "type T = [(y := 1) for a in b]",
+        "1:12 assignment expression within a comprehension cannot be used in a type alias",
+    ),
+    (NEWEST, "x: (y := 1)", "1:5 named expression cannot be used within an annotation"),
+    (NEWEST, "def f() -> (yield): pass", "1:13 yield expression cannot be used within an annotation"),
+    (NEWEST, "async def f(): x: await y", "1:19 await expression cannot be used within an annotation"),
+    (
+        NEWEST,
+        "async def f(): x: [a async for a in b]",
+        "1:19 asynchronous comprehension outside of an asynchronous function",
+    ),
     ((2, 7), "f() = 1", "1:1 cannot assign to function call here. Maybe you meant '==' instead of '='?"),
     ((2, 7), "x: int = 1", "1:2 invalid syntax"),
     ((2, 7), "exec a, b", "1:7 invalid syntax"),
@@ -239,6 +306,68 @@ def test_what_the_version_rejects_is_rejected(version: tuple[int, int], source: 
 def test_the_running_interpreter_rejects_it_as_well(source: str) -> None:
     with pytest.raises(SyntaxError):
         compile(source + "\n", "s", "exec")
+
+
+@pytest.mark.parametrize(
+    "source",
+    [
+        "type T = lambda: (y := 1)",
+        "type T = (x for x in y)",
+        "x: lambda: (y := 1)",
+        "x: [(y := 1) for a in b]",
+        "x: (a async for a in b)",
+        "class A((x for x in y),): pass",
+        "f((x for x in y),)",
+        "def f():\n y: z = 1\n global z",
+        "case {_.a: b}: pass",
+        "(y + z).a: int",
+        "f'{*x,}'",
+        'x = t"""{a =\\\n!r}"""',
+        "match(x)",
+        "case(x)",
+    ],
+)
+def test_what_is_no_more_than_like_it_is_none(source: str) -> None:
+    assert [text for text in read(source) if text[0].isdigit()] == []
+
+
+KEYS = [
+    ("1", "1.0", True),
+    ("0x10", "1_6", True),
+    ("1e1", "10", True),
+    ("True", "1", True),
+    ("0", "-0", True),
+    ("1", "-1", False),
+    ("1 + 2j", "1 + 2.0j", True),
+    ("2j", "02j", True),
+    ("2", "2j", False),
+    ("None", "0", False),
+    ("'ab'", '"a" r"b"', True),
+    ("'\\x61\\142\\n'", "'ab\\\n\\u000a'", True),
+    ("'é'", "'\\xe9'", True),
+    ("b'\\xe9'", "b'\\351'", True),
+    ("'a'", "b'a'", False),
+    ("a.b", "a.b", False),
+]
+
+
+@pytest.mark.parametrize(("one", "other", "is_same"), KEYS)
+def test_no_key_of_a_mapping_stands_in_it_twice(one: str, other: str, is_same: bool) -> None:
+    source = f"match x:\n case {{{one}: a, {other}: b}}: pass\n"
+    assert bool(analyze(source, version=NEWEST).errors) == is_same
+    if is_same:
+        with pytest.raises(SyntaxError, match="duplicate key"):
+            compile(source, "s", "exec")
+    else:
+        compile(source, "s", "exec")
+
+
+def test_a_key_is_shown_as_the_language_shows_it() -> None:
+    for key in ("-1", "'ab'", "b'a'", '"it\'s"', "'a\\n'", "(1+2j)", "None"):
+        source = f"match x:\n case {{{key.strip('()')}: a, {key.strip('()')}: b}}: pass\n"
+        [line] = analyze(source, version=NEWEST).errors
+        assert line.error is not None
+        assert line.error.msg == f"mapping pattern checks duplicate key ({key})"
 
 
 def test_what_only_the_compiler_rejects_keeps_its_records() -> None:
@@ -321,6 +450,26 @@ BY_VERSION = [
     ("[x for [a in b]", "EEEEEEE"),
     ("def f(self):\n self.m: (1, await 2)", "EE....."),
     ("x = 1 \\", "...EEEE"),
+    ("class A(x for x in y): pass", "E.EEEEE"),
+    ("f(x for x in y,)", "..EEEEE"),
+    ("def f(): (yield) += 1", "EEEEEEE"),
+    ("{**x for a in b}", "EEEEEEE"),
+    ("x = [a for a in b if lambda: c]", "....EEE"),
+    ("(y).a: int", "E...EEE"),
+    ("((y, z)): int", "EEEEEEE"),
+    ("([y]) += 1", "EEEEEEE"),
+    ("z[*c]: y", "EEEEEEE"),
+    ("z[*c]: y = 1", "EEEEE.."),
+    ("f'{*x}'", "EEEEEEE"),
+    ("x = 0_3", "EEEEEEE"),
+    ('x = f"""{a =\\\n}"""', "EEEEEE."),
+    ("x.__debug__ += 1", "EEEE..."),
+    ("import __debug__.a", "....EEE"),
+    ("[i for x[y := 1] in a]", "EEEEEEE"),
+    ("def f():\n if x: from a import *", ".EEEEEE"),
+    ("with x: from a import b,", "EEEEEEE"),
+    ("async def f(): lambda: await x", "EEEEEEE"),
+    ("def f(x, y):\n z: [b for __debug__ in c]", "EEEE..."),
     ("A[*Ts in int]", "EEEEE.."),
     ("f(a=1, b := 2)", "EEEEEEE"),
     ("*a: int", "EEEEEEE"),

@@ -21,6 +21,7 @@
 #include <vector>
 
 #include "analysis/source_bytes.h"
+#include "output/arrow_export.h"
 #include "output/arrow_stream.h"
 #include "output/json_lines.h"
 #include "output/text_lines.h"
@@ -794,6 +795,21 @@ TEST(Columns, HaveTheSameDictionariesInAllBatches) {
   }
   EXPECT_EQ(first_paths, (std::vector<int32_t>{0, 1, 0}));
   stream.release(&stream);
+}
+
+TEST(Columns, TakeBackBitsThatWereAdded) {
+  for (const size_t kept : {0u, 1u, 7u, 8u, 9u, 30u}) {
+    Bits bits;
+    for (size_t i = 0; i < 30; ++i) bits.Add(i % 3 != 0);
+    bits.Truncate(kept);
+    EXPECT_EQ(bits.size(), kept);
+    EXPECT_EQ(bits.false_count(), (kept + 2) / 3);
+    bits.Add(false);
+    bits.Add(true, 20);
+    ASSERT_EQ(bits.size(), kept + 21);
+    EXPECT_EQ(bits.false_count(), (kept + 2) / 3 + 1);
+    for (size_t i = 0; i < kept + 21; ++i) EXPECT_EQ(bits[i], i < kept ? i % 3 != 0 : i > kept) << kept << " " << i;
+  }
 }
 
 TEST(Columns, EndWithoutABatch) {

@@ -3,10 +3,12 @@
 #include <gtest/gtest.h>
 #include <pthread.h>
 
+#include <memory>
 #include <string>
 #include <vector>
 
 #include "analysis/file_analyzer.h"
+#include "tests/core/support/analysis_helper.h"
 
 namespace quillet {
 namespace {
@@ -71,6 +73,25 @@ TEST(CompleteReading, WhateverIsCutShortIsReadAlikeByRecycledNodes) {
   }
 }
 
+TEST(CompleteReading, NodesOfWhatIsRejectedAreUsedAgain) {
+  CPGenAnalyzerImpl analyzer(CompleteOptions(Version::Of(3, 12)));
+  const NodePool& pool = analyzer.type_hint_walker().hint_parser().factory().pool();
+  const TypingNames typing;
+  for (const char* source :
+       {"x y", "x = [a, b(c)] d", "f(a, b=1, c)", "def f(a, b)", "x = (1", "if a = b: c", "a.b[c:d"}) {
+    size_t nodes = 0;
+    for (int round = 0; round < 5; ++round) {
+      const testing::CutSource cut(source);
+      const std::unique_ptr<LogicalLine> line = cut.Line(0);
+      EXPECT_TRUE(analyzer.AnalyzeCompletely(*line, {}, typing, true)) << source;
+      if (round > 0) {
+        EXPECT_EQ(pool.node_count(), nodes) << source;
+      }
+      nodes = pool.node_count();
+    }
+  }
+}
+
 TEST(CompleteReading, AFormOfANewerVersionHasItsNamesWhereverItStands) {
   // The set is one that no table reads, so that its statement is not either.
   const struct {
@@ -117,6 +138,30 @@ TEST(CompleteReading, AFormOfANewerVersionHasItsNamesWhereverItStands) {
     }
     EXPECT_EQ(names, expected) << statement;
   }
+}
+
+TEST(CompleteReading, ExceptionTypesHaveOneCommaBetweenThem) {
+  FileAnalyzer files(CompleteOptions(Version::Of(3, 14)));
+  for (const auto& [types, is_fine] :
+       {std::pair("A, B", true), {"A, B, C", true}, {"A,, B", false}, {", A", false}, {"A,,", false}, {"A B", false}}) {
+    files.Analyze(std::string("try: pass\nexcept ") + types + ": pass\n");
+    EXPECT_EQ(files.errors().empty(), is_fine) << types;
+  }
+}
+
+TEST(CompleteReading, ASignatureCommentOfAMethodMayLeaveOutTheObject) {
+  FileAnalyzer files(CompleteOptions(Version::Of(3, 12)));
+  const auto hints = [&](const std::string& source) {
+    files.Analyze(source);
+    std::string found;
+    for (const Record& record : files.store().arg_rows)
+      if (record.info().starts_with(":h:")) found.append(record.name()).append(record.info()).append(" ");
+    return found;
+  };
+  EXPECT_EQ(hints("class A:\n  def m(self, a):  # type: (B, int) -> str\n    pass\n"),
+            "self:h:B a:h:int return:h:str ");
+  EXPECT_EQ(hints("class A:\n  def m(self, a):  # type: (int) -> str\n    pass\ndef f(b, c):  # type: (int) -> str\n"),
+            "a:h:int return:h:str b:h:int return:h:str ");
 }
 
 TEST(CompleteReading, DeepNestingIsAnErrorOrIsRead) {

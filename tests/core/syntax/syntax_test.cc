@@ -1,6 +1,9 @@
 // What the reader says of statements and expressions, whole ones and broken ones, and where it finds them.
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <utility>
+
 #include "tests/core/support/syntax_text.h"
 
 namespace quillet {
@@ -347,6 +350,43 @@ TEST(Syntax, BracketsOfItsOwnAreNoPartOfAnExpression) {
   const FileSyntax& file = read.file;
   EXPECT_EQ(file.TextOf(file[file.ExprsOf(file.stmt(1))[1]]), "(a) + b");
   EXPECT_EQ(file.TextOf(file[file.ExprsOf(file.stmt(2))[1]]), "(c, d)");
+}
+
+TEST(Syntax, PatternsThatAreNotClosedAreBroken) {
+  const auto pattern = [](const char* text) {
+    return SyntaxText(std::string("match a:\n case ") + text + ": pass\n")
+        .substr(std::string("Match a\n  Case").size());
+  };
+  EXPECT_EQ(pattern("A(b)"), " (PatternClass A (PatternCapture 'b'))\n    Pass\n");
+  EXPECT_EQ(pattern("A(b]"), "! (PatternClass A (PatternCapture 'b'))!\n");
+  EXPECT_EQ(pattern("[b)"), "! (PatternSequence (PatternCapture 'b'))!\n");
+  EXPECT_EQ(pattern("{'b': c)"), "! (PatternMapping 'b' (PatternCapture 'c'))!\n");
+  EXPECT_EQ(pattern("A(b c)"), "! (PatternClass A (PatternCapture 'b') (PatternCapture 'c'))!\n    Pass\n");
+}
+
+TEST(Syntax, NothingIsLeftOfAStringThatIsNoHint) {
+  const Text source = "x: 'A B' = c\ny = d  # type: E F\n";
+  const ReadSource read(source);
+  const auto named_at = [&](Text name) { return read.file.NamedAt(static_cast<uint32_t>(source.find(name))); };
+  for (const ExprId named : read.file.named) ASSERT_LT(named, read.file.exprs.size());
+  for (const Text gone : {"A", "B", "E", "F"}) EXPECT_EQ(named_at(gone), kNoExpr) << gone;
+  for (const Text name : {"x", "c", "y =", "d"}) {
+    ASSERT_NE(named_at(name), kNoExpr) << name;
+    EXPECT_EQ(read.file.NameOf(named_at(name)), name.substr(0, 1));
+  }
+}
+
+TEST(Syntax, AGeneratorHasTheBracketsThatItNeeds) {
+  for (const auto& [source, text] : {std::pair<Text, Text>("x = (a for a in b)\n", "(a for a in b)"),
+                                     {"x = ((a for a in b))\n", "(a for a in b)"},
+                                     {"f(a for a in b)\n", "(a for a in b)"},
+                                     {"f((a for a in b))\n", "(a for a in b)"},
+                                     {"x = (a for a in b), c\n", "(a for a in b)"}}) {
+    const ReadSource read(source);
+    const auto generator = std::ranges::find(read.file.exprs, ExprKind::kGenerator, &Expr::kind);
+    ASSERT_NE(generator, read.file.exprs.end()) << source;
+    EXPECT_EQ(read.file.TextOf(*generator), text) << source;
+  }
 }
 
 TEST(Syntax, AnEmptySourceIsAModule) {

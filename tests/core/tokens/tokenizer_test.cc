@@ -211,6 +211,7 @@ TEST(FormattedStrings, ABrokenFieldSpoilsOnlyItsLine) {
   EXPECT_EQ(TextsOf("x = f'{a'\nimport b\n"), (Texts{"x", "=", "f'{a'", "import", "b"}));
   EXPECT_EQ(TextsOf("x = f'{a\nimport b\n"), (Texts{"x", "=", "f'{a", "import", "b"}));
   EXPECT_EQ(TextsOf("f'{x:y'\nz"), (Texts{"f'{x:y'", "z"}));
+  for (const char* text : {"f'a\\", "f'{a}\\", "f'''a\\", "f'{a:\\", "f'a\\N"}) EXPECT_EQ(TextsOf(text), Texts{text});
 }
 
 TEST(FormattedStrings, TooDeepANestingIsReadTheOldWay) {
@@ -274,6 +275,8 @@ TEST(CodeOfText, IsTotal) {
   EXPECT_EQ(CodeOfText("'a' 'b'"), tok::ERRORTOKEN);
   EXPECT_EQ(CodeOfText("'a"), tok::ERRORTOKEN);
   EXPECT_EQ(CodeOfText("'''a''"), tok::ERRORTOKEN);
+  EXPECT_EQ(CodeOfText("fu'a'"), tok::ERRORTOKEN);
+  EXPECT_EQ(CodeOfText("xy'a'"), tok::ERRORTOKEN);
   EXPECT_EQ(CodeOfText("1x"), tok::ERRORTOKEN);
   EXPECT_EQ(CodeOfText("++"), tok::ERRORTOKEN);
   EXPECT_EQ(CodeOfText("**=="), tok::ERRORTOKEN);

@@ -584,6 +584,19 @@ TEST(Assignments, ANamedExpressionOfAnotherClassIsAnAssertion) {
   }
 }
 
+// A host's tree.
+TEST(Names, ADottedNameHasPartsWithTexts) {
+  const Ref<NodePool> pool(new NodePool);
+  const Printed printed;
+  CNode* const name = pool->Construct(NodeKind::kCDottedName, nullptr);
+  CNode* const part = pool->Construct(NodeKind::kCAtom, nullptr);
+  pool->ResizeChildren(part, 1)[0] = pool->Construct(NodeKind::kCAtom, nullptr);
+  for (CNode* const child : {part, static_cast<CNode*>(nullptr)}) {
+    pool->ResizeChildren(name, 1)[0] = child;
+    EXPECT_THROW(CNodeWalker(kPy3).VisitDottedName(static_cast<CDottedName*>(name)), Error);
+  }
+}
+
 // A host's tree; the pattern parser stops earlier.
 TEST(Patterns, MayNestToTheLimit) {
   const auto walk = [](int levels) {
