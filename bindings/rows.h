@@ -97,7 +97,14 @@ class TupleFiller {
   void Add(nb::object value) { values_[count_++] = Checked(std::move(value)).release().ptr(); }
   void Add(size_t number) { Add(nb::steal(PyLong_FromSize_t(number))); }
   nb::object Take() {
-    nb::object tuple = Checked(nb::steal(type_->tp_alloc(type_, static_cast<Py_ssize_t>(count_))));
+    const auto size = static_cast<Py_ssize_t>(count_);
+    // There is but one empty tuple: what is made of another one when it goes is not memory of the interpreter's.
+    const bool is_plain = type_ == &PyTuple_Type;
+    nb::object tuple = Checked(nb::steal(is_plain ? PyTuple_New(size) : type_->tp_alloc(type_, size)));
+#if PY_VERSION_HEX >= 0x030E0000
+    // Whoever makes one by its class says that its hash is not known yet.
+    if (!is_plain) reinterpret_cast<PyTupleObject*>(tuple.ptr())->ob_hash = -1;
+#endif
     for (size_t i = 0; i < count_; ++i) PyTuple_SET_ITEM(tuple.ptr(), i, values_[i]);
     count_ = 0;
     return tuple;

@@ -10,7 +10,7 @@ import sys
 
 import pytest
 
-from quillet import _fastaccess
+from quillet import _fastaccess, analyze
 
 # ---- token types ----
 
@@ -428,3 +428,16 @@ def test_classes_of_bytes():
     for code in (255, 256 + ord("5"), 10**9, -1):
         assert not _fastaccess.IsDigit(code)
         assert not _fastaccess.IsAlnum(code)
+
+
+# ---- tuples ----
+
+
+def test_what_is_made_as_a_tuple_is_one_to_the_interpreter() -> None:
+    comment, statement = analyze("# a comment\nx = y\n").lines
+    # There is but one that is empty.
+    empty: tuple[object, ...] = ()
+    assert comment.records is empty
+    record = statement.records[0]
+    assert hash(record) == hash(tuple(record))
+    assert {record: 1}[tuple(record)] == 1  # type: ignore[index]

@@ -192,10 +192,16 @@ INTERPRETERS = """
     import sys
     try:
         import _interpreters
-        run = lambda code, kind: _interpreters.exec(_interpreters.create(kind), code)
+        create, execute = _interpreters.create, _interpreters.exec
     except ImportError:
         import _xxsubinterpreters as _interpreters
-        run = lambda code, kind: _interpreters.run_string(_interpreters.create(isolated=kind != "legacy"), code)
+        create, execute = lambda kind: _interpreters.create(isolated=kind != "legacy"), _interpreters.run_string
+    def run(code, kind):
+        interpreter = create(kind)
+        try:
+            return execute(interpreter, code)
+        finally:
+            _interpreters.destroy(interpreter)
     refused = f'''
     import sys
     sys.path[:] = {sys.path!r}
