@@ -156,13 +156,6 @@ const char* WordOf(NameIndex::State state) {
   return "damaged";
 }
 
-char LowerOf(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
-
-bool IsAlike(Text a, Text b) {
-  return a.size() == b.size() &&
-         std::equal(a.begin(), a.end(), b.begin(), [](char x, char y) { return LowerOf(x) == LowerOf(y); });
-}
-
 nb::tuple FileOf(const IndexObject& self, size_t number, uint64_t size) {
   const IndexedFile& file = self.index[number];
   return nb::make_tuple(number, BytesOf(file.path), size, file.time, file.hash, file.lines, file.records, file.errors,
@@ -340,12 +333,10 @@ void BindIndex(nb::module_& tarvex) {
           [](const IndexObject& self, nb::handle text) {
             const HostText wanted = HostText::FromStr(text);
             nb::list found;
-            for (const WordTable::Entry& entry : self.index.words()) {
-              if (entry.word != wanted.text() && IsAlike(entry.word, wanted.text())) found.append(StrOf(entry.word));
-            }
+            for (const Text word : WordsAlike(self.index.words(), wanted.text())) found.append(StrOf(word));
             return found;
           },
-          nb::arg("word"), "The words that differ from this one by the case of letters alone.");
+          nb::arg("pattern"), "The words that differ from it by the case of letters alone; it may have * and ?.");
 
   nb::class_<NameIndexWriter>(host, "NameIndexWriter", "Makes the bytes of an index from files in any order.")
       .def(nb::init<>())

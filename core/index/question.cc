@@ -297,7 +297,8 @@ class QuestionWriter : public FileWriter {
       answer.flags = static_cast<uint8_t>(occurrence.flags);
       answer.name = name_;
       const bool is_wanted = (question_.uses & UsesOf(occurrence, bindings, source)) != 0;
-      if (TellRole(answer, is_wanted) || TellRoleBehind(occurrence.begin, rows[row], answer) || !is_wanted) continue;
+      if (TellRole(answer, is_wanted) || TellRoleBehind(source, occurrence.begin, rows[row], answer) || !is_wanted)
+        continue;
       answer.is_parameter = occurrence.kind == NameKind::kParameter;
       answer.scope = scopes.names()[ScopeAt(bindings.occurrences[root], answer.is_parameter, bindings, scopes, row)];
       if (!matcher_.TakesScope(answer.scope)) continue;
@@ -332,17 +333,19 @@ class QuestionWriter : public FileWriter {
   // The same for records of what stands behind a call or a subscript, which have the text of that in their name: they
   // are moved to where the names begin. A text that the statement spells another way (with blanks or in several
   // lines) is known by its end and its statement.
-  bool TellRoleBehind(uint32_t begin, const LineRow& row, const Answer& occurrence) {
+  bool TellRoleBehind(const SourceText& source, uint32_t begin, const LineRow& row, const Answer& occurrence) {
     if (!occurrence.name.starts_with('.')) return false;
     if (const auto found = told_behind_.find(begin); found != told_behind_.end()) {
       MoveTo(occurrence, found->second);
       return true;
     }
     const Text last = occurrence.name.substr(occurrence.name.rfind('.'));
+    const Token& last_token = source.tokens[row.first_token + row.token_count - 1];
+    const uint64_t end = PlaceOf(source.PositionFrom(static_cast<int32_t>(row.first_line), last_token.text));
     auto copy = std::lower_bound(copies_.begin(), copies_.end(), row.first_line + 1,
                                  [this](uint32_t i, uint32_t line) { return answers_[i].line < line; });
     for (size_t tries = 0; tries < kMostCompared && copy != copies_.end(); ++tries, ++copy) {
-      if (answers_[*copy].line > row.last_line + 1) break;
+      if (PlaceOf(answers_[*copy]) > end) break;
       if (answers_[*copy].role != 0 || !answers_[*copy].name.ends_with(last)) continue;
       MoveTo(occurrence, *copy);
       return true;
@@ -362,6 +365,9 @@ class QuestionWriter : public FileWriter {
   }
 
   static uint64_t PlaceOf(const Answer& answer) { return uint64_t{answer.line} << 32 | answer.column; }
+  static uint64_t PlaceOf(Position place) {
+    return (static_cast<uint64_t>(place.line) + 1) << 32 | (static_cast<uint32_t>(place.col) + 1);
+  }
 
   // As records have it: parameters belong to what their statement opens, global names to the module.
   static uint32_t ScopeAt(const Occurrence& root, bool is_parameter, const Bindings& bindings, const ScopeNames& scopes,
@@ -556,6 +562,21 @@ bool FitsGlob(Text text, Text pattern) {
   }
   while (in_pattern < pattern.size() && pattern[in_pattern] == '*') ++in_pattern;
   return in_pattern == pattern.size();
+}
+
+std::vector<Text> WordsAlike(std::span<const WordTable::Entry> words, Text pattern) {
+  const auto lower = [](Text text, std::string& out) {
+    out.assign(text);
+    for (char& c : out) c = c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
+  };
+  std::vector<Text> found;
+  std::string wanted, word;
+  lower(pattern, wanted);
+  for (const WordTable::Entry& entry : words) {
+    lower(entry.word, word);
+    if (FitsGlob(word, wanted) && !FitsGlob(entry.word, pattern)) found.push_back(entry.word);
+  }
+  return found;
 }
 
 std::unique_ptr<FileWriter> MakeQuestionWriter(const Question& question, Version version,

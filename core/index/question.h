@@ -47,6 +47,8 @@ WordNeeds WordsNeededBy(const Question& question);
 
 // Whether a text is as a pattern of * and ? says.
 bool FitsGlob(Text text, Text pattern);
+// The words that are not as a pattern says, or a word, but differ from that by the case of letters alone.
+std::vector<Text> WordsAlike(std::span<const WordTable::Entry> words, Text pattern);
 
 // A record or an occurrence that answers. An occurrence that no record tells of has the kind of record that
 // would, and no detail; its name is dotted as far as names go, and begins with a dot behind anything else.

@@ -15,7 +15,7 @@ from quillet.cli.defs import facts_of
 from quillet.cli.find_options import OPTIONS, plain_parameters
 from quillet.cli.index_commands import find
 from quillet.cli.outline import _hints, _parameters
-from quillet.index.questions import match_of
+from quillet.index.questions import DEFINING_USES, Folder, match_of
 from quillet.index.store import FUNCTION
 
 
@@ -114,6 +114,11 @@ def test_without_an_index_the_files_are_looked_through(tmp_path: Path) -> None:
     assert result.stderr == ""
     assert run("find", "nowhere", cwd=tmp_path).returncode == 1
     assert run("find", "SHOP", cwd=tmp_path).stderr == "quillet: nothing found; try: Shop, shop\n"
+    assert run("find", "SHO?", cwd=tmp_path).stderr == "quillet: nothing found; try: 'Sho?', 'sho?'\n"
+    assert run("find", "SELF.PR*", "--set", cwd=tmp_path).stderr == "quillet: nothing found; try: 'self.pr*' --set\n"
+    assert run("find", "Shop", "--raise", cwd=tmp_path).stderr == (
+        "quillet: nothing found; try: Shop --set, Shop --get, Shop --call, shop --set, shop --get, shop --import\n"
+    )
     assert run("find", "Shop", "--index", "none", cwd=tmp_path).returncode == 2
     assert run("defs", "shop.py", cwd=tmp_path).returncode == 0
     assert run("outline", "shop.py", cwd=tmp_path).returncode == 0
@@ -125,15 +130,22 @@ def test_without_an_index_the_files_are_looked_through(tmp_path: Path) -> None:
 @pytest.mark.parametrize(
     ("arguments", "near"),
     [
-        (["price", "--call"], "price, .price"),
+        (["price", "--call"], "price --set, price --get, price --param, .price --set"),
         (["items"], ".items"),
         (["limit"], "LIMIT"),
-        (["join", "--call"], ".join --call, .join"),
-        (["os.path.Join", "--call"], "os.path.join --call, os.path.join"),
+        (["join", "--call"], ".join --call"),
+        (["os.path.Join", "--call"], "os.path.join --call"),
+        (["OS.path.JOIN"], "os.path.join"),
         ([".shop"], "shop"),
         (["self.price", "--scope", "Shop"], "self.price"),
-        (["LIMIT", "--return"], "LIMIT"),
-        (["ITEM*"], None),
+        (["LIMIT", "--return"], "LIMIT --set, LIMIT --hint"),
+        (["os", "--hint"], "os --set, os --get, os --import"),
+        (["add", "--hint", "--raise"], "add --set, add --def, .add --get, .add --call"),
+        (["ITEM*"], "'Item*', 'item*'"),
+        (["*PRICE", "--set"], "'*price' --set"),
+        (["Self.?TEMS"], "'self.?tems'"),
+        ([".Items"], ".items"),
+        (["nope*"], None),
         (["x y"], None),
     ],
 )
@@ -344,7 +356,7 @@ class Counting(list[Any]):
 def test_outline_reads_no_more_for_a_signature_than_belongs_to_it(tmp_path: Path) -> None:
     path = tmp_path / "a.py"
     path.write_text("def f(a, b: int): pass\ndef g(c\n" * 100)
-    hits = Counting(facts_of(str(path), None, with_lines=False).hits)
+    hits = Counting(facts_of(str(path), None, Folder.everything(uses=DEFINING_USES)).hits)
     heads = [place for place, hit in enumerate(hits) if hit.opens == FUNCTION]
     assert [_hints(hits, place) for place in heads] == [{"b": "int"}] * 100
     assert hits.given <= 6 * len(heads)
@@ -434,6 +446,7 @@ def test_stats_counts(shop: Path) -> None:
     assert values["records"] == sum(values["kinds"].values())
     assert values["errors"] == 0
     assert run("stats", cwd=shop).stdout.splitlines()[3].split() == ["files", "1"]
+    assert "return" not in values["names"], "which is said of functions and is no name"
 
 
 @pytest.mark.parametrize(

@@ -13,6 +13,10 @@ from quillet.index.facts import FileFacts, Hit, definitions_in, row_of
 from quillet.index.questions import FLAGS, Folder, Index, Sources
 from quillet.index.store import IndexProblem, find_index
 
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from quillet.tarvex import _host
+
 # As much of a source line is shown, in characters.
 _WINDOW = 160
 
@@ -20,7 +24,7 @@ _WINDOW = 160
 def run(path: str, *, index: str | None, as_json: bool, imports: bool) -> int:
     """Runs the command and returns its exit code."""
     try:
-        facts = facts_of(path, index, with_lines=True)
+        facts = facts_of(path, index, Folder.everything(with_lines=True))
     except IndexProblem as problem:
         return fail(problem)
     lines = dict(zip(facts.hits, facts.source_lines, strict=True))
@@ -67,8 +71,8 @@ def _json(path: str, hit: Hit, source: bytes) -> str:
     return json.dumps(row, ensure_ascii=True, separators=(",", ":")) + "\n"
 
 
-def facts_of(path: str, index: str | None, *, with_lines: bool) -> FileFacts:
-    """What a file says that a person names, read as the Python of the index that is named or nearest.
+def facts_of(path: str, index: str | None, question: _host.Question) -> FileFacts:
+    """What a file that a person names answers to a question, read as the Python of the index that is named or nearest.
 
     Raises `IndexProblem` for an index that is named and cannot be used, and a file that cannot be read.
     """
@@ -78,7 +82,7 @@ def facts_of(path: str, index: str | None, *, with_lines: bool) -> FileFacts:
         raise IndexProblem(f"{path}: {problem_of(error) if isinstance(error, OSError) else error}") from error
     sources: Sources = Folder(".", version_of(index))
     row = row_of(os.fsencode(os.path.abspath(path)), status.st_size)
-    [facts] = sources.facts([row], sources.everything(with_lines=with_lines))
+    [facts] = sources.facts([row], question)
     if facts.problem is not None:
         raise IndexProblem(f"{path}: {facts.problem}")
     return facts

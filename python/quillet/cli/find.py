@@ -14,7 +14,7 @@ import time
 from quillet.cli.find_options import ROLES
 from quillet.cli.show import Style, printable
 from quillet.cli.streams import bytes_writer, quiet_output
-from quillet.index.questions import Folder, Index, Query, Sources, match_of
+from quillet.index.questions import Folder, Index, Query, Sources, match_of, roles_of
 from quillet.index.store import IndexProblem, find_index
 
 TYPE_CHECKING = False
@@ -28,6 +28,9 @@ _PATIENCE = 0.1
 _SLOW = 1.0
 # How many words that differ by case are tried where nothing is found.
 _MOST_ALIKE = 5
+# How many of them are looked at for what they are, and how many roles of a name are said.
+_MOST_LOOKED_AT = 1000
+_MOST_ROLES = 3
 
 
 def ask(
@@ -148,31 +151,71 @@ def show_answers(out: TextIO, sources: Sources, query: Query, form: str) -> bool
 def nearby(sources: Sources, query: Query) -> Iterator[str]:
     """Questions near to one without an answer, as one types them, of those that have one."""
     seen = {_typed(query)}
-    for near in _neighbours(sources, query):
+
+    def has_answer(near: Query) -> bool:
         typed = _typed(near)
-        if typed not in seen:
-            seen.add(typed)
-            if next(sources.lines(near, "none"), None) is not None:
-                yield typed
+        if typed in seen:
+            return False
+        seen.add(typed)
+        return next(sources.lines(near, "none"), None) is not None
+
+    if query.scope is not None and has_answer(near := query.but(scope=None)):
+        yield _typed(near)
+    if query.path is not None and has_answer(near := query.but(path=None)):
+        yield _typed(near)
+    for near in _other_names(sources, query):
+        if has_answer(near):
+            yield _typed(near)
+        elif query.roles or query.returns:
+            # What it is instead.
+            for role in _roles_of(sources, near.but(roles=(), returns=False)):
+                if has_answer(other := near.but(roles=(role,), returns=False)):
+                    yield _typed(other)
 
 
-def _neighbours(sources: Sources, query: Query) -> Iterator[Query]:
-    if query.scope is not None:
-        yield query.but(scope=None)
-    if query.path is not None:
-        yield query.but(path=None)
-    names = [query]
+def _other_names(sources: Sources, query: Query) -> Iterator[Query]:
+    """The question itself, and the same for names and patterns that are nearly the same."""
+    yield query
     if query.match == "exact":
-        names.append(query.but(name=f".{query.name}", match="suffix"))
-        outer, dot, tail = query.name.rpartition(".")
-        for word in sources.words_alike(tail)[:_MOST_ALIKE]:
-            names.append(query.but(name=outer + dot + word))
+        yield query.but(name=f".{query.name}", match="suffix")
     elif query.match == "suffix":
-        names.append(query.but(name=query.name.lstrip("."), match="exact"))
-    yield from names
-    if query.roles or query.returns:
-        for near in names:
-            yield near.but(roles=(), returns=False)
+        yield query.but(name=query.name.lstrip("."), match="exact")
+    for name in _in_other_cases(sources, query.name):
+        yield query.but(name=name)
+
+
+def _in_other_cases(sources: Sources, name: str) -> Iterator[str]:
+    """A name or a pattern as others are spelt that differ from it by the case of letters alone, but for itself."""
+    from itertools import islice, product
+
+    parts = []
+    for part in name.split("."):
+        alike = sources.words_alike(part) if part.strip("*?") else []
+        spelt = dict.fromkeys([part, *(_in_case_of(word, part) for word in alike)])
+        parts.append(list(spelt)[: _MOST_ALIKE + 1])
+    return islice(map(".".join, product(*parts)), 1, _MOST_ALIKE + 1)
+
+
+def _in_case_of(word: str, pattern: str) -> str:
+    """The pattern with its letters as a word has them that fits it in another case."""
+    import re
+
+    pieces = re.split("([*?])", pattern)
+    regex = "".join(
+        f"({re.escape(piece)})" if i % 2 == 0 else f"({piece.replace('*', '.*').replace('?', '.')})"
+        for i, piece in enumerate(pieces)
+    )
+    found = re.fullmatch(regex, word, re.IGNORECASE)
+    spelt = found.groups() if found else pieces
+    return "".join(piece if i % 2 else spelt[i] for i, piece in enumerate(pieces))
+
+
+def _roles_of(sources: Sources, query: Query) -> list[str]:
+    """What the first answers to a question are, at most so many roles, in the order of the options."""
+    from itertools import islice
+
+    found = {role for hit in islice(sources.find(query), _MOST_LOOKED_AT) for role in roles_of(hit)}
+    return [role for role in ROLES if role in found][:_MOST_ROLES]
 
 
 def _typed(query: Query) -> str:

@@ -11,11 +11,10 @@ from __future__ import annotations
 import json
 import os
 import re
-from collections.abc import Iterator
+from collections.abc import Iterator, Sequence
 from typing import NamedTuple
 
-from quillet._batch import analyze_files
-from quillet._names import FileBindings, Occurrence
+from quillet._names import FileBindings, Occurrence, bind
 from quillet._source import SourceEncodingError, to_utf8
 from quillet.cli.defs import facts_of, shown_path, version_of
 from quillet.cli.files import problem_of, read_file
@@ -23,6 +22,7 @@ from quillet.cli.find import fail
 from quillet.cli.show import Style, printable
 from quillet.cli.streams import quiet_output
 from quillet.index.facts import FileFacts, Hit
+from quillet.index.questions import DEFINING_USES, Folder
 from quillet.index.store import CLASS, FUNCTION, IndexProblem
 
 # How much of a signature is shown to people, in characters, and how far a head is read for it, in bytes.
@@ -54,18 +54,18 @@ class Definition(NamedTuple):
 def run(path: str, *, index: str | None, as_json: bool) -> int:
     """Runs the command and returns its exit code."""
     try:
-        facts = facts_of(path, index, with_lines=False)
+        facts = facts_of(path, index, Folder.everything(uses=DEFINING_USES))
         source = _source_of(path)
-        [result] = analyze_files([(path, source)], version=version_of(index), jobs=1, bindings=True)
-        if result.problem is not None:
-            raise IndexProblem(f"{path}: {result.problem}")
+        bindings = bind(source, version=version_of(index))
     except IndexProblem as problem:
         return fail(problem)
+    except OverflowError as problem:
+        return fail(IndexProblem(f"{path}: {problem}"))
     found = False
     with quiet_output() as out:
         style = Style.of_stdout()
         digits = len(str(facts.lines))
-        for definition in outline(facts, result.bindings, to_utf8(source)):
+        for definition in outline(facts, bindings, to_utf8(source)):
             found = True
             out.write(_json(shown_path(path), definition) if as_json else _line(definition, digits, style))
     return 0 if found else 1
@@ -110,9 +110,9 @@ def _json(path: str, definition: Definition) -> str:
 
 def outline(facts: FileFacts, bindings: FileBindings, source: bytes) -> Iterator[Definition]:
     """The definitions, in the order of the source, which is UTF-8."""
+    occurrences = bindings.occurrences
     source = source.removeprefix(b"\xef\xbb\xbf")
     starts = [0, *(match.end() for match in re.finditer(rb"\r\n|\r|\n", source))]
-    occurrences = list(bindings.occurrences)
     recorded = {(hit.line, hit.column): place for place, hit in enumerate(facts.hits) if hit.opens in (CLASS, FUNCTION)}
     for index, occurrence in enumerate(occurrences):
         if occurrence.role != "definition" or occurrence.kind not in ("class", "function"):
@@ -147,7 +147,7 @@ def _scopes_around(bindings: FileBindings, occurrence: Occurrence) -> tuple[str,
     return tuple(reversed(names))
 
 
-def _parameters(bindings: FileBindings, occurrences: list[Occurrence], index: int) -> Iterator[str]:
+def _parameters(bindings: FileBindings, occurrences: Sequence[Occurrence], index: int) -> Iterator[str]:
     """The parameters of the function whose name stands at an index: those of the first function behind it, as far as
     they stand in front of any other definition.
     """

@@ -13,9 +13,13 @@ import sys
 from collections.abc import Callable, Iterable, Sequence
 from typing import NamedTuple, TextIO, cast
 
-from quillet._workspace import Certainty, Location, RenameError, Workspace
+from quillet._workspace import Location, RenameError, Workspace
 from quillet.cli.show import Style, place_text, printable
 from quillet.cli.streams import quiet_output
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from quillet._workspace import Certainty
 
 # By what a folder is known as that of a project.
 _PROJECT_FILES = (".git", "pyproject.toml", "setup.py", "setup.cfg")
@@ -79,7 +83,7 @@ def ask(kind: str, target: str, settings: Settings, *, at_least: str = "by name"
         question = QUESTIONS[kind]
         found = False
         with quiet_output() as out:
-            answer = _Answer(out, workspace, settings.as_json, cast(Certainty, at_least))
+            answer = _Answer(out, workspace, settings.as_json, cast("Certainty", at_least))
             found = question(answer, place)
     except (OSError, ValueError) as problem:
         if isinstance(problem, BrokenPipeError):

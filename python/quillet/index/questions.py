@@ -53,6 +53,8 @@ ROLES = {
     "annotation": _uses("annotation"),
 }
 _ALL_USES = _USES["all"]
+# What defines a name, and what hints say of it and of its parameters.
+DEFINING_USES = _uses("set hint")
 # Where an occurrence stands, by the bits of `Hit.flags`.
 FLAGS: tuple[str, ...] = _host.NAME_FLAG_WORDS
 # A thread of its own is worth while for so much source.
@@ -92,6 +94,17 @@ class Query:
         return _host.MakeQuestion(self.match, self.name, uses, self.returns, self.scope, False)
 
 
+def roles_of(hit: Hit) -> Iterator[str]:
+    """The roles, as `ROLES` has them, that may ask for an answer."""
+    if hit.is_parameter:
+        yield "param"
+    if hit.opens:
+        yield "def"
+    yield from (word for i, word in enumerate(FLAGS) if hit.flags >> i & 1 and word in ROLES)
+    uses = _USES.get(hit.kind, 0) | (_host.ROLE_USES[hit.role] if hit.role is not None else 0)
+    yield from (role for role, asked in ROLES.items() if uses & asked)
+
+
 # A file as the core has it: the fields of `FileRow`, of which these are looked at here.
 _PATH = 1
 _SIZE = 2
@@ -113,8 +126,9 @@ class Sources:
         """The files that may answer, each with the fields of a `FileRow`."""
         raise NotImplementedError
 
-    def words_alike(self, word: str, /) -> list[str]:
-        """Words of the files that differ from one by the case of letters alone, as far as they are known."""
+    def words_alike(self, pattern: str, /) -> list[str]:
+        """Words of the files that differ from one, or from what fits a pattern of * and ?, by the case of letters
+        alone, as far as they are known."""
         raise NotImplementedError
 
     def full_path(self, stored: bytes) -> str:
@@ -164,9 +178,9 @@ class Sources:
             yield FileFacts(FileRow._make(row), found, lines, errors, result.line_count, problem)
 
     @staticmethod
-    def everything(*, with_lines: bool = False) -> _host.Question:
-        """The question that all records of a file answer."""
-        return _host.MakeQuestion("everything", "", _ALL_USES, False, None, with_lines)
+    def everything(*, with_lines: bool = False, uses: int = _ALL_USES) -> _host.Question:
+        """The question that all records of a file answer, or those that use a name in some ways."""
+        return _host.MakeQuestion("everything", "", uses, False, None, with_lines)
 
     def analysed(
         self, rows: Iterable[tuple[Any, ...]], form: _host.Format
@@ -259,8 +273,8 @@ class Index(Sources):
             self._walked = _host.CurrentFiles(pairs, self._settings.gitignore, pattern_lines(self._settings.exclude))
         return self._walked
 
-    def words_alike(self, word: str, /) -> list[str]:
-        return self._native.WordsAlike(word)
+    def words_alike(self, pattern: str, /) -> list[str]:
+        return self._native.WordsAlike(pattern)
 
     def file(self, path: str) -> FileRow | None:
         """A file by a path as a person names it, or None where the index does not have it."""
@@ -322,11 +336,17 @@ class Folder(Sources):
     def candidates(self, _: _host.Question, /) -> Sequence[tuple[Any, ...]]:
         return self.files()
 
-    def words_alike(self, word: str, /) -> list[str]:
+    def words_alike(self, pattern: str, /) -> list[str]:
         import re
 
-        lower = word.encode().lower()
-        alike = re.compile(rb"(?<!\w)" + re.escape(lower) + rb"(?!\w)", re.IGNORECASE)
+        pieces = re.split(rb"([*?])", pattern.encode())
+        part = rb"[\w\x80-\xff]"
+        parts = {b"*": part + b"*", b"?": part}
+        alike = re.compile(
+            b"(?<!%b)%b(?!%b)" % (part, b"".join(parts.get(piece) or re.escape(piece) for piece in pieces), part),
+            re.IGNORECASE,
+        )
+        longest = max(pieces[::2], key=len).lower()
         found: set[bytes] = set()
         for row in self.files():
             try:
@@ -334,9 +354,9 @@ class Folder(Sources):
                     text = file.read()
             except OSError:
                 continue  # the question said so
-            if lower in text.lower():
+            if longest in text.lower():
                 found.update(alike.findall(text))
-        return sorted(each.decode() for each in found)
+        return sorted(each.decode(errors="replace") for each in found)
 
 
 def is_like(path: str, pattern: str) -> bool:
