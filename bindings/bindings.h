@@ -44,5 +44,6 @@ void BindShard(nb::module_& tarvex);
 void BindSite(nb::module_& tarvex);
 void BindSyntax(nb::module_& tarvex);
 void BindWorkspace(nb::module_& tarvex);
+void BindJson(nb::module_& tarvex);
 
 }  // namespace quillet::host

@@ -79,6 +79,7 @@ NB_MODULE(tarvex_in_main, tarvex) {
   BindSite(tarvex);
   BindSyntax(tarvex);
   BindWorkspace(tarvex);
+  BindJson(tarvex);
 }
 
 extern "C" NB_EXPORT PyObject* PyInit_tarvex(void);

@@ -10,16 +10,21 @@ from __future__ import annotations
 
 import os
 import sys
-from collections.abc import Iterable, Sequence
-from typing import Literal, NamedTuple, Union, cast
 
 from quillet._languages import language_version, native_language_of
-from quillet._source import to_utf8
 from quillet.tarvex import _host
 
-StrPath = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
-Columns = Literal["utf-8", "utf-16", "utf-32"]
-Certainty = Literal["certain", "likely", "by name"]
+# As typing has it, which takes longer to load than a question to answer.
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Iterable, Sequence
+    from typing import Literal, NamedTuple
+
+    StrPath = str | bytes | os.PathLike[str] | os.PathLike[bytes]
+    Columns = Literal["utf-8", "utf-16", "utf-32"]
+    Certainty = Literal["certain", "likely", "by name"]
+else:
+    from quillet._named import NamedTuple
 
 _COLUMNS: tuple[Columns, ...] = ("utf-8", "utf-16", "utf-32")
 _CERTAINTIES: tuple[Certainty, ...] = ("certain", "likely", "by name")
@@ -293,7 +298,7 @@ class Workspace:
     def signatures(self, path: StrPath, line: int, column: int) -> list[Signature]:
         """How what is called around a place may be called."""
         return [
-            Signature(label, documentation, tuple(map(Parameter._make, parameters)), active, cast(Certainty, certainty))
+            Signature(label, documentation, tuple(map(Parameter._make, parameters)), active, certainty)
             for label, documentation, parameters, active, certainty in self._native.Signatures(
                 self._readable(path), line, column
             )
@@ -390,7 +395,12 @@ class Workspace:
 
     def open(self, path: StrPath, text: str | bytes) -> None:
         """An editor's text in place of a file's, which need not exist."""
-        self._native.Open(self._path(path), to_utf8(text))
+        if not isinstance(text, str):
+            from quillet._source import to_utf8
+
+            self._native.Open(self._path(path), to_utf8(text))
+        else:
+            self._native.Open(self._path(path), text.encode("utf-8", "surrogatepass"))
 
     def change(self, path: StrPath, edits: Iterable[Sequence[object]]) -> None:
         """Changes a text, of which a buffer is made where none is open. The edits, `Edit` or tuples of that form, are

@@ -7,12 +7,18 @@ unknown or of the wrong kind is an error that names the file, the line and what 
 from __future__ import annotations
 
 import os
-import re
 import sys
-from collections.abc import Callable, Iterable, Mapping
-from typing import Any, NamedTuple
 
-from quillet._workspace import Certainty, Columns, Workspace
+from quillet._workspace import Workspace
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable, Iterable, Mapping
+    from typing import Any, NamedTuple
+
+    from quillet._workspace import Certainty, Columns
+else:
+    from quillet._named import NamedTuple
 
 PROJECT_FILE = "pyproject.toml"
 TABLE = "tool.quillet"
@@ -50,9 +56,14 @@ class Settings(NamedTuple):
             columns=columns,
         )
 
+    @property
+    def admitted(self) -> tuple[Certainty, ...]:
+        """What an answer may be to be sure enough to be shown."""
+        return CERTAINTIES[: CERTAINTIES.index(self.certainty) + 1]
+
     def admits(self, certainty: str) -> bool:
         """Whether an answer is sure enough to be shown."""
-        return CERTAINTIES.index(certainty) <= CERTAINTIES.index(self.certainty)
+        return certainty in self.admitted
 
     def updated(self, given: Mapping[str, Any], folder: str, source: str) -> Settings:
         """These with others in their place, by the names that the table has; paths count from `folder`.
@@ -108,6 +119,8 @@ def _project_files(folder: str) -> Iterable[str]:
 
 def _table(path: str, text: str) -> dict[str, Any] | None:
     """The table of a file; None without one."""
+    import re
+
     if sys.version_info >= (3, 11):
         import tomllib
     else:
@@ -130,6 +143,8 @@ def _table(path: str, text: str) -> dict[str, Any] | None:
 
 def _line_of(text: str, key: str) -> int:
     """The line on which a key of the table stands; that of the table where it is written in a way of its own."""
+    import re
+
     header = re.compile(r"\s*\[\s*tool\s*\.\s*[\"']?quillet[\"']?\s*\]")
     plain = re.compile(rf"\s*[\"']?{re.escape(key)}[\"']?\s*=")
     dotted = re.compile(rf"\s*(?:tool\s*\.\s*)?quillet\s*\.\s*{re.escape(key)}\s*=")
@@ -200,10 +215,9 @@ def _environment(value: Any, folder: str) -> str:
 
 
 def _version(value: Any, _: str) -> tuple[int, int]:
-    match = re.fullmatch(r"(2\.7|3\.\d{1,2})", value) if isinstance(value, str) else None
-    if match is None:
+    major, _, minor = value.partition(".") if isinstance(value, str) else ("", "", "")
+    if value != "2.7" and not (major == "3" and minor.isascii() and minor.isdigit() and len(minor) <= 2):
         raise _Wrong('must be a version in quotes, "2.7" or "3.x" such as "3.12"')
-    major, _, minor = match[1].partition(".")
     return int(major), int(minor)
 
 

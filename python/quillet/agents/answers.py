@@ -10,9 +10,13 @@ from collections.abc import Callable, Iterable, Sequence
 from dataclasses import dataclass
 from typing import Any, NamedTuple
 
-from quillet._workspace import Call, Certainty, Location, OutlineItem
+from quillet._workspace import Call, Location, OutlineItem
 from quillet.agents.targets import QuestionError, Roots, Target, definitions_named, only_one_named, place
 from quillet.settings import Settings
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from quillet._workspace import Certainty
 
 LIMIT = 50
 LIMIT_AT_MOST = 200

@@ -2,6 +2,7 @@
 
 from __future__ import annotations
 
+import gc
 import sys
 
 
@@ -19,6 +20,10 @@ def run(log_file: str | None) -> int:
         except OSError as error:
             print(f"quillet: {log_file}: {error.strerror}", file=sys.stderr)
             return 2
+    # What is loaded stays: looking for what has gone in between would find nothing.
+    gc.disable()
     from quillet.server.main import serve
 
+    gc.freeze()
+    gc.enable()
     return serve(log_file)

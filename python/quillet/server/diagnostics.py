@@ -6,14 +6,15 @@ goes or is saved.
 
 from __future__ import annotations
 
-from typing import TYPE_CHECKING, Any
-
 from quillet.server.documents import Document
 from quillet.server.features import feature
 from quillet.server.language_server import Server
 from quillet.server.positions import range_of
 
+TYPE_CHECKING = False
 if TYPE_CHECKING:
+    from typing import Any
+
     from lsprotocol import types
 
 # As the protocol numbers severities.

@@ -3,19 +3,18 @@
 from __future__ import annotations
 
 import os
-import re
-from collections.abc import Iterator
-from functools import lru_cache
 
-_DRIVE = re.compile(r"/[A-Za-z]:")
-# What means itself in a path and in a URI; most of both is nothing else, and `urllib` takes a while to load.
-_PLAIN = re.compile(r"/[\w./~-]*", re.ASCII)
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Iterator
+
+# The letters that mean themselves in a path and in a URI; most of both have no other ones.
+_PLAIN = "/ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789._~-"
 
 
-@lru_cache(maxsize=4096)
 def path_of(uri: str) -> str:
     """The path that a URI stands for; one of its own for what is no file, such as a text without a name."""
-    if os.name != "nt" and uri.startswith("file:///") and _PLAIN.fullmatch(uri, 7):
+    if os.name != "nt" and uri.startswith("file:///") and _is_plain(uri[7:]):
         return os.path.abspath(uri[7:])
     from urllib.parse import unquote_to_bytes, urlsplit
 
@@ -25,23 +24,27 @@ def path_of(uri: str) -> str:
         return os.path.join(os.path.abspath(os.sep), "unnamed", f"{name}.py")
     path = os.fsdecode(unquote_to_bytes(parts.path))
     if os.name == "nt":
-        if _DRIVE.match(path):
+        if path[:1] == "/" and path[1:2].isalpha() and path[2:3] == ":":
             path = path[1:]
         elif parts.netloc:
             path = f"//{parts.netloc}{path}"
     return os.path.abspath(path)
 
 
-@lru_cache(maxsize=4096)
 def uri_of(path: str) -> str:
     """The URI of a file."""
     if os.name == "nt":
         path = "/" + path.replace("\\", "/")
-    if _PLAIN.fullmatch(path):
+    if path.startswith("/") and _is_plain(path):
         return "file://" + path
     from urllib.parse import quote
 
     return "file://" + quote(os.fsencode(path))
+
+
+def _is_plain(text: str) -> bool:
+    # Of a text of other letters as well, taking these off its ends leaves something.
+    return not text.strip(_PLAIN)
 
 
 class Document:
@@ -55,7 +58,7 @@ class Document:
         self.version = version
         self.is_python = is_python
         self.is_read = True  # not too large for that
-        self.outline: str | None = None  # of this text; editors ask for it again and again
+        self.outline: bytes | None = None  # of this text; editors ask for it again and again
 
 
 class Documents:

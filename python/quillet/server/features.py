@@ -2,10 +2,12 @@
 
 from __future__ import annotations
 
-from collections.abc import Callable
-from typing import Any, TypeVar
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable
+    from typing import Any, TypeVar
 
-Answer = TypeVar("Answer", bound=Callable[..., Any])
+    Answer = TypeVar("Answer", bound=Callable[..., Any])
 
 # What answers a method.
 FEATURES: dict[str, Callable[..., Any]] = {}

@@ -2,17 +2,23 @@
 
 from __future__ import annotations
 
-from collections.abc import Callable
-from typing import Any, NamedTuple
-
-from quillet._workspace import Stopped, Workspace
+from quillet._workspace import Stopped
 from quillet.server import log
 from quillet.server.documents import Document, Documents, path_of
 from quillet.server.positions import place_of
 from quillet.server.projects import Projects
-from quillet.server.protocol import Protocol
 from quillet.server.work import Work
-from quillet.settings import Settings
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable
+    from typing import Any, NamedTuple
+
+    from quillet._workspace import Workspace
+    from quillet.server.protocol import Protocol
+    from quillet.settings import Settings
+else:
+    from quillet._named import NamedTuple
 
 # Above so many characters a document is not read.
 MOST_TEXT = 1 << 25

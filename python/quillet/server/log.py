@@ -5,8 +5,7 @@ Loading `logging` takes as long as an answer, and most servers have no log.
 
 from __future__ import annotations
 
-from typing import TYPE_CHECKING
-
+TYPE_CHECKING = False
 if TYPE_CHECKING:
     from logging import Logger
 

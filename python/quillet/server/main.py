@@ -2,25 +2,28 @@
 
 from __future__ import annotations
 
-import json
 import os
-import signal
 import sys
-import threading
 import time
-from collections.abc import Callable
-from functools import partial
-from typing import Any
+from _signal import SIG_IGN, SIGINT, signal  # the module of that name loads more than all else here
+from _thread import start_new_thread
 
 from quillet import __version__
-from quillet._workspace import Columns
 from quillet.server import diagnostics, log, navigation, reading, sync, writing  # noqa: F401
 from quillet.server.documents import path_of
 from quillet.server.features import FEATURES, PROVIDERS
+from quillet.server.json_text import decode
 from quillet.server.language_server import Server
 from quillet.server.protocol import INVALID_REQUEST, PARSE_ERROR, Again, Protocol
 from quillet.server.streams import MalformedFrame, MessageReader, MessageWriter
 from quillet.server.work import Job
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable
+    from typing import Any
+
+    from quillet._workspace import Columns
 
 # How long what there is to do may take when the client has gone.
 _GRACE = 2.0
@@ -32,7 +35,7 @@ def serve(log_file: str | None = None) -> int:
     source, sink = _take_streams()
     if log_file is not None:
         log.write_to(log_file)
-    signal.signal(signal.SIGINT, signal.SIG_IGN)  # one for the editor in the same terminal is none for this
+    signal(SIGINT, SIG_IGN)  # one for the editor in the same terminal is none for this
     try:
         return _serve(source, sink)
     except Exception:
@@ -44,10 +47,15 @@ def _serve(source: int, sink: int) -> int:
     features: dict[str, Callable[[Any], Any]] = {}
     server = Server(Protocol(MessageWriter(sink), features))
     for method, answer in {**FEATURES, **_LIFE}.items():
-        features[method] = partial(answer, server)
+        features[method] = _answering(answer, server)
     client = _Client(server)
-    threading.Thread(target=client.read, args=(MessageReader(source),), daemon=True).start()
+    # Nothing in a thread of these may be the first to load threading, which would take it for the main one.
+    start_new_thread(client.read, (MessageReader(source),))
     return client.work()
+
+
+def _answering(answer: Callable[..., Any], server: Server) -> Callable[[Any], Any]:
+    return lambda params: answer(server, params)
 
 
 def _take_streams() -> tuple[int, int]:
@@ -86,7 +94,7 @@ class _Client:
             self._put_error(PARSE_ERROR, str(body))
             return
         try:
-            message = json.loads(body)
+            message = decode(body)
         except (ValueError, RecursionError) as error:
             self._put_error(PARSE_ERROR, f"a message is no JSON: {error}")
             return
@@ -117,7 +125,7 @@ class _Client:
         params = message.get("params")
         number = params.get("processId") if isinstance(params, dict) else None
         if isinstance(number, int) and number > 0:
-            threading.Thread(target=self._end_with, args=(number,), daemon=True).start()
+            start_new_thread(self._end_with, (number,))
 
     def _end_with(self, process: int) -> None:
         """Ends with the client's process, whose end of the stream may be held by others."""

@@ -2,18 +2,20 @@
 
 from __future__ import annotations
 
-from collections.abc import Iterable
-from typing import TYPE_CHECKING, Any
-
 from quillet._workspace import Call, Location, Workspace
 from quillet.server.documents import path_of
 from quillet.server.features import feature
+from quillet.server.json_text import encode
 from quillet.server.language_server import Place, Server
 from quillet.server.positions import name_range, part_of, place_of
-from quillet.server.protocol import Encoded, encode
+from quillet.server.protocol import Encoded
 from quillet.settings import Settings
 
+TYPE_CHECKING = False
 if TYPE_CHECKING:
+    from collections.abc import Iterable
+    from typing import Any
+
     from lsprotocol import types
 
 # As the protocol numbers kinds of symbols.
@@ -31,8 +33,14 @@ _MOST_SYMBOLS = 128
 
 
 def _places(ls: Server, locations: Iterable[Location]) -> list[dict[str, Any]]:
-    uri_of = ls.documents.uri_of
-    return [{"uri": uri_of(at.path), "range": name_range(at)} for at in locations]
+    uris: dict[str, str] = {}
+    places = []
+    for at in locations:
+        uri = uris.get(at.path)
+        if uri is None:
+            uri = uris[at.path] = ls.documents.uri_of(at.path)
+        places.append({"uri": uri, "range": name_range(at)})
+    return places
 
 
 def _sure(settings: Settings, locations: Iterable[Location]) -> list[Location]:

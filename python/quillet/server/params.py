@@ -7,10 +7,16 @@ there and of its kind. Whatever else comes, wrong or rare, is read by the librar
 
 from __future__ import annotations
 
-import contextlib
-from collections.abc import Callable
 from types import SimpleNamespace
-from typing import Any
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable
+    from typing import Any
+
+    Reader = Callable[[Any], Any]
+    # The names of fields here and in messages, and what reads the value, which is None where there is none.
+    Fields = tuple[tuple[str, str, Reader], ...]
 
 _MOST = 2**31
 
@@ -25,18 +31,15 @@ def read(method: str, params: Any) -> Any:
         return params
     fields = _PLAIN.get(method)
     if fields is not None:
-        with contextlib.suppress(_NotPlain):
+        try:
             made = _object(params, fields)
             return params if method in _AS_GIVEN else made
+        except _NotPlain:
+            pass
     from quillet.server.library import read_params
 
     made = read_params(method, params)
     return params if method in _AS_GIVEN else made
-
-
-Reader = Callable[[Any], Any]
-# The names of fields here and in messages, and what reads the value, which is None where there is none.
-Fields = tuple[tuple[str, str, Reader], ...]
 
 
 def _object(given: Any, fields: Fields) -> SimpleNamespace:

@@ -2,12 +2,13 @@
 
 from __future__ import annotations
 
-from typing import TYPE_CHECKING, Any
-
-from quillet._workspace import Columns
-
+TYPE_CHECKING = False
 if TYPE_CHECKING:
+    from typing import Any
+
     from lsprotocol import types
+
+    from quillet._workspace import Columns
 
 _MOST = 2**31 - 2
 

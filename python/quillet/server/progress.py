@@ -6,11 +6,18 @@ A client takes requests back by the token as well as by their number.
 
 from __future__ import annotations
 
-import threading
-from collections.abc import Callable
-from typing import Any
+from _thread import allocate_lock
 
-from quillet.server.work import Job
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable
+    from threading import Timer
+    from typing import Any
+
+    from quillet.server.work import Job
+
+    Tell = Callable[[str, Any], None]
+    Ask = Callable[[str, Any, Callable[[Any], None]], None]
 
 # What reads all files of a program, the first time it is asked.
 _LONG = {
@@ -24,9 +31,6 @@ _LONG = {
 # What is done before that is told by nothing but its answer.
 DELAY = 0.4
 
-Tell = Callable[[str, Any], None]
-Ask = Callable[[str, Any, Callable[[Any], None]], None]
-
 
 class Progress:
     """Of one request, told from when it is entered until it is left. `ask` asks the client, whose answer comes on the
@@ -38,10 +42,10 @@ class Progress:
     def __init__(self, job: Job, tell: Tell, ask: Ask | None) -> None:
         self._job, self._tell, self._ask = job, tell, ask
         self._title = _LONG.get(job.method) if isinstance(job.method, str) else None
-        self._lock = threading.Lock()
+        self._lock = allocate_lock()
         self._has_begun = False
         self._has_ended = False
-        self._timer: threading.Timer | None = None
+        self._timer: Timer | None = None
 
     def __enter__(self) -> None:
         if self._title is None:
@@ -49,7 +53,9 @@ class Progress:
         if self._job.token is not None:
             self._begin()
         elif self._ask is not None:
-            self._timer = threading.Timer(DELAY, self._create)
+            from threading import Timer
+
+            self._timer = Timer(DELAY, self._create)
             self._timer.daemon = True
             self._timer.start()
 

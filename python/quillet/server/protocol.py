@@ -6,17 +6,21 @@ the workspaces alone.
 
 from __future__ import annotations
 
-import json
 import time
-from collections.abc import Callable, Mapping
-from typing import Any
 
 from quillet._workspace import RenameError, Stopped
 from quillet.server import log
+from quillet.server.json_text import encode
 from quillet.server.params import read
 from quillet.server.progress import Progress
-from quillet.server.streams import MessageWriter
-from quillet.server.work import Job
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable, Mapping
+    from typing import Any
+
+    from quillet.server.streams import MessageWriter
+    from quillet.server.work import Job
 
 PARSE_ERROR = -32700
 INVALID_REQUEST = -32600
@@ -33,7 +37,7 @@ class Again(Exception):
     """A question made way and is to be asked again."""
 
 
-class Encoded(str):
+class Encoded(bytes):
     """An answer that is JSON already."""
 
 
@@ -172,7 +176,7 @@ class Protocol:
     def reply(self, number: Any, result: Any) -> None:
         """Answers a request by what can be written as JSON, or was."""
         if isinstance(result, Encoded):
-            self._writer.write_body(f'{{"jsonrpc":"2.0","id":{json.dumps(number)},"result":{result}}}'.encode())
+            self._writer.write_body(b'{"jsonrpc":"2.0","id":%b,"result":%b}' % (encode(number), result))
         else:
             self._write({"jsonrpc": "2.0", "id": number, "result": result})
 
@@ -186,11 +190,7 @@ class Protocol:
         self._write({"jsonrpc": "2.0", "method": method, "params": params})
 
     def _write(self, message: dict[str, Any]) -> None:
-        self._writer.write_body(encode(message).encode())
-
-
-# What it writes is ASCII. A new one for each message takes longer than most messages.
-encode = json.JSONEncoder(separators=(",", ":")).encode
+        self._writer.write_body(encode(message))
 
 
 _CANCELLED = (REQUEST_CANCELLED, "the request was cancelled")

@@ -2,13 +2,14 @@
 
 from __future__ import annotations
 
-from typing import TYPE_CHECKING, Any
-
 from quillet.server.features import feature
 from quillet.server.language_server import Server
 from quillet.server.positions import place_of, range_of
 
+TYPE_CHECKING = False
 if TYPE_CHECKING:
+    from typing import Any
+
     from lsprotocol import types
 
 # As the protocol numbers kinds of hints.

@@ -6,8 +6,11 @@ Descriptors, and not the streams of `sys`: a thread that waits in one of those w
 from __future__ import annotations
 
 import os
-import threading
-from collections.abc import Iterator
+from _thread import allocate_lock
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Iterator
 
 _CHUNK = 1 << 18
 _MOST_HEADERS = 1 << 16
@@ -88,7 +91,7 @@ class MessageWriter:
 
     def __init__(self, descriptor: int) -> None:
         self._descriptor = descriptor
-        self._lock = threading.Lock()
+        self._lock = allocate_lock()
         self.is_broken = False
 
     def write(self, data: bytes) -> None:

@@ -3,7 +3,6 @@
 from __future__ import annotations
 
 import os
-from typing import TYPE_CHECKING, Any
 
 from quillet._workspace import Edit
 from quillet.server import diagnostics, log
@@ -13,7 +12,10 @@ from quillet.server.language_server import Server
 from quillet.server.positions import place_of
 from quillet.settings import PROJECT_FILE
 
+TYPE_CHECKING = False
 if TYPE_CHECKING:
+    from typing import Any
+
     from lsprotocol import types
 
 SECTION = "quillet"

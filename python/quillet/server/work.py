@@ -10,11 +10,13 @@ behind them, or given up where its own text is no longer the one that it was ask
 
 from __future__ import annotations
 
-import threading
 import time
-from collections import deque
-from collections.abc import Callable
-from typing import Any
+from _thread import allocate_lock
+
+TYPE_CHECKING = False
+if TYPE_CHECKING:
+    from collections.abc import Callable
+    from typing import Any
 
 # What a person waits for while typing or pointing.
 _URGENT = frozenset(
@@ -60,8 +62,10 @@ class Work:
 
     def __init__(self, stop: Callable[[float], None]) -> None:
         self._stop = stop
-        self._changed = threading.Condition()
-        self._jobs: deque[Job] = deque()
+        self._lock = allocate_lock()
+        self._bell = allocate_lock()  # taken until there is something new
+        self._bell.acquire()
+        self._jobs: list[Job] = []
         self._running: Job | None = None
         self._is_idle_work = False
         self._later: dict[str, tuple[float, Callable[[], None]]] = {}
@@ -71,13 +75,13 @@ class Work:
 
     def put(self, job: Job) -> None:
         """Something more to do."""
-        with self._changed:
+        with self._lock:
             self._jobs.append(job)
             if self._is_idle_work:
                 self._stop(0)
             elif job.method in _EDITS or job.method in _URGENT:
                 self._make_way(job)
-            self._changed.notify()
+            self._ring()
 
     def _make_way(self, job: Job) -> None:
         running = self._running
@@ -100,7 +104,7 @@ class Work:
             self._cancel(lambda job: bool(job.token == token))
 
     def _cancel(self, is_meant: Callable[[Job], bool]) -> None:
-        with self._changed:
+        with self._lock:
             running = self._running
             if running is not None and running.is_request and is_meant(running):
                 running.is_cancelled = True
@@ -113,30 +117,42 @@ class Work:
 
     def end(self, *, at_once: bool = False) -> None:
         """Nothing more will come; `at_once` where nobody waits for what there is."""
-        with self._changed:
+        with self._lock:
             self._has_ended = True
             if at_once:
                 self._jobs.clear()
                 self._stop(0)
-            self._changed.notify()
+            self._ring()
+
+    def _ring(self) -> None:
+        if self._bell.locked():
+            self._bell.release()
 
     # ---- the main thread ----
 
+    def _wait(self, seconds: float = -1) -> None:
+        """Until there is something new, without an end or so long; the lock is free meanwhile."""
+        self._lock.release()
+        try:
+            self._bell.acquire(True, seconds)
+        finally:
+            self._lock.acquire()
+
     def later(self, key: str, action: Callable[[], None], delay: float = 0) -> None:
         """Does something once there is nothing else to do, and in place of what had the same key."""
-        with self._changed:
+        with self._lock:
             self._later[key] = (time.monotonic() + delay, action)
 
     def drop(self, key: str) -> None:
         """Not any more."""
-        with self._changed:
+        with self._lock:
             self._later.pop(key, None)
 
     def again(self, job: Job) -> None:
         """Asks one that made way again, behind the edits and what is urgent by now."""
         job.makes_way = False
         job.tries += 1
-        with self._changed:
+        with self._lock:
             place = 0
             for index, other in enumerate(self._jobs):
                 if other.method in _EDITS or other.method in _URGENT:
@@ -150,12 +166,12 @@ class Work:
 
         `proceed` is called in front of it: what was stopped before must not stop this.
         """
-        with self._changed:
+        with self._lock:
             self._running = None
             self._is_idle_work = False
             while True:
                 if self._jobs:
-                    self._running = self._jobs.popleft()
+                    self._running = self._jobs.pop(0)
                     proceed()
                     return self._running
                 if self._has_ended:
@@ -163,10 +179,10 @@ class Work:
                 now = time.monotonic()
                 due = min(self._later, key=lambda key: self._later[key][0], default=None)
                 if due is None:
-                    self._changed.wait()
+                    self._wait()
                 elif self._later[due][0] <= now:
                     self._is_idle_work = True
                     proceed()
                     return self._later.pop(due)[1]
                 else:
-                    self._changed.wait(self._later[due][0] - now)
+                    self._wait(self._later[due][0] - now)

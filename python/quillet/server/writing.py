@@ -2,8 +2,6 @@
 
 from __future__ import annotations
 
-from typing import TYPE_CHECKING, Any
-
 from quillet.server.documents import uri_of
 from quillet.server.features import feature
 from quillet.server.language_server import Server
@@ -11,7 +9,10 @@ from quillet.server.positions import name_range, part_of, range_of
 from quillet.server.protocol import RequestFailed
 from quillet.server.reading import documentation
 
+TYPE_CHECKING = False
 if TYPE_CHECKING:
+    from typing import Any
+
     from lsprotocol import types
 
 # As the protocol numbers kinds of completions.
@@ -26,6 +27,7 @@ _KINDS = {
     "keyword": 14,
     "attribute": 5,
 }
+_VARIABLE = _KINDS["variable"]
 
 
 @feature("textDocument/completion", "completionProvider", {"triggerCharacters": ["."], "resolveProvider": True})
@@ -36,19 +38,20 @@ def completion(ls: Server, params: types.CompletionParams) -> Any:
     ls.completed = (uri, ls.version_of(uri), place.line, place.column)
     ls.completion_number += 1
     items = []
-    for index, each in enumerate(place.workspace.complete(*place.at)):
-        if not place.settings.admits(each.certainty):
+    number, shown = ls.completion_number, place.settings.admitted
+    for index, (name, kind, detail, _, certainty) in enumerate(place.workspace.complete(*place.at)):
+        if certainty not in shown:
             continue
         item: dict[str, Any] = {
-            "label": each.name,
-            "kind": _KINDS.get(each.kind, _KINDS["variable"]),
+            "label": name,
+            "kind": _KINDS.get(kind, _VARIABLE),
             "sortText": f"{index:05d}",
-            "data": ls.completion_number,
+            "data": number,
         }
-        if each.detail:
-            item["detail"] = each.detail
-        if each.certainty != "certain":
-            item["labelDetails"] = {"description": each.certainty}
+        if detail:
+            item["detail"] = detail
+        if certainty != "certain":
+            item["labelDetails"] = {"description": certainty}
         items.append(item)
     return {"isIncomplete": False, "items": items}
 
