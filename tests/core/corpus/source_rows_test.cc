@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstring>
 #include <functional>
 #include <string>
@@ -186,6 +187,15 @@ TEST(SourceRows, CountsWhatItSaw) {
   ASSERT_EQ(files.size(), 3u);
   EXPECT_EQ(files[1], "1.py|3.12|0|0|0|0|it is gone");
   EXPECT_EQ(rows.TakeFiles(), nullptr);
+}
+
+TEST(SourceRows, SaysWhereASourceWasNotReadWhole) {
+  std::string many = "x = [";
+  for (int i = 0; i < 200'000; ++i) many += "a,";
+  const Strings rows = RowsOf(Options(), Table({many + "]\n", "y\n"}));
+  EXPECT_EQ(rows.back(), "1.py|1|1||y|get||no|-");
+  EXPECT_EQ(
+      std::ranges::count_if(rows, [](const std::string& row) { return row.find("|report|") != std::string::npos; }), 1);
 }
 
 TEST(SourceRows, CarriesValuesOfEveryFixedSize) {

@@ -82,6 +82,46 @@ TEST(Inference, FollowsCallsToWhatTheyReturn) {
   });
 }
 
+TEST(Inference, GuessesWhatAClassLeavesToThoseBelow) {
+  Check({
+      {"class A:\n  def m(self): raise NotImplementedError\n  def n(self): return self.$x\n"
+       "class B(A):\n  x = 1\n  def m(self): return 'a'\nclass C(B):\n  def m(self): return 1.5\n"
+       "def f(a: A):\n  $b = a.m()\n  $c = a.n()\n",
+       {"int", "str", "int"}},
+      {"class A:\n  def m(self): raise NotImplementedError\nclass B(A): pass\ndef f(a: A):\n  $b = a.m()\n", {""}},
+      {"class A:\n  def m(self): raise NotImplementedError\nclass B:\n  def m(self): return 1\n"
+       "def f(a: A):\n  $b = a.m()\n",
+       {""}},
+      // That of another class of the same name.
+      {"class A:\n  def m(self): raise NotImplementedError\nclass C:\n  class A: pass\n  class B(A):\n"
+       "    def m(self): return 1\ndef f(a: A):\n  $b = a.m()\n",
+       {""}},
+  });
+}
+
+TEST(Inference, KnowsWhatAClauseHasBoundInFrontOfTheNext) {
+  Check({
+      {"def f(a):\n  y = 'a'\n  [0 for x in (y := [1]) for z in $y]\n  [0 for x in a if (y := 1.5) for z in $y]\n  "
+       "$y\n",
+       {"list[int]", "float", "float | list[int] | str"}},
+  });
+}
+
+TEST(Inference, TakesNoConditionFromAnotherStatement) {
+  Check({
+      {"if :\n  False\n  $x = 1\n  $x\n$x\n", {"int", "int", "int"}},
+      {"if a: $x = 'a'\nelif :\n  False\n  $x = 1\n$x\n", {"str", "int", "int | str"}},
+  });
+}
+
+TEST(Inference, MakesOfADecoratorNoMoreThanOfACall) {
+  Check({
+      {"from typing import TypeVar, NamedTuple\nfrom enum import Enum\n@TypeVar\ndef f(a): pass\n$f\n@NamedTuple\n"
+       "def g(a): pass\n$g\n@Enum\ndef h(a): pass\n$h\n@namedtuple\ndef i(a): pass\n$i\n",
+       {"typing.TypeVar", "typing.NamedTuple", "enum.Enum", "def (a) -> None"}},
+  });
+}
+
 TEST(Inference, KnowsAttributesOfInstances) {
   Check({
       {"class A:\n  def __init__(self):\n    self.x = 1\n  def m(self):\n    self.y = 'a'\n    $self.x\n"

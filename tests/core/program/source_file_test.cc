@@ -103,7 +103,10 @@ TEST(SourceFile, KnowsTheScopeOfAPlace) {
   EXPECT_EQ(file.ScopeBehind("d=e"), "module");
   EXPECT_EQ(file.ScopeBehind("q + "), "lambda");
   EXPECT_EQ(file.ScopeBehind("[i + "), "comprehension");
+  EXPECT_EQ(file.ScopeBehind("for i in "), "module");
   EXPECT_EQ(file.ScopeBehind("in k("), "module");
+  EXPECT_EQ(file.ScopeBehind("in k(h)"), "module");
+  EXPECT_EQ(file.ScopeBehind("in k(h) "), "comprehension");
   EXPECT_EQ(file.ScopeBehind("if i for o in "), "comprehension");
   EXPECT_EQ(file.ScopeBehind("print(v f"), "comprehension");
   EXPECT_EQ(file.ScopeBehind("print"), "module");

@@ -91,6 +91,21 @@ TEST(HtmlText, NothingIsMarkupAndEverythingIsSeen) {
   EXPECT_EQ(Html("\xFF|\xC3"), "\uFFFD|\uFFFD");
 }
 
+TEST(Pages, AnOutlineGoesInWithTheScopesOfItsDefinitions) {
+  std::string source = "class A:\n def m(self):\n  def g(): pass\ndef f(): pass\n";
+  std::string indent;
+  for (int i = 0; i < 8; ++i, indent += ' ') source += indent + "class D" + std::to_string(i) + ":\n";
+  const std::string page = Site({source + indent + "x = 1\n"}).Page();
+  Strings outline;
+  const std::string begin = "<li class=\"d";
+  for (size_t at = page.find(begin); at != std::string::npos; at = page.find(begin, at + 1)) {
+    const size_t name = page.find("</i> ", at) + 5;
+    outline.push_back(page.substr(at + begin.size(), 1) + " " + page.substr(name, page.find('<', name) - name));
+  }
+  EXPECT_EQ(outline,
+            (Strings{"0 A", "1 m", "2 g", "0 f", "0 D0", "1 D1", "2 D2", "3 D3", "4 D4", "5 D5", "6 D6", "6 D7"}));
+}
+
 TEST(Pages, ALinkLeadsToTheDefinitionOfItsOwnScope) {
   Site site({"def f(n):\n    return n\n\ndef g(n):\n    return [n for n in n]\n"});
   EXPECT_EQ(site.Links("n"), (Strings{"#L1", "#L1", "#L4", "#L5", "#L5", "#L4"}));
@@ -145,6 +160,21 @@ TEST(Pages, BuiltinsAreNoLinks) {
   EXPECT_EQ(Site({"len(x)\nlen = 1\n"}).Links("len"), (Strings{"#L2", "#L2"}));
   EXPECT_EQ(Site({"from b import *\nlen(run)\n", "def run(): pass\n"}).Links("len"), Strings{});
   EXPECT_EQ(Site({"from b import *\nlen(run)\n", "def run(): pass\n"}).Links("run"), (Strings{"1.html#L1"}));
+}
+
+TEST(Pages, AnAttributeOfWhatIsNoNameLeadsToThoseOfItsName) {
+  Site site({"def f(): pass\nf()[0].x = 1\n[f].y\nclass A:\n  def m(self): pass\nf().m()\n"});
+  EXPECT_EQ(site.Links("m"), (Strings{"#L5", "0.html#L5"}));
+}
+
+TEST(Pages, ANameThatIsCutIsNoLink) {
+  std::string line = "x = [";
+  while (line.size() + 5 < ShownPart::kMostBytesOfLine) line += "0,";
+  line += std::string(ShownPart::kMostBytesOfLine - 3 - line.size(), ' ') + "total]\n";
+  Site site({"total = 1\n" + line});
+  EXPECT_EQ(site.Links("total"), (Strings{"#L1"}));
+  EXPECT_NE(site.Page().find("tot<em> \u2026 and 3 more bytes</em></p>"), std::string::npos);
+  EXPECT_EQ(Site({"total = 1\n" + line.substr(0, line.find("total") - 2) + "total]\n"}).Links("total").size(), 2u);
 }
 
 TEST(Pages, ALineIsCutAtACharacter) {

@@ -163,6 +163,15 @@ TEST(Operators, RequestedParenthesesAreForCompoundsAlone) {
   EXPECT_EQ(Full("'s'", kAddParens), "'s'");
 }
 
+TEST(Operators, APowerHasItsExponentWhereThatIsAskedFor) {
+  CNodeToTextConverter converter(true, true, true);
+  converter.set_shows_exponents(true);
+  EXPECT_EQ(TextOf(converter, "a.b[c] ** -2"), "a.b[c] ** -2");
+  EXPECT_EQ(TextOf(converter, "a ** 2", kAddParens), "(a ** 2)");
+  EXPECT_EQ(TextOf(converter, "a ** b ** c", kAddParens), "(a ** b ** c)");
+  EXPECT_EQ(TextOf(converter, "a ** 2", kDotted), "<none>");
+}
+
 TEST(Trailers, ShowBracketsAsTheOptionsSay) {
   EXPECT_EQ(Plain("f(x)"), "f()");
   EXPECT_EQ(Plain("x[0]"), "x[]");

@@ -563,6 +563,26 @@ TEST_F(TreeTest, ArraysOfChildrenAreNotUsedAgainWhileTheCoreWaits) {
   EXPECT_TRUE(last->children == before.data() || another->children == before.data());
 }
 
+TEST_F(TreeTest, ArraysOfChildrenAreUsedAgainBehindTheLastViewOfAHost) {
+  CNode* node = factory_.NewBare<CPatternNode>();
+  CNode* children[] = {Name("a"), Name("b")};
+  factory_.SetChildren(node, children);
+  CNode** const before = node->children;
+  NodePool::is_core_waiting = [] { return true; };
+  pool_->ClearChildren(node);
+  pool_->ResizeChildren(node, 20);
+  std::fill_n(node->children, 20, nullptr);
+  pool_->HostViewsDropped();
+  CNode* const other = factory_.NewBare<CPatternNode>();
+  factory_.SetChildren(other, children);
+  EXPECT_NE(other->children, before);
+  NodePool::is_core_waiting = nullptr;
+  pool_->HostViewsDropped();
+  CNode* const last = factory_.NewBare<CPatternNode>();
+  factory_.SetChildren(last, children);
+  EXPECT_EQ(last->children, before);
+}
+
 TEST_F(TreeTest, ReclaimWaitsWhileTheHostLooks) {
   pool_->host_views = 2;
   CNode* node = Rule(NodeKind::kCExprStmt, {Name("a"), Name("b")});

@@ -155,6 +155,17 @@ TEST(Completions, AreDescribed) {
   EXPECT_EQ(described(2, "nothing"), "|");
 }
 
+TEST(Completions, AreDescribedBehindBlanks) {
+  Program program({
+      {"a.py", "$  $\nfrom b import \t $\nimport b\nb. \t$\n(b\n . $)\nx = b.  g$\n"},
+      {"b.py", "def g(): return 1\n"},
+  });
+  Words described;
+  for (const Program::Place& place : program.places())
+    described.push_back(program->DescribeCompletion(place.file, place.offset, "g").text);
+  EXPECT_EQ(described, (Words{"", "", "def g() -> int", "def g() -> int", "def g() -> int", "def g() -> int"}));
+}
+
 TEST(Places, CountWhatIsAskedFor) {
   Program program("a = 'ä€😀'; $b\r\tc = '😀'; $d\r\n");
   const auto places = [&] {

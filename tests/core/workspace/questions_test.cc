@@ -168,6 +168,12 @@ TEST(Definitions, SayHowSureTheyAre) {
   EXPECT_EQ(
       Program("class A:\n  def m(self): pass\nclass B:\n  def m(self): pass\ndef f(x: A): x.$m()\n").Definitions(),
       Words{"a.py:2:7"});
+  // By what a lambda is given to, if all that it may be given to say so.
+  const std::string head =
+      "from typing import Callable\nclass A:\n  def m(self): pass\ndef f(x: Callable[[A], int]): pass\ndef g(x): "
+      "pass\n";
+  EXPECT_EQ(Program(head + "f(lambda x: x.$m())\n").Definitions(), Words{"a.py:3:7"});
+  EXPECT_EQ(Program(head + "(f if c else g)(lambda x: x.$m())\n").Definitions(), Words{"a.py:3:7 likely"});
 }
 
 TEST(Definitions, OfStubsLieInTheirSources) {
@@ -202,6 +208,20 @@ TEST(References, AreFoundInTheWholeProject) {
   EXPECT_EQ(found[3].role, "read");
   EXPECT_EQ(program.Say(program->References(program[0].file, program[0].offset, false)),
             (Words{"a.py:2:7", "a.py:3:31"}));
+}
+
+TEST(References, SayWhatTheNameIsAndDoesThere) {
+  Program program("import a\nclass $A:\n  x = 1\n  def f(self, b): self.y = b\nA().$f(A)\nA.$x = 2\nA().$y\n");
+  const auto said = [&](size_t i) {
+    Words words;
+    for (const Location& found : program->References(program[i].file, program[i].offset))
+      words.push_back(std::string(found.role) + " " + std::string(found.kind));
+    return words;
+  };
+  EXPECT_EQ(said(0), (Words{"definition class", "call ", "read ", "read ", "call "}));
+  EXPECT_EQ(said(1), (Words{"definition function", "call "}));
+  EXPECT_EQ(said(2), (Words{"write variable", "write "}));
+  EXPECT_EQ(said(3), (Words{"write ", "read "}));
 }
 
 TEST(References, AreTheSameFromEachOfThem) {
@@ -447,6 +467,16 @@ TEST(Definitions, OfKeysThatAreGotten) {
   EXPECT_EQ(program.Definitions(0), (Words{"a.py:3:3"}));
   EXPECT_EQ(program.Definitions(1), (Words{"a.py:3:3"}));
   EXPECT_EQ(program.Definitions(2), Words());
+}
+
+TEST(Definitions, OfKeysAreThoseOfWhatIsExpected) {
+  Program program(
+      "from typing import TypedDict\nclass M(TypedDict):\n  name: str\n  inner: 'M'\ndef f(m: M, n=0): pass\n"
+      "class C:\n  def g(self, m: M): pass\nx: M = {'$name': ''}\nf({'$name': ''})\nf(n=1, m={'$name': ''})\n"
+      "f({'inner': {'$name': ''}})\nC().g({'$name': ''})\nf(0, {'$name': ''})\nf(n={'$name': ''})\n"
+      "y = {'$name': ''}\n(f, {'$name': ''})\n");
+  for (size_t i = 0; i < program.places().size(); ++i)
+    EXPECT_EQ(program.Definitions(i), i < 5 ? Words{"a.py:3:3"} : Words()) << i;
 }
 
 // ---- renames ----
@@ -743,6 +773,15 @@ TEST(Signatures, KnowTheActiveParameter) {
   EXPECT_EQ(program->Signatures(program[0].file, program[0].offset)[0].documentation, "Words.");
 }
 
+TEST(Signatures, OfNamedTuplesAreTheirFields) {
+  for (const char* fields : {"' x, y '", "'x y'", "'x,y,'", "['x', 'y']", "'''x\n  y\n'''"}) {
+    Program program("from collections import namedtuple\nP = namedtuple('P', " + std::string(fields) + ")\nP($)\n");
+    const auto signatures = program->Signatures(program[0].file, program[0].offset);
+    ASSERT_EQ(signatures.size(), 1u) << fields;
+    EXPECT_EQ(signatures[0].label, "P(x, y)") << fields;
+  }
+}
+
 TEST(Signatures, AreNotThoseOfACallThatAnotherStatementLeftOpen) {
   Program program("def f(a): pass\nf(1,\nimport os\nos.path $\nf(1, $\n");
   EXPECT_TRUE(program->Signatures(program[0].file, program[0].offset).empty());
@@ -841,6 +880,8 @@ TEST(Symbols, AreRanked) {
   EXPECT_EQ(program->Symbols("total", 2).size(), 2u);
   EXPECT_EQ(program->Symbols("twoten").size(), 1u);
   EXPECT_EQ(program->Symbols("zzz").size(), 0u);
+  Program letters("def aZ(): pass\ndef Az(): pass\n");
+  for (const Text query : {"az", "AZ", "Az", "zA"}) EXPECT_EQ(letters->Symbols(query).size(), query == "zA" ? 0u : 2u);
 }
 
 TEST(Symbols, HaveTheColumnsOfWhoAsks) {
@@ -962,6 +1003,21 @@ TEST(Problems, AreNoneBehindStarsOfAnythingAndWhatIsNeverRun) {
   EXPECT_EQ(ProblemsOf(old), Words{});
 }
 
+TEST(Problems, OfImportsThatAreBrokenOffAreThoseOfTheirWholeParts) {
+  const std::pair<const char*, Words> cases[] = {
+      {"import\n", {}},
+      {"import c.\n", {"a.py:1:8 unresolved-import: no module named 'c'"}},
+      {"from c import\n", {"a.py:1:6 unresolved-import: no module named 'c'"}},
+      {"from b import (x,\n", {"a.py:1:16 unresolved-import: nothing is named 'x' there"}},
+      {"from b import x y\n", {"a.py:1:15 unresolved-import: nothing is named 'x' there"}},
+      {"import (c)\n", {}},
+  };
+  for (const auto& [source, expected] : cases) {
+    Program program({{"a.py", source}, {"b.py", "there = 1\n"}});
+    EXPECT_EQ(ProblemsOf(program), expected) << source;
+  }
+}
+
 // ---- buffers ----
 
 TEST(Buffers, StandForTheirFiles) {
@@ -1020,6 +1076,22 @@ TEST(Questions, SayThatAnyOfTheirPartsMetABound) {
   EXPECT_TRUE(program->was_bounded());
   EXPECT_EQ(program->Definitions(program[1].file, program[1].offset).size(), 1u);
   EXPECT_FALSE(program->was_bounded());
+}
+
+TEST(Questions, SayThatMoreFilesDefineAMemberThanTheyLookAt) {
+  testing::TemporaryFolder folder = {{"a.py", "def f(x): x.speed; x.weight\n"}};
+  for (int i = 0; i < 401; ++i) {
+    const std::string member = i < 400 ? "  def weight(self): pass\n" : "";
+    folder.Write("m" + std::to_string(i) + ".py", "class C:\n  def speed(self): pass\n" + member);
+  }
+  Workspace::Settings settings;
+  settings.roots = {folder.path()};
+  Workspace workspace(std::move(settings));
+  const FileId file = workspace.FileOf(folder / "a.py");
+  EXPECT_EQ(workspace.Definitions(file, workspace.OffsetOf(file, 1, 13)).size(), 400u);
+  EXPECT_TRUE(workspace.was_bounded());
+  EXPECT_EQ(workspace.Definitions(file, workspace.OffsetOf(file, 1, 22)).size(), 400u);
+  EXPECT_FALSE(workspace.was_bounded());
 }
 
 TEST(Questions, AreAnsweredWithoutALibrary) {
