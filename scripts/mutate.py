@@ -52,7 +52,7 @@ COPIED = ("core", "tests", "bench", "cmake", "resources", "fuzz", "bindings", "p
 FOLDERS = re.findall(r"quillet_library\((\w+)", (ROOT / "core" / "CMakeLists.txt").read_text())
 WANTED = 0.95
 # Tests that take more seconds than this are asked only about changes that the digest sees.
-SLOW = 4.0
+SLOW = 8.0
 NICENESS = int(os.environ.get("MUTATE_NICENESS", "10"))
 
 # Folder, name, and the last folder that the test is linked with, which reaches all those before it.

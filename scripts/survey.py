@@ -67,7 +67,8 @@ class Library:
 
     def files(self, each_nth: int = 1) -> list[Path]:
         """Its sources, tests included, or every n-th of them."""
-        paths = (path for path in self.root.rglob("*.py") if not NOT_THE_LIBRARY & set(path.parts))
+        found = (path for path in self.root.rglob("*.py") if not NOT_THE_LIBRARY & set(path.parts))
+        paths = (path for path in found if path.is_file())
         return sorted(paths)[::each_nth]
 
     def refusals(self, paths: Sequence[Path]) -> dict[Path, str]:

@@ -6,7 +6,7 @@ python -m bench.corpus engines FOLDER [ENGINE...]      the rows of all engines c
 python -m bench.corpus kill FOLDER ROUNDS SEED         SIGKILL of a worker and of the run, in turn, at random moments
 
 Seconds are of processor time of the workers, so that what else the machine does changes little; the native rate is that
-of `analyze_files` over the same sources, which are in memory, on one thread.
+of `analyze_files` over the same sources, 512 MiB of them at most, which are in memory, on one thread.
 """
 
 from __future__ import annotations
@@ -32,6 +32,8 @@ from quillet.corpus.engines import ENGINES
 from quillet.corpus.sources import Columns, read, units_of
 
 VERSION = (3, 12)
+# So many bytes of sources tell the native rate.
+NATIVE_BYTES = 512 << 20
 
 
 def same_rows(one: Path, other: Path) -> bool:
@@ -47,11 +49,22 @@ def same_rows(one: Path, other: Path) -> bool:
     return True
 
 
+def sources_in(folder: Path, most_bytes: int) -> list[tuple[str, bytes]]:
+    """The first sources that a folder's archives hold, as many as are wanted in memory."""
+    sources = []
+    for unit in units_of([str(folder)]):
+        for row in read(unit, Columns()):
+            if row[3] is None:
+                continue
+            if (most_bytes := most_bytes - len(row[3])) < 0:
+                return sources
+            sources.append((row[2], row[3]))
+    return sources
+
+
 def native_rate(folder: Path) -> tuple[float, float]:
     """Lines a second of `analyze_files` as columns and of `corpus.records`, over the same sources in memory."""
-    sources = [
-        (row[2], row[3]) for unit in units_of([str(folder)]) for row in read(unit, Columns()) if row[3] is not None
-    ]
+    sources = sources_in(folder, NATIVE_BYTES)
     lines = sum(content.count(b"\n") for _, content in sources)
     batches = [
         pyarrow.record_batch({"path": [p for p, _ in part], "content": [c for _, c in part]})

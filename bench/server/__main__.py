@@ -1,7 +1,8 @@
 """Measures the language server.
 
 python -m bench.server soak FOLDER [--steps N] [--seed N]
-python -m bench.server peers --project FOLDER FILE LINE COLUMN WORD... [--only NAME]... [--bin FOLDER] [--save FILE]
+python -m bench.server peers --project FOLDER FILE LINE COLUMN WORD... [--only NAME]... [--question NAME]...
+    [--bin FOLDER] [--save FILE]
 """
 
 from __future__ import annotations
@@ -30,6 +31,7 @@ def main() -> int:
         help="where is asked, at a name behind a dot, and the word that symbols are looked for by",
     )
     peers.add_argument("--only", action="append", help="a server; all of them without it")
+    peers.add_argument("--question", dest="questions", action="append", help="a row; all of them without it")
     peers.add_argument("--bin", type=Path, help="where the other servers are installed")
     peers.add_argument("--timeout", type=float, default=120, help="seconds that an answer may take")
     peers.add_argument("--save", type=Path, help="where each figure is written to as well, a line of JSON each")

@@ -32,7 +32,7 @@ _CAPABILITIES: dict[str, Any] = {
     },
 }
 COMMANDS: dict[str, list[str]] = {
-    "quillet": [sys.executable, "-m", "quillet", "serve"],
+    "quillet": [str(Path(sys.executable).with_name("quillet")), "serve"],
     "jedi-language-server": ["jedi-language-server"],
     "python-lsp-server": ["pylsp"],
     "basedpyright": ["basedpyright-langserver", "--stdio"],
@@ -204,7 +204,7 @@ def compare(given: argparse.Namespace) -> int:
     rows = []
     for folder, file, line, column, query in given.projects:
         asked = Asked(Path(folder).resolve(), file, int(line), int(column), query)
-        for question in QUESTIONS:
+        for question in given.questions or QUESTIONS:
             cells = []
             for name in names:
                 found = measure(command_of(name, given.bin), question, asked, given.timeout)
