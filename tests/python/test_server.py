@@ -373,6 +373,15 @@ def test_what_takes_long_is_taken_back_by_its_progress(tmp_path: Path, token: st
 # ---- settings ----
 
 
+def wait_for_codes(client: Client, codes: list[str]) -> None:
+    client.Wait(
+        lambda told: (
+            told.get("method") == "textDocument/publishDiagnostics"
+            and [at["code"] for at in told["params"]["diagnostics"]] == codes
+        )
+    )
+
+
 def test_settings_of_the_project_and_of_the_client(tmp_path: Path) -> None:
     (tmp_path / "pyproject.toml").write_text('[tool.quillet]\ndiagnostics = ["syntax"]\n')
     (tmp_path / "a.py").write_text("import nowhere\nx = unbound\ndef f(:\n  pass\n")
@@ -381,12 +390,7 @@ def test_settings_of_the_project_and_of_the_client(tmp_path: Path) -> None:
         assert [at["code"] for at in client.diagnostics("a.py")] == ["syntax"]
         client.settings["quillet"] = {"diagnostics": ["unbound-name"]}
         client.Tell("workspace/didChangeConfiguration", {"settings": {}})
-        client.Wait(
-            lambda told: (
-                told.get("method") == "textDocument/publishDiagnostics"
-                and [at["code"] for at in told["params"]["diagnostics"]] == ["unbound-name"]
-            )
-        )
+        wait_for_codes(client, ["unbound-name"])
         client.settings["quillet"] = {"diagnostics": "all"}
         client.Tell("workspace/didChangeConfiguration", {"settings": {}})
         said = client.Wait(lambda told: told.get("method") == "window/showMessage")["params"]["message"]
@@ -410,25 +414,16 @@ def test_certainty_leaves_out(folder: Path) -> None:
 
 
 def test_settings_that_come_later_leave_the_first_ones_they_do_not_name(tmp_path: Path) -> None:
-    (tmp_path / "a.py").write_text("class A:\n    def f(self): pass\n\ndef g(x):\n    x.f()\n\nunbound\n")
+    (tmp_path / "a.py").write_text("class A:\n    def f(self): pass\n\ndef g(x):\n    x.f()\n\nunbound\nx = (\n")
     given = {"initializationOptions": {"certainty": "certain", "diagnostics": ["syntax"]}}
     with Client(tmp_path.resolve(), given=given, settings={"quillet": {"diagnostics": ["unbound-name"]}}) as client:
         client.open("a.py")
-        client.Wait(
-            lambda told: (
-                told.get("method") == "textDocument/publishDiagnostics"
-                and [at["code"] for at in told["params"]["diagnostics"]] == ["unbound-name"]
-            )
-        )
+        wait_for_codes(client, ["unbound-name"])
         found = client.ask("references", "a.py", "f(self)", context={"includeDeclaration": True})
         assert client.shown(found) == ["a.py:1:8-9"]
-        client.settings["quillet"] = {"certainty": "by name", "diagnostics": []}
+        client.settings["quillet"] = {"certainty": "by name", "diagnostics": ["syntax", "unbound-name"]}
         client.Tell("workspace/didChangeConfiguration", {"settings": {}})
-        client.Wait(
-            lambda told: (
-                told.get("method") == "textDocument/publishDiagnostics" and not told["params"]["diagnostics"]
-            )
-        )
+        wait_for_codes(client, ["unbound-name", "syntax"])
         found = client.ask("references", "a.py", "f(self)", context={"includeDeclaration": True})
         assert client.shown(found) == ["a.py:1:8-9", "a.py:4:6-7"]
 
