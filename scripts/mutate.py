@@ -10,8 +10,8 @@
 A change is a comparison with its bound moved or turned round, "and" for "or", a condition that is always or
 never true, a constant or an index off by one, the branches of a "?:" exchanged, "break" for "continue", or a
 statement left out. Each is made in a copy of the tree (`--work`, below build/ by itself), which is built without
-optimisation; then the tests run, those of the changed folder first, and the first that fails ends the trial. Tests
-that take long run last, and only where the digest sees a difference:
+optimisation; then the tests run, those of the changed folder first and then the one that compares digests, and the
+first that fails ends the trial. Tests that take long run last, and only where the digest sees a difference:
 
     noticed     a test of the core failed, crashed or ran out of time
     python      only a test of the package noticed (with --python, which builds the extension and asks those tests
@@ -53,6 +53,8 @@ FOLDERS = re.findall(r"quillet_library\((\w+)", (ROOT / "core" / "CMakeLists.txt
 WANTED = 0.95
 # Tests that take more seconds than this are asked only about changes that the digest sees.
 SLOW = 8.0
+# The test that looks at all folders.
+DIGESTS = "digests"
 NICENESS = int(os.environ.get("MUTATE_NICENESS", "10"))
 
 # Folder, name, and the last folder that the test is linked with, which reaches all those before it.
@@ -336,7 +338,8 @@ class Workshop:
         files = sorted(path for path in library.glob("*.py") if path.stat().st_size < 30_000)
         files += sorted(path for path in (library / "test").glob("test_[fgpst]*.py") if path.stat().st_size < 12_000)
         chosen = random.Random(1).sample(files, min(len(files), 60))
-        return [self.tree / "fuzz" / "corpus", self.tree / "tests" / "golden", self.tree / "examples", *sorted(chosen)]
+        shipped = [self.tree / name for name in ("fuzz/corpus", "tests/golden", "tests/programs", "examples")]
+        return [*shipped, *sorted(chosen)]
 
     def ask_digest(self) -> str:
         result = run([self.build / "tests/core/quillet_digest", *self.corpus], timeout=3600)
@@ -389,8 +392,9 @@ class Workshop:
         place = FOLDERS.index(folder)
         own = [name for test_folder, name, _ in self.tests if test_folder == folder]
         others = [name for _, name, last in self.tests if name not in own and FOLDERS.index(last) >= place]
-        ordered = sorted(own, key=self.times.__getitem__) + sorted(others, key=self.times.__getitem__)
-        slow = [name for name in ordered if self.times[name] > SLOW]
+        others.sort(key=lambda name: (name != DIGESTS, self.times[name]))
+        ordered = sorted(own, key=self.times.__getitem__) + others
+        slow = [name for name in ordered if self.times[name] > SLOW and name != DIGESTS]
         if outcome := self.ask_tests([name for name in ordered if name not in slow]):
             return outcome
         if not self.builds(["quillet_digest"]):

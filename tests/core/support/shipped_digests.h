@@ -1,0 +1,98 @@
+// The digests of every source that comes with the tests, as tests/digests.txt holds them: a line a file, a
+// column a stage.
+//
+// Sources are those of the fuzz corpus, the examples, the statements of the golden files, and the programs below
+// tests/programs, each folder of which is one: what a workspace answers about a program's file is asked with all of
+// them there. A program whose name ends in "_27" is read as Python 2.7.
+#pragma once
+
+#include <algorithm>
+#include <cstdio>
+#include <filesystem>
+#include <functional>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "tests/core/support/digest.h"
+
+namespace quillet::testing {
+
+inline const std::string kDigestTable = QUILLET_SOURCE_DIR "/tests/digests.txt";
+
+struct ShippedSource {
+  std::string path;     // from the root of the repository
+  std::string program;  // the folder of its program; empty for a file by itself
+};
+
+// In the order of their paths.
+inline std::vector<ShippedSource> ShippedSources() {
+  const std::filesystem::path root = QUILLET_SOURCE_DIR;
+  std::vector<ShippedSource> sources;
+  for (const char* folder : {"examples", "fuzz/corpus", "tests/golden", "tests/programs"}) {
+    if (!std::filesystem::is_directory(root / folder)) continue;
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(root / folder)) {
+      const std::string path = entry.path().lexically_relative(root).generic_string();
+      if (!entry.is_regular_file() || path.find("/__pycache__/") != std::string::npos) continue;
+      std::string program;
+      if (path.starts_with("tests/programs/")) program = path.substr(0, path.find('/', sizeof "tests/programs/"));
+      sources.push_back({path, program == path ? "" : program});
+    }
+  }
+  std::ranges::sort(sources, {}, &ShippedSource::path);
+  return sources;
+}
+
+// The bytes of a source; of a golden file the statements alone.
+inline std::string BytesOf(const ShippedSource& source) {
+  std::string bytes = BytesOf(std::filesystem::path(QUILLET_SOURCE_DIR) / source.path);
+  if (!source.path.starts_with("tests/golden/")) return bytes;
+  std::istringstream lines(bytes);
+  bool is_statement = false;
+  bytes.clear();
+  for (std::string line; std::getline(lines, line);) {
+    const bool is_head = line.starts_with("=== ");
+    if (is_head || line.starts_with("--- ")) is_statement = is_head;
+    if (is_statement && !is_head) bytes += line + "\n";
+  }
+  return bytes;
+}
+
+inline void AddShipped(const ShippedSource& source, const std::vector<ShippedSource>& all, Digests& digests) {
+  const std::string bytes = BytesOf(source);
+  const Version versions[] = {Version::Of(3, 14), Version::Of(3, 8), Version::Of(2, 7)};
+  SourcesDigest(versions, digests).Add(bytes, 1);
+  const Version version = source.program.ends_with("_27") ? Version::Of(2, 7) : Version::Of(3, 14);
+  AnswersDigest answers(version, digests.answers);
+  if (source.program.empty()) {
+    answers.Write("b.py", kOtherModule);
+    answers.Open("a.py", bytes);
+    answers.AddFile("a.py", 12);
+    return;
+  }
+  const size_t folder = source.program.size() + 1;
+  for (const ShippedSource& other : all)
+    if (other.program == source.program) answers.Write(other.path.substr(folder), BytesOf(other));
+  answers.AddFile(source.path.substr(folder), 60);
+}
+
+// A line of the table, and the names of its columns.
+inline std::string DigestLine(const ShippedSource& source, const std::vector<ShippedSource>& all) {
+  Digests digests;
+  AddShipped(source, all, digests);
+  std::string line;
+  for (const auto& [name, digest] : digests.Stages()) {
+    char number[12];
+    const uint64_t value = digest->value();
+    std::snprintf(number, sizeof number, "%08x ", static_cast<unsigned>(value ^ value >> 32));
+    line += number;
+  }
+  return line + source.path;
+}
+inline std::string DigestHead() {
+  std::string line;
+  for (const auto& [name, digest] : Digests().Stages()) line += (std::string(name) + "         ").substr(0, 9);
+  return line + "file";
+}
+
+}  // namespace quillet::testing

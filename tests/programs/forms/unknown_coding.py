@@ -1,0 +1,2 @@
+# vim: set fileencoding=unknown-thing :
+x = 1

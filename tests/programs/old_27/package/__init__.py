@@ -1,0 +1,1 @@
+missing_too = 1

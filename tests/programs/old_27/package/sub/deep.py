@@ -1,0 +1,2 @@
+found = u"x".encode("utf-8")
+import sub

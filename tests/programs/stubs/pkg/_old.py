@@ -1,0 +1,1 @@
+def read(): return u""

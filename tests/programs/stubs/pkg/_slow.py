@@ -1,0 +1,1 @@
+def compute(n): return n * 2
