@@ -8,9 +8,6 @@ namespace quillet {
 
 namespace {
 
-constexpr uint32_t kNoPlace = UINT32_MAX;
-constexpr size_t kFetchedAhead = 16;
-
 // A text and its first bytes as a number, which nearly always decides.
 struct RankedText {
   uint64_t head;
@@ -30,37 +27,46 @@ Text TextOf(const ColumnBuffers::Texts& texts, uint32_t number) {
   return {static_cast<const char*>(texts.bytes) + offsets[0], static_cast<size_t>(offsets[1] - offsets[0])};
 }
 
+Bits TakeBits(const void* bits, const uint32_t* order, size_t size) {
+  const auto* const bytes = static_cast<const uint8_t*>(bits);
+  Bits taken;
+  taken.Assign(size, [bytes, order](size_t i) { return (bytes[order[i] / 8] >> order[i] % 8 & 1) != 0; });
+  return taken;
+}
+
+template <class Word>
+std::unique_ptr<Word[]> TakeWords(const void* values, const uint32_t* order, size_t size) {
+  const auto* const from = static_cast<const Word*>(values);
+  auto taken = std::make_unique_for_overwrite<Word[]>(size);
+  for (size_t i = 0; i < size; ++i) taken[i] = from[order[i]];
+  return taken;
+}
+
+// The values of a part of the rows: where they lie, or those that are there one behind the other.
+template <class Word, class Value>
+std::span<const Value> ValuesOf(const Word* words, const Bits* validity, size_t begin, size_t end,
+                                std::vector<Value>& values) {
+  if (validity == nullptr) return {reinterpret_cast<const Value*>(words) + begin, end - begin};
+  values.clear();
+  for (size_t row = begin; row < end; ++row) {
+    if ((*validity)[row]) values.push_back(static_cast<Value>(words[row]));
+  }
+  return values;
+}
+
 }  // namespace
 
 SortedRun::SortedRun(const RowTable& table, size_t key)
     : table_(table), key_(key), schema_(table.Schema()), buffers_(table.Buffers()) {
   size_t most_texts = 0;
   for (const ColumnBuffers& column : buffers_) most_texts = std::max(most_texts, column.dictionary.size);
-  places_.assign(most_texts, kNoPlace);
-  LayOut();
-  Sort();
+  is_listed_.assign(most_texts, 0);
+  places_.resize(most_texts);
+  const std::unique_ptr<uint32_t[]> order = Order();
+  for (size_t i = 0; i < schema_.size(); ++i) sorted_.push_back(Take(i, order.get()));
 }
 
-void SortedRun::LayOut() {
-  size_t bits = 0;
-  for (size_t i = 0; i < schema_.size(); ++i) {
-    Place& place = layout_.emplace_back();
-    if (schema_[i].format == "b") place.at = bits++;
-    const Bits* const validity = buffers_[i].validity;
-    is_missing_.push_back(validity != nullptr && validity->false_count() == table_.size());
-    if (validity != nullptr && !is_missing_.back()) place.validity = bits++;
-  }
-  row_words_ = (bits + 31) / 32;
-  for (const bool is_long : {false, true}) {
-    for (size_t i = 0; i < schema_.size(); ++i) {
-      if (schema_[i].format == "b" || (schema_[i].format == "l") != is_long) continue;
-      layout_[i].at = row_words_;
-      row_words_ += is_long ? 2 : 1;
-    }
-  }
-}
-
-void SortedRun::Sort() {
+std::unique_ptr<uint32_t[]> SortedRun::Order() const {
   const size_t size = table_.size();
   const auto* const keys = static_cast<const uint32_t*>(buffers_[key_].values[0]);
   const ColumnBuffers::Texts& texts = buffers_[key_].dictionary;
@@ -74,46 +80,31 @@ void SortedRun::Sort() {
   std::sort(ranked.begin(), ranked.end());
   uint32_t begin = 0;
   for (const RankedText& text : ranked) begin += std::exchange(next[text.number], begin);
+  auto order = std::make_unique_for_overwrite<uint32_t[]>(size);
+  for (size_t row = 0; row < size; ++row) order[next[keys[row]]++] = static_cast<uint32_t>(row);
+  return order;
+}
 
-  // What is copied into a row: bits, and behind them words, those of long numbers last.
-  struct BitSource {
-    const uint8_t* bytes;
-    size_t bit;
-  };
-  std::vector<BitSource> bits;  // in the order of their places
-  std::vector<const uint32_t*> words;
-  std::vector<const uint64_t*> long_words;
-  for (size_t i = 0; i < schema_.size(); ++i) {
-    const void* const values = buffers_[i].values[0];
-    if (schema_[i].format == "b")
-      bits.push_back({static_cast<const uint8_t*>(values), layout_[i].at});
-    else if (schema_[i].format == "l")
-      long_words.push_back(static_cast<const uint64_t*>(values));
-    else
-      words.push_back(static_cast<const uint32_t*>(values));
-    if (layout_[i].validity != kNone)
-      bits.push_back({static_cast<const uint8_t*>(buffers_[i].validity->data()), layout_[i].validity});
+SortedRun::Sorted SortedRun::Take(size_t column, const uint32_t* order) const {
+  const size_t size = table_.size();
+  const ColumnBuffers& from = buffers_[column];
+  Sorted sorted;
+  if (from.validity != nullptr) {
+    sorted.is_missing = from.validity->false_count() == size;
+    if (sorted.is_missing) return sorted;
+    sorted.validity = TakeBits(from.validity->data(), order, size);
   }
-  const size_t bit_words = row_words_ - words.size() - 2 * long_words.size();
-  rows_ = std::make_unique_for_overwrite<uint32_t[]>(size * row_words_);
-  for (size_t row = 0; row < size; ++row) {
-    // Rows go all over the table: where the next ones go is fetched by then.
-    if (row + kFetchedAhead < size)
-      __builtin_prefetch(rows_.get() + next[keys[row + kFetchedAhead]] * row_words_, /*to be written*/ 1);
-    uint32_t* out = rows_.get() + next[keys[row]]++ * row_words_;
-    const BitSource* source = bits.data();
-    for (size_t end = 32; end <= 32 * bit_words; end += 32) {
-      uint32_t word = 0;
-      for (; source < bits.data() + bits.size() && source->bit < end; ++source)
-        word |= (source->bytes[row / 8] >> row % 8 & 1u) << source->bit % 32;
-      *out++ = word;
-    }
-    for (const uint32_t* const from : words) *out++ = from[row];
-    for (const uint64_t* const from : long_words) {
-      std::memcpy(out, from + row, sizeof *from);
-      out += 2;
-    }
+  switch (schema_[column].format[0]) {
+    case 'b':
+      sorted.bits = TakeBits(from.values[0], order, size);
+      break;
+    case 'l':
+      sorted.long_words = TakeWords<uint64_t>(from.values[0], order, size);
+      break;
+    default:
+      sorted.words = TakeWords<uint32_t>(from.values[0], order, size);
   }
+  return sorted;
 }
 
 void SortedRun::WriteTo(ParquetFile& file, size_t group_rows) {
@@ -122,7 +113,6 @@ void SortedRun::WriteTo(ParquetFile& file, size_t group_rows) {
   for (size_t begin = 0; begin < table_.size(); begin += group_rows) {
     const size_t end = std::min(begin + group_rows, table_.size());
     for (size_t i = 0; i < schema_.size(); ++i) columns[i] = Gather(i, begin, end, gathered[i]);
-    // Sorted as the rows are, since places are given in their order.
     const std::vector<Text>& keys = gathered[key_].dictionary;
     columns[key_].bounds = {keys.front(), keys.back()};
     file.WriteGroup(end - begin, columns);
@@ -131,82 +121,61 @@ void SortedRun::WriteTo(ParquetFile& file, size_t group_rows) {
 
 ParquetColumn SortedRun::Gather(size_t column, size_t begin, size_t end, Gathered& gathered) {
   ParquetColumn out;
-  const Place place = layout_[column];
-  if (is_missing_[column]) {
+  const Sorted& sorted = sorted_[column];
+  if (sorted.is_missing) {
     gathered.validity = Bits();
     gathered.validity.Add(false, end - begin);
     out.validity = &gathered.validity;
     return out;
   }
-  if (place.validity != kNone) {
-    GatherBits(place.validity, begin, end, gathered.validity);
+  const Bits* const validity = sorted.validity ? &*sorted.validity : nullptr;
+  if (validity != nullptr) {
+    gathered.validity.Assign(end - begin, [validity, begin](size_t i) { return (*validity)[begin + i]; });
     out.validity = &gathered.validity;
   }
   switch (schema_[column].format[0]) {
     case 'i':
-      gathered.numbers.resize(end - begin);
-      gathered.numbers.resize(ForEachValue(
-          place, begin, end,
-          [to = gathered.numbers.data()](size_t i, const uint32_t* at) { to[i] = static_cast<int32_t>(*at); }));
-      out.numbers = gathered.numbers;
+      out.numbers = ValuesOf(sorted.words.get(), validity, begin, end, gathered.numbers);
       break;
     case 'l':
-      gathered.long_numbers.resize(end - begin);
-      gathered.long_numbers.resize(ForEachValue(
-          place, begin, end,
-          [to = gathered.long_numbers.data()](size_t i, const uint32_t* at) { std::memcpy(to + i, at, sizeof *to); }));
-      out.long_numbers = gathered.long_numbers;
+      out.long_numbers = ValuesOf(sorted.long_words.get(), validity, begin, end, gathered.long_numbers);
       break;
     case 'b':
-      GatherBits(place.at, begin, end, gathered.bits);
+      gathered.bits.Assign(end - begin, [&sorted, begin](size_t i) { return (*sorted.bits)[begin + i]; });
       out.bits = &gathered.bits;
       break;
     default:
-      GatherTexts(column, begin, end, gathered);
+      ListTexts(column, ValuesOf(sorted.words.get(), validity, begin, end, gathered.numbers_of_texts), gathered);
       out.places = gathered.places;
       out.dictionary = gathered.dictionary;
   }
   return out;
 }
 
-template <class Take>
-size_t SortedRun::ForEachValue(Place place, size_t begin, size_t end, const Take& take) const {
-  const size_t step = row_words_;
-  const uint32_t* at = rows_.get() + begin * step + place.at;
-  if (place.validity == kNone) {
-    for (size_t i = 0; i < end - begin; ++i, at += step) take(i, at);
-    return end - begin;
-  }
-  size_t count = 0;
-  for (size_t row = begin; row < end; ++row, at += step) {
-    if (BitAt(row, place.validity)) take(count++, at);
-  }
-  return count;
-}
-
-void SortedRun::GatherBits(size_t bit, size_t begin, size_t end, Bits& bits) const {
-  bits.Assign(end - begin, [&](size_t i) { return BitAt(begin + i, bit); });
-}
-
-void SortedRun::GatherTexts(size_t column, size_t begin, size_t end, Gathered& gathered) {
-  std::vector<uint32_t> used;
-  gathered.places.resize(end - begin);
-  const size_t count =
-      ForEachValue(layout_[column], begin, end,
-                   [to = gathered.places.data(), places = places_.data(), &used](size_t i, const uint32_t* at) {
-                     uint32_t& place = places[*at];
-                     if (place == kNoPlace) [[unlikely]] {
-                       place = static_cast<uint32_t>(used.size());
-                       used.push_back(*at);
-                     }
-                     to[i] = place;
-                   });
-  gathered.places.resize(count);
+// Makes a dictionary of the texts of a column that have these numbers, and their places in it.
+void SortedRun::ListTexts(size_t column, std::span<const uint32_t> numbers, Gathered& gathered) {
+  const ColumnBuffers::Texts& texts = buffers_[column].dictionary;
   gathered.dictionary.clear();
-  for (const uint32_t number : used) {
-    gathered.dictionary.push_back(TextOf(buffers_[column].dictionary, number));
-    places_[number] = kNoPlace;
+  gathered.places.resize(numbers.size());
+  const auto list = [&](uint32_t number) {
+    places_[number] = static_cast<uint32_t>(gathered.dictionary.size());
+    gathered.dictionary.push_back(TextOf(texts, number));
+  };
+  if (column == key_) {
+    for (size_t i = 0; i < numbers.size(); ++i) {
+      if (i == 0 || numbers[i] != numbers[i - 1]) list(numbers[i]);
+    }
+  } else {
+    for (const uint32_t number : numbers) is_listed_[number] = 1;
+    uint8_t* const begin = is_listed_.data();
+    uint8_t* const end = begin + texts.size;
+    for (uint8_t* at = begin; at < end; *at++ = 0) {
+      at = static_cast<uint8_t*>(std::memchr(at, 1, static_cast<size_t>(end - at)));
+      if (at == nullptr) break;
+      list(static_cast<uint32_t>(at - begin));
+    }
   }
+  for (size_t i = 0; i < numbers.size(); ++i) gathered.places[i] = places_[numbers[i]];
 }
 
 }  // namespace quillet
