@@ -120,7 +120,7 @@ CloserLook::CloserLook(Version version)
   if (!python3_) set(tok::NOTEQUAL, false);
 }
 
-bool CloserLook::NeedsCompleteParser(const LogicalLine& line) const {
+bool CloserLook::NeedsCompleteParserBehind(const LogicalLine& line) const {
   switch (line.kind) {
     case LineKind::kMatch:
     case LineKind::kCase:
@@ -131,10 +131,8 @@ bool CloserLook::NeedsCompleteParser(const LogicalLine& line) const {
     case LineKind::kWith:
     case LineKind::kFunctionDef:
     case LineKind::kClassDef:
-      break;
     case LineKind::kUnknown:
     case LineKind::kAssignment:
-      if (!line.toks.empty() && line.toks[0].code == tok::NAME) return false;
       break;
     default:
       return false;

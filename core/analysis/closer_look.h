@@ -18,7 +18,9 @@ class CloserLook {
   explicit CloserLook(Version version);
 
   // Whether only the complete parser can read such a statement as the version has it.
-  bool NeedsCompleteParser(const LogicalLine& line) const;
+  bool NeedsCompleteParser(const LogicalLine& line) const {
+    return (line.toks.empty() || kTellingBeginnings[line.toks[0].code]) && NeedsCompleteParserBehind(line);
+  }
   // Whether a statement that the tables took is to be read again.
   bool IsDoubtful(const LogicalLine& line, const LinePlace& place) const {
     return (DoubtOf(line) & BitsOf(place)) != 0;
@@ -45,6 +47,16 @@ class CloserLook {
                                 (place.in_def ? 0 : kOutsideOfFunction) |
                                 (place.in_async_def ? kInAsync : kOutsideOfAsync));
   }
+  // What begins with none of these needs no complete parser, whatever kind it is of.
+  static constexpr auto kTellingBeginnings = [] {
+    std::array<bool, 256> table{};
+    for (const TokenCode code : {TokenCode{word::kAsync}, TokenCode{word::kCase}, TokenCode{word::kClass},
+                                 TokenCode{word::kDef}, TokenCode{word::kExcept}, TokenCode{word::kMatch},
+                                 TokenCode{word::kType}, TokenCode{word::kWith}, tok::COMMENT, tok::BACKSLASH})
+      table[code] = true;
+    return table;
+  }();
+  bool NeedsCompleteParserBehind(const LogicalLine& line) const;
   uint8_t DoubtOf(const LogicalLine& line) const;
   // Whether a token may stand in a lambda or an annotation, by those in front of it.
   bool MayBeInScope(TokenSpan toks, size_t i) const;

@@ -16,8 +16,8 @@ namespace quillet {
 
 namespace {
 
-// A tree is no deeper than its statement has tokens.
-constexpr size_t kTokensOfDeepTree = 80;
+// A tree is no deeper than its statement has tokens; a deeper one is given back without the quick way's recursion.
+constexpr size_t kTokensOfDeepTree = 900;
 
 StatementPlace PlaceOfStatement(const LinePlace& place) {
   using Scope = StatementPlace::Scope;
@@ -156,10 +156,10 @@ void CPGenAnalyzerImpl::WalkCompletely(CNode* tree, LogicalLine& logical, const 
     InspectEmbeddedCompletely(logical, place);
   node_walker_->set_met_doubtful(met_doubtful);
   if (tree != nullptr) {
-    // The quick way back has an end at a hundred levels, and says so.
+    // The quick way back has an end, and says so: it begins as far above it as there may be levels.
     if (logical.toks.size() >= kTokensOfDeepTree) return;
     give_back.tree = nullptr;
-    FinishedWithNode(tree);
+    FinishedWithNodeAtDepth(tree, -static_cast<int64_t>(logical.toks.size()));
   }
 }
 
