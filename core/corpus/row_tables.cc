@@ -202,14 +202,17 @@ class RecordRows : public RowTable {
 
   size_t size() const override { return lines_.size(); }
 
-  void AddRecord(const PlacedRecord& record, Text scope) override {
-    AddPlace(record.line, record.column);
-    AddScope(record.scope, scope);
-    names_.Add(record.name);
-    kinds_.AddWord(static_cast<size_t>(record.kind), RecordKindWords());
-    details_.Add(record.detail);
-    are_parameters_.Add(record.is_parameter);
-    errors_.AddNone();
+  void AddRecords(std::span<const PlacedRecord> records, std::span<const Text> scopes) override {
+    if (names_.has_numbers()) Fetch(records);
+    for (const PlacedRecord& record : records) {
+      AddPlace(record.line, record.column);
+      AddScope(record.scope, scopes[record.scope]);
+      names_.Add(record.name);
+      kinds_.AddWord(static_cast<size_t>(record.kind), RecordKindWords());
+      details_.Add(record.detail);
+      are_parameters_.Add(record.is_parameter);
+      errors_.AddNone();
+    }
   }
 
   void AddMessage(Text kind, const BatchResult::Message& message) override {
@@ -246,6 +249,17 @@ class RecordRows : public RowTable {
   void ForgetSource() override { scope_numbers_.clear(); }
 
  private:
+  // The tables of a run's texts are larger than caches are.
+  void Fetch(std::span<const PlacedRecord> records) const {
+    for (const PlacedRecord& record : records) {
+      names_.FetchSlot(record.name);
+      details_.FetchSlot(record.detail);
+    }
+    for (const PlacedRecord& record : records) {
+      names_.FetchEntry(record.name);
+      details_.FetchEntry(record.detail);
+    }
+  }
   void AddScope(uint32_t index, Text scope) {
     if (!scopes_.has_numbers()) return scopes_.Add(scope);
     if (index >= scope_numbers_.size()) scope_numbers_.resize(index + 1, kNoIndex);

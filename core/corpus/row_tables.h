@@ -12,6 +12,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -37,6 +38,9 @@ class ColumnTexts {
     if (table_.size() != count) byte_size_ += text.size();
     return last_;
   }
+  // For texts whose numbers are asked for soon; see TextTable.
+  void FetchSlot(Text text) const { table_.FetchSlot(text); }
+  void FetchEntry(Text text) const { table_.FetchEntry(text); }
   size_t byte_size() const { return byte_size_; }
   // All of them, in the order of their numbers. They stand until one is added.
   ColumnBuffers::Texts Listed() {
@@ -82,6 +86,8 @@ class TextColumn {
   bool has_numbers() const { return texts_ != nullptr; }
   uint32_t NumberOf(Text text) { return texts_->NumberOf(text); }
   void AddNumber(uint32_t number) { numbers_.push_back(number); }
+  void FetchSlot(Text text) const { texts_->FetchSlot(text); }
+  void FetchEntry(Text text) const { texts_->FetchEntry(text); }
   // A text of a few that are known before, by its number among them.
   void AddWord(size_t word, std::span<const Text> words) {
     if (texts_ == nullptr) return Add(words[word]);
@@ -160,7 +166,7 @@ class RowTable : public ColumnTable {
   bool IsFull() const { return size() >= most_rows_ || byte_size() >= kMostBytes; }
 
   // Each has to be followed by a Carry, sooner or later.
-  virtual void AddRecord(const PlacedRecord&, Text /*scope*/) {}
+  virtual void AddRecords(std::span<const PlacedRecord>, std::span<const Text> /*scopes*/) {}
   virtual void AddOccurrence(const Bindings&, uint32_t /*index*/, const std::vector<std::string>& /*scope_names*/) {}
   virtual void AddMessage(Text /*kind*/, const BatchResult::Message&) {}
   virtual void AddFile(const BatchResult&, Text /*python*/) {}

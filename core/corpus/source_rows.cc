@@ -26,7 +26,7 @@ std::string InWords(Version version) {
 // Puts records into rows.
 class SourceRows::Writer : public FileWriter {
  public:
-  // Between two looks at whether a table is full.
+  // Between two looks at whether a table is full, and those whose texts are looked up together.
   static constexpr size_t kRecordsAtOnce = 16;
 
   explicit Writer(SourceRows& rows) : rows_(rows) {}
@@ -35,22 +35,27 @@ class SourceRows::Writer : public FileWriter {
              std::string&) override {
     if (rows_.options_.form != RowForm::kRecords) return;
     placed.Begin(file, scopes);
+    records_.clear();
     size_t held = 0;
-    RowTable* table = nullptr;
-    size_t added = 0;
     for (size_t row = 0; row < file.rows().size(); ++row) {
       file.CheckMemory(held);
       for (const PlacedRecord& record : placed.OfRow(row)) {
-        const Text scope = scopes.names()[record.scope];
-        if (added++ % kRecordsAtOnce == 0) table = &rows_.Room();
-        table->AddRecord(record, scope);
-        held += record.name.size() + record.detail.size() + scope.size() + sizeof(PlacedRecord);
+        records_.push_back(record);
+        held += record.name.size() + record.detail.size() + scopes.names()[record.scope].size() + sizeof(PlacedRecord);
+        if (records_.size() == kRecordsAtOnce) Put(scopes);
       }
     }
+    if (!records_.empty()) Put(scopes);
   }
 
  private:
+  void Put(const ScopeNames& scopes) {
+    rows_.Room().AddRecords(records_, scopes.names());
+    records_.clear();
+  }
+
   SourceRows& rows_;
+  std::vector<PlacedRecord> records_;
 };
 
 // Puts names into rows.

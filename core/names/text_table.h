@@ -49,6 +49,12 @@ class TextTable {
       if (slot.tag == tag && Same(entries_[slot.number], text, key)) return slot.number;
     }
   }
+  // For texts that are asked for soon: has their slots fetched, then what these lead to.
+  void FetchSlot(Text text) const { __builtin_prefetch(&slots_[HashOf(text, KeyOf(text)) & mask_]); }
+  void FetchEntry(Text text) const {
+    const uint32_t number = slots_[HashOf(text, KeyOf(text)) & mask_].number;
+    if (number != kNoIndex) __builtin_prefetch(&entries_[number]);
+  }
   // kNoIndex for a text that is not there.
   uint32_t Find(Text text) const {
     const Key key = KeyOf(text);
