@@ -481,9 +481,10 @@ def mirror(source: Path, target: Path) -> None:
 
 
 def fingerprint_of(tree: Path) -> str:
-    """A number for all that is built."""
+    """A number for all that is built and asked about."""
     sha = hashlib.sha1()
-    for path in sorted(path for name in ("core", "tests/core", "resources") for path in (tree / name).rglob("*")):
+    names = ("core", "tests/core", "tests/programs", "tests/golden", "fuzz/corpus", "examples", "resources")
+    for path in sorted(path for name in names for path in (tree / name).rglob("*")):
         if path.is_file():
             sha.update(str(path.relative_to(tree)).encode() + path.read_bytes())
     return sha.hexdigest()

@@ -43,6 +43,7 @@ int DigestAll(const std::vector<std::filesystem::path>& files) {
   for (const std::filesystem::path& path : files) {
     const std::string bytes = BytesOf(path);
     sources.Add(bytes, 2);
+    sources.AddRows(bytes);
     for (const std::string& text : {bytes, Spoilt(bytes, 1)}) {
       answers.Open("a.py", text);
       answers.AddFile("a.py", 30);
@@ -77,9 +78,10 @@ int Show(const std::string& stage, const std::string& path) {
 
 int Write() {
   const std::vector<ShippedSource> all = ShippedSources();
+  std::string table = DigestHead() + "\n";
+  for (const ShippedSource& source : all) table += DigestLine(source, all) + "\n";
   std::ofstream out(kDigestTable, std::ios::binary);
-  out << DigestHead() << "\n";
-  for (const ShippedSource& source : all) out << DigestLine(source, all) << "\n";
+  out << table;
   return out ? 0 : 1;
 }
 

@@ -358,7 +358,10 @@ class AnalysisDigest {
 // What a workspace answers about the files of a program, which lie in a folder of their own.
 class AnswersDigest {
  public:
-  explicit AnswersDigest(Version version, Digest& digest) : digest_(digest), workspace_(SettingsFor(version)) {}
+  // With little memory, what was found is forgotten all the time, and found again.
+  enum class Memory : uint8_t { kPlenty, kLittle };
+  AnswersDigest(Version version, Digest& digest, Memory memory = Memory::kPlenty)
+      : digest_(digest), workspace_(SettingsFor(version, memory)) {}
 
   // Before anything is asked.
   void Write(const std::string& path, const std::string& bytes) { folder_.Write(path, bytes); }
@@ -367,34 +370,56 @@ class AnswersDigest {
   // At most so many places of a kind are asked about.
   void AddFile(const std::string& path, size_t most_places) {
     const FileId file = File(path);
+    AddWhole(file);
     const std::vector<ColouredName> names = workspace_.Colours(file);
-    digest_.Head("names");
-    for (const ColouredName& name : names) digest_.AddNumbers({name.begin, int64_t(name.kind), name.modifiers});
     const size_t step = names.size() / most_places + 1;
-    for (size_t i = 0; i < names.size(); i += step) AddPlace(file, names[i].begin, i % (7 * step) == 0);
-    digest_.Head("the file");
-    for (const InlineHint& hint : workspace_.Hints(file)) {
-      digest_.Add(hint.text);
-      digest_.AddNumbers({hint.offset, int64_t(hint.certainty)});
+    for (size_t i = 0; i < names.size(); i += step) AddName(file, names[i].begin, i % (5 * step) == 0);
+    AddPlacesBetween(file, most_places);
+  }
+  // Of a buffer that is edited here and there, and closed.
+  void AddEdits(const std::string& path) {
+    const FileId file = File(path);
+    const std::string before(workspace_.SourceOf(file));
+    workspace_.Open(file, before);
+    uint32_t at = 0;
+    for (const Text inserted : {Text("."), Text("("), Text("\n"), Text("x = "), Text("\"\"\""), Text("")}) {
+      const auto size = static_cast<uint32_t>(workspace_.SourceOf(file).size());
+      at = static_cast<uint32_t>((uint64_t{at} + size / 7 + 3) % (size + 1));
+      const std::vector<ColouredName> names = workspace_.Colours(file, at);
+      if (!names.empty()) at = names.front().end;
+      const uint32_t end = std::min(size, at + (inserted.empty() ? 9 : 1));
+      digest_.Head("edited at " + std::to_string(at));
+      workspace_.Change(file, at, inserted == Text("\n") ? end : at, inserted);
+      AddWhole(file);
+      AddPlace(file, at + 1);
+      if (!names.empty()) AddName(file, names.front().begin, false);
     }
-    for (const OutlineItem& item : workspace_.Outline(file)) {
-      for (const Text text : {Text(item.name), Text(item.kind), Text(item.detail)}) digest_.Add(text);
-      digest_.AddNumbers({item.begin, item.end, item.name_begin, item.name_end, item.parent});
+    workspace_.Close(file);
+    workspace_.Refresh();
+    digest_.Head("closed");
+    AddPlace(file, at);
+  }
+  // Of all files together.
+  void AddProgram() {
+    for (const Text query : {Text(""), Text("e"), Text("Or"), Text("shop.o"), Text("__init__")}) {
+      for (const size_t most : {size_t{3}, size_t{200}}) {
+        for (const SymbolInfo& symbol : workspace_.Symbols(query, most)) {
+          for (const Text text : {Text(symbol.name), Text(symbol.kind), Text(symbol.container)}) digest_.Add(text);
+          digest_.Add(PathOf(symbol.file));
+          digest_.AddNumbers({symbol.begin, symbol.end, symbol.place.line, symbol.place.col, symbol.end_column});
+        }
+      }
     }
-    for (const Problem& problem : workspace_.Problems(file)) {
-      digest_.Add(problem.message);
-      digest_.AddNumbers({problem.begin, problem.end});
-    }
-    for (const Fold& fold : workspace_.Folds(file)) {
-      digest_.AddNumbers({fold.first_line, fold.last_line});
-      digest_.Add(fold.kind);
-    }
+    for (const Text name : {Text("Order"), Text("Good.take"), Text("shop.goods.Good.price"), Text("a.b")})
+      Add(workspace_.Named(name));
   }
 
  private:
-  Workspace::Settings SettingsFor(Version version) const {
+  Workspace::Settings SettingsFor(Version version, Memory memory) const {
     Workspace::Settings settings;
+    if (memory == Memory::kLittle) settings.most_held = settings.most_visited = settings.most_remembered = 1000;
     settings.roots = {folder_.path()};
+    settings.libraries = {folder_ / "site-packages"};
     settings.typeshed = SmallLibrary();
     settings.version = version;
     settings.analyzer = std::make_shared<FileAnalyzer::Options>(AnalysisDigest::CompletelyOf(version));
@@ -419,30 +444,108 @@ class AnswersDigest {
     }
   }
 
-  void AddPlace(FileId file, uint32_t offset, bool all) {
-    digest_.Head(std::to_string(offset) + ": " + workspace_.LineOf(file, offset));
-    for (const std::string& type : workspace_.Types(file, offset)) digest_.Add(type);
-    Add(workspace_.Definitions(file, offset));
-    const Hover hover = workspace_.HoverAt(file, offset);
+  void Add(const std::vector<Call>& calls) {
+    for (const Call& call : calls) {
+      digest_.Add(call.name);
+      Add({call.function});
+      Add(call.calls);
+    }
+  }
+  void Add(const Hover& hover) {
     digest_.Add(Shown(hover.text));
     digest_.Add(hover.documentation);
-    for (const Signature& signature : workspace_.Signatures(file, offset)) {
-      digest_.Add(signature.label);
-      digest_.AddNumbers({signature.active, int64_t(signature.certainty)});
-    }
-    if (!all) return;
-    Add(workspace_.References(file, offset));
-    Add(workspace_.TypeDefinitions(file, offset));
-    for (const Completion& completion : workspace_.Complete(file, offset)) {
-      for (const Text text : {Text(completion.name), Text(completion.kind), Text(completion.detail)}) digest_.Add(text);
-    }
-    const Rename rename = workspace_.RenameTo(file, offset, "another_name");
+    for (const std::string& type : hover.types) digest_.Add(type);
+    digest_.AddNumbers({int64_t(hover.certainty), hover.begin, hover.end});
+  }
+  void Add(const Rename& rename) {
     digest_.Add(Shown(rename.problem));
     for (const TextEdit& edit : rename.edits) {
       digest_.Add(PathOf(edit.file));
       digest_.AddNumbers({edit.begin, edit.end});
+      digest_.Add(edit.text);
     }
+  }
+
+  // What is said of a file without a place.
+  void AddWhole(FileId file) {
+    for (const ColouredName& name : workspace_.Colours(file))
+      digest_.AddNumbers({name.begin, name.end, int64_t(name.kind), name.modifiers});
+    for (const InlineHint& hint : workspace_.Hints(file)) {
+      digest_.Add(hint.text);
+      digest_.AddNumbers({hint.offset, hint.is_type, int64_t(hint.certainty)});
+    }
+    for (const OutlineItem& item : workspace_.Outline(file)) {
+      for (const Text text : {Text(item.name), Text(item.kind), Text(item.detail)}) digest_.Add(text);
+      digest_.AddNumbers({item.begin, item.end, item.name_begin, item.name_end, item.parent});
+    }
+    for (const Problem& problem : workspace_.Problems(file)) {
+      digest_.Add(problem.code);
+      digest_.Add(problem.message);
+      digest_.AddNumbers({problem.begin, problem.end});
+    }
+    for (const Fold& fold : workspace_.Folds(file)) {
+      digest_.AddNumbers({fold.first_line, fold.last_line});
+      digest_.Add(fold.kind);
+    }
+  }
+
+  // What is there, and with `all` also what is asked of all files.
+  void AddName(FileId file, uint32_t offset, bool all) {
+    digest_.Head(std::to_string(offset) + ": " + workspace_.LineOf(file, offset));
+    for (const std::string& type : workspace_.Types(file, offset)) digest_.Add(type);
+    Add(workspace_.Definitions(file, offset));
+    Add(workspace_.HoverAt(file, offset));
+    Add(workspace_.TypeDefinitions(file, offset));
+    if (!all) return;
+    for (const bool everywhere : {false, true}) Add(workspace_.References(file, offset, everywhere));
+    for (const bool only_certain : {false, true}) Add(workspace_.RenameTo(file, offset, "another_name", only_certain));
+    Add(workspace_.RenameTo(file, offset, "self"));
+    Add(workspace_.RenameTo(file, offset, "no name"));
+    Add(workspace_.Declarations(file, offset));
+    Add(workspace_.Implementations(file, offset));
+    Add(workspace_.Callers(file, offset));
+    Add(workspace_.Callees(file, offset));
+    Add(workspace_.Supertypes(file, offset));
+    Add(workspace_.Subtypes(file, offset));
+    AddPlace(file, offset);
+  }
+  // What may be written at a place, and what is around it.
+  void AddPlace(FileId file, uint32_t offset) {
+    digest_.Head(std::to_string(offset) + " in " + workspace_.LineOf(file, offset));
+    for (const Signature& signature : workspace_.Signatures(file, offset)) {
+      digest_.Add(signature.label);
+      digest_.Add(signature.documentation);
+      digest_.AddNumbers({signature.active, int64_t(signature.certainty)});
+      for (const Parameter& parameter : signature.parameters) digest_.Add(parameter.label);
+    }
+    const std::vector<Completion> completions = workspace_.Complete(file, offset);
+    for (const Completion& completion : completions) {
+      for (const Text text :
+           {Text(completion.name), Text(completion.kind), Text(completion.detail), Text(completion.documentation)})
+        digest_.Add(text);
+      digest_.Add(static_cast<int64_t>(completion.certainty));
+    }
+    if (!completions.empty())
+      Add(workspace_.DescribeCompletion(file, offset, completions[offset % completions.size()].name));
     for (const Span& span : workspace_.Selections(file, offset)) digest_.AddNumbers({span.begin, span.end});
+    Add(workspace_.Definitions(file, offset));
+    digest_.Add(static_cast<int64_t>(workspace_.was_bounded()));
+    for (const ColumnUnit unit : {ColumnUnit::kUtf16, ColumnUnit::kUtf8}) {
+      workspace_.set_column_unit(unit);
+      const Position place = workspace_.PlaceOf(file, offset);
+      digest_.AddNumbers({place.line, place.col, workspace_.OffsetOf(file, place.line, place.col + 1),
+                          workspace_.OffsetOf(file, place.line + 1, 3)});
+    }
+  }
+  // Behind brackets, commas and points, where an editor asks by itself, and anywhere.
+  void AddPlacesBetween(FileId file, size_t most_places) {
+    const std::string source(workspace_.SourceOf(file));
+    std::vector<uint32_t> places;
+    for (uint32_t at = 1; at <= source.size(); ++at)
+      if (Text("(,.=@[{ \n\"'").find(source[at - 1]) != Text::npos) places.push_back(at);
+    for (size_t i = 0; i < places.size(); i += places.size() / most_places + 1) AddPlace(file, places[i]);
+    for (size_t at = 0; at <= source.size(); at += source.size() / 8 + 1)
+      AddName(file, static_cast<uint32_t>(at), false);
   }
 
   Digest& digest_;
@@ -479,10 +582,8 @@ class SourcesDigest {
       }
     }
     TheConsole() = before;
-    AddRows(bytes);
   }
 
- private:
   // As the rows of a corpus, in runs and groups that are small, of the version that it shows itself to be.
   void AddRows(const std::string& bytes) {
     for (const RowForm form : {RowForm::kRecords, RowForm::kOccurrences}) {
@@ -511,6 +612,7 @@ class SourcesDigest {
     }
   }
 
+ private:
   Digests& digests_;
   std::vector<std::unique_ptr<AnalysisDigest>> analyses_;
 };

@@ -60,8 +60,11 @@ inline std::string BytesOf(const ShippedSource& source) {
 
 inline void AddShipped(const ShippedSource& source, const std::vector<ShippedSource>& all, Digests& digests) {
   const std::string bytes = BytesOf(source);
-  const Version versions[] = {Version::Of(3, 14), Version::Of(3, 8), Version::Of(2, 7)};
-  SourcesDigest(versions, digests).Add(bytes, 1);
+  const Version ends[] = {Version::Of(3, 14), Version::Of(2, 7)}, between[] = {Version::Of(3, 8), Version::Of(3, 6)};
+  SourcesDigest sources(ends, digests);
+  sources.Add(bytes, 1);
+  sources.AddRows(bytes);
+  SourcesDigest(between, digests).Add(bytes, 0);
   const Version version = source.program.ends_with("_27") ? Version::Of(2, 7) : Version::Of(3, 14);
   AnswersDigest answers(version, digests.answers);
   if (source.program.empty()) {
@@ -71,9 +74,18 @@ inline void AddShipped(const ShippedSource& source, const std::vector<ShippedSou
     return;
   }
   const size_t folder = source.program.size() + 1;
-  for (const ShippedSource& other : all)
-    if (other.program == source.program) answers.Write(other.path.substr(folder), BytesOf(other));
-  answers.AddFile(source.path.substr(folder), 60);
+  AnswersDigest with_little(version, digests.answers, AnswersDigest::Memory::kLittle);
+  for (const ShippedSource& other : all) {
+    if (other.program != source.program) continue;
+    answers.Write(other.path.substr(folder), BytesOf(other));
+    with_little.Write(other.path.substr(folder), BytesOf(other));
+  }
+  const std::string path = source.path.substr(folder);
+  answers.AddFile(path, 50);
+  answers.AddEdits(path);
+  with_little.AddFile(path, 3);
+  // Once a program.
+  if (std::ranges::find(all, source.program, &ShippedSource::program)->path == source.path) answers.AddProgram();
 }
 
 // A line of the table, and the names of its columns.

@@ -94,3 +94,19 @@ class Generic[T: (int, str), U]:
     def method[V](self, v: V) -> "tuple[T, V]": type Inner = T; return self.field, v
 assert generic, Generic
 print(global_only, made_here, walrus, sin, shared, _hidden, missing, o.Shared, conditional)
+def annotated_later():
+    def inner():
+        nonlocal early
+        global early_global
+        early_global: int = 1
+        early = early_global
+    early: str = "a"
+    exec("early_global"); eval("early")
+    del early
+    return inner
+early_global = 2
+def deletes():
+    x = 1
+    def uses(): return x
+    del x
+    return uses, f"{x}", "x"
