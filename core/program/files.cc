@@ -47,7 +47,11 @@ void DecodeSource(std::string& bytes) {
 void FindLines(Text source, std::vector<uint32_t>& lines) {
   static constexpr Text kMark = "\xEF\xBB\xBF";
   lines.push_back(source.starts_with(kMark) ? static_cast<uint32_t>(kMark.size()) : 0);
-  for (size_t at = source.find_first_of("\n\r"); at != Text::npos; at = source.find_first_of("\n\r", at + 1)) {
+  const bool has_returns = source.find('\r') != Text::npos;
+  const auto find = [&](size_t from) {
+    return has_returns ? source.find_first_of("\n\r", from) : source.find('\n', from);
+  };
+  for (size_t at = find(0); at != Text::npos; at = find(at + 1)) {
     if (source[at] == '\r' && source.substr(at + 1).starts_with('\n')) ++at;
     lines.push_back(static_cast<uint32_t>(at + 1));
   }
