@@ -12,10 +12,12 @@
 #include "foundations/stop.h"
 #include "names/binder.h"
 #include "names/text_table.h"
-#include "program/member_texts.h"
+#include "program/blanks.h"
 #include "program/possible_symbols.h"
 #include "program/two_threads.h"
 #include "project/file_system.h"
+#include "project/word_search.h"
+#include "tokens/token_ends.h"
 
 namespace quillet {
 
@@ -165,6 +167,111 @@ class DefinitionsMaker {
   size_t line_begin_ = SIZE_MAX;  // of the line looked at last
   size_t ascii_end_ = 0;          // up to which it is ASCII
 };
+
+// ---- whether a text may define a member, without its analysis ----
+
+// Where the line of a place begins, where what stands on it does, and how far that is indented.
+struct Line {
+  size_t begin, first, indent;
+};
+Line LineAround(Text source, size_t at) {
+  static constexpr size_t kTab = 8;
+  size_t begin = at;
+  while (begin > 0 && !IsLineEnd(source[begin - 1])) --begin;
+  size_t first = begin, indent = 0;
+  for (; first < source.size() && IsBlank(source[first]); ++first)
+    indent = source[first] == '\t' ? (indent / kTab + 1) * kTab : indent + 1;
+  return {begin, first, indent};
+}
+
+bool BeginsWithWord(Text text, Text word) {
+  return text.starts_with(word) && (text.size() == word.size() || IsBlank(text[word.size()]));
+}
+
+// Whether what stands behind a name lets it be a target.
+bool MayFollowTarget(Text behind) {
+  size_t at = 0;
+  while (at < behind.size() && IsBlank(behind[at])) ++at;
+  behind.remove_prefix(at);
+  if (behind.empty()) return true;
+  switch (behind.front()) {
+    case '(':
+    case '.':
+    case '[':
+      return false;
+    case '=':
+      return !behind.starts_with("==");
+    case '+':
+    case '-':
+    case '*':
+    case '/':
+    case '%':
+    case '@':
+    case '&':
+    case '|':
+    case '^':
+    case '<':
+    case '>':
+    case '!':
+      return behind.substr(0, 3).find('=') != Text::npos;
+    default:
+      return true;
+  }
+}
+
+size_t CountOf(Text text, Text mark) {
+  size_t count = 0;
+  for (size_t at = 0; (at = text.find(mark, at)) != Text::npos; at += mark.size()) ++count;
+  return count;
+}
+
+// Whether a place lies in the body of a function or module rather than of a class, by what the lines in front of it
+// that are less and less indented begin with. Where a string or a bracket may be open in between, that is not known.
+bool IsSurelyLocal(Text source, size_t place, size_t& budget) {
+  Line line = LineAround(source, place);
+  size_t indent = line.indent;
+  if (BeginsWithWord(source.substr(line.first), "class")) return false;
+  bool is_in_function = false;
+  while (!is_in_function && indent > 0 && line.begin > 0) {
+    const size_t behind = line.begin;
+    line = LineAround(source, behind - 1);
+    if (budget < behind - line.begin) return false;
+    budget -= behind - line.begin;
+    const Text text = source.substr(line.first);
+    if (line.indent >= indent || IsLineEnd(text.front()) || text.front() == '#') continue;
+    if (BeginsWithWord(text, "class")) return false;
+    if (!IsIdentifierByte(text.front()) && text.front() != '@') return false;
+    indent = line.indent;
+    is_in_function = BeginsWithWord(text, "def") || BeginsWithWord(text, "async");
+  }
+  const Text between = source.substr(line.begin, place - line.begin);
+  if (budget < between.size()) return false;
+  budget -= between.size();
+  return CountOf(between, "\"\"\"") % 2 == 0 && CountOf(between, "'''") % 2 == 0;
+}
+
+bool MayDefineMember(Text source, Text name) {
+  static constexpr Text kReceiver = "self.";
+  static constexpr size_t kMostLooks = 8;
+  size_t budget = kMostLooks * source.size();  // bytes that are looked at again
+  for (size_t at = 0; (at = FindWord(source, name, at)) != Text::npos; at += name.size()) {
+    const Text behind = source.substr(at + name.size());
+    size_t before = at;
+    while (before > 0 && IsBlank(source[before - 1])) --before;
+    if (before > 0 && source[before - 1] == '.') {
+      const bool is_of_self = before == at ? source.substr(0, at).ends_with(kReceiver) : true;
+      if (is_of_self && MayFollowTarget(behind)) return true;
+      continue;
+    }
+    const Text head = source.substr(0, before);
+    if (head.ends_with("def") || head.ends_with("class")) {
+      if (LineAround(source, at).indent > 0) return true;
+      continue;
+    }
+    if (MayFollowTarget(behind) && !IsSurelyLocal(source, at, budget)) return true;
+  }
+  return false;
+}
 
 }  // namespace
 

@@ -5,7 +5,6 @@
 #include <span>
 #include <tuple>
 
-#include "program/member_texts.h"
 #include "workspace/workspace_impl.h"
 
 namespace quillet {
@@ -173,10 +172,8 @@ std::vector<Location> Workspace::Impl::MembersBelow(const SourceFile& file, Expr
     static constexpr size_t kMaxFiles = 200;
     size_t count = 0;
     const std::string of_class(inference.InfoOf(t.a).name);
-    std::string memory;
     for (const FileId id : project.WithWords({name, of_class})) {
       if (count == kMaxFiles) break;
-      if (!MayGiveMember(files.SourceOf(id, memory), name)) continue;
       const SourceFile* source = Get(id);
       if (source == nullptr || NumberOfText(source->bindings, name) == kNoIndex ||
           NumberOfText(source->bindings, of_class) == kNoIndex)

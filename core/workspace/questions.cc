@@ -5,7 +5,6 @@
 #include <malloc.h>
 #endif
 
-#include "program/name_calls.h"
 #include "workspace/workspace_impl.h"
 
 namespace quillet {
@@ -164,18 +163,7 @@ std::vector<ExprPlace> Workspace::Impl::CallsOf(const FunctionInfo& function) {
   if (!is_new) return at->second;
   std::vector<ExprPlace> calls;
   size_t count = 0;  // of files that have the name
-  std::string memory;
   const auto look = [&](FileId id) {
-    // Most files that have the name only mention it.
-    switch (UseOfName(files.SourceOf(id, memory), name)) {
-      case NameUse::kNone:
-        return;
-      case NameUse::kMentioned:
-        ++count;
-        return;
-      case NameUse::kMayBeCalled:
-        break;
-    }
     const SourceFile* file = inference.FileOf(id);
     const uint32_t number = file == nullptr ? kNoIndex : NumberOfText(file->bindings, name);
     if (number == kNoIndex) return;
