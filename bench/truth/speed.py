@@ -219,51 +219,88 @@ def Choose(folder: Path, symbol: str | None, seed: int, within: str = "") -> Que
     )
 
 
-def Measure(start: Callable[[], Subject], questions: Questions) -> dict[str, str]:
-    """A row of the table. A first answer gets a process of its own."""
+def Measure(start: Callable[[], Subject], draws: Sequence[Questions]) -> dict[str, str]:
+    """A row of the table. A first answer gets a process of its own, and so do the warm ones of each draw."""
     row: dict[str, str] = {}
-    for what, place, opened in (
-        ("first definition", questions.use, questions.use.path),
-        ("first references", questions.symbol, questions.symbol.path),
-    ):
-        begin = time.perf_counter()
-        subject = start()
-        try:
-            subject.Open(opened)
-            ask = subject.Definitions if what == "first definition" else subject.References
-            _, count = ask(place)
-            wall = time.perf_counter() - begin
-            usage = subject.usage.Look()
-            row[what] = f"{wall:.2f} s ({count})"
-            row["its processor"] = f"{usage.seconds:.2f} s"
-            row["memory"] = f"{usage.peak_kib / 1024:.0f} MiB"
-            if what == "first definition":
-                row["the definition's processor"] = row.pop("its processor")
-                row["the definition's memory"] = row.pop("memory")
-            else:
-                _AskWarm(subject, questions, row)
-        except ServerError as error:
-            row["failure"] = str(error)
-        finally:
-            subject.Stop()
-    return row
+    warm = Warm()
+    try:
+        first = _First(start, draws[0].use, definition=True)
+        row["first definition"] = f"{first.wall:.2f} s ({first.found})"
+        row["the definition's processor"] = f"{first.processor:.2f} s"
+        row["the definition's memory"] = f"{first.mebibytes:.0f} MiB"
+        for number, questions in enumerate(draws):
+            first = _First(start, questions.symbol, then=lambda subject: warm.Ask(subject, questions))  # noqa: B023
+            if number == 0:
+                row["first references"] = f"{first.wall:.2f} s ({first.found})"
+                row["its processor"] = f"{first.processor:.2f} s"
+                row["memory"] = f"{first.mebibytes:.0f} MiB"
+    except ServerError as error:
+        row["failure"] = str(error)
+    return {**row, **warm.Row()}
 
 
-def _AskWarm(subject: Subject, questions: Questions, row: dict[str, str]) -> None:
-    for path in sorted({place.path for place in questions.before}):
-        subject.Open(path)
-    for place in questions.before:
-        subject.Definitions(place)
-    row["definitions"] = _Spread([subject.Definitions(place)[0] for place in questions.definitions])
-    for place in questions.completions[::10]:
-        subject.Complete(place)
-    row["completions"] = _Spread([subject.Complete(place)[0] for place in questions.completions])
-    row["references"] = _Spread([subject.References(place)[0] for place in questions.references])
-    if questions.keystroke.path not in {place.path for place in questions.before}:
-        subject.Open(questions.keystroke.path)
-    strokes = [subject.Keystroke(questions.keystroke) for _ in range(21)][1:]
-    both = all(given for _, given in strokes)
-    row["keystroke"] = _Spread([seconds for seconds, _ in strokes]) + ("" if both else " (outline only)")
+class First(NamedTuple):
+    """The first answer of a process: seconds by the clock and of the processor, results, and memory by then."""
+
+    wall: float
+    processor: float
+    found: int
+    mebibytes: float
+
+
+def _First(
+    start: Callable[[], Subject],
+    place: Place,
+    *,
+    definition: bool = False,
+    then: Callable[[Subject], None] | None = None,
+) -> First:
+    begin = time.perf_counter()
+    subject = start()
+    try:
+        subject.Open(place.path)
+        _, count = (subject.Definitions if definition else subject.References)(place)
+        wall = time.perf_counter() - begin
+        usage = subject.usage.Look()
+        first = First(wall, usage.seconds, count, usage.peak_kib / 1024)
+        if then is not None:
+            then(subject)
+        return first
+    finally:
+        subject.Stop()
+
+
+class Warm:
+    """What processes that have answered before take for further questions, of all draws together."""
+
+    def __init__(self) -> None:
+        self.seconds: dict[str, list[float]] = {}
+        self.outline_only = False
+
+    def Ask(self, subject: Subject, questions: Questions) -> None:
+        for path in sorted({place.path for place in questions.before}):
+            subject.Open(path)
+        for place in questions.before:
+            subject.Definitions(place)
+        self._Add("definitions", [subject.Definitions(place)[0] for place in questions.definitions])
+        for place in questions.completions[::10]:
+            subject.Complete(place)
+        self._Add("completions", [subject.Complete(place)[0] for place in questions.completions])
+        self._Add("references", [subject.References(place)[0] for place in questions.references])
+        if questions.keystroke.path not in {place.path for place in questions.before}:
+            subject.Open(questions.keystroke.path)
+        strokes = [subject.Keystroke(questions.keystroke) for _ in range(21)][1:]
+        self.outline_only |= not all(given for _, given in strokes)
+        self._Add("keystroke", [seconds for seconds, _ in strokes])
+
+    def _Add(self, what: str, seconds: list[float]) -> None:
+        self.seconds.setdefault(what, []).extend(seconds)
+
+    def Row(self) -> dict[str, str]:
+        row = {what: _Spread(seconds) for what, seconds in self.seconds.items()}
+        if self.outline_only:
+            row["keystroke"] += " (outline only)"
+        return row
 
 
 def _Spread(seconds: list[float]) -> str:
@@ -296,6 +333,7 @@ def AddTo(commands: argparse._SubParsersAction[argparse.ArgumentParser]) -> None
     parser.add_argument("--all-cores", action="store_true")
     parser.add_argument("--without", action="store_true", help="measure the servers alone")
     parser.add_argument("--seed", type=int, default=1)
+    parser.add_argument("--draws", type=int, default=1, help="ask so many draws of warm questions, from the seed on")
     AddPeers(parser, "ty,basedpyright,pyrefly,zuban,jedi")
     parser.set_defaults(run=Run)
 
@@ -310,9 +348,11 @@ def Run(options: argparse.Namespace) -> int:
                 time.sleep(2.5)  # a file that was written just now is not known by its time
                 subprocess.run([sys.executable, "-m", "quillet", "index", ".", "--quiet"], cwd=folder, check=True)
         lines = sum(len(Cut(ReadText(path))) for path in SourceFiles(folder))
-        questions = Choose(folder, options.symbol, options.seed, within)
-        symbol = Path(questions.symbol.path).relative_to(folder)
-        print(f"{options.project.name}, {lines:,} lines; the symbol is at {symbol}:{questions.symbol.line}", flush=True)
+        seeds = range(options.seed, options.seed + options.draws)
+        draws = [Choose(folder, options.symbol, seed, within) for seed in seeds]
+        asked = draws[0].symbol
+        symbol = Path(asked.path).relative_to(folder)
+        print(f"{options.project.name}, {lines:,} lines; the symbol is at {symbol}:{asked.line}", flush=True)
         one_core = not options.all_cores
         subjects: dict[str, Callable[[], Subject]] = {}
         if not options.without:
@@ -321,7 +361,7 @@ def Run(options: argparse.Namespace) -> int:
             subjects[peer] = lambda peer=peer: Server(peer, folder, one_core=one_core)  # type: ignore[misc]
         rows = {}
         for subject, start in subjects.items():
-            rows[subject] = Measure(start, questions)
+            rows[subject] = Measure(start, draws)
             print(f"{subject}: {rows[subject]}", flush=True)
     heads = list(dict.fromkeys(head for row in rows.values() for head in row))
     print(f"\n| | {' | '.join(rows)} |\n| --- |{' ---: |' * len(rows)}")

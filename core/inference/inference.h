@@ -396,7 +396,7 @@ class Inference {
   }
   // Makes guesses pay for the files that were read for them.
   void CountReading() {
-    static constexpr uint64_t kBytesOfAStep = 1024;
+    static constexpr uint64_t kBytesOfAStep = 256;
     if (unpaid_ == 0) return;
     guess_steps_ -= static_cast<uint32_t>(std::min<uint64_t>(guess_steps_, unpaid_ / kBytesOfAStep));
     unpaid_ = 0;

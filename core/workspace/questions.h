@@ -172,7 +172,7 @@ class Workspace {
     std::string typeshed;
     Version version;
     // Bytes of files that may be held, and up to which those are that a question only goes over.
-    size_t most_held = size_t{80} << 20;
+    size_t most_held = size_t{120} << 20;
     size_t most_visited = size_t{48} << 20;
     // Bytes of what was found about values, roughly, that may be remembered.
     size_t most_remembered = size_t{32} << 20;
