@@ -98,10 +98,8 @@ class Answers(ast.NodeVisitor):
         self.add(" ", node.id, (node.lineno, node.col_offset + 1))
 
     def visit_Attribute(self, node: ast.Attribute) -> None:
-        if isinstance(node.ctx, ast.Load):
-            self.use(node, "get")
-        elif isinstance(node.ctx, ast.Store):
-            self.use(node, "set")
+        # The operand of "del" is read.
+        self.use(node, "set" if isinstance(node.ctx, ast.Store) else "get")
         self.generic_visit(node)
 
     def visit_AugAssign(self, node: ast.AugAssign) -> None:

@@ -59,11 +59,11 @@ def test_a_difference_is_seen(answer: list[object] | None, source: str, counted:
     assert getattr(report, counted).total() == 1
 
 
-#: What is wrong with the place of a statement among others, or with its names: the statement is understood.
+#: What is wrong with the place of a statement among others, with its names or its version: it is understood.
 OF_THE_PLACE = re.compile(
     r"expected an indented|expected 'except' or|unexpected (un)?indent|unindent does not|inconsistent use|"
     r"default 'except:'|cannot have both 'except'|remaining patterns unreachable|outside loop|not properly in loop|"
-    r"from __future__|future feature|too many (levels|statically)"
+    r"from __future__|future feature|too many (levels|statically)|only supported in Python"
 )
 
 

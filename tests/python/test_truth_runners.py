@@ -1,6 +1,5 @@
 """The measurements of bench/truth read their sets as those are written, and count what they should."""
 
-import io
 import json
 import subprocess
 import sys
@@ -653,13 +652,13 @@ def test_a_run_leaves_the_other_half_unread(tmp_path, monkeypatch, capsys):
         (folder / "main.py").write_text("def f(): pass\nf()\n")
         (folder / "callgraph.json").write_text(json.dumps({"main": ["main.f"]}))
     read = set()
-    plain = io.open
+    plain = Path.open
 
     def Reading(path, *given, **named):
-        read.add(Path(path).parent.name if isinstance(path, str | Path) else None)
+        read.add(path.parent.name)
         return plain(path, *given, **named)
 
-    monkeypatch.setattr(io, "open", Reading)
+    monkeypatch.setattr(Path, "open", Reading)
     monkeypatch.setitem(call_edges.ENGINES, "quillet", lambda roots: Fake())
     parser_options = type(
         "Options", (), {"folder": tmp_path / "set", "half": "even", "engine": "quillet", "failures": False}
