@@ -703,12 +703,12 @@ Value Inference::ResultOfSpecialCall(TypeId callee, std::vector<Argument>& argum
     const SourceFile* file = FileOf(info.file);
     if (info.stmt == kModuleStmt || file == nullptr) return {};
     const Text name = info.name;
-    static constexpr Text kNames[] = {"super",      "type",      "property",     "abstractproperty",
-                                      "TypeVar",    "ParamSpec", "TypeVarTuple", "NewType",
-                                      "NamedTuple", "Enum",      "IntEnum",      "Flag",
-                                      "IntFlag",    "StrEnum",   "staticmethod", "classmethod",
-                                      "partial",    "tuple",     "dict"};
-    if (std::ranges::find(kNames, name) == std::end(kNames) || !file->is_stub) return {};
+    static constexpr Text kNames[] = {
+        "super", "type",    "TypeVar", "ParamSpec", "TypeVarTuple", "NewType",     "NamedTuple", "Enum", "IntEnum",
+        "Flag",  "IntFlag", "StrEnum", "partial",   "staticmethod", "classmethod", "tuple",      "dict"};
+    static constexpr Text kProperties[] = {"property", "abstractproperty", "DynamicClassAttribute"};
+    const bool is_property = std::ranges::find(kProperties, name) != std::end(kProperties);
+    if ((!is_property && std::ranges::find(kNames, name) == std::end(kNames)) || !file->is_stub) return {};
     if (name == "super") {
       if (arguments.size() >= 2) {
         for (const TypeId cls : types_.CopyOf(at(0).set))
@@ -740,7 +740,7 @@ Value Inference::ResultOfSpecialCall(TypeId callee, std::vector<Argument>& argum
       }
       return answer(value);
     }
-    if (name == "property" || name == "abstractproperty") {
+    if (is_property) {
       const ClassId property = ClassNamed("builtins", "property");
       if (property == kNoId) return answer(kUnknownValue);
       TypeSetId getter = kNoTypes;

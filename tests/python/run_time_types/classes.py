@@ -1,6 +1,7 @@
 import abc
 import enum
 import functools
+import types
 from dataclasses import dataclass, field, replace
 from collections import namedtuple
 from typing import NamedTuple, Generic, TypeVar, Optional, ClassVar, Protocol
@@ -154,12 +155,17 @@ class Color(enum.Enum):
     def describe(self):
         return self.name, self.value
 
+    @types.DynamicClassAttribute
+    def code(self):
+        return len(self.name)
+
 
 Color.RED
 Color.RED.name
 Color.RED.value
 Color.GREEN.value
 Color.RED.nice
+Color.RED.code
 Color.default()
 Color("g")
 Color["RED"]
