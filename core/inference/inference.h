@@ -470,6 +470,7 @@ class Inference {
   std::string ForeignNameOf(const SourceFile& file, uint32_t offset);
   Value Unpack(const SourceFile& file, ExprId target, ExprId root, Value value, ExprPlace source, FrameId frame);
   Value ValueOfPattern(const SourceFile& file, ExprId pattern, FrameId frame);
+  Value ValueMatchedBy(const SourceFile& file, ExprId pattern, FrameId frame);
   Value Entered(Value manager, bool is_async);
   Value Caught(Value type, int depth = 0);
   Value BuiltinNamed(Text name);

@@ -222,7 +222,7 @@ Value Inference::ValueOfTarget(const SourceFile& file, ExprId target, FrameId fr
   }
 }
 
-// What a pattern, or the name in it, stands for in what is matched.
+// What a pattern, or the name that it is, stands for: what it says itself, or else what it is compared with.
 Value Inference::ValueOfPattern(const SourceFile& file, ExprId pattern, FrameId frame) {
   const FileSyntax& syntax = file.syntax;
   if (syntax[pattern].kind == ExprKind::kPatternClass) {
@@ -235,7 +235,14 @@ Value Inference::ValueOfPattern(const SourceFile& file, ExprId pattern, FrameId 
       value = types_.Union(value, ValueOfPattern(file, alternative, frame));
     return value;
   }
+  if (syntax[pattern].kind == ExprKind::kPatternAs) return ValueOfPattern(file, syntax.ChildOf(pattern, 0), frame);
   if (syntax[pattern].kind == ExprKind::kPatternValue) return ValueOf(file.id, syntax.ChildOf(pattern, 0), frame);
+  return ValueMatchedBy(file, pattern, frame);
+}
+
+// What a pattern is compared with: the part that falls to it of what is matched.
+Value Inference::ValueMatchedBy(const SourceFile& file, ExprId pattern, FrameId frame) {
+  const FileSyntax& syntax = file.syntax;
   const ExprId parent = syntax[pattern].parent;
   if (parent == kNoExpr) {
     const StmtId match = syntax.stmt(syntax.StatementOf(pattern)).parent;
@@ -245,21 +252,9 @@ Value Inference::ValueOfPattern(const SourceFile& file, ExprId pattern, FrameId 
   const auto children = syntax.ChildrenOf(parent);
   const auto index = static_cast<size_t>(std::ranges::find(children, pattern) - children.begin());
   switch (syntax[parent].kind) {
-    case ExprKind::kPatternAs: {
-      const ExprId around = syntax[parent].parent;
-      if (around == kNoExpr) {
-        const StmtId match = syntax.stmt(syntax.StatementOf(parent)).parent;
-        const auto subject = syntax.ExprsOf(syntax.stmt(match));
-        return subject.empty() ? kUnknownValue : ValueOf(file.id, subject[0], frame);
-      }
-      return ValueOfPattern(file, around, frame);
-    }
-    case ExprKind::kPatternOr: {
-      const ExprId around = syntax[parent].parent;
-      if (around != kNoExpr) return ValueOfPattern(file, around, frame);
-      const auto subject = syntax.ExprsOf(syntax.stmt(syntax.stmt(syntax.StatementOf(parent)).parent));
-      return subject.empty() ? kUnknownValue : ValueOf(file.id, subject[0], frame);
-    }
+    case ExprKind::kPatternAs:
+    case ExprKind::kPatternOr:
+      return ValueMatchedBy(file, parent, frame);
     case ExprKind::kPatternSequence: {
       const Value whole = ValueOfPattern(file, parent, frame);
       Value item{kNoTypes, whole.doubt};

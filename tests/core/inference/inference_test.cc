@@ -397,6 +397,8 @@ TEST(Inference, ReadsPatterns) {
        "def f(p):\n  match p:\n    case P($x, y=$y): pass\n",
        {"int", "str"}},
       {"def f(x):\n  match x:\n    case str() | int() as $y: pass\n", {"int | str"}},
+      {"match (1, 'a'):\n  case (1 as $x, _ as $y): pass\n", {"int", "str"}},
+      {"match (1, 'a'):\n  case ((1 | ($x | 2)) as $y, _) | [$z]: pass\n", {"int", "int", "int"}},
   });
 }
 
