@@ -43,7 +43,7 @@ int DigestAll(const std::vector<std::filesystem::path>& files) {
   for (const std::filesystem::path& path : files) {
     const std::string bytes = BytesOf(path);
     sources.Add(bytes, 2);
-    sources.AddRows(bytes);
+    sources.AddRows({bytes});
     for (const std::string& text : {bytes, Spoilt(bytes, 1)}) {
       answers.Open("a.py", text);
       answers.AddFile("a.py", 30);

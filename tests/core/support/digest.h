@@ -15,6 +15,7 @@
 #include <iterator>
 #include <memory>
 #include <span>
+#include <sstream>
 #include <string>
 #include <utility>
 #include <vector>
@@ -31,6 +32,8 @@
 #include "output/json_lines.h"
 #include "output/record_rows.h"
 #include "output/text_lines.h"
+#include "project/ignore_rules.h"
+#include "project/word_filters.h"
 #include "site/pages.h"
 #include "site/site_index.h"
 #include "tests/core/support/analyzer_helper.h"
@@ -85,10 +88,10 @@ class Digest {
 };
 
 struct Digests {
-  Digest tokens, trees, records, complete, output, rows, names, syntax, index, site, answers;
+  Digest tokens, trees, records, complete, output, rows, names, syntax, index, project, site, answers;
 
   using Stage = std::pair<const char*, Digest*>;
-  std::array<Stage, 11> Stages() {
+  std::array<Stage, 12> Stages() {
     return {{{"tokens", &tokens},
              {"trees", &trees},
              {"records", &records},
@@ -98,6 +101,7 @@ struct Digests {
              {"names", &names},
              {"syntax", &syntax},
              {"index", &index},
+             {"project", &project},
              {"site", &site},
              {"answers", &answers}}};
   }
@@ -364,16 +368,17 @@ class AnswersDigest {
       : digest_(digest), workspace_(SettingsFor(version, memory)) {}
 
   // Before anything is asked.
-  void Write(const std::string& path, const std::string& bytes) { folder_.Write(path, bytes); }
+  void Write(const std::string& path, const std::string& bytes) { folder_.Write(kRoot + path, bytes); }
 
   void Open(const std::string& path, const std::string& bytes) { workspace_.Open(File(path), bytes); }
-  // At most so many places of a kind are asked about.
+  // So many places of a kind are asked about, the last name among them, and each fifth of them about all files.
   void AddFile(const std::string& path, size_t most_places) {
     const FileId file = File(path);
     AddWhole(file);
     const std::vector<ColouredName> names = workspace_.Colours(file);
     const size_t step = names.size() / most_places + 1;
     for (size_t i = 0; i < names.size(); i += step) AddName(file, names[i].begin, i % (5 * step) == 0);
+    if (!names.empty()) AddName(file, names.back().begin, false);
     AddPlacesBetween(file, most_places);
   }
   // Of a buffer that is edited here and there, and closed.
@@ -418,14 +423,14 @@ class AnswersDigest {
   Workspace::Settings SettingsFor(Version version, Memory memory) const {
     Workspace::Settings settings;
     if (memory == Memory::kLittle) settings.most_held = settings.most_visited = settings.most_remembered = 1000;
-    settings.roots = {folder_.path()};
-    settings.libraries = {folder_ / "site-packages"};
+    settings.roots = {folder_ / kRoot};
+    settings.libraries = {folder_ / kRoot + "site-packages"};
     settings.typeshed = SmallLibrary();
     settings.version = version;
     settings.analyzer = std::make_shared<FileAnalyzer::Options>(AnalysisDigest::CompletelyOf(version));
     return settings;
   }
-  FileId File(const std::string& path) { return workspace_.FileOf(folder_ / path); }
+  FileId File(const std::string& path) { return workspace_.FileOf(folder_ / kRoot + path); }
 
   // Without the folders, whose names are others in each run.
   std::string Shown(std::string text) const {
@@ -548,6 +553,9 @@ class AnswersDigest {
       AddName(file, static_cast<uint32_t>(at), false);
   }
 
+  // The program lies two folders down, so that what it imports from above it is not what else lies on this machine.
+  static constexpr const char* kRoot = "above/program/";
+
   Digest& digest_;
   // Before that of the library, since answers are in the order of paths.
   TemporaryFolder folder_{"answers-"};
@@ -584,8 +592,29 @@ class SourcesDigest {
     TheConsole() = before;
   }
 
+  // The words that it may hold and define; and as rules of an ignore file, what it says of paths, which are its own
+  // lines.
+  void AddProject(const std::string& bytes) {
+    WordKeys words;
+    std::string source = bytes;
+    words.Read(source);
+    for (const WordKey key : words.keys()) digests_.project.Add(static_cast<int64_t>(key));
+    std::vector<uint64_t> filter;
+    AppendFilter(words.keys(), filter);
+    for (const uint64_t bits : filter) digests_.project.Add(static_cast<int64_t>(bits));
+    digests_.project.AddNumbers({words.may_define_any(), HasWordKey(bytes)});
+    IgnoreRules rules(bytes);
+    std::istringstream lines(bytes);
+    std::string path, before;
+    for (int i = 0; i < 100 && std::getline(lines, path); ++i) {
+      for (const std::string& asked : {path, before + "/" + path, path + before})
+        digests_.project.AddNumbers({int64_t(rules.Of(asked, false)), int64_t(rules.Of(asked, true))});
+      before = path;
+    }
+  }
+
   // As the rows of a corpus, in runs and groups that are small, of the version that it shows itself to be.
-  void AddRows(const std::string& bytes) {
+  void AddRows(const std::vector<std::string>& sources) {
     for (const RowForm form : {RowForm::kRecords, RowForm::kOccurrences}) {
       ShardWriter::Options options;
       options.form = form;
@@ -598,8 +627,10 @@ class SourcesDigest {
       options.run_rows = 100;
       options.group_rows = 30;
       ShardWriter writer(std::move(options));
-      writer.Add({"p", "a", "a.py", bytes, /*is_text=*/false, {}});
-      writer.Add({"p", "", "b.py", bytes, /*is_text=*/true, {}});
+      for (const std::string& bytes : sources) {
+        writer.Add({"p", "a", "a.py", bytes, /*is_text=*/false, {}});
+        writer.Add({"p", "", "b.py", bytes, /*is_text=*/true, {}});
+      }
       writer.Add({"p", "a", "c.py", {}, false, "gone"});
       writer.WorkToTheEnd();
       writer.Finish("key", "value");

@@ -11,7 +11,7 @@ namespace quillet::testing {
 
 inline std::string ScopeWord(const Bindings& bindings, uint32_t index) {
   const NameScope& scope = bindings.scopes[index];
-  if (scope.kind == NameScopeKind::kTypeParameters) return "[" + std::string(bindings.texts[scope.name]) + "]";
+  if (scope.kind == NameScopeKind::kTypeParameters) return "[" + std::string(bindings.NameOf(scope)) + "]";
   if (scope.kind == NameScopeKind::kAnnotation) return "annotation";
   if (scope.kind == NameScopeKind::kClass || scope.kind == NameScopeKind::kFunction)
     return scope.name == kNoIndex ? "?" : std::string(bindings.texts[scope.name]);

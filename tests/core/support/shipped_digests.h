@@ -1,9 +1,10 @@
-// The digests of every source that comes with the tests, as tests/digests.txt holds them: a line a file, a
+// The digests of every source that comes with the tests, as tests/digests.txt holds them: a line a source, a
 // column a stage.
 //
-// Sources are those of the fuzz corpus, the examples, the statements of the golden files, and the programs below
-// tests/programs, each folder of which is one: what a workspace answers about a program's file is asked with all of
-// them there. A program whose name ends in "_27" is read as Python 2.7.
+// Sources are the files of the fuzz corpus, the examples, the statements of the golden files, the programs below
+// tests/programs, each folder of which is one, and families of sources that are made (made_sources.h), all of a family
+// in one line. What a workspace answers about a program's file is asked with all of them there. A program whose name
+// ends in "_27" is read as Python 2.7.
 #pragma once
 
 #include <algorithm>
@@ -15,17 +16,19 @@
 #include <vector>
 
 #include "tests/core/support/digest.h"
+#include "tests/core/support/made_sources.h"
 
 namespace quillet::testing {
 
 inline const std::string kDigestTable = QUILLET_SOURCE_DIR "/tests/digests.txt";
 
 struct ShippedSource {
-  std::string path;     // from the root of the repository
-  std::string program;  // the folder of its program; empty for a file by itself
+  std::string path;                    // from the root of the repository; of a family, its name
+  std::string program;                 // the folder of its program; empty for a file by itself
+  const MadeFamily* family = nullptr;  // that it is, if it is one
 };
 
-// In the order of their paths.
+// In the order of their paths, families behind files.
 inline std::vector<ShippedSource> ShippedSources() {
   const std::filesystem::path root = QUILLET_SOURCE_DIR;
   std::vector<ShippedSource> sources;
@@ -40,6 +43,7 @@ inline std::vector<ShippedSource> ShippedSources() {
     }
   }
   std::ranges::sort(sources, {}, &ShippedSource::path);
+  for (const MadeFamily& family : MadeFamilies()) sources.push_back({std::string("made/") + family.name, {}, &family});
   return sources;
 }
 
@@ -58,14 +62,56 @@ inline std::string BytesOf(const ShippedSource& source) {
   return bytes;
 }
 
+// What is said of sources by themselves, as versions from 2.7 to 3.14.
+class SeveralVersions {
+ public:
+  explicit SeveralVersions(Digests& digests) : ends_(kEnds, digests), between_(kBetween, digests) {}
+  void Add(const std::string& bytes) {
+    ends_.Add(bytes, 1);
+    ends_.AddProject(bytes);
+    between_.Add(bytes, 0);
+  }
+  void AddRows(const std::vector<std::string>& sources) { ends_.AddRows(sources); }
+
+ private:
+  static inline const Version kEnds[] = {Version::Of(3, 14), Version::Of(2, 7)};
+  static inline const Version kBetween[] = {Version::Of(3, 8), Version::Of(3, 6)};
+  SourcesDigest ends_, between_;
+};
+
+inline Version VersionOfProgram(const std::string& name) {
+  return name.ends_with("_27") ? Version::Of(2, 7) : Version::Of(3, 14);
+}
+
+inline void AddFamily(const MadeFamily& family, Digests& digests) {
+  const Version newest[] = {Version::Of(3, 14)};
+  SourcesDigest long_ones(newest, digests);
+  SeveralVersions others(digests);
+  AnswersDigest answers(VersionOfProgram(family.name), digests.answers);
+  answers.Write("b.py", kOtherModule);
+  std::vector<std::string> sources;
+  for (const MadeProgram& program : family.Make()) {
+    for (const auto& [path, bytes] : program) {
+      if (family.is_long) {
+        long_ones.Add(bytes, 0);
+      } else {
+        others.Add(bytes);
+        sources.push_back(bytes);
+      }
+      answers.Open(path, bytes);
+    }
+    for (const auto& [path, bytes] : program) answers.AddFile(path, family.places);
+  }
+  others.AddRows(sources);
+}
+
 inline void AddShipped(const ShippedSource& source, const std::vector<ShippedSource>& all, Digests& digests) {
+  if (source.family != nullptr) return AddFamily(*source.family, digests);
   const std::string bytes = BytesOf(source);
-  const Version ends[] = {Version::Of(3, 14), Version::Of(2, 7)}, between[] = {Version::Of(3, 8), Version::Of(3, 6)};
-  SourcesDigest sources(ends, digests);
-  sources.Add(bytes, 1);
-  sources.AddRows(bytes);
-  SourcesDigest(between, digests).Add(bytes, 0);
-  const Version version = source.program.ends_with("_27") ? Version::Of(2, 7) : Version::Of(3, 14);
+  SeveralVersions by_itself(digests);
+  by_itself.Add(bytes);
+  by_itself.AddRows({bytes});
+  const Version version = VersionOfProgram(source.program);
   AnswersDigest answers(version, digests.answers);
   if (source.program.empty()) {
     answers.Write("b.py", kOtherModule);
