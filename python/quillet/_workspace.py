@@ -224,6 +224,7 @@ class Workspace:
             found_version = found if found is not None and _is_known(found) else language_version()
         self._version = found_version
         self._roots = tuple(os.fsdecode(folder) for folder in folders)
+        self._last_path = "", b""  # an absolute one that was given, and as the core has it
         self._native = _host.Workspace(
             folders,
             [os.fsencode(library) for library in libraries],
@@ -440,7 +441,13 @@ class Workspace:
         return f"<Workspace {roots} for Python {self._version[0]}.{self._version[1]}>"
 
     def _path(self, path: StrPath) -> bytes:
-        return os.path.abspath(os.fsencode(path))
+        last, file = self._last_path  # questions come one after the other about the same file
+        if type(path) is str and path == last:
+            return file
+        file = os.path.abspath(os.fsencode(path))
+        if type(path) is str and os.path.isabs(path):
+            self._last_path = path, file
+        return file
 
     def _readable(self, path: StrPath) -> bytes:
         """The path of a file that can be read. Raises `OSError` for any other."""

@@ -276,6 +276,17 @@ def test_a_file_that_cannot_be_read_is_an_error(project: Path) -> None:
             workspace.definitions(project / "pipe.py", 1, 1)
 
 
+def test_a_relative_path_is_one_from_where_the_process_stands(tmp_path: Path, monkeypatch: pytest.MonkeyPatch) -> None:
+    for folder in ("first", "second"):
+        (tmp_path / folder).mkdir()
+        (tmp_path / folder / "module.py").write_text(f"def {folder}(): pass\n")
+    workspace = quillet.Workspace(tmp_path)
+    for folder in ("first", "second", "first"):
+        monkeypatch.chdir(tmp_path / folder)
+        for path in ("module.py", str(tmp_path / folder / "module.py"), Path("module.py")):
+            assert [item.name for item in workspace.outline(path)] == [folder]
+
+
 def test_places_outside_of_a_file_are_held_to_it(project: Path) -> None:
     workspace = Workspace(project)
     main = project / "main.py"

@@ -74,6 +74,11 @@ class Documents:
     def get(self, uri: str) -> Document | None:
         return self._by_uri.get(uri)
 
+    def path_of(self, uri: str) -> str:
+        """The path that a URI stands for, which is known of what is open."""
+        document = self._by_uri.get(uri)
+        return path_of(uri) if document is None else document.path
+
     def at(self, path: str) -> Document | None:
         return self._by_path.get(path)
 

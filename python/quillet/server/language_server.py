@@ -4,7 +4,7 @@ from __future__ import annotations
 
 from quillet._workspace import Stopped
 from quillet.server import log
-from quillet.server.documents import Document, Documents, path_of
+from quillet.server.documents import Document, Documents
 from quillet.server.positions import place_of
 from quillet.server.projects import Projects
 from quillet.server.work import Work
@@ -64,13 +64,13 @@ class Server:
 
     def place(self, params: Any) -> Place:
         """Where a request with a document and a position asks."""
-        path = path_of(params.text_document.uri)
+        path = self.documents.path_of(params.text_document.uri)
         project = self.projects.of(path)
         return Place(project.workspace, project.settings, path, *place_of(params.position))
 
     def file(self, uri: str) -> tuple[Workspace, Settings, str]:
         """What a request about a whole document asks."""
-        path = path_of(uri)
+        path = self.documents.path_of(uri)
         project = self.projects.of(path)
         return project.workspace, project.settings, path
 

@@ -20,7 +20,7 @@ if TYPE_CHECKING:
     Ask = Callable[[str, Any, Callable[[Any], None]], None]
 
 # What reads all files of a program, the first time it is asked.
-_LONG = {
+TAKES_LONG = {
     "textDocument/references": "Looking for references",
     "textDocument/implementation": "Looking for implementations",
     "textDocument/rename": "Looking for what is renamed",
@@ -33,23 +33,21 @@ DELAY = 0.4
 
 
 class Progress:
-    """Of one request, told from when it is entered until it is left. `ask` asks the client, whose answer comes on the
-    reading thread; without it nothing is told but what the request wants.
+    """Of one request that takes long, told from when it is entered until it is left. `ask` asks the client, whose
+    answer comes on the reading thread; without it nothing is told but what the request wants.
     """
 
     _created = 0
 
     def __init__(self, job: Job, tell: Tell, ask: Ask | None) -> None:
         self._job, self._tell, self._ask = job, tell, ask
-        self._title = _LONG.get(job.method) if isinstance(job.method, str) else None
+        self._title = TAKES_LONG[job.method]
         self._lock = allocate_lock()
         self._has_begun = False
         self._has_ended = False
         self._timer: Timer | None = None
 
     def __enter__(self) -> None:
-        if self._title is None:
-            return
         if self._job.token is not None:
             self._begin()
         elif self._ask is not None:

@@ -46,6 +46,7 @@ class Projects:
         self._client: Mapping[str, Any] = {}
         self._projects: list[Project] = []
         self._last: Project | None = None
+        self._last_path: str | None = None  # of a file that was found in that
 
     # ---- what there is ----
 
@@ -59,13 +60,15 @@ class Projects:
 
     def of(self, path: str) -> Project:
         """The one to be asked about a file."""
+        if self._last is not None and path == self._last_path:
+            return self._last
         best = max(self._projects, key=lambda project: project.holds(path), default=None)
         if best is None or not best.holds(path):
             if self._last is not None and self._last in self._projects:
                 return self._last
             if best is None:
                 best = self._add_project_of(path)
-        self._last = best
+        self._last, self._last_path = best, path
         return best
 
     def _add_project_of(self, path: str) -> Project:
@@ -114,6 +117,7 @@ class Projects:
                 self._is_changed(project.workspace)
             projects.append(project)
         self._projects = projects
+        self._last_path = None
 
     def _make(self, settings: Settings) -> Project | None:
         for attempt in (settings, settings._replace(environment=None, version=None)):

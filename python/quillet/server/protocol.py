@@ -12,7 +12,7 @@ from quillet._workspace import RenameError, Stopped
 from quillet.server import log
 from quillet.server.json_text import encode
 from quillet.server.params import read
-from quillet.server.progress import Progress
+from quillet.server.progress import TAKES_LONG, Progress
 
 TYPE_CHECKING = False
 if TYPE_CHECKING:
@@ -92,7 +92,10 @@ class Protocol:
             self.fail(job.number, INVALID_PARAMS, f"the parameters of {job.method} are not what they have to be")
             return
         try:
-            with Progress(job, self.tell, self._ask_at_once if self.has_progress else None):
+            if job.method in TAKES_LONG:
+                with Progress(job, self.tell, self._ask_at_once if self.has_progress else None):
+                    result = feature(params)
+            else:
                 result = feature(params)
         except Stopped:
             if not job.is_cancelled and not job.is_outdated and job.makes_way:
