@@ -377,9 +377,21 @@ Value Inference::GuessedParameter(FunctionId id, size_t index) {
   }
   const InFrame in_frame(*this, kNoFrame);
   const Value all = Remembered(guesses_, KeyOf(0, id, 0), [&] {
-    ++guess_level_;
-    const Value value = GuessParameters(id);
-    --guess_level_;
+    if (guess_level_ + 1 < kMaxGuesses) {
+      ++guess_level_;
+      const Value value = GuessParameters(id);
+      --guess_level_;
+      return value;
+    }
+    // The last one takes what is sure, and pays for that as guesses do.
+    Value value;
+    bool needs_level = false;
+    {
+      const Afresh afresh(*this, kMaxDepth, true);
+      value = GuessParameters(id);
+      needs_level = needs_level_;
+    }
+    needs_level_ = needs_level;
     return value;
   });
   if (!all.IsKnown()) return kUnknownValue;

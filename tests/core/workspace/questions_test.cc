@@ -1078,6 +1078,22 @@ TEST(Questions, SayThatAnyOfTheirPartsMetABound) {
   EXPECT_FALSE(program->was_bounded());
 }
 
+TEST(Questions, LetTheLastOfGuessesPayForWhatIsSure) {
+  std::string text = "class A:\n  def m(self): pass\n";
+  std::string heavy = "def heavy():\n";
+  for (int i = 0; i < 1200; ++i) {
+    const std::string name = "f" + std::to_string(i);
+    text += "def " + name + "(): return A()\n";
+    heavy += "  if unknown(" + std::to_string(i) + "): return " + name + "()\n";
+  }
+  text += heavy + "def last(x): $x\ndef second(x): last(x)\ndef third(x): second(x)\nthird(heavy())\n$heavy()\n";
+  Program program(text);
+  EXPECT_EQ(program.Types(0), "");
+  EXPECT_TRUE(program->was_bounded());
+  EXPECT_EQ(program.Types(1), "def () -> a.A | None");
+  EXPECT_FALSE(program->was_bounded());
+}
+
 TEST(Questions, SayThatMoreFilesDefineAMemberThanTheyLookAt) {
   testing::TemporaryFolder folder = {{"a.py", "def f(x): x.speed; x.weight\n"}};
   for (int i = 0; i < 401; ++i) {
