@@ -2,6 +2,7 @@
 // put together.
 #include "program/defined_names.h"
 
+#include <algorithm>
 #include <array>
 #include <optional>
 #include <string>
@@ -30,6 +31,11 @@ constexpr size_t kBytesOfAStepOfBinding = 16;
 using Definition = DefinedNames::Definition;
 using PossibleSymbol = DefinedNames::PossibleSymbol;
 
+bool HoldMember(const std::vector<PossibleSymbols::Symbol>& symbols, Text name) {
+  return std::ranges::any_of(
+      symbols, [&](const PossibleSymbols::Symbol& symbol) { return symbol.may_be_member && symbol.name == name; });
+}
+
 // Binds one file after another, and takes what is defined from each.
 class DefinitionsMaker {
  public:
@@ -48,16 +54,20 @@ class DefinitionsMaker {
     texts.Begin(kExpectedTexts);
   }
 
-  // False where the text does not tell. `source` is as it was behind it.
-  bool MakePossible(size_t index, const FileStamp& stamp, Version version, std::string& source) {
+  // False where the text does not tell, or it says that a text that is given may be a member. `source` is as it was
+  // behind it.
+  bool MakePossible(size_t index, const FileStamp& stamp, Version version, std::string& source, Text member) {
+    static constexpr uint32_t kSorts = 4;
     if (!lines_.Read(source, version)) return false;
+    if (HoldMember(lines_.symbols(), member)) return false;
     const size_t begin = possible.size();
-    for (const auto& [name, is_variable] : lines_.symbols()) {
-      const uint32_t number = 2 * texts.NumberOfCopy(name) + (is_variable ? 1 : 0);
-      if (number >= last_file_.size()) last_file_.resize(2 * texts.size(), kNoIndex);
+    for (const auto& [name, is_variable, may_be_member] : lines_.symbols()) {
+      const uint32_t sort = (is_variable ? 1 : 0) + (may_be_member ? 2 : 0);
+      const uint32_t number = kSorts * texts.NumberOfCopy(name) + sort;
+      if (number >= last_file_.size()) last_file_.resize(kSorts * texts.size(), kNoIndex);
       if (last_file_[number] == index) continue;
       last_file_[number] = static_cast<uint32_t>(index);
-      possible.push_back({number / 2, number % 2});
+      possible.push_back({number / kSorts, is_variable, may_be_member});
     }
     made.push_back({index, stamp, begin, possible.size() - begin, true});
     return true;
@@ -72,6 +82,20 @@ class DefinitionsMaker {
     const size_t begin = definitions.size();
     Take(bindings, source);
     made.push_back({index, stamp, begin, definitions.size() - begin});
+  }
+
+  // Whether a name is a member there.
+  static bool HasMember(const Bindings& bindings, Text name) {
+    uint32_t number = 0;
+    while (number < bindings.texts.size() && bindings.texts[number] != name) ++number;
+    if (number == bindings.texts.size()) return false;
+    for (uint32_t i = 0; i < bindings.occurrences.size(); ++i) {
+      const Occurrence& occurrence = bindings.occurrences[i];
+      if (occurrence.text != number) continue;
+      const bool in_class = bindings.scopes[bindings.ScopeOf(occurrence)].kind == NameScopeKind::kClass;
+      if (occurrence.binds() ? in_class && IsDefinition(bindings, occurrence) : IsOfSelf(bindings, i)) return true;
+    }
+    return false;
   }
 
   std::vector<Made> made;
@@ -170,24 +194,6 @@ class DefinitionsMaker {
 
 // ---- whether a text may define a member, without its analysis ----
 
-// Where the line of a place begins, where what stands on it does, and how far that is indented.
-struct Line {
-  size_t begin, first, indent;
-};
-Line LineAround(Text source, size_t at) {
-  static constexpr size_t kTab = 8;
-  size_t begin = at;
-  while (begin > 0 && !IsLineEnd(source[begin - 1])) --begin;
-  size_t first = begin, indent = 0;
-  for (; first < source.size() && IsBlank(source[first]); ++first)
-    indent = source[first] == '\t' ? (indent / kTab + 1) * kTab : indent + 1;
-  return {begin, first, indent};
-}
-
-bool BeginsWithWord(Text text, Text word) {
-  return text.starts_with(word) && (text.size() == word.size() || IsBlank(text[word.size()]));
-}
-
 // Whether what stands behind a name lets it be a target.
 bool MayFollowTarget(Text behind) {
   size_t at = 0;
@@ -219,58 +225,71 @@ bool MayFollowTarget(Text behind) {
   }
 }
 
-size_t CountOf(Text text, Text mark) {
-  size_t count = 0;
-  for (size_t at = 0; (at = text.find(mark, at)) != Text::npos; at += mark.size()) ++count;
-  return count;
+// Whether what stands on a line in front of an attribute's name is what it is an attribute of, and no more than that
+// behind the last mark that a statement may follow.
+bool IsReceiver(Text head) {
+  head.remove_prefix(head.find_last_of(":;") + 1);
+  while (!head.empty() && IsBlank(head.front())) head.remove_prefix(1);
+  return std::ranges::all_of(head, [](char c) { return IsIdentifierByte(c) || c == '.'; });
 }
 
-// Whether a place lies in the body of a function or module rather than of a class, by what the lines in front of it
-// that are less and less indented begin with. Where a string or a bracket may be open in between, that is not known.
-bool IsSurelyLocal(Text source, size_t place, size_t& budget) {
-  Line line = LineAround(source, place);
-  size_t indent = line.indent;
-  if (BeginsWithWord(source.substr(line.first), "class")) return false;
-  bool is_in_function = false;
-  while (!is_in_function && indent > 0 && line.begin > 0) {
-    const size_t behind = line.begin;
-    line = LineAround(source, behind - 1);
-    if (budget < behind - line.begin) return false;
-    budget -= behind - line.begin;
-    const Text text = source.substr(line.first);
-    if (line.indent >= indent || IsLineEnd(text.front()) || text.front() == '#') continue;
-    if (BeginsWithWord(text, "class")) return false;
-    if (!IsIdentifierByte(text.front()) && text.front() != '@') return false;
-    indent = line.indent;
-    is_in_function = BeginsWithWord(text, "def") || BeginsWithWord(text, "async");
-  }
-  const Text between = source.substr(line.begin, place - line.begin);
-  if (budget < between.size()) return false;
-  budget -= between.size();
-  return CountOf(between, "\"\"\"") % 2 == 0 && CountOf(between, "'''") % 2 == 0;
-}
-
-bool MayDefineMember(Text source, Text name) {
-  static constexpr Text kReceiver = "self.";
-  static constexpr size_t kMostLooks = 8;
-  size_t budget = kMostLooks * source.size();  // bytes that are looked at again
-  for (size_t at = 0; (at = FindWord(source, name, at)) != Text::npos; at += name.size()) {
-    const Text behind = source.substr(at + name.size());
-    size_t before = at;
-    while (before > 0 && IsBlank(source[before - 1])) --before;
-    if (before > 0 && source[before - 1] == '.') {
-      const bool is_of_self = before == at ? source.substr(0, at).ends_with(kReceiver) : true;
-      if (is_of_self && MayFollowTarget(behind)) return true;
-      continue;
+// Whether an attribute whose name is there may be given something: by itself, among the targets of an assignment, of a
+// loop or of a `with`. `budget` is how many bytes may still be looked at; behind that it may.
+bool MayBeGiven(Text source, size_t begin, size_t end, size_t& budget) {
+  static constexpr Text kInTargets = " \t\f.,*()[]\\";
+  const Text behind = source.substr(end);
+  if (!MayFollowTarget(behind)) return false;
+  const Text head = source.substr(0, begin).substr(source.substr(0, begin).find_last_of("\n\r") + 1);
+  budget -= std::min(budget, head.size());
+  if (HoldsWord(head, "as")) return true;
+  if (const size_t loop = head.rfind("for"); loop != Text::npos && !HoldsWord(head.substr(loop), "in")) return true;
+  char last = 'a';
+  for (size_t at = 0; at < behind.size(); ++at) {
+    if (budget == 0) return true;
+    --budget;
+    const char c = behind[at];
+    if (IsLineEnd(c)) {
+      const size_t next = behind.find_first_not_of(" \t\f\n\r", at);
+      const bool goes_on = last == ',' || last == '(' || last == '[' || last == '\\';
+      if (next == Text::npos || (!goes_on && behind[next] != ')' && behind[next] != ']')) return false;
+      at = next - 1;
+    } else if (c == '#') {
+      at = std::min(behind.find_first_of("\n\r", at), behind.size()) - 1;
+    } else if (IsIdentifierByte(c) || kInTargets.find(c) != Text::npos) {
+      if (!IsBlank(c)) last = c;
+    } else if (c == ':') {
+      return IsReceiver(head);
+    } else {
+      return behind.substr(at, 3).find('=') != Text::npos && !behind.substr(at).starts_with("==");
     }
-    const Text head = source.substr(0, before);
-    if (head.ends_with("def") || head.ends_with("class")) {
-      if (LineAround(source, at).indent > 0) return true;
-      continue;
-    }
-    if (MayFollowTarget(behind) && !IsSurelyLocal(source, at, budget)) return true;
   }
   return false;
+}
+
+// What the places of a name say, where strings and comments count as code. The receiver ends in a dot.
+enum class MemberUse : uint8_t {
+  kNone,        // no place defines a member
+  kOfBody,      // one may, if it stands in the body of a class
+  kOfReceiver,  // an attribute of the receiver may be given something
+};
+constexpr Text kSelf = "self.", kAnyReceiver = ".";
+MemberUse UseAsMember(Text source, Text name, Text wanted) {
+  static constexpr size_t kMostLooks = 8;
+  size_t budget = kMostLooks * source.size();
+  MemberUse use = MemberUse::kNone;
+  for (size_t at = 0; (at = FindWord(source, name, at)) != Text::npos; at += name.size()) {
+    size_t before = at;
+    while (before > 0 && IsBlank(source[before - 1])) --before;
+    const Text head = source.substr(0, before);
+    const size_t end = at + name.size();
+    if (head.ends_with('.')) {
+      const bool may_be_wanted = before < at || head.ends_with(wanted);
+      if (may_be_wanted && MayBeGiven(source, at, end, budget)) return MemberUse::kOfReceiver;
+    } else if (MayFollowTarget(source.substr(end)) || head.ends_with("def") || head.ends_with("class")) {
+      use = MemberUse::kOfBody;
+    }
+  }
+  return use;
 }
 
 }  // namespace
@@ -294,6 +313,17 @@ class DefinedNames::Impl {
 
   void Read(std::span<const FileId> files, Text member) { Update(files, member, false); }
   void ReadPossible(std::span<const FileId> files) { Update(files, kNoText, true); }
+
+  bool MayDefineMember(FileId file, Text name) const {
+    std::string memory;
+    const Text source = files_.SourceOf(file, memory);
+    const MemberUse use = UseAsMember(source, name, kAnyReceiver);
+    if (use == MemberUse::kOfReceiver || HoldsWord(source, "__slots__")) return true;
+    if (use == MemberUse::kNone) return false;
+    if (source.data() != memory.data()) memory = source;
+    PossibleSymbols lines;
+    return !lines.Read(memory, files_.VersionOf(file)) || HoldMember(lines.symbols(), name);
+  }
 
   bool IsRead(FileId file) const { return file < tables_.size() && tables_[file].round == round_; }
   std::span<const PossibleSymbol> PossibleOf(FileId file) const {
@@ -361,11 +391,27 @@ class DefinedNames::Impl {
         source = held->text();
       } else if (!is_open) {
         files_.ReadSource(file, stamp, maker.memory);
-        if (may_be_possible && maker.MakePossible(i, SettledStamp(stamp), files_.VersionOf(file), maker.memory)) return;
+        if (may_be_possible &&
+            maker.MakePossible(i, SettledStamp(stamp), files_.VersionOf(file), maker.memory, kNoText))
+          return;
         source = maker.memory;
       }
-      found[i] = Found::kNothing;
-      if (!IsNone(member) && table.round == 0 && !MayDefineMember(source, member)) return;
+      if (!IsNone(member) && table.round == 0) {
+        found[i] = Found::kNothing;
+        if (held != nullptr) {
+          if (!DefinitionsMaker::HasMember(held->bindings, member)) return;
+        } else if (!is_open) {
+          const MemberUse use = UseAsMember(source, member, kSelf);
+          if (use == MemberUse::kNone) return;
+          found[i] = Found::kPossible;
+          if (use == MemberUse::kOfBody &&
+              (stamp == table.possible_stamp
+                   ? !IsPossibleMember(table, member)
+                   : maker.MakePossible(i, SettledStamp(stamp), files_.VersionOf(file), maker.memory, member)))
+            return;
+          source = maker.memory;  // which may have moved
+        }
+      }
       found[i] = Found::kDefinitions;
       if (held != nullptr) {  // bound before
         maker.Make(i, SettledStamp(stamp), held->bindings, source);
@@ -379,6 +425,13 @@ class DefinedNames::Impl {
       if (found[i] == Found::kDefinitions) tables_[unsure[i]].round = round_;
       if (found[i] == Found::kPossible) tables_[unsure[i]].possible_round = round_;
     }
+  }
+
+  bool IsPossibleMember(const Table& table, Text name) const {
+    const uint32_t number = texts_.Find(name);
+    return std::ranges::any_of(table.possible, [&](const PossibleSymbol& symbol) {
+      return symbol.name == number && symbol.may_be_member != 0;
+    });
   }
 
   void Add(const std::vector<FileId>& files, const DefinitionsMaker& maker) {
@@ -405,7 +458,7 @@ class DefinedNames::Impl {
     }
   }
 
-  static constexpr uint32_t kMostNames = UINT32_MAX >> 1;
+  static constexpr uint32_t kMostNames = UINT32_MAX >> 2;
 
   const Files& files_;
   std::vector<Table> tables_;  // by the numbers of files
@@ -423,6 +476,7 @@ std::span<const Definition> DefinedNames::Of(FileId file) const { return impl_->
 std::span<const DefinedNames::PossibleSymbol> DefinedNames::PossibleOf(FileId file) const {
   return impl_->PossibleOf(file);
 }
+bool DefinedNames::MayDefineMember(FileId file, Text name) const { return impl_->MayDefineMember(file, name); }
 bool DefinedNames::IsRead(FileId file) const { return impl_->IsRead(file); }
 uint32_t DefinedNames::text_count() const { return impl_->text_count(); }
 Text DefinedNames::TextOf(uint32_t number) const { return impl_->TextOf(number); }

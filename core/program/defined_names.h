@@ -39,21 +39,25 @@ class DefinedNames {
 
   // Reads those of the files that were not read, or have changed.
   void Read(std::span<const FileId> files);
-  // The same, but leaves out files, as long as they were never read, in whose text the name is plainly no attribute
-  // that is defined: local, called, or of something else than `self`. Looking costs a tenth of binding.
+  // The same, but leaves out files, as long as they were never read, in whose text the name is plainly no member that
+  // is defined: local, called, or of something else than `self`. What their lines say is kept.
   void ReadForMember(std::span<const FileId> files, Text name);
+  // Whether the text of a file says that it may define a member, by an attribute of anything as well. One that the body
+  // of a class imports is none.
+  bool MayDefineMember(FileId file, Text name) const;
   // Of a file that was read, in the order of the source; until the next Read.
   std::span<const Definition> Of(FileId file) const;
 
   // A name that may be a symbol of a file.
   struct PossibleSymbol {
-    uint32_t name : 31;
-    uint32_t is_variable : 1;  // otherwise a class or a function
+    uint32_t name : 30;
+    uint32_t is_variable : 1;    // otherwise a class or a function
+    uint32_t may_be_member : 1;  // otherwise surely in the body of no class
   };
   // Finds which symbols files may define that were not read, or have changed, by their text; reads those whose text
   // does not tell.
   void ReadPossible(std::span<const FileId> files);
-  // All symbols of such a file and some more, each once in no order.
+  // All symbols of such a file and some more, in no order; some more than once.
   std::span<const PossibleSymbol> PossibleOf(FileId file) const;
   // Whether Of says what there is.
   bool IsRead(FileId file) const;

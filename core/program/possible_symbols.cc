@@ -204,6 +204,7 @@ class PossibleSymbols::Statement {
       part_ = Part::kHead;
       const char* const behind = all_.ReadNameBehind(end);
       Keep();
+      all_.is_in_block_ = true;
       return behind;
     }
     if (part_ == Part::kFirst) {
@@ -229,7 +230,7 @@ class PossibleSymbols::Statement {
       Drop();
       part_ = Part::kValue;
     } else if (part_ == Part::kTargets) {
-      all_.symbols_.push_back({word, true});
+      all_.symbols_.push_back({word, true, all_.is_in_block_});
     } else if (part_ == Part::kLoop || part_ == Part::kAlias || part_ == Part::kPattern) {
       AddBound(word);
     }
@@ -247,12 +248,12 @@ class PossibleSymbols::Statement {
   }
 
   void AddBound(Text name) {
-    all_.symbols_.push_back({name, true});
+    all_.symbols_.push_back({name, true, all_.is_in_block_});
     Keep();
   }
   // What was added up to here is bound; otherwise the end of the statement takes it away.
   void Keep() { kept_ = all_.symbols_.size(); }
-  void Drop() { all_.symbols_.resize(kept_, {Text(), false}); }
+  void Drop() { all_.symbols_.resize(kept_, {}); }
 
   void Colon() {
     if (part_ != Part::kTargets && part_ != Part::kValue) return Begin();
@@ -298,6 +299,7 @@ const char* PossibleSymbols::ReadLine(const char* at, uint32_t indent) {
     return is_odd ? nullptr : SkipLine(at);
   }
   while (!blocks_.empty() && blocks_.back().indent >= indent) blocks_.pop_back();
+  is_in_block_ = indent > 0;
   const char* word_end = AsciiIdentifierEnd(at);
   const char* definition = at;
   if (Is(at, word_end, "async")) {
@@ -351,7 +353,7 @@ const char* PossibleSymbols::ReadNameBehind(const char* at) {
   at = SkipBlanks(at);
   const char* const end = AsciiIdentifierEnd(at);
   if (IsHigh(*end)) return nullptr;
-  if (end != at) symbols_.push_back({Text(at, static_cast<size_t>(end - at)), false});
+  if (end != at) symbols_.push_back({Text(at, static_cast<size_t>(end - at)), false, is_in_block_});
   return end;
 }
 
@@ -363,7 +365,7 @@ void PossibleSymbols::ReadNamedExpressions() {
     while (end > 0 && (IsBlank(text[end - 1]) || IsLineEnd(text[end - 1]) || text[end - 1] == '\\')) --end;
     size_t begin = end;
     while (begin > 0 && IsAsciiIdentifierByte(text[begin - 1])) --begin;
-    if (begin < end) symbols_.push_back({text.substr(begin, end - begin), true});
+    if (begin < end) symbols_.push_back({text.substr(begin, end - begin), true, true});
   }
 }
 

@@ -14,8 +14,9 @@ namespace quillet {
 class PossibleSymbols {
  public:
   struct Symbol {
-    Text name;         // a view of the source
-    bool is_variable;  // otherwise a class or a function
+    Text name;           // a view of the source
+    bool is_variable;    // otherwise a class or a function
+    bool may_be_member;  // otherwise surely in the body of no class
   };
 
   // False where lines do not tell: in Python 2, behind a string that does not end, and where characters beyond ASCII
@@ -44,6 +45,7 @@ class PossibleSymbols {
   const char* begin_ = nullptr;
   const char* end_ = nullptr;
   std::vector<Block> blocks_;  // around the line, the innermost last
+  bool is_in_block_ = false;   // whether the line is indented, or in the body of a class
   std::vector<Symbol> symbols_;
 };
 

@@ -174,6 +174,7 @@ std::vector<Location> Workspace::Impl::MembersBelow(const SourceFile& file, Expr
     const std::string of_class(inference.InfoOf(t.a).name);
     for (const FileId id : project.WithWords({name, of_class})) {
       if (count == kMaxFiles) break;
+      if (!defined.MayDefineMember(id, name)) continue;
       const SourceFile* source = Get(id);
       if (source == nullptr || NumberOfText(source->bindings, name) == kNoIndex ||
           NumberOfText(source->bindings, of_class) == kNoIndex)

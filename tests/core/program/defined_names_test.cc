@@ -133,10 +133,18 @@ bool IsReadForX(std::string_view text) {
   const TemporaryFolder folder;
   folder.Write("a.py", source);
   Files files(Version::Of(3, 12));
-  DefinedNames names(files);
   const FileId file = files.NumberOf(folder / "a.py");
+  DefinedNames names(files);
   names.ReadForMember({{file}}, "x");
-  return !names.Of(file).empty();
+  const bool is_read = !names.Of(file).empty();
+  // What was kept of other questions changes nothing.
+  DefinedNames others(files);
+  others.ReadForMember({{file}}, "other");
+  others.ReadPossible({{file}});
+  others.ReadForMember({{file}}, "x");
+  EXPECT_EQ(!others.Of(file).empty(), is_read) << text;
+  EXPECT_TRUE(!is_read || names.MayDefineMember(file, "x")) << text;
+  return is_read;
 }
 
 TEST(DefinedNames, AreReadForAMemberWhereItMayBeDefined) {
@@ -160,6 +168,13 @@ TEST(DefinedNames, AreReadForAMemberWhereItMayBeDefined) {
                            "class A:\n  def f(self):\n    self.x += 1",
                            "class A:\n  def f(self):\n    self.x: int",
                            "class A:\n  def f(self):\n    for self.x in y: pass",
+                           "class A:\n  def f(self):\n    with y as self.x, z: pass",
+                           "class A:\n  def f(self):\n    with y as (\n      z,\n      self.x): pass",
+                           "class A:\n  def f(self):\n    if y: self.x: int",
+                           "class A:\n  def f(self):\n    self . x = 1",
+                           "class A:\n  def f(self):\n    self.x, \\\n      y = 1, 2",
+                           "class A:\n  def f(self):\n    [self.x,  # the first\n     y] = 1, 2",
+                           "class A:\n  def f(self, y=(x := 1)): pass",
                            "class A:\n  def f(self):\n    (y,\n     self.x\n    ) = 1, 2"}) {
     EXPECT_TRUE(IsReadForX(text)) << text;
   }
@@ -168,7 +183,11 @@ TEST(DefinedNames, AreReadForAMemberWhereItMayBeDefined) {
 TEST(DefinedNames, AreNotReadForAMemberThatIsPlainlyNone) {
   for (const char* text :
        {"x = 1", "def x(): pass", "def f(x): x = 1", "def f():\n  x = 1", "class A:\n  def f(self):\n    x = 1",
-        "class A:\n  def f(self,\n        x=1): pass", "class A:\n  def f(self):\n    self.x()\n    x.y = self.x.y",
+        "class A:\n  def f(self,\n        x=1): pass", "class A:\n  def f(self, x, *, y=x): pass",
+        "class A:\n  '\"'\n  \"\"\"Of x\n  x = 1\n  \"\"\"\n  # x = 1\n  y = f(x=1)",
+        "class A:\n  def f(self):\n    y = g(self.x)\n    z = 1",
+        "class A:\n  def f(self):\n    return (self.x,\n            y)",
+        "class A:\n  def f(self):\n    self.x()\n    x.y = self.x.y",
         "class A:\n  def f(self):\n    y.x = 1\n    self.x == 1",
         "class A:\n  def f(self):\n    'x'\n    return self.x + 1",
         "def f():\n  \"\"\"Of x.\"\"\"\n  if y:\n    x = 1"}) {

@@ -23,7 +23,8 @@ Names Possible(std::string source, Version version = Version::Of(3, 12)) {
   EXPECT_EQ(source, before);
   if (!is_told) return {"?"};
   Names names;
-  for (const auto& [name, is_variable] : lines.symbols()) names.insert((is_variable ? "" : "+") + std::string(name));
+  for (const PossibleSymbols::Symbol& symbol : lines.symbols())
+    names.insert((symbol.is_variable ? "" : "+") + std::string(symbol.name));
   return names;
 }
 
@@ -94,6 +95,30 @@ TEST(PossibleSymbols, HoldLittleElse) {
             (Names{"+f", "m"}));
   EXPECT_EQ(Possible("__all__ = ['a', 'b']\nd = {e: f, 'g': h}\ni: J = k\nassert l == m, n\ndel o\n"),
             (Names{"__all__", "d", "i"}));
+}
+
+TEST(PossibleSymbols, SayWhatMayBeAMember) {
+  const auto members = [](std::string source) {
+    PossibleSymbols lines;
+    EXPECT_TRUE(lines.Read(source, Version::Of(3, 12)));
+    Names names;
+    for (const PossibleSymbols::Symbol& symbol : lines.symbols())
+      if (symbol.may_be_member) names.insert(std::string(symbol.name));
+    return names;
+  };
+  EXPECT_EQ(members("x = 1\ndef f(): pass\nclass A: y = 1; z = 2\nu: int\n"), (Names{"y", "z"}));
+  EXPECT_EQ(members("class A:\n  x = 1\n  def f(self, y):\n    z = 1\n  class B: u, v = 1, 2\nw = 1\n"),
+            (Names{"x", "f", "B", "u", "v"}));
+  NameBinder binder(Version::Of(3, 12));
+  const Bindings& bindings = binder.Bind(kSource);
+  const Names all = members(kSource);
+  size_t count = 0;
+  for (const Occurrence& occurrence : bindings.occurrences) {
+    if (!occurrence.binds() || bindings.scopes[bindings.ScopeOf(occurrence)].kind != NameScopeKind::kClass) continue;
+    EXPECT_TRUE(all.contains(std::string(bindings.TextOf(occurrence)))) << bindings.TextOf(occurrence);
+    ++count;
+  }
+  EXPECT_GT(count, 8u);
 }
 
 TEST(PossibleSymbols, AreNotToldWhereTextIsOdd) {
