@@ -44,6 +44,7 @@ int DigestAll(const std::vector<std::filesystem::path>& files) {
     const std::string bytes = BytesOf(path);
     sources.Add(bytes, 2);
     sources.AddRows({bytes});
+    sources.AddProject(bytes);
     for (const std::string& text : {bytes, Spoilt(bytes, 1)}) {
       answers.Open("a.py", text);
       answers.AddFile("a.py", 30);
