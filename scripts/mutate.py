@@ -271,7 +271,7 @@ class Workshop:
         self.tree = folder / "tree"
         self.build = folder / "core"
         self.extension = folder / "extension"
-        self.tests = [test for test in TESTS if test[0] in folders]
+        self.tests = [test for test in TESTS if test[0] in folders or test[1] == DIGESTS]
         self.jobs = jobs
         self.python = python
         self.times: dict[str, float] = {}
