@@ -46,6 +46,8 @@ TEST(CompleteErrors, AreWhereAndWhatTheyAre) {
       {"d = {1, 2: 3}\n", "1:10 invalid syntax"},
       {"x =\n", "1:4 invalid syntax"},
       {"f(**k, *a)\n", "1:8 iterable argument unpacking follows keyword argument unpacking"},
+      {"f(*a=1)\n", "1:3 cannot assign to iterable argument unpacking"},
+      {"f(**a=1)\n", "1:3 cannot assign to keyword argument unpacking"},
       {"f(a=1, 2)\n", "1:9 positional argument follows keyword argument"},
       {"f(a=1, a=2)\n", "1:8 keyword argument repeated: a"},
       {"f(1=2)\n", "1:3 expression cannot contain assignment, perhaps you meant \"==\"?"},

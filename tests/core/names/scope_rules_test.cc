@@ -89,6 +89,7 @@ TEST(ScopeRules, OfPython3) {
       {"async def f():\n  return 2\n  if a:\n    yield\n", "2:3 'return' with value in async generator"},
       {"async def f():\n  return\n  yield\n", ""},
       {"async def f():\n  return 1\n  lambda: (yield)\n", ""},
+      {"async def f():\n  for a in (yield): b\n  return 1\n", "3:3 'return' with value in async generator"},
   };
   for (const Case& one : cases) EXPECT_EQ(testing::ErrorsOf(files, one.source), one.errors) << one.source;
 }
