@@ -172,7 +172,7 @@ struct MadeFamily {
 inline const std::vector<MadeFamily>& MadeFamilies() {
   static const std::vector<MadeFamily> families = {
       {"expressions", 20, 6}, {"statements", 20, 12}, {"older_27", 20, 6},    {"hints", 20, 10},
-      {"patterns", 20, 10},   {"lines", 20, 6},       {"strings", 20, 6},     {"errors", 30, 6},
+      {"patterns", 20, 10},   {"lines", 20, 6},       {"strings", 20, 6},     {"errors", 45, 4},
       {"scopes", 20, 10},     {"types", 24, 25},      {"classes", 30, 25},    {"generics", 24, 25},
       {"flow", 24, 25},       {"calls", 24, 20},      {"docstrings", 20, 15}, {"modules", 7, 20},
       {"ignore", 20, 1},      {"shapes_3", 3, 1},     {"fragments", 60, 2},   {"limits", 0, 2, true}};
