@@ -66,11 +66,13 @@ class ShardWriterObject {
 
   nb::object TakeRows() {
     const InUse in_use(*this);
-    return BytesOf(writer_->TakeRows());
+    writer_->TakeRows(taken_rows_);
+    return BytesOf(taken_rows_);
   }
   nb::object TakeFiles() {
     const InUse in_use(*this);
-    return BytesOf(writer_->TakeFiles());
+    writer_->TakeFiles(taken_files_);
+    return BytesOf(taken_files_);
   }
 
   nb::tuple Totals() const {
@@ -124,6 +126,7 @@ class ShardWriterObject {
   const nb::object compress_;
   bool is_in_use_ = false;  // changes with the interpreter lock held
   std::unique_ptr<ShardWriter> writer_;
+  std::string taken_rows_, taken_files_;
 };
 
 }  // namespace

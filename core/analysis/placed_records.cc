@@ -33,8 +33,7 @@ void PlacedRecords::Begin(const FileAnalyzer& file, const ScopeNames& scopes) {
   texts_.Reset();
 }
 
-std::span<const PlacedRecord> PlacedRecords::OfRow(size_t row) {
-  placed_.clear();
+void PlacedRecords::AddRow(size_t row) {
   spelled_at_ = 0;
   const FileAnalyzer::LineResult& result = file_->results()[row];
   const RecordStore& store = file_->store();
@@ -42,7 +41,6 @@ std::span<const PlacedRecord> PlacedRecords::OfRow(size_t row) {
   in_signature_ = result.first_in_def && file_->rows()[row].kind == LineKind::kComment && FindSignature(row);
   for (uint32_t i = result.record_begin; i < result.record_end; ++i) Add(row, store.rows[i], false);
   for (uint32_t i = result.arg_record_begin; i < result.arg_record_end; ++i) Add(row, store.arg_rows[i], true);
-  return placed_;
 }
 
 void PlacedRecords::Add(size_t row, const Record& record, bool is_parameter) {

@@ -45,7 +45,16 @@ class PlacedRecords {
 
   // The records of a row, in the order in which they were found, parameters last. They stand until the
   // next call; texts until Begin.
-  std::span<const PlacedRecord> OfRow(size_t row);
+  std::span<const PlacedRecord> OfRow(size_t row) {
+    Clear();
+    AddRow(row);
+    return records();
+  }
+  // The same for several rows, one behind the other.
+  void Clear() { placed_.clear(); }
+  void DropFirst(size_t count) { placed_.erase(placed_.begin(), placed_.begin() + static_cast<ptrdiff_t>(count)); }
+  void AddRow(size_t row);
+  std::span<const PlacedRecord> records() const { return placed_; }
 
  private:
   void Add(size_t row, const Record& record, bool is_parameter);

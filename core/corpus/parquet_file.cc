@@ -208,24 +208,21 @@ ParquetFile::Chunk ParquetFile::WriteColumn(size_t size, const Column& type, con
   Chunk chunk{written_, 0, size, null_count, 0, 0, {}};
   const PhysicalType physical = PhysicalTypeOf(type);
   std::span<const uint32_t> places = column.places;
-  size_t dictionary_size = column.dictionary.size();
-  page_.clear();
+  Text dictionary = column.dictionary;
+  size_t dictionary_size = column.dictionary_size;
   if (physical == kByteArray) {
-    for (const Text text : column.dictionary) {
-      const auto length = static_cast<uint32_t>(text.size());
-      page_.append(reinterpret_cast<const char*>(&length), 4);
-      page_ += text;
-    }
     if (column.bounds && std::max(column.bounds->least.size(), column.bounds->greatest.size()) <= kLongestBound)
       chunk.bounds.emplace(column.bounds->least, column.bounds->greatest);
   } else if (physical == kInt32 && FindNumbers(column.numbers)) {
+    page_.clear();
     AppendPlain(std::span<const int32_t>(found_numbers_), page_);
+    dictionary = page_;
     places = number_places_;
     dictionary_size = found_numbers_.size();
   }
   const bool has_dictionary = physical == kByteArray || !places.empty();
   if (has_dictionary) {
-    WritePage(true, dictionary_size, false, chunk);
+    WritePage(dictionary, true, dictionary_size, false, chunk);
     chunk.dictionary_size = chunk.size;
   }
   page_.clear();
@@ -241,7 +238,7 @@ ParquetFile::Chunk ParquetFile::WriteColumn(size_t size, const Column& type, con
   } else {
     page_.append(static_cast<const char*>(column.bits->data()), (size + 7) / 8);
   }
-  WritePage(false, size, has_dictionary, chunk);
+  WritePage(page_, false, size, has_dictionary, chunk);
   return chunk;
 }
 
@@ -249,33 +246,34 @@ ParquetFile::Chunk ParquetFile::WriteColumn(size_t size, const Column& type, con
 bool ParquetFile::FindNumbers(std::span<const int32_t> numbers) {
   constexpr uint32_t kNoPlace = UINT32_MAX;
   constexpr uint32_t kMost = 1 << 16;
-  found_numbers_.clear();
-  number_places_.clear();
   if (place_of_number_.empty()) place_of_number_.assign(kMost, kNoPlace);
-  for (const int32_t number : numbers) {
-    const auto small = static_cast<uint32_t>(number);
+  number_places_.resize(numbers.size());
+  found_numbers_.clear();
+  const size_t most = numbers.size() / 4;
+  size_t count = 0;
+  for (; count < numbers.size(); ++count) {
+    const auto small = static_cast<uint32_t>(numbers[count]);
     if (small >= kMost) break;
     uint32_t& place = place_of_number_[small];
     if (place == kNoPlace) {
+      if (found_numbers_.size() == most) break;
       place = static_cast<uint32_t>(found_numbers_.size());
-      found_numbers_.push_back(number);
+      found_numbers_.push_back(numbers[count]);
     }
-    number_places_.push_back(place);
+    number_places_[count] = place;
   }
   for (const int32_t number : found_numbers_) place_of_number_[static_cast<uint32_t>(number)] = kNoPlace;
-  if (number_places_.size() == numbers.size() && found_numbers_.size() * 4 <= numbers.size()) return true;
-  number_places_.clear();
-  return false;
+  return count == numbers.size();
 }
 
-void ParquetFile::WritePage(bool is_dictionary, size_t value_count, bool has_places, Chunk& chunk) {
+void ParquetFile::WritePage(Text page, bool is_dictionary, size_t value_count, bool has_places, Chunk& chunk) {
   compressed_.clear();
-  compress_(page_, compressed_);
+  compress_(page, compressed_);
   const size_t begin = bytes_.size();
   ThriftText header(bytes_);
   header.Open();
   header.Number(1, ThriftText::kWord, is_dictionary ? 2 : 0);
-  header.Number(2, ThriftText::kWord, static_cast<int64_t>(page_.size()));
+  header.Number(2, ThriftText::kWord, static_cast<int64_t>(page.size()));
   header.Number(3, ThriftText::kWord, static_cast<int64_t>(compressed_.size()));
   header.Open(is_dictionary ? 7 : 5);
   header.Number(1, ThriftText::kWord, static_cast<int64_t>(value_count));
@@ -286,7 +284,7 @@ void ParquetFile::WritePage(bool is_dictionary, size_t value_count, bool has_pla
   }
   header.Close();
   header.Close();
-  chunk.plain_size += bytes_.size() - begin + page_.size();
+  chunk.plain_size += bytes_.size() - begin + page.size();
   bytes_ += compressed_;
   chunk.size += bytes_.size() - begin;
   written_ += bytes_.size() - begin;

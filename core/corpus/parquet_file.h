@@ -14,6 +14,7 @@
 #include <optional>
 #include <span>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "foundations/text.h"
@@ -24,7 +25,8 @@ namespace quillet {
 // A column of a row group. What belongs to its type is set, and stands while it is written.
 struct ParquetColumn {
   std::span<const uint32_t> places;  // of texts: in the dictionary
-  std::span<const Text> dictionary;
+  Text dictionary;                   // one text behind the other, each behind its length in four bytes
+  size_t dictionary_size = 0;        // in texts
   std::span<const int32_t> numbers;
   std::span<const int64_t> long_numbers;
   const Bits* bits = nullptr;
@@ -54,8 +56,11 @@ class ParquetFile {
   void Finish(Text key, Text value);
 
   size_t row_count() const { return row_count_; }
-  // The bytes since the last call.
-  std::string TakeBytes() { return std::exchange(bytes_, {}); }
+  // Exchanges the bytes since the last call for what is in `taken`, whose memory is used for those that follow.
+  void TakeBytes(std::string& taken) {
+    taken.clear();
+    taken.swap(bytes_);
+  }
 
  private:
   struct Chunk {
@@ -71,8 +76,8 @@ class ParquetFile {
 
   bool FindNumbers(std::span<const int32_t> numbers);
   Chunk WriteColumn(size_t size, const Column& type, const ParquetColumn& column);
-  // The bytes in `page_` as a page with this header behind its sizes; sets the chunk's sizes.
-  void WritePage(bool is_dictionary, size_t value_count, bool has_places, Chunk& chunk);
+  // The bytes as a page with this header behind its sizes; sets the chunk's sizes.
+  void WritePage(Text page, bool is_dictionary, size_t value_count, bool has_places, Chunk& chunk);
   std::string Footer(Text key, Text value) const;
 
   const std::vector<Column> columns_;

@@ -19,7 +19,12 @@ void TextColumn::Repeat(Text text, size_t count) {
 }
 
 void TextColumn::Truncate(size_t size) {
-  if (texts_ != nullptr) return numbers_.resize(size);
+  if (texts_ != nullptr) {
+    numbers_.resize(size);
+    if (size != 0) return;
+    word_numbers_.clear();
+    return texts_->Clear();
+  }
   offsets_.resize(size + 1);
   bytes_.resize(static_cast<size_t>(offsets_.back()));
 }
@@ -119,7 +124,7 @@ ColumnBuffers CarriedColumn::Buffers() const {
 
 RowTable::RowTable(std::vector<CarriedColumn> carried, TextForm text_form, size_t most_rows)
     : text_form_(text_form), most_rows_(most_rows), carried_(std::move(carried)) {
-  for (CarriedColumn& column : carried_) column.SetTextForm(text_form, most_rows);
+  for (CarriedColumn& column : carried_) column.SetTextForm(text_form, room());
 }
 
 void RowTable::Carry(const InputRow& input) {
@@ -174,9 +179,9 @@ class RareTexts {
     texts_.Add(text);
     are_there_.Add(true);
   }
-  void AddNone() {
-    texts_.AddNone();
-    are_there_.Add(false);
+  void AddNone(size_t count = 1) {
+    texts_.AddNone(count);
+    are_there_.Add(false, count);
   }
   void Truncate(size_t size) {
     texts_.Truncate(size);
@@ -196,27 +201,31 @@ class RecordRows : public RowTable {
  public:
   RecordRows(std::vector<CarriedColumn> carried, TextForm text_form, size_t most_rows)
       : RowTable(std::move(carried), text_form, most_rows) {
-    lines_.reserve(most_rows);
-    columns_.reserve(most_rows);
+    lines_.reserve(room());
+    columns_.reserve(room());
   }
 
   size_t size() const override { return lines_.size(); }
 
   void AddRecords(std::span<const PlacedRecord> records, std::span<const Text> scopes) override {
-    if (names_.has_numbers()) Fetch(records);
-    for (const PlacedRecord& record : records) {
-      AddPlace(record.line, record.column);
-      AddScope(record.scope, scopes[record.scope]);
-      names_.Add(record.name);
-      kinds_.AddWord(static_cast<size_t>(record.kind), RecordKindWords());
-      details_.Add(record.detail);
-      are_parameters_.Add(record.is_parameter);
-      errors_.AddNone();
+    if (names_.has_numbers())
+      AddNumbers(records, scopes);
+    else
+      AddTexts(records, scopes);
+    const size_t count = records.size();
+    int32_t* const lines = AddTo(lines_, count);
+    int32_t* const columns = AddTo(columns_, count);
+    for (size_t i = 0; i < count; ++i) {
+      lines[i] = static_cast<int32_t>(records[i].line);
+      columns[i] = static_cast<int32_t>(records[i].column);
     }
+    are_parameters_.AddEach(count, [records](size_t i) { return records[i].is_parameter; });
+    errors_.AddNone(count);
   }
 
   void AddMessage(Text kind, const BatchResult::Message& message) override {
-    AddPlace(message.line, message.column);
+    lines_.push_back(static_cast<int32_t>(message.line));
+    columns_.push_back(static_cast<int32_t>(message.column));
     scopes_.Add({});
     names_.Add({});
     kinds_.Add(kind);
@@ -249,37 +258,62 @@ class RecordRows : public RowTable {
   void ForgetSource() override { scope_numbers_.clear(); }
 
  private:
-  // The tables of a run's texts are larger than caches are.
-  void Fetch(std::span<const PlacedRecord> records) const {
+  void AddTexts(std::span<const PlacedRecord> records, std::span<const Text> scopes) {
     for (const PlacedRecord& record : records) {
-      names_.FetchSlot(record.name);
-      details_.FetchSlot(record.detail);
-    }
-    for (const PlacedRecord& record : records) {
-      names_.FetchEntry(record.name);
-      details_.FetchEntry(record.detail);
+      scopes_.Add(scopes[record.scope]);
+      names_.Add(record.name);
+      kinds_.Add(RecordKindWords()[static_cast<size_t>(record.kind)]);
+      details_.Add(record.detail);
     }
   }
-  void AddScope(uint32_t index, Text scope) {
-    if (!scopes_.has_numbers()) return scopes_.Add(scope);
-    if (index >= scope_numbers_.size()) scope_numbers_.resize(index + 1, kNoIndex);
-    if (scope_numbers_[index] == kNoIndex) scope_numbers_[index] = scopes_.NumberOf(scope);
-    scopes_.AddNumber(scope_numbers_[index]);
+  // The tables of a run's texts are larger than caches are: what is asked of them is fetched for all records first.
+  void AddNumbers(std::span<const PlacedRecord> records, std::span<const Text> scopes) {
+    ColumnTexts& names = names_.texts();
+    ColumnTexts& details = details_.texts();
+    asked_.clear();
+    for (const PlacedRecord& record : records) {
+      const auto& [name, detail] =
+          asked_.emplace_back(ColumnTexts::Asked(record.name), ColumnTexts::Asked(record.detail));
+      names.FetchSlot(name);
+      details.FetchSlot(detail);
+    }
+    for (const auto& [name, detail] : asked_) {
+      names.FetchText(name);
+      details.FetchText(detail);
+    }
+    const size_t count = records.size();
+    uint32_t* const numbers_of_names = names_.AddNumbers(count);
+    uint32_t* const numbers_of_details = details_.AddNumbers(count);
+    for (size_t i = 0; i < count; ++i) {
+      numbers_of_names[i] = names.NumberOf(asked_[i].first);
+      numbers_of_details[i] = details.NumberOf(asked_[i].second);
+    }
+    uint32_t* const numbers_of_scopes = scopes_.AddNumbers(count);
+    uint32_t* const numbers_of_kinds = kinds_.AddNumbers(count);
+    const std::span<const uint32_t> kinds = kinds_.NumbersOf(RecordKindWords());
+    for (size_t i = 0; i < count; ++i) {
+      numbers_of_scopes[i] = NumberOfScope(records[i].scope, scopes);
+      numbers_of_kinds[i] = kinds[static_cast<size_t>(records[i].kind)];
+    }
   }
-  void AddPlace(uint32_t line, uint32_t column) {
-    lines_.push_back(static_cast<int32_t>(line));
-    columns_.push_back(static_cast<int32_t>(column));
+  uint32_t NumberOfScope(uint32_t index, std::span<const Text> scopes) {
+    if (index >= scope_numbers_.size()) scope_numbers_.resize(scopes.size(), kNoIndex);
+    uint32_t& number = scope_numbers_[index];
+    if (number == kNoIndex) number = scopes_.texts().NumberOf(scopes[index]);
+    return number;
   }
 
   std::vector<int32_t> lines_;
   std::vector<int32_t> columns_;
-  TextColumn scopes_{text_form(), most_rows()};
+  TextColumn scopes_{text_form(), room()};
   std::vector<uint32_t> scope_numbers_;  // of a source's scopes
-  TextColumn names_{text_form(), most_rows()};
-  TextColumn kinds_{text_form(), most_rows()};
-  TextColumn details_{text_form(), most_rows()};
+  TextColumn names_{text_form(), room()};
+  TextColumn kinds_{text_form(), room()};
+  TextColumn details_{text_form(), room()};
   Bits are_parameters_;
-  RareTexts errors_{text_form(), most_rows()};
+  RareTexts errors_{text_form(), room()};
+  // Names and details of the records that are being added.
+  std::vector<std::pair<ColumnTexts::Asked, ColumnTexts::Asked>> asked_;
 };
 
 // ---- occurrences ----
@@ -394,19 +428,19 @@ class OccurrenceRows : public RowTable {
   std::vector<int32_t> lines_;
   std::vector<int32_t> columns_;
   std::vector<int32_t> end_columns_;
-  TextColumn texts_{text_form(), most_rows()};
-  TextColumn roles_{text_form(), most_rows()};
-  RareTexts kinds_{text_form(), most_rows()};
+  TextColumn texts_{text_form(), room()};
+  TextColumn roles_{text_form(), room()};
+  RareTexts kinds_{text_form(), room()};
   std::vector<Bits> flags_ = std::vector<Bits>(NameFlagWords().size());
   std::vector<int32_t> receivers_;
   Bits have_receivers_;
   Bits are_attributes_;
   std::vector<int32_t> scopes_;
-  TextColumn scope_names_{text_form(), most_rows()};
+  TextColumn scope_names_{text_form(), room()};
   std::vector<int32_t> symbols_;
   Bits have_symbols_;
-  TextColumn symbol_names_{text_form(), most_rows()};
-  RareTexts errors_{text_form(), most_rows()};
+  TextColumn symbol_names_{text_form(), room()};
+  RareTexts errors_{text_form(), room()};
   std::string shown_;
 };
 
@@ -447,12 +481,12 @@ class FileRows : public RowTable {
   }
 
  private:
-  TextColumn pythons_{text_form(), most_rows()};
+  TextColumn pythons_{text_form(), room()};
   std::vector<int64_t> bytes_;
   std::vector<int64_t> lines_;
   std::vector<int64_t> statements_;
   std::vector<int64_t> errors_;
-  RareTexts problems_{text_form(), most_rows()};
+  RareTexts problems_{text_form(), room()};
 };
 
 }  // namespace

@@ -6,7 +6,7 @@
 // another reason) or "problem" (the file could not be read at all) where a record has its kind, the message in
 // `error`, the place, and nothing in the other columns.
 //
-// In a table that is to be sorted, texts are dictionaries: copied once each, and compared once each.
+// In a table that is to be sorted, texts are numbered: copied once each, and compared once each.
 #pragma once
 
 #include <cstddef>
@@ -17,49 +17,23 @@
 #include <vector>
 
 #include "analysis/file_worker.h"
+#include "corpus/column_texts.h"
 #include "corpus/input_batch.h"
 #include "names/bindings.h"
-#include "names/text_table.h"
 #include "output/arrow_export.h"
 
 namespace quillet {
 
-// The texts of a column, each once.
-class ColumnTexts {
- public:
-  // For so many rows.
-  explicit ColumnTexts(size_t rows) { table_.Begin(rows / kRowsOfAText); }
-
-  uint32_t NumberOf(Text text) {
-    // Many rows have what the one before them has.
-    if (last_ < table_.size() && table_.TextOf(last_) == text) return last_;
-    const size_t count = table_.size();
-    last_ = table_.NumberOfCopy(text);
-    if (table_.size() != count) byte_size_ += text.size();
-    return last_;
-  }
-  // For texts whose numbers are asked for soon; see TextTable.
-  void FetchSlot(Text text) const { table_.FetchSlot(text); }
-  void FetchEntry(Text text) const { table_.FetchEntry(text); }
-  size_t byte_size() const { return byte_size_; }
-  // All of them, in the order of their numbers. They stand until one is added.
-  ColumnBuffers::Texts Listed() {
-    table_.CopyTo(list_);
-    return ColumnBuffers::DictionaryOf(list_);
-  }
-
- private:
-  static constexpr size_t kRowsOfAText = 16;  // more or less
-
-  TextTable table_;
-  TextList list_;
-  uint32_t last_ = 0;
-  size_t byte_size_ = 0;
-};
-
 enum class TextForm : uint8_t { kPlain, kNumbered };
 
-// Texts with 32-bit offsets, or a dictionary of them and their numbers; rows that may be missing. A copy of one with
+// More values at the end of a column, which are to be set.
+template <class Number>
+Number* AddTo(std::vector<Number>& numbers, size_t count) {
+  numbers.resize(numbers.size() + count);
+  return numbers.data() + numbers.size() - count;
+}
+
+// Texts with 32-bit offsets, or a ColumnTexts and their numbers in it; rows that may be missing. A copy of one with
 // numbers shares them.
 class TextColumn {
  public:
@@ -68,7 +42,7 @@ class TextColumn {
     if (form == TextForm::kPlain) {
       offsets_.push_back(0);
     } else {
-      texts_ = std::make_shared<ColumnTexts>(rows);
+      texts_ = std::make_shared<ColumnTexts>();
       numbers_.reserve(rows);
     }
   }
@@ -82,29 +56,29 @@ class TextColumn {
       offsets_.push_back(static_cast<int32_t>(bytes_.size()));
     }
   }
-  // Of a text that is asked for often: its number, and a row of it.
+  // The texts of one with numbers, and rows of what was looked up in them.
   bool has_numbers() const { return texts_ != nullptr; }
-  uint32_t NumberOf(Text text) { return texts_->NumberOf(text); }
+  ColumnTexts& texts() { return *texts_; }
   void AddNumber(uint32_t number) { numbers_.push_back(number); }
-  void FetchSlot(Text text) const { texts_->FetchSlot(text); }
-  void FetchEntry(Text text) const { texts_->FetchEntry(text); }
-  // A text of a few that are known before, by its number among them.
-  void AddWord(size_t word, std::span<const Text> words) {
-    if (texts_ == nullptr) return Add(words[word]);
+  // The numbers of more rows, which are to be set.
+  uint32_t* AddNumbers(size_t count) { return AddTo(numbers_, count); }
+  // Of texts that are known before: the numbers of them all.
+  std::span<const uint32_t> NumbersOf(std::span<const Text> words) {
     while (word_numbers_.size() < words.size()) word_numbers_.push_back(texts_->NumberOf(words[word_numbers_.size()]));
-    numbers_.push_back(word_numbers_[word]);
+    return word_numbers_;
   }
-  // In a row that has none.
-  void AddNone() {
-    if (texts_ == nullptr)
-      Add({});
+  // In rows that have none.
+  void AddNone(size_t count = 1) {
+    if (texts_ != nullptr)
+      numbers_.resize(numbers_.size() + count);
     else
-      numbers_.push_back(0);
+      offsets_.resize(offsets_.size() + count, offsets_.back());
   }
   void Repeat(Text text, size_t count);
   void Truncate(size_t size);
+  // The values are offsets and bytes, or numbers and the ColumnTexts.
   ColumnBuffers Buffers(const Bits* validity = nullptr) const {
-    if (texts_ != nullptr) return {{numbers_.data()}, texts_->Listed(), validity};
+    if (texts_ != nullptr) return {{numbers_.data(), texts_.get()}, {}, validity};
     return {{offsets_.data(), bytes_.data()}, {}, validity};
   }
 
@@ -158,6 +132,8 @@ class RowTable : public ColumnTable {
   // Rows, and bytes of text, that make a batch worth while.
   static constexpr size_t kMostRows = size_t{1} << 16;
   static constexpr size_t kMostBytes = size_t{16} << 20;
+  // Records that are added between two looks at whether a table is full, and whose texts are looked up together.
+  static constexpr size_t kRowsAtOnce = 16;
 
   RowTable(std::vector<CarriedColumn> carried, TextForm text_form, size_t most_rows);
 
@@ -172,7 +148,8 @@ class RowTable : public ColumnTable {
   virtual void AddFile(const BatchResult&, Text /*python*/) {}
   // Completes the rows that were added with what is carried from the input.
   void Carry(const InputRow& input);
-  // Takes all rows behind the first ones away, whether they were completed or not.
+  // Takes all rows behind the first ones away, whether they were completed or not. A table without rows is as good as
+  // a new one, and has its memory already.
   void Truncate(size_t size);
 
   size_t byte_size() const;
@@ -188,7 +165,7 @@ class RowTable : public ColumnTable {
 
   // With what a table's own columns are made.
   TextForm text_form() const { return text_form_; }
-  size_t most_rows() const { return most_rows_; }
+  size_t room() const { return most_rows_ + kRowsAtOnce; }
 
  private:
   TextForm text_form_;

@@ -4,8 +4,6 @@
 #include <algorithm>
 #include <utility>
 
-#include "corpus/sorted_run.h"
-
 namespace quillet {
 
 namespace {
@@ -45,6 +43,13 @@ class ShardWriter::Sources : public ColumnTable {
 
   bool is_text() const { return is_text_; }
   bool IsFull() const { return size_ >= kBatchRows || contents_.byte_size() >= kBatchBytes; }
+  bool IsUncommon() const { return contents_.byte_size() >= 4 * kBatchBytes; }
+  void Clear() {
+    size_ = 0;
+    for (TextColumn* texts : {&packages_, &archives_, &paths_, &contents_, &problems_}) texts->Truncate(0);
+    have_content_.Truncate(0);
+    have_problem_.Truncate(0);
+  }
 
   void Add(const Source& source) {
     packages_.Add(source.package);
@@ -105,6 +110,10 @@ ShardWriter::~ShardWriter() = default;
 
 bool ShardWriter::Add(const Source& source) {
   if (sources_ != nullptr && sources_->is_text() != source.is_text && source.content) Work();
+  if (sources_ == nullptr && spare_ != nullptr && spare_.use_count() == 1 && spare_->is_text() == source.is_text) {
+    sources_ = std::exchange(spare_, nullptr);
+    sources_->Clear();
+  }
   if (sources_ == nullptr) sources_ = std::make_shared<Sources>(source.is_text);
   sources_->Add(source);
   return sources_->IsFull();
@@ -116,7 +125,8 @@ void ShardWriter::Work() {
   ArrowArray array;
   FillTableSchema(sources_->Schema(), &schema);
   FillTableArray(sources_, &array);
-  sources_.reset();
+  spare_ = std::exchange(sources_, nullptr);
+  if (spare_->IsUncommon()) spare_.reset();
   rows_->Begin(std::make_unique<InputBatch>(schema, array));
   bool has_written = false;
   while (const std::shared_ptr<const RowTable> table = rows_->Next()) {
@@ -133,7 +143,7 @@ void ShardWriter::WorkToTheEnd() {
 }
 
 void ShardWriter::Write(const RowTable* table, ParquetFile& file, size_t key) {
-  if (table != nullptr && table->size() != 0) SortedRun(*table, key).WriteTo(file, options_.group_rows);
+  if (table != nullptr && table->size() != 0) sorted_.Write(*table, key, options_.group_rows, file);
 }
 
 void ShardWriter::Finish(Text key, Text value) {

@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "corpus/parquet_file.h"
+#include "corpus/sorted_run.h"
 #include "corpus/source_rows.h"
 
 namespace quillet {
@@ -62,9 +63,9 @@ class ShardWriter {
   // Then: the end of the files; with the rows a text.
   void Finish(Text key, Text value);
 
-  // The bytes since the last call.
-  std::string TakeRows() { return rows_file_->TakeBytes(); }
-  std::string TakeFiles() { return files_file_->TakeBytes(); }
+  // The bytes since the last call, as ParquetFile gives them.
+  void TakeRows(std::string& taken) { rows_file_->TakeBytes(taken); }
+  void TakeFiles(std::string& taken) { files_file_->TakeBytes(taken); }
   Totals totals() const;
 
  private:
@@ -74,11 +75,13 @@ class ShardWriter {
 
   const Options options_;
   std::shared_ptr<Sources> sources_;
+  std::shared_ptr<Sources> spare_;  // those before, whose memory is used again
   std::unique_ptr<SourceRows> rows_;
   std::unique_ptr<ParquetFile> rows_file_;
   std::unique_ptr<ParquetFile> files_file_;
   size_t rows_key_;
   size_t files_key_;
+  SortedRun sorted_;
 };
 
 }  // namespace quillet

@@ -1,6 +1,7 @@
 #include "corpus/sorted_run.h"
 
 #include <algorithm>
+#include <bit>
 #include <cstring>
 #include <utility>
 
@@ -8,45 +9,23 @@ namespace quillet {
 
 namespace {
 
-// A text and its first bytes as a number, which nearly always decides.
-struct RankedText {
-  uint64_t head;
-  Text text;
-  size_t number;  // so wide that nothing of it is left out when it is moved
-
-  RankedText(Text of, size_t its_number) : head(0), text(of), number(its_number) {
-    for (size_t i = 0; i < 8; ++i) head = head << 8 | (i < of.size() ? static_cast<unsigned char>(of[i]) : 0u);
-  }
-  friend bool operator<(const RankedText& a, const RankedText& b) {
-    return a.head != b.head ? a.head < b.head : a.text < b.text;
-  }
-};
-
-Text TextOf(const ColumnBuffers::Texts& texts, uint32_t number) {
-  const auto* const offsets = static_cast<const int64_t*>(texts.offsets) + number;
-  return {static_cast<const char*>(texts.bytes) + offsets[0], static_cast<size_t>(offsets[1] - offsets[0])};
-}
-
-Bits TakeBits(const void* bits, const uint32_t* order, size_t size) {
+void TakeBits(const void* bits, std::span<const uint32_t> order, Bits& taken) {
   const auto* const bytes = static_cast<const uint8_t*>(bits);
-  Bits taken;
-  taken.Assign(size, [bytes, order](size_t i) { return (bytes[order[i] / 8] >> order[i] % 8 & 1) != 0; });
-  return taken;
+  taken.Assign(order.size(), [bytes, order](size_t i) { return (bytes[order[i] / 8] >> order[i] % 8 & 1) != 0; });
 }
 
 template <class Word>
-std::unique_ptr<Word[]> TakeWords(const void* values, const uint32_t* order, size_t size) {
+void TakeWords(const void* values, std::span<const uint32_t> order, std::vector<Word>& taken) {
   const auto* const from = static_cast<const Word*>(values);
-  auto taken = std::make_unique_for_overwrite<Word[]>(size);
-  for (size_t i = 0; i < size; ++i) taken[i] = from[order[i]];
-  return taken;
+  taken.resize(order.size());
+  for (size_t i = 0; i < order.size(); ++i) taken[i] = from[order[i]];
 }
 
 // The values of a part of the rows: where they lie, or those that are there one behind the other.
 template <class Word, class Value>
-std::span<const Value> ValuesOf(const Word* words, const Bits* validity, size_t begin, size_t end,
+std::span<const Value> ValuesOf(const std::vector<Word>& words, const Bits* validity, size_t begin, size_t end,
                                 std::vector<Value>& values) {
-  if (validity == nullptr) return {reinterpret_cast<const Value*>(words) + begin, end - begin};
+  if (validity == nullptr) return {reinterpret_cast<const Value*>(words.data()) + begin, end - begin};
   values.clear();
   for (size_t row = begin; row < end; ++row) {
     if ((*validity)[row]) values.push_back(static_cast<Value>(words[row]));
@@ -56,126 +35,144 @@ std::span<const Value> ValuesOf(const Word* words, const Bits* validity, size_t 
 
 }  // namespace
 
-SortedRun::SortedRun(const RowTable& table, size_t key)
-    : table_(table), key_(key), schema_(table.Schema()), buffers_(table.Buffers()) {
-  size_t most_texts = 0;
-  for (const ColumnBuffers& column : buffers_) most_texts = std::max(most_texts, column.dictionary.size);
-  is_listed_.assign(most_texts, 0);
-  places_.resize(most_texts);
-  const std::unique_ptr<uint32_t[]> order = Order();
-  for (size_t i = 0; i < schema_.size(); ++i) sorted_.push_back(Take(i, order.get()));
+void SortedRun::Page::Grow(size_t by) {
+  const size_t room = std::max(2 * room_, size_ + by);
+  auto bytes = std::make_unique_for_overwrite<char[]>(room + ColumnTexts::kSlack);
+  std::memcpy(bytes.get(), bytes_.get(), size_);
+  bytes_ = std::move(bytes);
+  room_ = room;
 }
 
-std::unique_ptr<uint32_t[]> SortedRun::Order() const {
-  const size_t size = table_.size();
-  const auto* const keys = static_cast<const uint32_t*>(buffers_[key_].values[0]);
-  const ColumnBuffers::Texts& texts = buffers_[key_].dictionary;
-  // Rows of each text, then where the next row of it belongs.
-  std::vector<uint32_t> next(texts.size);
-  for (size_t row = 0; row < size; ++row) ++next[keys[row]];
-  std::vector<RankedText> ranked;
-  for (uint32_t number = 0; number < next.size(); ++number) {
-    if (next[number] != 0) ranked.emplace_back(TextOf(texts, number), number);
-  }
-  std::sort(ranked.begin(), ranked.end());
-  uint32_t begin = 0;
-  for (const RankedText& text : ranked) begin += std::exchange(next[text.number], begin);
-  auto order = std::make_unique_for_overwrite<uint32_t[]>(size);
-  for (size_t row = 0; row < size; ++row) order[next[keys[row]]++] = static_cast<uint32_t>(row);
-  return order;
+SortedRun::RankedText::RankedText(Text of, size_t its_number) : head(0), text(of), number(its_number) {
+  for (size_t i = 0; i < 8; ++i) head = head << 8 | (i < of.size() ? static_cast<unsigned char>(of[i]) : 0u);
 }
 
-SortedRun::Sorted SortedRun::Take(size_t column, const uint32_t* order) const {
-  const size_t size = table_.size();
-  const ColumnBuffers& from = buffers_[column];
-  Sorted sorted;
-  if (from.validity != nullptr) {
-    sorted.is_missing = from.validity->false_count() == size;
-    if (sorted.is_missing) return sorted;
-    sorted.validity = TakeBits(from.validity->data(), order, size);
-  }
-  switch (schema_[column].format[0]) {
-    case 'b':
-      sorted.bits = TakeBits(from.values[0], order, size);
-      break;
-    case 'l':
-      sorted.long_words = TakeWords<uint64_t>(from.values[0], order, size);
-      break;
-    default:
-      sorted.words = TakeWords<uint32_t>(from.values[0], order, size);
-  }
-  return sorted;
-}
-
-void SortedRun::WriteTo(ParquetFile& file, size_t group_rows) {
-  std::vector<Gathered> gathered(schema_.size());
-  std::vector<ParquetColumn> columns(schema_.size());
-  for (size_t begin = 0; begin < table_.size(); begin += group_rows) {
-    const size_t end = std::min(begin + group_rows, table_.size());
-    for (size_t i = 0; i < schema_.size(); ++i) columns[i] = Gather(i, begin, end, gathered[i]);
-    const std::vector<Text>& keys = gathered[key_].dictionary;
-    columns[key_].bounds = {keys.front(), keys.back()};
+void SortedRun::Write(const RowTable& table, size_t key, size_t group_rows, ParquetFile& file) {
+  const std::vector<Column> schema = table.Schema();
+  const std::vector<ColumnBuffers> buffers = table.Buffers();
+  const size_t size = table.size();
+  Order(buffers[key], size);
+  sorted_.resize(schema.size());
+  gathered_.resize(schema.size());
+  for (size_t i = 0; i < schema.size(); ++i) Take(schema[i], buffers[i], sorted_[i]);
+  for (size_t begin = 0; begin < size; begin += group_rows) {
+    const size_t end = std::min(begin + group_rows, size);
+    std::vector<ParquetColumn> columns(schema.size());
+    for (size_t i = 0; i < schema.size(); ++i) Gather(sorted_[i], i == key, begin, end, gathered_[i], columns[i]);
     file.WriteGroup(end - begin, columns);
   }
 }
 
-ParquetColumn SortedRun::Gather(size_t column, size_t begin, size_t end, Gathered& gathered) {
-  ParquetColumn out;
-  const Sorted& sorted = sorted_[column];
+void SortedRun::Order(const ColumnBuffers& keys, size_t size) {
+  const auto* const numbers = static_cast<const uint32_t*>(keys.values[0]);
+  const auto& texts = *static_cast<const ColumnTexts*>(keys.values[1]);
+  next_.assign(texts.size(), 0);
+  for (size_t row = 0; row < size; ++row) ++next_[numbers[row]];
+  ranked_.clear();
+  for (uint32_t number = 0; number < next_.size(); ++number) {
+    if (next_[number] != 0) ranked_.emplace_back(texts.TextOf(number), number);
+  }
+  std::sort(ranked_.begin(), ranked_.end());
+  uint32_t begin = 0;
+  for (const RankedText& text : ranked_) begin += std::exchange(next_[text.number], begin);
+  order_.resize(size);
+  for (size_t row = 0; row < size; ++row) order_[next_[numbers[row]]++] = static_cast<uint32_t>(row);
+}
+
+void SortedRun::Take(const Column& column, const ColumnBuffers& from, Sorted& sorted) const {
+  sorted.type = column.format[0];
+  sorted.has_validity = from.validity != nullptr;
+  sorted.is_missing = sorted.has_validity && from.validity->false_count() == order_.size();
+  if (sorted.is_missing) return;
+  if (sorted.has_validity) TakeBits(from.validity->data(), order_, sorted.validity);
+  switch (sorted.type) {
+    case 'b':
+      return TakeBits(from.values[0], order_, sorted.bits);
+    case 'l':
+      return TakeWords(from.values[0], order_, sorted.long_words);
+    case 'u':
+      sorted.texts = static_cast<const ColumnTexts*>(from.values[1]);
+      break;
+    default:
+      break;
+  }
+  TakeWords(from.values[0], order_, sorted.words);
+}
+
+void SortedRun::Gather(const Sorted& sorted, bool is_key, size_t begin, size_t end, Gathered& gathered,
+                       ParquetColumn& out) {
   if (sorted.is_missing) {
     gathered.validity = Bits();
     gathered.validity.Add(false, end - begin);
     out.validity = &gathered.validity;
-    return out;
+    return;
   }
-  const Bits* const validity = sorted.validity ? &*sorted.validity : nullptr;
+  const Bits* const validity = sorted.has_validity ? &sorted.validity : nullptr;
   if (validity != nullptr) {
     gathered.validity.Assign(end - begin, [validity, begin](size_t i) { return (*validity)[begin + i]; });
     out.validity = &gathered.validity;
   }
-  switch (schema_[column].format[0]) {
+  switch (sorted.type) {
     case 'i':
-      out.numbers = ValuesOf(sorted.words.get(), validity, begin, end, gathered.numbers);
+      out.numbers = ValuesOf(sorted.words, validity, begin, end, gathered.numbers);
       break;
     case 'l':
-      out.long_numbers = ValuesOf(sorted.long_words.get(), validity, begin, end, gathered.long_numbers);
+      out.long_numbers = ValuesOf(sorted.long_words, validity, begin, end, gathered.long_numbers);
       break;
     case 'b':
-      gathered.bits.Assign(end - begin, [&sorted, begin](size_t i) { return (*sorted.bits)[begin + i]; });
+      gathered.bits.Assign(end - begin, [&sorted, begin](size_t i) { return sorted.bits[begin + i]; });
       out.bits = &gathered.bits;
       break;
-    default:
-      ListTexts(column, ValuesOf(sorted.words.get(), validity, begin, end, gathered.numbers_of_texts), gathered);
+    default: {
+      const auto numbers = ValuesOf(sorted.words, validity, begin, end, gathered.numbers_of_texts);
+      ListTexts(*sorted.texts, is_key, numbers, gathered);
       out.places = gathered.places;
-      out.dictionary = gathered.dictionary;
+      out.dictionary = gathered.dictionary.bytes();
+      out.dictionary_size = gathered.dictionary_size;
+      if (is_key) out.bounds = {sorted.texts->TextOf(numbers.front()), sorted.texts->TextOf(numbers.back())};
+    }
   }
-  return out;
 }
 
-// Makes a dictionary of the texts of a column that have these numbers, and their places in it.
-void SortedRun::ListTexts(size_t column, std::span<const uint32_t> numbers, Gathered& gathered) {
-  const ColumnBuffers::Texts& texts = buffers_[column].dictionary;
-  gathered.dictionary.clear();
+// Makes a dictionary of the texts that have these numbers, and their places in it.
+void SortedRun::ListTexts(const ColumnTexts& texts, bool is_key, std::span<const uint32_t> numbers,
+                          Gathered& gathered) {
+  gathered.dictionary.Clear();
   gathered.places.resize(numbers.size());
-  const auto list = [&](uint32_t number) {
-    places_[number] = static_cast<uint32_t>(gathered.dictionary.size());
-    gathered.dictionary.push_back(TextOf(texts, number));
-  };
-  if (column == key_) {
+  if (places_.size() < texts.size()) places_.resize(texts.size());
+  uint32_t listed = 0;
+  if (is_key) {
     for (size_t i = 0; i < numbers.size(); ++i) {
-      if (i == 0 || numbers[i] != numbers[i - 1]) list(numbers[i]);
+      if (i == 0 || numbers[i] != numbers[i - 1]) {
+        gathered.dictionary.Append(texts.Page(numbers[i], numbers[i] + 1));
+        ++listed;
+      }
+      gathered.places[i] = listed - 1;
     }
-  } else {
-    for (const uint32_t number : numbers) is_listed_[number] = 1;
-    uint8_t* const begin = is_listed_.data();
-    uint8_t* const end = begin + texts.size;
-    for (uint8_t* at = begin; at < end; *at++ = 0) {
-      at = static_cast<uint8_t*>(std::memchr(at, 1, static_cast<size_t>(end - at)));
-      if (at == nullptr) break;
-      list(static_cast<uint32_t>(at - begin));
+    gathered.dictionary_size = listed;
+    return;
+  }
+  const size_t eights = texts.size() / 8 + 1;
+  if (are_listed_.size() < eights) are_listed_.resize(eights);
+  auto* const is_listed = reinterpret_cast<uint8_t*>(are_listed_.data());
+  for (const uint32_t number : numbers) is_listed[number] = 1;
+  // Those that follow one another are taken together.
+  uint32_t begin = 0;
+  uint32_t end = 0;
+  for (size_t eight = 0; eight < eights; ++eight) {
+    for (uint64_t left = std::exchange(are_listed_[eight], 0); left != 0; left &= left - 1) {
+      const auto number = static_cast<uint32_t>(8 * eight) + static_cast<uint32_t>(std::countr_zero(left)) / 8;
+      places_[number] = listed++;
+      if (number != end) {
+        if (begin != end) gathered.dictionary.Append(texts.Page(begin, end));
+        begin = number;
+      }
+      end = number + 1;
     }
   }
+  if (begin != end) gathered.dictionary.Append(texts.Page(begin, end));
   for (size_t i = 0; i < numbers.size(); ++i) gathered.places[i] = places_[numbers[i]];
+  gathered.dictionary_size = listed;
 }
 
 }  // namespace quillet

@@ -1,6 +1,7 @@
 // A source's rows go into tables while it is analysed; where it fails half way, they are taken out again.
 #include "corpus/source_rows.h"
 
+#include <algorithm>
 #include <utility>
 
 #include "foundations/errors.h"
@@ -26,36 +27,37 @@ std::string InWords(Version version) {
 // Puts records into rows.
 class SourceRows::Writer : public FileWriter {
  public:
-  // Between two looks at whether a table is full, and those whose texts are looked up together.
-  static constexpr size_t kRecordsAtOnce = 16;
-
   explicit Writer(SourceRows& rows) : rows_(rows) {}
 
   void Write(const BatchInput&, const FileAnalyzer& file, const ScopeNames& scopes, PlacedRecords& placed,
              std::string&) override {
     if (rows_.options_.form != RowForm::kRecords) return;
     placed.Begin(file, scopes);
-    records_.clear();
-    size_t held = 0;
+    placed.Clear();
+    held_ = 0;
     for (size_t row = 0; row < file.rows().size(); ++row) {
-      file.CheckMemory(held);
-      for (const PlacedRecord& record : placed.OfRow(row)) {
-        records_.push_back(record);
-        held += record.name.size() + record.detail.size() + scopes.names()[record.scope].size() + sizeof(PlacedRecord);
-        if (records_.size() == kRecordsAtOnce) Put(scopes);
-      }
+      placed.AddRow(row);
+      const size_t count = placed.records().size() / RowTable::kRowsAtOnce * RowTable::kRowsAtOnce;
+      if (count == 0) continue;
+      Put(placed.records().first(count), file, scopes);
+      placed.DropFirst(count);
     }
-    if (!records_.empty()) Put(scopes);
+    Put(placed.records(), file, scopes);
   }
 
  private:
-  void Put(const ScopeNames& scopes) {
-    rows_.Room().AddRecords(records_, scopes.names());
-    records_.clear();
+  void Put(std::span<const PlacedRecord> records, const FileAnalyzer& file, const ScopeNames& scopes) {
+    for (size_t at = 0; at < records.size(); at += RowTable::kRowsAtOnce) {
+      const auto part = records.subspan(at, std::min(RowTable::kRowsAtOnce, records.size() - at));
+      for (const PlacedRecord& record : part)
+        held_ += record.name.size() + record.detail.size() + scopes.names()[record.scope].size() + sizeof(PlacedRecord);
+      file.CheckMemory(held_);
+      rows_.Room().AddRecords(part, scopes.names());
+    }
   }
 
   SourceRows& rows_;
-  std::vector<PlacedRecord> records_;
+  size_t held_ = 0;  // by the rows of a source, in bytes
 };
 
 // Puts names into rows.
@@ -136,14 +138,25 @@ std::shared_ptr<const RowTable> SourceRows::Next() {
     batch_.reset();
     return nullptr;
   }
-  std::shared_ptr<const RowTable> next = std::move(full_.front());
+  given_table_ = std::move(full_.front());
   full_.pop_front();
-  return next;
+  return options_.numbered_rows != 0 ? given_table_ : std::exchange(given_table_, nullptr);
 }
 
 std::shared_ptr<const RowTable> SourceRows::Finish() {
   if (table_ == nullptr || table_->size() == 0) return nullptr;
   return std::exchange(table_, nullptr);
+}
+
+std::shared_ptr<const RowTable> SourceRows::TakeFiles() {
+  given_files_ = std::exchange(files_, nullptr);
+  return options_.numbered_rows != 0 ? given_files_ : std::exchange(given_files_, nullptr);
+}
+
+std::shared_ptr<RowTable> SourceRows::NewTable(RowForm form, std::shared_ptr<RowTable>& given) {
+  if (given == nullptr || given.use_count() != 1) return MakeRowTable(form, carried_, options_.numbered_rows);
+  given->Truncate(0);
+  return std::exchange(given, nullptr);
 }
 
 // ---- rows ----
@@ -153,7 +166,7 @@ RowTable& SourceRows::Room() {
     table_->Carry({&columns_, row_});
     full_.push_back(std::exchange(table_, nullptr));
   }
-  if (table_ == nullptr) table_ = MakeRowTable(options_.form, carried_, options_.numbered_rows);
+  if (table_ == nullptr) table_ = NewTable(options_.form, given_table_);
   return *table_;
 }
 
@@ -185,7 +198,7 @@ void SourceRows::AnalyzeRow() {
     if (options_.form == RowForm::kFiles) Room().AddFile(result, reading->python);
     if (table_ != nullptr) table_->Carry({&columns_, row_});
     if (problem_ != nullptr) {
-      if (files_ == nullptr) files_ = MakeRowTable(RowForm::kFiles, carried_, options_.numbered_rows);
+      if (files_ == nullptr) files_ = NewTable(RowForm::kFiles, given_files_);
       files_->AddFile(result, reading->python);
       files_->Carry({&columns_, row_});
     }

@@ -31,7 +31,8 @@ class SourceRows {
     // Texts that say why a source could not be had, null where it is there. With such a column TakeFiles gives rows.
     std::string problem_column;
     std::function<bool(Text bytes, std::string& utf8)> decode;  // as FileWorker::Options has it
-    // With it, tables of so many rows with numbers for texts, as MakeRowTable has it.
+    // With it, tables of so many rows with numbers for texts, as MakeRowTable has it. A table that nobody holds any
+    // longer is used again.
     size_t numbered_rows = 0;
   };
 
@@ -57,7 +58,7 @@ class SourceRows {
   // What is left over at the end of all batches; null where that is nothing.
   std::shared_ptr<const RowTable> Finish();
   // A row for each source since the last call, of the form kFiles; null where that is none.
-  std::shared_ptr<const RowTable> TakeFiles() { return std::exchange(files_, nullptr); }
+  std::shared_ptr<const RowTable> TakeFiles();
   const Totals& totals() const { return totals_; }
 
  private:
@@ -80,6 +81,8 @@ class SourceRows {
   void AddMessages(const BatchResult& result);
   // The table that the next row goes into.
   RowTable& Room();
+  // One without rows: the one that was given out last, where its memory may be used again.
+  std::shared_ptr<RowTable> NewTable(RowForm form, std::shared_ptr<RowTable>& given);
   void GoBackTo(const Mark& mark);
 
   const Options options_;
@@ -93,6 +96,8 @@ class SourceRows {
   std::deque<std::shared_ptr<RowTable>> full_;
   std::shared_ptr<RowTable> table_;
   std::shared_ptr<RowTable> files_;
+  std::shared_ptr<RowTable> given_table_;
+  std::shared_ptr<RowTable> given_files_;
   Totals totals_;
 };
 

@@ -36,7 +36,7 @@ uint32_t TextTable::NumberOfCopy(Text text) {
   return number;
 }
 
-uint32_t TextTable::Add(Text text, Key key, uint64_t hash, size_t slot) {
+uint32_t TextTable::Add(Text text, TextKey key, uint64_t hash, size_t slot) {
   const auto number = static_cast<uint32_t>(entries_.size());
   entries_.push_back(
       {key.first, key.last, text.data(), static_cast<uint32_t>(text.size()), FormOf(text), kNoIndex, kNoIndex});
@@ -51,7 +51,7 @@ void TextTable::Grow() {
   std::fill_n(slots_.begin(), count, Slot{0, kNoIndex});
   mask_ = count - 1;
   for (uint32_t number = 0; number < entries_.size(); ++number) {
-    const uint64_t hash = HashOf(TextOf(number), {entries_[number].first, entries_[number].last});
+    const uint64_t hash = TextKey{entries_[number].first, entries_[number].last}.HashOf(TextOf(number));
     size_t at = hash & mask_;
     while (slots_[at].number != kNoIndex) at = (at + 1) & mask_;
     slots_[at] = {static_cast<uint32_t>(hash >> 32), number};

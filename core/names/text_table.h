@@ -6,12 +6,12 @@
 #pragma once
 
 #include <cstdint>
-#include <cstring>
 #include <string>
 #include <vector>
 
 #include "foundations/arena.h"
 #include "foundations/text.h"
+#include "foundations/text_key.h"
 #include "names/bindings.h"
 
 namespace quillet {
@@ -40,8 +40,8 @@ class TextTable {
 
   // The number of a text that stands until the next Begin.
   uint32_t NumberOf(Text text) {
-    const Key key = KeyOf(text);
-    const uint64_t hash = HashOf(text, key);
+    const TextKey key = TextKey::Of(text);
+    const uint64_t hash = key.HashOf(text);
     const auto tag = static_cast<uint32_t>(hash >> 32);
     for (size_t at = hash & mask_;; at = (at + 1) & mask_) {
       const Slot slot = slots_[at];
@@ -49,16 +49,10 @@ class TextTable {
       if (slot.tag == tag && Same(entries_[slot.number], text, key)) return slot.number;
     }
   }
-  // For texts that are asked for soon: has their slots fetched, then what these lead to.
-  void FetchSlot(Text text) const { __builtin_prefetch(&slots_[HashOf(text, KeyOf(text)) & mask_]); }
-  void FetchEntry(Text text) const {
-    const uint32_t number = slots_[HashOf(text, KeyOf(text)) & mask_].number;
-    if (number != kNoIndex) __builtin_prefetch(&entries_[number]);
-  }
   // kNoIndex for a text that is not there.
   uint32_t Find(Text text) const {
-    const Key key = KeyOf(text);
-    const uint64_t hash = HashOf(text, key);
+    const TextKey key = TextKey::Of(text);
+    const uint64_t hash = key.HashOf(text);
     for (size_t at = hash & mask_; slots_[at].number != kNoIndex; at = (at + 1) & mask_) {
       if (Same(entries_[slots_[at].number], text, key)) return slots_[at].number;
     }
@@ -76,44 +70,17 @@ class TextTable {
   void CopyTo(TextList& texts) const;
 
  private:
-  struct Key {
-    uint64_t first, last;
-  };
   struct Slot {
     uint32_t tag;
     uint32_t number;  // kNoIndex in an empty slot
   };
 
-  template <class Word>
-  static uint64_t Load(const char* at) {
-    Word word;
-    std::memcpy(&word, at, sizeof word);
-    return word;
-  }
-  static Key KeyOf(Text text) {
-    const char* const at = text.data();
-    const size_t size = text.size();
-    if (size >= 8) return {Load<uint64_t>(at), Load<uint64_t>(at + size - 8)};
-    if (size >= 4) return {Load<uint32_t>(at), Load<uint32_t>(at + size - 4)};
-    if (size == 0) return {0, 0};
-    const auto byte_at = [at](size_t i) { return uint64_t{static_cast<unsigned char>(at[i])}; };
-    return {byte_at(0) << 16 | byte_at(size >> 1) << 8 | byte_at(size - 1), 0};
-  }
-  static uint64_t Mix(uint64_t a, uint64_t b) {
-    const uint64_t product = (a ^ 0x9E3779B97F4A7C15u) * 0xD6E8FEB86659FD93u + (b ^ (b >> 29)) * 0xA0761D6478BD642Fu;
-    return (product ^ (product >> 32)) * 0xE7037ED1A0B428DBu;
-  }
-  static uint64_t HashOf(Text text, Key key) {
-    uint64_t hash = Mix(key.first + text.size(), key.last);
-    for (size_t at = 8; at + 8 < text.size(); at += 8) [[unlikely]] hash = Mix(hash, Load<uint64_t>(text.data() + at));
-    return hash ^ (hash >> 29);
-  }
-  static bool Same(const Entry& entry, Text text, Key key) {
+  static bool Same(const Entry& entry, Text text, TextKey key) {
     if (entry.first != key.first || entry.last != key.last || entry.size != text.size()) return false;
-    return text.size() <= 16 || std::memcmp(entry.data + 8, text.data() + 8, text.size() - 16) == 0;
+    return TextKey::AreSameInside({entry.data, entry.size}, text);
   }
 
-  uint32_t Add(Text text, Key key, uint64_t hash, size_t slot);
+  uint32_t Add(Text text, TextKey key, uint64_t hash, size_t slot);
   void Grow();
 
   std::vector<Entry> entries_;

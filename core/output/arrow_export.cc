@@ -82,6 +82,11 @@ void FillArray(size_t length, std::unique_ptr<OwnedArray> owned, ArrowArray* arr
 }  // namespace
 
 void Bits::Truncate(size_t size) {
+  if (size == 0) {
+    bytes_.clear();
+    size_ = false_count_ = 0;
+    return;
+  }
   while (size_ > size) {
     --size_;
     false_count_ -= !(*this)[size_];

@@ -33,11 +33,29 @@ class Bits {
     false_count_ += !value;
   }
   void Add(bool value, size_t count) {
-    for (; count > 0 && size_ % 8 != 0; --count) Add(value);
-    bytes_.insert(bytes_.end(), count / 8, value ? uint8_t{0xFF} : uint8_t{0});
+    if (!value) {
+      size_ += count;
+      false_count_ += count;
+      return bytes_.resize((size_ + 7) / 8);  // behind the last one there are zeros
+    }
+    for (; count > 0 && size_ % 8 != 0; --count) Add(true);
+    bytes_.insert(bytes_.end(), count / 8, uint8_t{0xFF});
     size_ += count / 8 * 8;
-    false_count_ += value ? 0 : count / 8 * 8;
-    for (count %= 8; count > 0; --count) Add(value);
+    for (count %= 8; count > 0; --count) Add(true);
+  }
+  // So many more, the ith of which is bit_at(i).
+  template <class BitAt>
+  void AddEach(size_t count, const BitAt& bit_at) {
+    size_t truths = 0;
+    size_t at = size_;
+    size_ += count;
+    bytes_.resize((size_ + 7) / 8);
+    for (size_t i = 0; i < count; ++i, ++at) {
+      const bool bit = bit_at(i);
+      bytes_[at / 8] = static_cast<uint8_t>(bytes_[at / 8] | bit << at % 8);
+      truths += bit;
+    }
+    false_count_ += count - truths;
   }
   // So many, the ith of which is bit_at(i).
   template <class BitAt>

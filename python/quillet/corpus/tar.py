@@ -19,7 +19,7 @@ except ImportError:
 _BLOCK = 512
 _ZEROS = bytes(_BLOCK)
 # Bytes that are read at once, and that one step of unpacking gives at most.
-_READ_BYTES, _STEP_BYTES = 1 << 16, 1 << 20
+_READ_BYTES, _STEP_BYTES = 1 << 16, 1 << 17
 # A header that holds more describes no file.
 _MOST_HEADER_BYTES = 1 << 20
 _REGULAR = b"0\x007"

@@ -282,17 +282,20 @@ struct Shard {
 
 Shard ShardOf(ShardWriter::Options options, const std::vector<ShardWriter::Source>& sources) {
   ShardWriter writer(std::move(options));
-  std::string rows;
-  std::string files;
+  std::string rows, files, taken;
+  const auto take = [&] {
+    writer.TakeRows(taken);
+    rows += taken;
+    writer.TakeFiles(taken);
+    files += taken;
+  };
   for (const ShardWriter::Source& source : sources) {
     if (writer.Add(source)) writer.Work();
-    rows += writer.TakeRows();
-    files += writer.TakeFiles();
+    take();
   }
   writer.WorkToTheEnd();
   writer.Finish("a", "b");
-  rows += writer.TakeRows();
-  files += writer.TakeFiles();
+  take();
   return {Read(rows), Read(files), writer.totals()};
 }
 
@@ -388,6 +391,21 @@ TEST(ShardWriter, NothingIsAFileWithoutRows) {
 
 // ---- the file itself ----
 
+std::string TakenFrom(ParquetFile& file) {
+  std::string taken;
+  file.TakeBytes(taken);
+  return taken;
+}
+
+std::string DictionaryOf(const Strings& texts) {
+  std::string page;
+  for (const std::string& text : texts) {
+    const auto length = static_cast<uint32_t>(text.size());
+    page.append(reinterpret_cast<const char*>(&length), 4) += text;
+  }
+  return page;
+}
+
 TEST(ParquetFile, HoldsWhatIsWrittenWhateverItsRuns) {
   std::mt19937 chance(7);
   const auto below = [&chance](size_t bound) { return static_cast<size_t>(chance() % bound); };
@@ -400,7 +418,7 @@ TEST(ParquetFile, HoldsWhatIsWrittenWhateverItsRuns) {
       // Now and then more texts than a byte can tell apart.
       Strings owned;
       for (size_t i = 0; i < (round % 5 == 0 ? 300 : 1 + below(9)); ++i) owned.push_back("text" + std::to_string(i));
-      const std::vector<Text> dictionary(owned.begin(), owned.end());
+      const std::string dictionary = DictionaryOf(owned);
       const size_t sameness = 1 + below(40);
       std::vector<uint32_t> places;
       std::vector<int32_t> numbers;
@@ -410,7 +428,7 @@ TEST(ParquetFile, HoldsWhatIsWrittenWhateverItsRuns) {
         const bool is_there = round % 2 == 0 || below(sameness) != 0;
         validity.Add(is_there);
         const auto place =
-            static_cast<uint32_t>(below(sameness) != 0 && !places.empty() ? places.back() : below(dictionary.size()));
+            static_cast<uint32_t>(below(sameness) != 0 && !places.empty() ? places.back() : below(owned.size()));
         if (is_there) {
           places.push_back(place);
           numbers.push_back(round % 3 == 0 ? static_cast<int32_t>(chance())
@@ -424,6 +442,7 @@ TEST(ParquetFile, HoldsWhatIsWrittenWhateverItsRuns) {
       ParquetColumn texts, ints, longs, truths;
       texts.places = places;
       texts.dictionary = dictionary;
+      texts.dictionary_size = owned.size();
       texts.bounds = {"text0", "text9"};
       ints.numbers = numbers;
       longs.long_numbers = long_numbers;
@@ -432,7 +451,7 @@ TEST(ParquetFile, HoldsWhatIsWrittenWhateverItsRuns) {
       file.WriteGroup(size, std::vector<ParquetColumn>{texts, ints, longs, truths});
     }
     file.Finish("round", std::to_string(round));
-    const File read = Read(file.TakeBytes());
+    const File read = Read(TakenFrom(file));
     EXPECT_EQ(read.Rows(), expected) << round;
     EXPECT_EQ(read.groups.size(), groups);
   }
@@ -441,15 +460,16 @@ TEST(ParquetFile, HoldsWhatIsWrittenWhateverItsRuns) {
 TEST(ParquetFile, LongTextsAreNoBounds) {
   ParquetFile file({{"t", "u", {}}}, 0, Copy);
   const std::string text(ParquetFile::kLongestBound + 1, 'x');
-  const std::vector<Text> dictionary = {"a", text};
+  const std::string dictionary = DictionaryOf({"a", text});
   const std::vector<uint32_t> places = {0, 1};
   ParquetColumn column;
   column.places = places;
   column.dictionary = dictionary;
+  column.dictionary_size = 2;
   column.bounds = {"a", text};
   file.WriteGroup(2, std::vector<ParquetColumn>{column});
   file.Finish("", "");
-  const File read = Read(file.TakeBytes());
+  const File read = Read(TakenFrom(file));
   EXPECT_EQ(read.groups[0].bounds[0], std::pair(std::string(), std::string()));
   EXPECT_EQ(read.Rows()[1][0], text);
 }

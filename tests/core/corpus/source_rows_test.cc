@@ -47,16 +47,12 @@ std::shared_ptr<InputTable> Table(const Texts& contents, const std::string& layo
 }
 
 // The value of a row's column, as text; "-" for none.
-std::string Shown(const Column& column, const ColumnBuffers& buffers, size_t row) {
+std::string Shown(const Column& column, const ColumnBuffers& buffers, size_t row, bool is_numbered) {
   if (buffers.validity != nullptr && !(*buffers.validity)[row]) return "-";
   const auto text_at = [](const auto* offsets, const void* bytes, size_t i) {
     return std::string(static_cast<const char*>(bytes) + offsets[i], static_cast<size_t>(offsets[i + 1] - offsets[i]));
   };
   const void* values = buffers.values[0];
-  if (buffers.dictionary.offsets != nullptr) {
-    const uint32_t number = static_cast<const uint32_t*>(values)[row];
-    return text_at(static_cast<const int64_t*>(buffers.dictionary.offsets), buffers.dictionary.bytes, number);
-  }
   switch (column.format[0]) {
     case 'i':
       return std::to_string(static_cast<const int32_t*>(values)[row]);
@@ -65,11 +61,15 @@ std::string Shown(const Column& column, const ColumnBuffers& buffers, size_t row
     case 'b':
       return (static_cast<const uint8_t*>(values)[row / 8] >> row % 8 & 1) != 0 ? "yes" : "no";
     default:
+      if (is_numbered) {
+        const uint32_t number = static_cast<const uint32_t*>(values)[row];
+        return std::string(static_cast<const ColumnTexts*>(buffers.values[1])->TextOf(number));
+      }
       return text_at(static_cast<const int32_t*>(values), buffers.values[1], row);
   }
 }
 
-void Append(const RowTable* table, Strings& rows) {
+void Append(const RowTable* table, Strings& rows, bool is_numbered = false) {
   if (table == nullptr) return;
   const std::vector<Column> schema = table->Schema();
   const std::vector<ColumnBuffers> buffers = table->Buffers();
@@ -77,25 +77,26 @@ void Append(const RowTable* table, Strings& rows) {
     std::string shown;
     for (size_t i = 0; i < schema.size(); ++i) {
       if (i > 0) shown += '|';
-      shown += Shown(schema[i], buffers[i], row);
+      shown += Shown(schema[i], buffers[i], row, is_numbered);
     }
     rows.push_back(shown);
   }
 }
 
-Strings RowsOf(SourceRows& rows, const std::vector<std::shared_ptr<InputTable>>& tables) {
+Strings RowsOf(SourceRows& rows, const std::vector<std::shared_ptr<InputTable>>& tables, bool is_numbered = false) {
   Strings shown;
   for (const auto& table : tables) {
     rows.Begin(BatchOf(table));
-    while (const auto next = rows.Next()) Append(next.get(), shown);
+    while (const auto next = rows.Next()) Append(next.get(), shown, is_numbered);
   }
-  Append(rows.Finish().get(), shown);
+  Append(rows.Finish().get(), shown, is_numbered);
   return shown;
 }
 
 Strings RowsOf(SourceRows::Options options, const std::shared_ptr<InputTable>& table) {
+  const bool is_numbered = options.numbered_rows != 0;
   SourceRows rows(std::move(options));
-  return RowsOf(rows, {table});
+  return RowsOf(rows, {table}, is_numbered);
 }
 
 std::string MessageOf(const std::function<void()>& call) {

@@ -634,8 +634,11 @@ class SourcesDigest {
       writer.Add({"p", "a", "c.py", {}, false, "gone"});
       writer.WorkToTheEnd();
       writer.Finish("key", "value");
-      digests_.rows.AddBytes(writer.TakeRows());
-      digests_.rows.AddBytes(writer.TakeFiles());
+      std::string taken;
+      writer.TakeRows(taken);
+      digests_.rows.AddBytes(taken);
+      writer.TakeFiles(taken);
+      digests_.rows.AddBytes(taken);
       const ShardWriter::Totals totals = writer.totals();
       for (const size_t number :
            {totals.files, totals.bytes, totals.lines, totals.rows, totals.errors, totals.problems})
