@@ -11,6 +11,7 @@ import zlib
 from collections.abc import Callable, Iterator
 from typing import Any, BinaryIO
 
+_inflate: Any
 try:
     from isal import isal_zlib as _inflate  # several times as fast
 except ImportError:
