@@ -110,8 +110,10 @@ class ShardWriterObject {
     const Locked lock;
     std::string failure;
     try {
-      const nb::object view = nb::steal(
-          PyMemoryView_FromMemory(const_cast<char*>(bytes.data()), static_cast<Py_ssize_t>(bytes.size()), PyBUF_READ));
+      // A page of nothing may lie nowhere, which some compressors abort at.
+      const char* const at = bytes.empty() ? "" : bytes.data();
+      const nb::object view =
+          nb::steal(PyMemoryView_FromMemory(const_cast<char*>(at), static_cast<Py_ssize_t>(bytes.size()), PyBUF_READ));
       if (!view.is_valid()) throw nb::python_error();
       const nb::object answer = compress_(view);
       compressed.assign(BufferText(answer).text());

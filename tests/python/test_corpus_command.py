@@ -142,6 +142,20 @@ def test_row_groups_hold_few_names(tmp_path: Path, monkeypatch: pytest.MonkeyPat
     assert sum(each.min <= "name_050" <= each.max for each in statistics) <= 2
 
 
+@pytest.mark.parametrize("compressor", ["zstandard", "pyarrow"])
+def test_pages_are_compressed_by_what_there_is(
+    compressor: str, mirror: Path, tmp_path: Path, monkeypatch: pytest.MonkeyPatch
+) -> None:
+    if compressor == "pyarrow":
+        monkeypatch.setitem(sys.modules, "zstandard", None)
+    pytest.importorskip(compressor)
+    units = sources.units_of([str(mirror / "plain")])
+    plan = shards.plan_of(str(tmp_path / "out"), "records", (3, 12), sources.Columns(), units)
+    shards.run_shard(*shards.task_of(plan, 0))
+    table = parquet.read_table(plan.path_of(0))
+    assert table["error"].null_count == table.num_rows > 0
+
+
 @pytest.mark.parametrize("reader", ["duckdb", "polars", "pandas"])
 def test_other_readers_take_the_files(reader: str, mirror: Path, tmp_path: Path) -> None:
     module = pytest.importorskip(reader)
