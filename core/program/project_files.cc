@@ -12,6 +12,7 @@
 
 #include "foundations/stop.h"
 #include "program/indexed_words.h"
+#include "program/possible_symbols.h"
 #include "program/two_threads.h"
 #include "project/file_system.h"
 #include "project/find_files.h"
@@ -82,6 +83,15 @@ class ProjectFiles::Impl {
     };
   }
 
+  // What asks a filter whether a name may be defined as a member.
+  auto DefinesMember(Text name) const {
+    return [this, word = KeyOfWord(name), definition = KeyOfDefinition(name),
+            member = KeyOfMember(name)](const Filter& filter) {
+      const WordKey key = filter.tells_members ? member : filter.tells_definitions ? definition : word;
+      return MayHold(bits_.data() + filter.begin, filter.size, key);
+    };
+  }
+
   std::vector<FileId> WithWords(std::vector<Text> words) {
     // The longest is most likely the one that is not there.
     std::ranges::stable_sort(words, std::greater(), &Text::size);
@@ -97,16 +107,21 @@ class ProjectFiles::Impl {
     }
   }
 
-  std::vector<FileId> Defining(Text name) {
+  std::vector<FileId> DefiningMember(Text name) {
     if (!HasWordKey(name)) return {};
     if (!IsInFilters(name)) return WithWords({name});
-    const WordKey word = KeyOfWord(name);
-    const WordKey definition = KeyOfDefinition(name);
     // Who asks looks into the text anyway.
-    const auto may_define = [&](const Filter& filter) {
-      return MayHold(bits_.data() + filter.begin, filter.size, filter.may_define_any ? word : definition);
+    return Candidates({name}, DefinesMember(name), false);
+  }
+
+  std::vector<FileId> DefiningMember(Text name, Text word) {
+    if (!IsInFilters(name)) return WithWords({name, word});
+    const auto has_words = HasWords({name, word});
+    const auto has_slots = HasWords({"__slots__"});
+    const auto may_define = [&, defines = DefinesMember(name)](const Filter& filter) {
+      return has_words(filter) && (defines(filter) || has_slots(filter));
     };
-    return Candidates({name}, may_define, false);
+    return Candidates({name, word}, may_define, false);
   }
 
   bool Refresh() {
@@ -133,11 +148,14 @@ class ProjectFiles::Impl {
   struct Filter {
     uint32_t begin = 0;
     uint32_t size = 0;
-    bool may_define_any = false;
+    bool tells_definitions = false;
+    bool tells_members = false;  // which no index does
   };
   // What a thread needs to make filters, and what it made: their places among its own bits.
   struct FilterMaker {
-    WordKeys keys;
+    WordKeys words;
+    PossibleSymbols lines;
+    std::vector<WordKey> keys;
     std::string source;
     std::vector<uint64_t> bits;
     struct Made {
@@ -220,16 +238,33 @@ class ProjectFiles::Impl {
   void MakeFilter(size_t i, const FileStamp& stamp, FilterMaker& maker) const {
     ++read_count_;
     files_.ReadSource(all_[i], stamp, maker.source);
-    maker.keys.Read(maker.source);
-    MakeFilter(i, stamp, maker.keys.keys(), maker.keys.may_define_any(), maker);
+    maker.words.Read(maker.source);
+    Filter filter;
+    filter.tells_definitions = !maker.words.may_define_any();
+    filter.tells_members = filter.tells_definitions && FindMembers(files_.VersionOf(all_[i]), maker);
+    if (!filter.tells_members) maker.keys.clear();
+    maker.keys.insert(maker.keys.end(), maker.words.keys().begin(), maker.words.keys().end());
+    AddFilter(i, stamp, filter, maker);
   }
 
-  static void MakeFilter(size_t i, const FileStamp& stamp, const std::vector<WordKey>& keys, bool may_define_any,
-                         FilterMaker& maker) {
-    const size_t begin = maker.bits.size();
-    AppendFilter(keys, maker.bits);
-    const Filter filter = {static_cast<uint32_t>(begin), static_cast<uint32_t>(maker.bits.size() - begin),
-                           may_define_any};
+  // The keys of what may be members in the source that was read for words; false where it does not tell.
+  static bool FindMembers(Version version, FilterMaker& maker) {
+    maker.keys = maker.words.attributes();
+    if (HoldsWord(maker.source, "class")) {
+      if (!maker.lines.Read(maker.source, version)) return false;
+      for (const PossibleSymbols::Symbol& symbol : maker.lines.symbols())
+        if (symbol.may_be_member) maker.keys.push_back(KeyOfMember(symbol.name));
+    }
+    std::ranges::sort(maker.keys);
+    maker.keys.erase(std::unique(maker.keys.begin(), maker.keys.end()), maker.keys.end());
+    return true;
+  }
+
+  // Of the keys.
+  static void AddFilter(size_t i, const FileStamp& stamp, Filter filter, FilterMaker& maker) {
+    filter.begin = static_cast<uint32_t>(maker.bits.size());
+    AppendFilter(maker.keys, maker.bits);
+    filter.size = static_cast<uint32_t>(maker.bits.size() - filter.begin);
     maker.made.push_back({i, SettledStamp(stamp), filter});
   }
 
@@ -240,7 +275,6 @@ class ProjectFiles::Impl {
           index_maker_.empty() ? nullptr : IndexedWords::Read(root, index_maker_);
       if (index == nullptr) continue;
       std::array<FilterMaker, 2> makers;
-      std::array<std::vector<WordKey>, 2> keys;
       ForEachByThreads(all_.size(), kFilesWorthAThread, makers, [&](size_t i, FilterMaker& maker) {
         const Version version = files_.VersionOf(all_[i]);
         const std::string& path = files_.PathOf(all_[i]);
@@ -251,9 +285,8 @@ class ProjectFiles::Impl {
         const FileStamp stamp = StampOf(path);
         const std::optional<uint32_t> known = index->Find(Text(path).substr(root.size() + 1), stamp);
         if (!known) return;
-        std::vector<WordKey>& of_file = keys[&maker == makers.data() ? 0 : 1];
-        index->KeysOf(*known, of_file);
-        MakeFilter(i, stamp, of_file, false, maker);
+        index->KeysOf(*known, maker.keys);
+        AddFilter(i, stamp, {.tells_definitions = true}, maker);
       });
       TakeFilters(makers);
     }
@@ -280,7 +313,8 @@ class ProjectFiles::Impl {
         bits_.insert(bits_.end(), from, from + made.size);
       }
       filter.size = made.size;
-      filter.may_define_any = made.may_define_any;
+      filter.tells_definitions = made.tells_definitions;
+      filter.tells_members = made.tells_members;
       stamps_[i] = stamp;
     }
   }
@@ -408,7 +442,8 @@ ProjectFiles::~ProjectFiles() = default;
 const std::vector<FileId>& ProjectFiles::All() { return impl_->All(); }
 std::vector<FileId> ProjectFiles::WithWords(const std::vector<Text>& words) { return impl_->WithWords(words); }
 void ProjectFiles::EachWithWord(Text word, const std::function<bool(FileId)>& take) { impl_->EachWithWord(word, take); }
-std::vector<FileId> ProjectFiles::Defining(Text name) { return impl_->Defining(name); }
+std::vector<FileId> ProjectFiles::DefiningMember(Text name) { return impl_->DefiningMember(name); }
+std::vector<FileId> ProjectFiles::DefiningMember(Text name, Text word) { return impl_->DefiningMember(name, word); }
 bool ProjectFiles::Refresh() { return impl_->Refresh(); }
 void ProjectFiles::Forget() { impl_->Forget(); }
 size_t ProjectFiles::ByteSize() const { return impl_->ByteSize(); }

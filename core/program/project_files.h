@@ -34,9 +34,11 @@ class ProjectFiles {
   // The same files one after the other, until `take` has enough and gives false: no more are searched. `take` asks
   // nothing of the project.
   void EachWithWord(Text word, const std::function<bool(FileId)>& take);
-  // Those in which a name may be defined as a function, a class, a variable or an attribute that is assigned: all in
-  // which it is, and some more. By an import or as a parameter is not counted.
-  std::vector<FileId> Defining(Text name);
+  // Those in which a name may be defined in the body of a class or as an attribute that is assigned: all in which it
+  // is, and some more. By an import is not counted.
+  std::vector<FileId> DefiningMember(Text name);
+  // Those of them that hold another word, too, and those that do and have `__slots__`, of which the name may be one.
+  std::vector<FileId> DefiningMember(Text name, Text word);
 
   // Looks whether files came or went; true where any did. What the files hold is looked at by the next question about
   // words. Costs a look at each folder.

@@ -64,6 +64,7 @@ WordKey KeyAt(const char* at, size_t size) {
 }
 
 WordKey DefinitionOf(WordKey word) { return MixedKey(word, 0x5DEECE66D); }
+WordKey MemberOf(WordKey word) { return MixedKey(word, 0x2545F4914F6CDD1D); }
 
 struct BlockMasks {
   uint64_t names;  // bytes of words
@@ -112,6 +113,7 @@ std::string WithSpare(Text word) {
 
 WordKey KeyOfWord(Text word) { return KeyAt(WithSpare(word).data(), word.size()); }
 WordKey KeyOfDefinition(Text name) { return DefinitionOf(KeyOfWord(name)); }
+WordKey KeyOfMember(Text name) { return MemberOf(KeyOfWord(name)); }
 
 bool HasWordKey(Text word) {
   return !word.empty() && !IsDigitByte(word[0]) && std::ranges::all_of(word, IsIdentifierByte);
@@ -124,6 +126,7 @@ void WordKeys::Clear(size_t size) {
   slots_.assign(slots, 0);
   slot_mask_ = slots - 1;
   keys_.clear();
+  attributes_.clear();
 }
 
 void WordKeys::Grow() {
@@ -205,8 +208,23 @@ inline void WordKeys::AddWord(size_t begin, size_t end) {
   }
 }
 
-void WordKeys::AddDefinition(size_t begin, size_t end) {
-  if (!IsDigitByte(text_[begin])) Add(DefinitionOf(KeyAt(text_ + begin, end - begin)));
+void WordKeys::AddDefinition(size_t begin, size_t end, bool is_annotated) {
+  if (IsDigitByte(text_[begin])) return;
+  const WordKey word = KeyAt(text_ + begin, end - begin);
+  Add(DefinitionOf(word));
+  if (IsBehindDot(begin) && (!is_annotated || BeginsStatement(begin))) attributes_.push_back(MemberOf(word));
+}
+
+bool WordKeys::IsBehindDot(size_t at) const {
+  while (at > 0 && (IsBlankByte(text_[at - 1]) || IsLineEndByte(text_[at - 1]))) --at;
+  return at > 0 && text_[at - 1] == '.';
+}
+
+// Whether a chain of names that ends there is the first of its statement.
+bool WordKeys::BeginsStatement(size_t at) const {
+  while (at > 0 && (text_[at - 1] == '.' || IsIdentifierByte(text_[at - 1]))) --at;
+  while (at > 0 && IsBlankByte(text_[at - 1])) --at;
+  return at == 0 || IsLineEndByte(text_[at - 1]) || text_[at - 1] == ';' || text_[at - 1] == ':';
 }
 
 size_t WordKeys::BeginOfWord(size_t end) const {
@@ -268,7 +286,7 @@ void WordKeys::ReadMark(size_t at) {
   }
   while (end > 0 && (IsBlankByte(text_[end - 1]) || IsLineEndByte(text_[end - 1]))) --end;
   const size_t begin = BeginOfWord(end);
-  if (begin < end) AddDefinition(begin, end);
+  if (begin < end) AddDefinition(begin, end, text_[at] == ':');
   if (!is_list || end == 0) return;
   if (begin < end) {
     // Nearly all are a name or a chain of them at the beginning of a line, or the first argument of a call.

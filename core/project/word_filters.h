@@ -16,6 +16,7 @@ namespace quillet {
 using WordKey = uint64_t;
 WordKey KeyOfWord(Text word);
 WordKey KeyOfDefinition(Text name);
+WordKey KeyOfMember(Text name);  // of a class
 
 // Whether keys tell of a word at all: a run of letters, digits and underscores that begins with no digit.
 bool HasWordKey(Text word);
@@ -32,6 +33,8 @@ class WordKeys {
   void Read(std::string& source);
 
   const std::vector<WordKey>& keys() const { return keys_; }
+  // Of the defined names that stand behind a dot, as members; some more than once.
+  const std::vector<WordKey>& attributes() const { return attributes_; }
   // Whether the source may define what its keys do not say: its targets go on without end.
   bool may_define_any() const { return may_define_any_; }
 
@@ -41,9 +44,11 @@ class WordKeys {
   void Add(WordKey key);
   void ReadBlocks();
   void AddWord(size_t begin, size_t end);
-  void AddDefinition(size_t begin, size_t end);
+  void AddDefinition(size_t begin, size_t end, bool is_annotated = false);
   size_t BeginOfWord(size_t end) const;
   size_t EndOfWord(size_t begin) const;
+  bool IsBehindDot(size_t at) const;
+  bool BeginsStatement(size_t at) const;
   bool EndsStatement(size_t line_end) const;
   void ReadMark(size_t at);
   void ReadTargetsBefore(size_t end);
@@ -58,6 +63,7 @@ class WordKeys {
   size_t budget_ = 0;  // bytes that may be looked at twice
   bool may_define_any_ = false;
   std::vector<WordKey> keys_;
+  std::vector<WordKey> attributes_;
   std::vector<WordKey> slots_;  // the same, open addressing; 0 for none
   size_t slot_mask_ = 0;
   std::vector<std::pair<size_t, size_t>> targets_;  // where they begin and end

@@ -202,7 +202,7 @@ std::vector<Location> Workspace::Impl::MembersNamed(Text name) {
   static constexpr size_t kFilesAtOnce = 256;
   std::vector<Location> found;
   size_t definers = 0;
-  const std::vector<FileId> candidates = project.Defining(name);
+  const std::vector<FileId> candidates = project.DefiningMember(name);
   for (size_t i = 0; i < candidates.size(); ++i) {
     if (i % kFilesAtOnce == 0)
       defined.ReadForMember(std::span(candidates).subspan(i, std::min(kFilesAtOnce, candidates.size() - i)), name);

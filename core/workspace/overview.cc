@@ -172,7 +172,7 @@ std::vector<Location> Workspace::Impl::MembersBelow(const SourceFile& file, Expr
     static constexpr size_t kMaxFiles = 200;
     size_t count = 0;
     const std::string of_class(inference.InfoOf(t.a).name);
-    for (const FileId id : project.WithWords({name, of_class})) {
+    for (const FileId id : project.DefiningMember(name, of_class)) {
       if (count == kMaxFiles) break;
       if (!defined.MayDefineMember(id, name)) continue;
       const SourceFile* source = Get(id);

@@ -142,7 +142,8 @@ TEST(ProjectFiles, AreFoundByWholeWords) {
 
 // A folder of files, of which a project was asked before they change.
 struct Changing {
-  TemporaryFolder folder = {{"a.py", "def total(): pass\n"}, {"b.py", "x = 1\n"}, {"sub/c.py", "total()\n"}};
+  TemporaryFolder folder = {
+      {"a.py", "class A:\n  def total(): pass\n"}, {"b.py", "x = 1\n"}, {"sub/c.py", "total()\n"}};
   Files files{Version::Of(3, 12)};
   ProjectFiles project{files, {folder.path()}};
 
@@ -152,13 +153,13 @@ struct Changing {
   }
   Paths All() { return Below(folder, files, project.All()); }
   Paths With(Text word) { return Below(folder, files, project.WithWords({word})); }
-  Paths Defining(Text name) { return Below(folder, files, project.Defining(name)); }
+  Paths DefiningMember(Text name) { return Below(folder, files, project.DefiningMember(name)); }
 };
 
 TEST(ProjectFiles, SeeWhatComesAndGoes) {
   Changing at;
   EXPECT_FALSE(at.project.Refresh());
-  at.folder.Write("sub/new.py", "total = 2\n");
+  at.folder.Write("sub/new.py", "self.total = 2\n");
   at.folder.Write("other/deep/d.py", "total\n");
   EXPECT_TRUE(at.project.Refresh());
   EXPECT_EQ(at.All(), (Paths{"a.py", "b.py", "other/deep/d.py", "sub/c.py", "sub/new.py"}));
@@ -168,7 +169,7 @@ TEST(ProjectFiles, SeeWhatComesAndGoes) {
   at.folder.Remove("other");
   EXPECT_TRUE(at.project.Refresh());
   EXPECT_EQ(at.With("total"), (Paths{"sub/c.py", "sub/new.py"}));
-  EXPECT_EQ(at.Defining("total"), (Paths{"sub/new.py"}));
+  EXPECT_EQ(at.DefiningMember("total"), (Paths{"sub/new.py"}));
   at.folder.Write("sub/notes.txt", "total\n");
   EXPECT_FALSE(at.project.Refresh());
 }
@@ -204,12 +205,13 @@ TEST(ProjectFiles, SeeWhatChanges) {
   // Larger than its filter was, again and again.
   std::string text;
   for (int i = 0; i < 5; ++i) {
-    for (int k = 0; k < 100; ++k) text += "name_" + std::to_string(i) + "_" + std::to_string(k) + " = " + "total\n";
+    for (int k = 0; k < 100; ++k)
+      text += "self.name_" + std::to_string(i) + "_" + std::to_string(k) + " = " + "total\n";
     at.folder.Write("b.py", text);
     at.project.Refresh();
-    EXPECT_EQ(at.Defining("name_" + std::to_string(i) + "_99"), (Paths{"b.py"}));
+    EXPECT_EQ(at.DefiningMember("name_" + std::to_string(i) + "_99"), (Paths{"b.py"}));
     EXPECT_EQ(at.With("total"), (Paths{"a.py", "b.py", "sub/c.py"}));
-    EXPECT_EQ(at.Defining("total"), (Paths{"a.py"}));
+    EXPECT_EQ(at.DefiningMember("total"), (Paths{"a.py"}));
   }
   at.folder.Write("b.py", "");
   at.project.Forget();
@@ -245,7 +247,7 @@ TEST(ProjectFiles, TakeTheTextOfBuffers) {
   at.files.Open(a, "nothing\n");
   EXPECT_EQ(at.With("total"), (Paths{"b.py", "sub/c.py"}));
   EXPECT_EQ(at.With("nothing"), (Paths{"a.py"}));
-  EXPECT_EQ(at.Defining("amount"), (Paths{"b.py"}));
+  EXPECT_EQ(at.DefiningMember("amount"), (Paths{"b.py"}));
   at.files.Change(b, 4, 10, "number");
   EXPECT_EQ(at.With("number"), (Paths{"b.py"}));
   EXPECT_TRUE(at.With("amount").empty());
@@ -255,7 +257,7 @@ TEST(ProjectFiles, TakeTheTextOfBuffers) {
   for (const FileId buffer : std::vector<FileId>(at.files.Buffers())) at.files.Close(buffer);
   EXPECT_TRUE(at.project.Refresh());
   EXPECT_EQ(at.With("total"), (Paths{"a.py", "sub/c.py"}));
-  EXPECT_EQ(at.Defining("total"), (Paths{"a.py"}));
+  EXPECT_EQ(at.DefiningMember("total"), (Paths{"a.py"}));
 }
 
 TEST(ProjectFiles, AreFoundByWhatIsNoWordAndByNothing) {
@@ -266,14 +268,14 @@ TEST(ProjectFiles, AreFoundByWhatIsNoWordAndByNothing) {
   EXPECT_EQ(at.With("12"), (Paths{"sub/c.py"}));
   EXPECT_EQ(at.With("\xC3\xA4hnlich"), (Paths{"sub/c.py"}));
   EXPECT_EQ(Below(at.folder, at.files, at.project.WithWords({})), at.All());
-  EXPECT_TRUE(at.Defining("").empty());
+  EXPECT_TRUE(at.DefiningMember("").empty());
 }
 
 // A folder of many files with an index of them, that a project may use.
 struct Indexed {
   static constexpr size_t kFiles = 90;
   TemporaryFolder folder = {
-      {"a.py", "def total(): pass\n"}, {"b.py", "self.total = 1 # cart\n"}, {"c.py", "total()\n"}};
+      {"a.py", "class A:\n  def total(): pass\n"}, {"b.py", "self.total = 1 # cart\n"}, {"c.py", "total()\n"}};
   std::vector<std::string> stored = {"a.py", "b.py", "c.py"};
   NameIndexWriter writer;
 
@@ -323,7 +325,7 @@ struct Indexed {
     Answers answers;
     answers.with_total = Below(folder, files, project.WithWords({"total"}));
     answers.read_first = project.read_count();
-    answers.defining = Below(folder, files, project.Defining("total"));
+    answers.defining = Below(folder, files, project.DefiningMember("total"));
     answers.with_cart = Below(folder, files, project.WithWords({"cart"}));
     answers.read = project.read_count();
     return answers;
@@ -345,6 +347,31 @@ TEST(ProjectFiles, ReadNothingThatAnIndexKnows) {
   EXPECT_LE(with.read, 12u);
   EXPECT_LE(at.Ask("us", {"many", ""}).read_first, 5u) << "of another root";
   EXPECT_EQ(at.Ask("us", {"many"}).read_first, Indexed::kFiles - 3) << "that of a root alone";
+}
+
+// Where lines do not tell, what is defined by anything counts.
+TEST(ProjectFiles, TellMembersFromOtherDefinitions) {
+  const TemporaryFolder folder = {
+      {"body.py", "class Cart:\n    if shop:\n        total: int = 1\n"},
+      {"given.py", "def fill(self):\n    self.total = 1\n"},
+      {"method.py", "class Cart:\n    def total(self): pass\n"},
+      {"nested.py", "def fill():\n    class Cart:\n        total = 1\n"},
+      {"untold.py", "class Cart:\n    def fill(self):\n        total = '\n"},
+      {"function.py", "def total(): pass\n"},
+      {"local.py", "class Cart:\n    def fill(self, total=1):\n        total = self.total\n"},
+      {"mentioned.py", "class Cart:\n    '''\n    total: of all\n    '''\n"},
+      {"module.py", "total = 1\nclass Cart: pass\n"},
+      {"read.py", "class Cart:\n    def fill(self):\n        for item in self.total: pass\n"},
+      {"slots.py", "class Cart:\n    __slots__ = ('total',)\n"},
+  };
+  Files files(Version::Of(3, 12));
+  ProjectFiles project(files, {folder.path()});
+  const auto defining = [&](Text name) { return Below(folder, files, project.DefiningMember(name)); };
+  EXPECT_EQ(defining("total").size(), 11u) << "searched, as there are no filters yet";
+  EXPECT_EQ(defining("total"), (Paths{"body.py", "given.py", "method.py", "nested.py", "untold.py"}));
+  EXPECT_EQ(Below(folder, files, project.DefiningMember("total", "Cart")),
+            (Paths{"body.py", "method.py", "nested.py", "slots.py", "untold.py"}));
+  EXPECT_TRUE(project.DefiningMember("total", "Shop").empty());
 }
 
 TEST(ProjectFiles, AreGivenOneAfterTheOtherUntilThereAreEnough) {
@@ -412,7 +439,7 @@ TEST(ProjectFiles, AskNoIndexForLongWords) {
   ProjectFiles project(files, {at.folder.path()}, "", "us");
   for (int i = 0; i < 2; ++i) {
     EXPECT_EQ(Below(at.folder, files, project.WithWords({name})), (Paths{"long.py"}));
-    EXPECT_EQ(Below(at.folder, files, project.Defining(name)), (Paths{"long.py"}));
+    EXPECT_EQ(Below(at.folder, files, project.DefiningMember(name)), (Paths{"long.py"}));
     EXPECT_TRUE(project.WithWords({Text(name).substr(1)}).empty());
   }
 }
@@ -529,6 +556,21 @@ TEST(WordKeys, TellDefinitionsFromOtherWords) {
     EXPECT_FALSE(Defines(source, "n")) << source;
 }
 
+TEST(WordKeys, TellAttributesThatAreGivenSomething) {
+  const auto is_attribute = [](std::string source) {
+    WordKeys keys;
+    keys.Read(source);
+    return std::ranges::count(keys.attributes(), KeyOfMember("n")) > 0;
+  };
+  for (const char* source :
+       {"self.n = 1", "a.b.n += 1", "a.n: int", "  a.n: int = 3", "if b: a.n: int", "b; a.n: int", "a . n = 1",
+        "(a.\n n) = 1", "a.\\\n n = 1", "b, a[0].n = c", "f(x).n = 1", "for a.n in c: pass", "with c as a.n: pass"})
+    EXPECT_TRUE(is_attribute(source)) << source;
+  for (const char* source : {"n = 1", "n: int", "def n(): pass", "class n: pass", "if a.n: pass", "for b in a.n: pass",
+                             "while not a.n: pass", "b[a.n:]", "a.n == 1", "f(a.n, b=1)", "a.n.b = 1", "a.n"})
+    EXPECT_FALSE(is_attribute(source)) << source;
+}
+
 TEST(WordKeys, HoldEveryWordWhereverItStands) {
   WordKeys keys;
   for (size_t size = 1; size < 70; ++size) {
@@ -555,7 +597,7 @@ TEST(WordKeys, AreBoundedWhereTargetsDoNotEnd) {
   folder.Write("a.py", "name" + source);
   Files files(Version::Of(3, 12));
   ProjectFiles project(files, {folder.path()});
-  EXPECT_EQ(Below(folder, files, project.Defining("name")), (Paths{"a.py"}));
+  EXPECT_EQ(Below(folder, files, project.DefiningMember("name")), (Paths{"a.py"}));
 }
 
 TEST(WordFilters, HoldTheirKeysAndFewOthers) {
