@@ -252,6 +252,25 @@ TEST(Syntax, WhatIsLeftOver) {
   EXPECT_EQ(SyntaxText("f(a.b=1)\n"), "Expression! (Call f (Attribute 'b' a) 1)!\n");
 }
 
+// What nests deeper than it is read is left out, and what it is left out of says so.
+TEST(Syntax, BracketsThatNestTooDeep) {
+  const auto nested = [](size_t depth, Text opening, Text closing) {
+    std::string text;
+    for (size_t i = 0; i < depth; ++i) text += opening;
+    text += "here";
+    for (size_t i = 0; i < depth; ++i) text += closing;
+    return SyntaxText(text + "\n");
+  };
+  for (const auto& [opening, closing] :
+       std::vector<std::pair<Text, Text>>{{"f(", ")"}, {"a[", "]"}, {"[", "]"}, {"{", "}"}}) {
+    EXPECT_EQ(nested(60, opening, closing).find('!'), std::string::npos) << opening;
+    const std::string deep = nested(500, opening, closing);
+    const std::string innermost = deep.substr(0, deep.find(')') + 2);
+    EXPECT_TRUE(innermost.ends_with(")!")) << innermost;
+    EXPECT_EQ(deep.find("here"), std::string::npos) << opening;
+  }
+}
+
 // ---- places ----
 
 TEST(Syntax, NamesAreFoundWhereTheyBegin) {

@@ -227,6 +227,21 @@ TEST(Failures, NoNodeIsAnAttributeError) {
   }
 }
 
+TEST(Failures, ACompoundOfNothingIsATypeError) {
+  const ParsedLine line("a + b");
+  auto* sum = line.Find<COperatorExpression>();
+  ASSERT_NE(sum, nullptr);
+  CNode* childless = sum->pool->Construct(sum->kind, sum->fClsInfo);
+  CNodeToTextConverter converter(true, true, true);
+  try {
+    converter.TextForNode(childless);
+    FAIL();
+  } catch (const Error& error) {
+    EXPECT_EQ(error.kind(), ErrorKind::kTypeError);
+    EXPECT_EQ(error.message(), "'NoneType' object is not subscriptable");
+  }
+}
+
 TEST(Failures, NestingPastTheBoundIsARecursionErrorAndSpoilsNothing) {
   const auto nested = [](int depth) { return std::string(depth, '[') + "1" + std::string(depth, ']'); };
   const int depth = CNodeToTextConverter::kMaxDepth;
