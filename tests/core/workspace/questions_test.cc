@@ -134,6 +134,19 @@ TEST(Definitions, DependOnTheVersion) {
   EXPECT_EQ(Program(text, Version::Of(2, 7)).Definitions(), Words{"a.py:5:7"});
 }
 
+TEST(Definitions, OfMembersDependOnTheVersion) {
+  const char* const text =
+      "import sys\nclass A:\n  if sys.version_info >= (3,):\n    def f(self): pass\n    x = 1\n  else:\n"
+      "    def f(self): pass\n    x = 2\n  if sys.version_info > (4,):\n    y = 1\nA().$f()\nA.$x\nA.$y\n";
+  Program three(text);
+  EXPECT_EQ(three.Definitions(0), Words{"a.py:4:9"});
+  EXPECT_EQ(three.Definitions(1), Words{"a.py:5:5"});
+  EXPECT_EQ(three.Definitions(2), Words{"a.py:10:5"});
+  Program two(text, Version::Of(2, 7));
+  EXPECT_EQ(two.Definitions(0), Words{"a.py:7:9"});
+  EXPECT_EQ(two.Definitions(1), Words{"a.py:8:5"});
+}
+
 TEST(Definitions, AreThoseThatReach) {
   EXPECT_EQ(Program("x = 1\nif a:\n  x = 2\n$x\n").Definitions(), (Words{"a.py:1:1", "a.py:3:3"}));
   EXPECT_EQ(Program("x = 1\nx = 2\n$x\n").Definitions(), Words{"a.py:2:1"});
@@ -467,6 +480,14 @@ TEST(Definitions, OfKeysThatAreGotten) {
   EXPECT_EQ(program.Definitions(0), (Words{"a.py:3:3"}));
   EXPECT_EQ(program.Definitions(1), (Words{"a.py:3:3"}));
   EXPECT_EQ(program.Definitions(2), Words());
+}
+
+TEST(Definitions, OfKeysThatSomeOfTheTypesHave) {
+  Program program(
+      "from typing import TypedDict\nclass M(TypedDict):\n  name: str\nclass N(TypedDict):\n  size: int\n  name: str\n"
+      "def f(m: M | int | N):\n  m['$name']\n  m['$size']\n");
+  EXPECT_EQ(program.Definitions(0), (Words{"a.py:3:3", "a.py:6:3"}));
+  EXPECT_EQ(program.Definitions(1), (Words{"a.py:5:3"}));
 }
 
 TEST(Definitions, OfKeysAreThoseOfWhatIsExpected) {
