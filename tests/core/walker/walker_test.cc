@@ -423,6 +423,26 @@ TEST(Imports, BindWhatTheyName) {
   });
 }
 
+// A host's trees.
+TEST(Imports, OfNamesWithoutPartsOrInPieces) {
+  const ParsedLine line("import a.b as c");
+  CDottedName* const name = line.Find<CDottedName>();
+  ASSERT_NE(name, nullptr);
+  CNode* const inner = name->pool->Construct(NodeKind::kCDottedName, nullptr);
+  std::copy_n(name->children, 3, name->pool->ResizeChildren(inner, 3));
+  name->pool->ResizeChildren(name, 1)[0] = inner;
+  CNodeWalker(kPy3).Walk(line.root(), &line.line());
+  EXPECT_EQ(RecordStrings(line.line()), (Records{"c :s:", "c :i:a.b", "c :a:c"}));
+  name->pool->ClearChildren(inner);
+  line.line().ClearDerivedInfo();
+  CNodeWalker(kPy3).Walk(line.root(), &line.line());
+  EXPECT_EQ(RecordStrings(line.line()), (Records{"c :s:", "c :i:", "c :a:c"}));
+  name->pool->ClearChildren(name);
+  line.line().ClearDerivedInfo();
+  CNodeWalker(kPy3).Walk(line.root(), &line.line());
+  EXPECT_EQ(RecordStrings(line.line()), (Records{"c :s:", "c :i:", "c :a:c"}));
+}
+
 // ---- definitions ----
 
 TEST(Definitions, OfFunctions) {
