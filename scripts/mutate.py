@@ -189,7 +189,7 @@ def changes_of(name: str, text: str) -> Iterator[Change]:
                 continue
             if kind == "jump" and match[0].startswith("break") and in_switch(masked, match.start()):
                 continue
-            yield Change(name, match.start(), match[0], new, kind)
+            yield Change(name, match.start(), text[match.start() : match.end()], new, kind)
     for match in CONSTANT.finditer(masked):
         number = int(match[1])
         for new_number in (number + 1, max(number - 1, 0)):
