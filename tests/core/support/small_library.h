@@ -270,9 +270,15 @@ TypeGuard: _SpecialForm
 TypeIs: _SpecialForm
 TypedDict: _SpecialForm
 Union: _SpecialForm
+class _Alias:
+    def __getitem__(self, typeargs: Any) -> Any: ...
+Counter = _Alias()
+Deque = _Alias()
 Dict = dict
-List = list
+FrozenSet = _Alias()
+List = _Alias()
 Set = set
+Text = str
 TYPE_CHECKING: bool
 
 _T = TypeVar("_T")
@@ -338,6 +344,14 @@ class ModuleType:
 class NoneType:
     def __bool__(self) -> bool: ...
 class EllipsisType: ...
+class FrameType:
+    f_lineno: int
+class GeneratorType:
+    gi_frame: FrameType
+class CoroutineType:
+    cr_frame: FrameType
+class AsyncGeneratorType:
+    ag_frame: FrameType
 class TracebackType:
     tb_lineno: int
 )"},
@@ -362,6 +376,8 @@ _K = TypeVar("_K")
 _V = TypeVar("_V")
 
 def namedtuple(typename: str, field_names: Any) -> type[tuple[Any, ...]]: ...
+class Counter(dict[_T, int]):
+    def total(self) -> int: ...
 class deque(Generic[_T]):
     def popleft(self) -> _T: ...
     def __iter__(self) -> Iterator[_T]: ...
