@@ -9,9 +9,10 @@
 
 A change is a comparison with its bound moved or turned round, "and" for "or", a condition that is always or
 never true, a constant or an index off by one, the branches of a "?:" exchanged, "break" for "continue", or a
-statement left out. Each is made in a copy of the tree (`--work`, below build/ by itself), which is built without
-optimisation; then the tests run, those of the changed folder first and then the one that compares digests, and the
-first that fails ends the trial. Tests that take long run last, and only where the digest sees a difference:
+statement left out. Each is made in a copy of the tree (`--work`, below build/ by itself), which is built with
+little optimisation, as the tests take longer than the compiler; then the tests run, those of the changed folder first
+and then the one that compares digests, and the first that fails ends the trial. Tests that take long run last, and
+only where the digest sees a difference:
 
     noticed     a test of the core failed, crashed or ran out of time
     python      only a test of the package noticed (with --python, which builds the extension and asks those tests
@@ -296,7 +297,7 @@ class Workshop:
             "-G",
             "Ninja",
             "-DCMAKE_BUILD_TYPE=Debug",
-            "-DCMAKE_CXX_FLAGS_DEBUG=-O0 -w",
+            "-DCMAKE_CXX_FLAGS_DEBUG=-O1 -w",
             *flags,
         ]
         require([*base, "-B", self.build, "-DQUILLET_TESTS=ON", "-DQUILLET_EXTENSION=OFF"])
@@ -418,7 +419,7 @@ class Workshop:
         for name in names:
             if not self.builds([f"{name}_test"]):
                 return "invalid", ""
-            failure = self.run_test(name, timeout=30 + 8 * self.times[name])
+            failure = self.run_test(name, timeout=20 + 6 * self.times[name])
             if failure:
                 return "noticed", failure
         return None

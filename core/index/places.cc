@@ -15,9 +15,8 @@ constexpr char kSeparator = static_cast<char>(std::filesystem::path::preferred_s
 bool IsSeparator(char c) { return c == '/' || (kSeparator == '\\' && c == '\\'); }
 
 bool IsBelow(Text path, Text folder) {
-  if (path == folder) return true;
   while (!folder.empty() && IsSeparator(folder.back())) folder.remove_suffix(1);
-  return path.size() > folder.size() && path.starts_with(folder) && IsSeparator(path[folder.size()]);
+  return path.starts_with(folder) && (path.size() == folder.size() || IsSeparator(path[folder.size()]));
 }
 
 bool IsAbsolute(Text path) {

@@ -298,22 +298,6 @@ std::string Workspace::Impl::DocumentationOf(TypeId type) {
   return found;
 }
 
-std::string Workspace::Impl::KindOf(TypeId type, bool is_member) {
-  const Type t = inference.types()[type];
-  switch (t.kind) {
-    case TypeKind::kModule:
-      return "module";
-    case TypeKind::kClass:
-      return "class";
-    case TypeKind::kFunction:
-      return is_member ? "method" : "function";
-    case TypeKind::kInstance:
-      return inference.InfoOf(t.a).name == "property" ? "property" : "variable";
-    default:
-      return "variable";
-  }
-}
-
 Value Workspace::Impl::ValueAt(const SourceFile& file, uint32_t index) {
   const Occurrence& occurrence = file.bindings.occurrences[index];
   const FileSyntax& syntax = file.syntax;

@@ -179,7 +179,6 @@ class Workspace::Impl final : public CallerSource {
   std::string DocumentationOf(FileId file, StmtId stmt);
   std::string DocumentationOf(TypeId type);
   std::string DocumentationOf(const Entity& entity);
-  std::string KindOf(TypeId type, bool is_member);
   ExprId ExpressionClosedAt(const SourceFile& file, uint32_t offset);
   Value ValueAt(const SourceFile& file, uint32_t occurrence);
 

@@ -202,6 +202,7 @@ TEST(CompleteErrors, AreWhereAndWhatTheyAre) {
       {"if a = 1: pass\n", "1:4 invalid syntax. Maybe you meant '==' or ':=' instead of '='?"},
       {"while a = b: pass\n", "1:7 invalid syntax. Maybe you meant '==' or ':=' instead of '='?"},
       {"f(a = b = c)\n", "1:9 invalid syntax"},
+      {"f(a=b for c in d)\n", "1:3 invalid syntax. Maybe you meant '==' or ':=' instead of '='?"},
       {"x = {a = 1}\n", "1:6 invalid syntax. Maybe you meant '==' or ':=' instead of '='?"},
       {"(a = 1)\n", "1:2 invalid syntax. Maybe you meant '==' or ':=' instead of '='?"},
       {";\n", "1:1 invalid syntax"},

@@ -140,6 +140,16 @@ TEST(CompleteReading, AFormOfANewerVersionHasItsNamesWhereverItStands) {
   }
 }
 
+TEST(CompleteReading, ATemplateEndsWhereItsFieldsSay) {
+  FileAnalyzer newest(CompleteOptions(Version::Of(3, 14)));
+  EXPECT_EQ(ResultOf(newest, "x = t'{a['b']} {c}' # '\n"), ResultOf(newest, "x = t'{a[\"b\"]} {c}' # '\n"));
+  EXPECT_EQ(ResultOf(newest, "x = rt'{a['b']}\\' # '\n"), ResultOf(newest, "x = rt'{a[\"b\"]}\\' # '\n"));
+  EXPECT_NE(ResultOf(newest, "x = t 'a'\n"), ResultOf(newest, "x = t'a'\n"));
+  EXPECT_NE(ResultOf(newest, "x = t'{a['b']}'\n"), ResultOf(newest, "x = s'{a['b']}'\n"));
+  FileAnalyzer before(CompleteOptions(Version::Of(3, 13)));
+  EXPECT_NE(ResultOf(before, "x = t'{a['b']} {c}'\n"), ResultOf(newest, "x = t'{a['b']} {c}'\n"));
+}
+
 TEST(CompleteReading, ExceptionTypesHaveOneCommaBetweenThem) {
   FileAnalyzer files(CompleteOptions(Version::Of(3, 14)));
   for (const auto& [types, is_fine] :

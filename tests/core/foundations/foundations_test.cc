@@ -1,6 +1,7 @@
 // UTF-8 primitives, character tables, errors and the text arena.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <string>
 #include <thread>
 #include <unordered_map>
@@ -307,6 +308,9 @@ TEST(Errors, ReprOfTextChoosesQuotesAndEscapesAsTheHostDoes) {
   EXPECT_EQ(ReprOfText("a\\b\n\r\t\x01\x7f"), "'a\\\\b\\n\\r\\t\\x01\\x7f'");
   EXPECT_EQ(ReprOfText("\xC3\xA9\xC2\x85"), "'\xC3\xA9\\x85'");
   EXPECT_EQ(ReprOfText("\xFF"), "'\\xff'");
+  SetCharPageLoader([](uint32_t, uint8_t* classes) { std::fill_n(classes, kCharPageSize, uint8_t{0}); });
+  EXPECT_EQ(ReprOfText("\xC3\xBF\xC4\x80\xEF\xBF\xBF\xF0\x90\x80\x80"), "'\\xff\\u0100\\uffff\\U00010000'");
+  SetCharPageLoader(nullptr);
 }
 
 TEST(Errors, EveryKindHasTheNameOfAHostException) {

@@ -333,6 +333,19 @@ TEST(Questions, AreAnsweredAlikeOutOfTheStatementsThatHoldTheirWord) {
   }
 }
 
+TEST(Questions, TellRecordsFromOtherOccurrences) {
+  const auto kinds = [](Text source, Text name) {
+    const auto writer = MakeQuestionWriter(QuestionFor(Match::kExact, name), testing::kPy3, MakeAnswerBytes(false));
+    std::vector<std::string> found;
+    EXPECT_TRUE(ReadAnswers(Written(*writer, source), [&](const Answer& answer, Text) {
+      found.push_back((answer.is_record ? "" : "also ") + std::string(KindWordOf(answer)));
+    }));
+    return found;
+  };
+  EXPECT_EQ(kinds("x = 1\nx.y\n", "x"), (Found{"set", "literal", "get"}));
+  EXPECT_EQ(kinds("global x\nf(x=1)\n@x\ndef g(): pass\n", "x"), (Found{"global", "also keyword", "called", "get"}));
+}
+
 TEST(Questions, HandOnTheSourceLineCutWhereItIsLong) {
   const Question question = QuestionFor(Match::kExact, "x");
   const std::string source = "x = 1; x = 2\r\ny\nx = '" + std::string(9000, 'a') + "'";

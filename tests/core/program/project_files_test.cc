@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <chrono>
 #include <filesystem>
 #include <optional>
@@ -34,6 +35,21 @@ Paths All(const TemporaryFolder& folder, const Paths& roots = {""}) {
   Paths whole;
   for (const std::string& root : roots) whole.push_back(folder / root);
   return Below(folder, files, ProjectFiles(files, whole).All());
+}
+
+// What went wrong before counts for nothing.
+TEST(Folders, AreListed) {
+  const TemporaryFolder folder = {{"a.py", ""}, {"b/c.py", ""}};
+  for (const int before : {0, EACCES}) {
+    std::vector<ListedEntry> entries;
+    errno = before;
+    EXPECT_EQ(ListFolder(folder.path(), entries), std::nullopt);
+    EXPECT_EQ(entries.size(), 2u);
+    EXPECT_EQ(ListFolder(folder.path() + "/b", entries), std::nullopt);
+    EXPECT_EQ(entries.size(), 1u);
+    EXPECT_EQ(ListFolder(folder.path() + "/d", entries), ENOENT);
+    EXPECT_EQ(ListFolder(folder.path() + "/a.py", entries), ENOTDIR);
+  }
 }
 
 TEST(ProjectFiles, AreSourcesAndStubsInOrder) {

@@ -879,6 +879,7 @@ TEST(FromImportTest, TheStar) {
   EXPECT_TRUE(Parse3("from x import *").Find<CFromImportStmt>()->GetImportStar());
   EXPECT_FALSE(Parse3("from x import a").Find<CFromImportStmt>()->GetImportStar());
   EXPECT_FALSE(Bare<CFromImportStmt>({BareLeaf("from"), BareLeaf("*")})->GetImportStar());
+  EXPECT_TRUE(Bare<CFromImportStmt>({BareLeaf("from"), BareLeaf("import"), BareLeaf("*")})->GetImportStar());
 }
 
 TEST(FromImportTest, WithoutAnImportChildThereIsNoFromText) {
