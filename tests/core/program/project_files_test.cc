@@ -40,13 +40,17 @@ Paths All(const TemporaryFolder& folder, const Paths& roots = {""}) {
 // What went wrong before counts for nothing.
 TEST(Folders, AreListed) {
   const TemporaryFolder folder = {{"a.py", ""}, {"b/c.py", ""}};
+  std::filesystem::create_directory(folder.path() + "/empty");
   for (const int before : {0, EACCES}) {
     std::vector<ListedEntry> entries;
     errno = before;
     EXPECT_EQ(ListFolder(folder.path(), entries), std::nullopt);
-    EXPECT_EQ(entries.size(), 2u);
+    EXPECT_EQ(entries.size(), 3u);
     EXPECT_EQ(ListFolder(folder.path() + "/b", entries), std::nullopt);
     EXPECT_EQ(entries.size(), 1u);
+    errno = before;
+    EXPECT_EQ(ListFolder(folder.path() + "/empty", entries), std::nullopt);
+    EXPECT_EQ(entries.size(), 0u);
     EXPECT_EQ(ListFolder(folder.path() + "/d", entries), ENOENT);
     EXPECT_EQ(ListFolder(folder.path() + "/a.py", entries), ENOTDIR);
   }

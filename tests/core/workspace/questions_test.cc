@@ -484,10 +484,11 @@ TEST(Definitions, OfKeysThatAreGotten) {
 
 TEST(Definitions, OfKeysThatSomeOfTheTypesHave) {
   Program program(
-      "from typing import TypedDict\nclass M(TypedDict):\n  name: str\nclass N(TypedDict):\n  size: int\n  name: str\n"
-      "def f(m: M | int | N):\n  m['$name']\n  m['$size']\n");
-  EXPECT_EQ(program.Definitions(0), (Words{"a.py:3:3", "a.py:6:3"}));
-  EXPECT_EQ(program.Definitions(1), (Words{"a.py:5:3"}));
+      "from typing import TypedDict\nclass M(TypedDict):\n  name: str\n  age: int\nclass N(TypedDict):\n  size: int\n"
+      "  name: str\ndef f(m: M | int | N):\n  m['$name']\n  m['$size']\n  m['$age']\n");
+  EXPECT_EQ(program.Definitions(0), (Words{"a.py:3:3", "a.py:7:3"}));
+  EXPECT_EQ(program.Definitions(1), (Words{"a.py:6:3"}));
+  EXPECT_EQ(program.Definitions(2), (Words{"a.py:4:3"}));
 }
 
 TEST(Definitions, OfKeysAreThoseOfWhatIsExpected) {
