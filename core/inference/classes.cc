@@ -241,9 +241,8 @@ void Inference::FindMembers(ClassId cls) {
     if (bindings.symbols[symbol].variable != symbol) continue;
     for (const uint32_t i : file->occurrences().Of(symbol)) {
       const Occurrence& occurrence = bindings.occurrences[i];
-      if (!occurrence.binds()) continue;
-      info.symbols.emplace(Kept(bindings.TextOf(occurrence)), symbol);  // as spelled: attributes are not mangled
-      break;
+      // As each is spelled, `__x` and `_A__x`: attributes are not mangled.
+      if (occurrence.binds()) info.symbols.emplace(Kept(bindings.TextOf(occurrence)), symbol);
     }
   }
   const Stmt& own = syntax.stmt(info.stmt);

@@ -482,6 +482,17 @@ TEST(Definitions, OfKeysThatAreGotten) {
   EXPECT_EQ(program.Definitions(2), Words());
 }
 
+TEST(Definitions, OfPrivateMembersAreFoundAsSpelled) {
+  Program program(
+      "class A:\n  __x = 1\n  _A__x = ''\n  _A__y = 1\n  def m(self):\n    self.$__x\n    self.$_A__x\n"
+      "    self.$_A__y\nA.$_A__x\n");
+  EXPECT_EQ(program.Definitions(0), (Words{"a.py:2:3", "a.py:3:3"}));
+  EXPECT_EQ(program.Definitions(1), (Words{"a.py:2:3", "a.py:3:3"}));
+  EXPECT_EQ(program.Definitions(2), Words{"a.py:4:3"});
+  EXPECT_EQ(program.Definitions(3), (Words{"a.py:2:3", "a.py:3:3"}));
+  EXPECT_EQ(program.Types(1), "builtins.str");
+}
+
 TEST(Definitions, OfKeysThatSomeOfTheTypesHave) {
   Program program(
       "from typing import TypedDict\nclass M(TypedDict):\n  name: str\n  age: int\nclass N(TypedDict):\n  size: int\n"
