@@ -132,7 +132,15 @@ void Inference::FindBases(ClassId cls) {
       } else if (t.kind == TypeKind::kTypeForm) {  // `tuple[int, str]`
         for (const TypeId inner : types_.CopyOf(types_.ArgOf(id, 0))) {
           const ClassId found = ClassOfType(inner);
-          if (found != kNoId) add_base(found, {});
+          if (found == kNoId) continue;
+          std::vector<TypeSetId> args;
+          for (size_t i = 0; i < types_[inner].args_count; ++i) args.push_back(types_.ArgOf(inner, i));
+          if (types_[inner].kind == TypeKind::kTuple && !args.empty()) {
+            Value items;
+            for (const TypeSetId item : args) items = types_.Union(items, Value{item, 0});
+            args = {items.Packed()};
+          }
+          add_base(found, std::move(args));
         }
       }
     }

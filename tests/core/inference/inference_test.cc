@@ -652,6 +652,15 @@ TEST(Inference, KnowsWhatANamedTupleIsMadeOf) {
   });
 }
 
+TEST(Inference, KnowsTheItemsOfBasesWithArguments) {
+  Check({
+      {"class A(tuple[int, str]):\n  def f(self): return self[0]\nclass B(tuple[int, ...]): pass\n"
+       "Keys = dict[str, float]\nclass C(Keys): pass\nclass D(list[A]): pass\n"
+       "$a = A()[1]\n$b = A().f()\nfor $c in A(): pass\n$d = B()[0]\n$e = C()['']\n$f = D()[0][0]\n",
+       {"int | str", "int | str", "int | str", "int", "float", "int | str"}},
+  });
+}
+
 TEST(Inference, KnowsWhatIsGottenFromATypedDictionary) {
   Check({
       {"from typing import TypedDict\nclass M(TypedDict):\n  name: str\n  year: int\ndef f(m: M, k: str, n: M | "
