@@ -277,9 +277,11 @@ class Inference {
   TypeTable& types() { return types_; }
   Files& files() { return files_; }
   Modules& modules() { return modules_; }
-  // A file that is read for a question, once: whether it was read for an earlier one, too, makes no difference to it.
+  // A file that is read. A guess pays for it, once a question: whether it was read for an earlier one, too, makes no
+  // difference to it, nor whether what is sure was found in it.
   const SourceFile* FileOf(FileId file) {
     const SourceFile* source = files_.Get(file);
+    if (guess_level_ == kMaxGuesses && !is_within_guess_) return source;
     if (file >= read_for_.size()) read_for_.resize(file + 1);
     if (std::exchange(read_for_[file], question_) != question_ && source != nullptr) unpaid_ += source->text().size();
     return source;
@@ -396,7 +398,7 @@ class Inference {
   }
   // Makes guesses pay for the files that were read for them.
   void CountReading() {
-    static constexpr uint64_t kBytesOfAStep = 256;
+    static constexpr uint64_t kBytesOfAStep = 240;
     if (unpaid_ == 0) return;
     guess_steps_ -= static_cast<uint32_t>(std::min<uint64_t>(guess_steps_, unpaid_ / kBytesOfAStep));
     unpaid_ = 0;
@@ -658,6 +660,7 @@ class Inference {
   bool has_met_bound_ = false;
   uint32_t question_ = 1;           // its number
   std::vector<uint32_t> read_for_;  // by files: the last question
+  bool is_within_guess_ = false;    // whether what is found surely is found for one
   uint64_t unpaid_ = 0;             // bytes of files that guesses have not paid for
   int depth_ = 0;
   int max_depth_ = kMaxDepth;

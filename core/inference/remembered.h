@@ -46,6 +46,7 @@ class Inference::Afresh {
       : in_(inference),
         first_(in_.for_now_.size()),
         is_for_guess_(is_for_guess),
+        was_within_guess_(in_.is_within_guess_),
         steps_(in_.steps_),
         max_depth_(in_.max_depth_),
         guess_level_(in_.guess_level_),
@@ -57,6 +58,7 @@ class Inference::Afresh {
     static constexpr uint32_t kSteps = 2000;
     in_.surface_ = static_cast<int>(in_.finding_.size());
     in_.lowest_ = INT32_MAX;
+    in_.is_within_guess_ = was_within_guess_ || (guess_level_ < kMaxGuesses && in_.depth_ > 0);
     in_.guess_level_ = kMaxGuesses;
     in_.max_depth_ = std::min(std::max(max_depth_, in_.depth_ + depth), 2 * kMaxDepth);
     in_.steps_ = is_for_guess ? in_.guess_steps_ : std::max(steps_, kSteps);
@@ -72,6 +74,7 @@ class Inference::Afresh {
       in_.steps_ = steps_ > used ? steps_ - used : 0;
     }
     in_.max_depth_ = max_depth_;
+    in_.is_within_guess_ = was_within_guess_;
     in_.guess_level_ = guess_level_;
     in_.lowest_ = lowest_;
     in_.surface_ = surface_;
@@ -86,6 +89,7 @@ class Inference::Afresh {
   Inference& in_;
   const size_t first_;
   const bool is_for_guess_;  // what is found surely for its sake counts as steps of the guess
+  const bool was_within_guess_;
   const uint32_t steps_;
   uint32_t given_ = 0;
   const int max_depth_, guess_level_, lowest_, surface_;

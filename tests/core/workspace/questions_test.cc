@@ -1127,6 +1127,14 @@ TEST(Questions, LetTheLastOfGuessesPayForWhatIsSure) {
   EXPECT_FALSE(program->was_bounded());
 }
 
+TEST(Questions, LetNoGuessPayForFilesInWhichWhatIsSureWasFound) {
+  const std::string text = "class A: pass\ndef f(x):\n  y = made() or x\n  $y\nf(A())\n";
+  const std::string too_long = "# " + std::string(size_t{4} << 20, '-') + "\n";
+  Program program({{"a.py", "from b import made\n" + text}, {"b.py", too_long + "def made() -> int: ...\n"}});
+  EXPECT_EQ(program.Types(0), "a.A | builtins.int");
+  EXPECT_FALSE(program->was_bounded());
+}
+
 TEST(Questions, SayThatMoreFilesDefineAMemberThanTheyLookAt) {
   testing::TemporaryFolder folder = {{"a.py", "def f(x): x.speed; x.weight\n"}};
   for (int i = 0; i < 401; ++i) {
