@@ -485,23 +485,15 @@ std::vector<Signature> Workspace::Signatures(FileId id, uint32_t offset) {
   // Which argument: by the commas in front of the place at the call's own level.
   size_t position = 0;
   Text keyword;
-  {
-    const Text text = file->text();
-    uint32_t at = syntax[children[0]].end;
-    while (at < text.size() && text[at] != '(') ++at;
-    uint32_t from = at + 1;
-    for (size_t i = 1; i < children.size(); ++i) {
-      if (syntax[children[i]].end >= offset) {
-        if (syntax[children[i]].kind == ExprKind::kKeyword && syntax[children[i]].begin < offset)
-          keyword = syntax.NameOf(children[i]);
-        break;
-      }
-      from = syntax[children[i]].end;
-      const size_t comma = text.find(',', from);
-      if (comma == Text::npos || comma >= offset) break;
-      ++position;
-      from = static_cast<uint32_t>(comma) + 1;
+  for (size_t i = 1; i < children.size(); ++i) {
+    if (syntax[children[i]].end >= offset) {
+      if (syntax[children[i]].kind == ExprKind::kKeyword && syntax[children[i]].begin < offset)
+        keyword = syntax.NameOf(children[i]);
+      break;
     }
+    const size_t comma = file->text().find(',', syntax[children[i]].end);
+    if (comma == Text::npos || comma >= offset) break;
+    ++position;
   }
   const Value callee = in.inference.ValueOf(id, children[0]);
   const auto add = [&](FunctionId function, bool is_bound, Text name) {

@@ -245,6 +245,8 @@ TEST(JoinedTokens, TakeTextsThatWereJoinedBefore) {
   EXPECT_EQ(Joined({"x", "not in", "(a, b)"}), "x not in (a, b)");
   EXPECT_EQ(Joined({"(", "a, b", ")"}), "(a, b)");
   EXPECT_EQ(Joined({"a", ":", "b", ":c"}), "a:b:c");
+  EXPECT_EQ(Joined({"[", "lambda: x:", "y", "]"}), "[lambda: x:y]");
+  EXPECT_EQ(Joined({"(", "lambda", ":", "x:", "y", ")"}), "(lambda: x:y)");
   EXPECT_EQ(Joined({"f", "(x)", ".y"}), "f(x).y");
   EXPECT_EQ(Joined({"not", "-x"}), "not -x");
   EXPECT_EQ(Joined({"[", "x", "for x in y", "]"}), "[x for x in y]");
