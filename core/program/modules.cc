@@ -419,16 +419,16 @@ class Modules::Impl {
     } else {
       name = LastPartOf(place);
     }
+    if (is_package) {
+      const ModuleId found = ModuleOfFolder(std::string(folder));
+      if (entries_[found].module.file == file || entries_[found].module.stub == file) return found;
+    }
     Entry entry;
     entry.is_stray = true;
     entry.module.name = std::move(name);
     (is_stub ? entry.module.stub : entry.module.file) = file;
     entry.module.is_package = is_package;
     entry.module.is_project = IsOfProject(path);
-    if (is_package) {
-      entry.module.folders.emplace_back(folder);
-      entry.sources.emplace_back(folder);
-    }
     return AddEntry(std::move(entry));
   }
 

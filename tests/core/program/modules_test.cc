@@ -220,6 +220,26 @@ TEST(Modules, FollowRelativeImports) {
             world.modules().Find("pack.a"));
 }
 
+TEST(Modules, OutsideOfAllFoldersArePackagesOfTheirOwn) {
+  const TemporaryFolder folder = {
+      {"project/a.py", ""}, {"aside/pack/__init__.py", ""}, {"aside/pack/b.py", ""}, {"aside/stubs/__init__.pyi", ""}};
+  for (const bool is_file_first : {false, true}) {
+    World world(folder);
+    const FileId file = world.files().NumberOf(folder / "aside/pack/__init__.py");
+    const ModuleId by_file = is_file_first ? world.modules().OfFile(file) : kNoModule;
+    EXPECT_EQ(world.From("aside/pack/b.py", 1, ""), "aside/pack/__init__.py");
+    const ModuleId package = world.modules().FindFrom(world.files().NumberOf(folder / "aside/pack/b.py"), 1, "");
+    EXPECT_EQ(world.modules().OfFile(file), package);
+    if (is_file_first) {
+      EXPECT_EQ(by_file, package);
+    }
+    EXPECT_EQ(world.NameOf("aside/pack/__init__.py"), "pack");
+    EXPECT_EQ(world.modules().ChildNames(package), std::vector<std::string>{"b"});
+    EXPECT_NE(world.modules().Child(package, "b"), kNoModule);
+    EXPECT_EQ(world.NameOf("aside/stubs/__init__.pyi"), "stubs");
+  }
+}
+
 TEST(Modules, LookBesideTheFileFirstInPython2) {
   const TemporaryFolder folder = {
       {"project/pack/__init__.py", ""},
