@@ -335,6 +335,16 @@ TEST(TypeComments, OfLoopsAndWithStatements) {
   });
 }
 
+// A host may say where a node stands in place of which token it is.
+TEST(TypeComments, EndTheRowsOfAStatementAsAHostSays) {
+  const ParsedLine line("a + b");
+  CNode* const first = line.root()->ChildAt(0);
+  first->fContext = Context::At({7, 3});
+  EXPECT_EQ(HintWalker().GetRowRange(first), std::make_pair(int64_t{7}, int64_t{8}));
+  first->fContext = Context::Foreign(1);
+  EXPECT_THROW(HintWalker().GetRowRange(first), Error);
+}
+
 TEST(TypeComments, OnTheOlderGrammar) {
   ExpectHints({{"x = 1  # type: int", {"x int"}}, {"for x in y:  # type: int", {"x int"}}}, kPy2);
 }
