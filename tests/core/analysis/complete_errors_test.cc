@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <vector>
 
 #include "analysis/file_analyzer.h"
 #include "tests/core/support/analyzer_helper.h"
@@ -216,6 +217,50 @@ TEST(CompleteErrors, AreWhereAndWhatTheyAre) {
   };
   FileAnalyzer files(Options());
   for (const Case& one : cases) EXPECT_EQ(testing::ErrorsOf(files, one.source), one.errors) << one.source;
+}
+
+TEST(CompleteErrors, TellKeysThatComeTwiceHoweverTheyAreSpelled) {
+  const std::vector<std::vector<const char*>> values = {
+      {"0", "00", "-0", "0.0", "0j", "False"},
+      {"1", "1.0", "1+0j", "True"},
+      {"2"},
+      {"10"},
+      {"12"},
+      {"120"},
+      {"16", "0x10", "0X1_0", "0b10000", "0o20", "1_6"},
+      {"100", "1e2", "1E+2", "100.0"},
+      {"0.5", ".5", "5e-1", "50e-2"},
+      {"1.5", "15e-1"},
+      {"-1", "- 1", "-1.0"},
+      {"1j", "1J"},
+      {"-1j"},
+      {"1+2j", "1 + 2j", "1.0+2.0j"},
+      {"1-2j"},
+      {"-1+2j"},
+      {"'a'", "\"a\"", "'\\x61'", "'\\u0061'", "'\\U00000061'", "'\\141'", "r'a'", "u'a'", "'a' ''", "'''a'''"},
+      {"'ab'", "'a' 'b'", "'a\\\nb'"},
+      {"'\\n'", "'\\12'", "'\\012'", "'\\x0a'"},
+      {"r'\\n'", "'\\\\n'"},
+      {"'\\0'", "'\\x00'"},
+      {"'\\a\\b\\f\\r\\t\\v'", "'\\x07\\x08\\x0c\\x0d\\x09\\x0b'"},
+      {"'\\xe9'", "'\\u00e9'"},
+      {"b'a'", "b'\\x61'", "rb'a'"},
+      {"''"},
+      {"b''"},
+      {"None"},
+  };
+  FileAnalyzer files(Options());
+  for (size_t i = 0; i < values.size(); ++i) {
+    for (size_t j = 0; j < values.size(); ++j) {
+      for (const char* first : values[i]) {
+        for (const char* second : values[j]) {
+          const std::string source = std::string("match x:\n  case {") + first + ": _, " + second + ": _}: pass\n";
+          EXPECT_EQ(testing::ErrorsOf(files, source.c_str()).find("duplicate key") != std::string::npos, i == j)
+              << source;
+        }
+      }
+    }
+  }
 }
 
 TEST(CompleteErrors, AreNoneInWhatOnlyLooksBroken) {
