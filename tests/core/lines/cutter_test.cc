@@ -544,6 +544,20 @@ TEST(LogicalLines, ShowARow) {
   EXPECT_EQ(TextFromTokens(line), "b = [1,\n  2]");
 }
 
+TEST(LogicalLines, TellNoPlaceOfWhatIsNotInTheirSource) {
+  const Cut cut("a\nb = c\n");
+  LogicalLine line;
+  SetFromRow(line, cut.source, cut.rows[1]);
+  std::vector<Token> tokens(line.toks.begin(), line.toks.end());
+  static constexpr char kElsewhere[] = "x";
+  tokens[0].text = nullptr;
+  tokens[1].text = kElsewhere;
+  line.toks = tokens;
+  EXPECT_EQ(line.positions()[0], Position());
+  EXPECT_EQ(line.positions()[1], Position());
+  EXPECT_EQ(line.positions()[2], (Position{0, 4}));
+}
+
 TEST(LogicalLines, HoldTheirSourceOrLeaveItToOthers) {
   const Cut cut("a");
   const Ref<SourceText> other = SourceText::Copy("b");
