@@ -337,11 +337,11 @@ def files_of(paths: Iterable[Path]) -> list[Path]:
     return files
 
 
-def own_library() -> list[Path]:
-    """The files of the running interpreter's library, tests included."""
+def own_library(each_nth: int = 1) -> list[Path]:
+    """The files of the running interpreter's library, tests included, or every n-th of them."""
     library = library_of(sys.executable)
     assert library is not None
-    return library.files()
+    return library.files(each_nth)
 
 
 def main() -> int:
