@@ -4,6 +4,8 @@
 
 #include <algorithm>
 #include <array>
+#include <bit>
+#include <cstring>
 #include <initializer_list>
 #include <utility>
 
@@ -21,12 +23,7 @@ constexpr Text kFuture = "__future__";
 constexpr size_t kMostBlocks = 100;  // as deep as the language lets blocks nest, the file itself with them
 
 using Role = BlockRules::Role;
-
-struct alignas(uint32_t) FactsOfKind {
-  Role role;
-  BlockRules::Head head;        // of what stands inside
-  BlockRules::Clauses clauses;  // that may come behind it
-};
+using FactsOfKind = BlockRules::FactsOfKind;
 
 constexpr auto kFactsOfKinds = [] {
   using Head = BlockRules::Head;
@@ -59,6 +56,19 @@ constexpr auto kFactsOfKinds = [] {
 constexpr const FactsOfKind& FactsOf(const LineRow& row) { return kFactsOfKinds[static_cast<size_t>(row.kind)]; }
 constexpr Role RoleOf(LineKind kind) { return kFactsOfKinds[static_cast<size_t>(kind)].role; }
 bool IsHeadKind(LineKind kind) { return RoleOf(kind) >= Role::kHead; }
+
+// A place as one number, which is moved as such and not field by field.
+using PackedPlace = uint64_t;
+static_assert(sizeof(PackedPlace) == sizeof(LinePlace));
+inline PackedPlace Pack(const LinePlace& place) {
+  PackedPlace packed;
+  std::memcpy(&packed, &place, sizeof packed);
+  return packed;
+}
+inline void Unpack(PackedPlace packed, LinePlace& place) {
+  std::memcpy(static_cast<void*>(&place), &packed, sizeof packed);
+}
+constexpr auto kFirstInDef = std::bit_cast<PackedPlace>(LinePlace{.first_in_def = true});
 
 bool IsDefinitionKind(LineKind kind) { return kind == LineKind::kFunctionDef || kind == LineKind::kClassDef; }
 
@@ -148,81 +158,90 @@ size_t BlockRules::GoOn(size_t index) {
     next_place_ = *outside_inline_;
     outside_inline_.reset();
   }
-  if ((watch_ & ~kHead) != 0) return index;
+  // Between the cases of a match no statement goes on.
+  const bool is_between_cases =
+      blocks_.back().clauses == Clauses::kCase || (head_index_ != kNoRow && head_ == Head::kMatch);
+  if ((watch_ & ~kHead) != 0 || is_between_cases) return index;
   const Token* const tokens = source_->tokens.data();
   const LineRow* const rows = rows_.data();
   const LineRow* const end = rows + NextRejected(index);
   blocks_.resize(blocks_.size() + kDeepBlocks);
   Block* top = &blocks_.back() - kDeepBlocks;
   const Block* const deepest = blocks_.data() + kDeepBlocks - 1;
-  LinePlace within = next_place_;  // a definition whose head was the last row
-  const LinePlace* next_place = &within;
+  PackedPlace next_place = Pack(next_place_);
+  PackedPlace here = next_place;
   LineResult* place = places_ + index;
   const LineRow* head_row = head_index_ != kNoRow ? rows + head_index_ : nullptr;
   Head head = head_;
-  const LineRow* last = nullptr;
   const LineRow* row = rows + index;
-  for (; row < end; ++row, ++place) {
-    const FactsOfKind& facts = FactsOf(*row);
-    if (facts.role <= Role::kComment) {
-      if (facts.role == Role::kComment) place->LinePlace::operator=(*next_place);
-      continue;
-    }
-    if ((row->unusual & UnusualTokens::kPlace) != 0) break;
-    const Token* const toks = tokens + row->first_token;
-    const bool is_unplain = kUnplainBeginnings[toks->code];
-    Clauses plain = Clauses::kNone;
-    if (facts.role >= Role::kHead) {
-      if (facts.role >= Role::kMatch || toks[row->token_count - 1].code != tok::COLON) break;
-    } else if (is_unplain) {
-      if (facts.role == Role::kImport) {
-        if (row->token_count < 2 || toks[1].length == kFuture.size()) break;
-      } else {
-        // What stands behind a decorator on its line is in no row.
-        if (toks->code != tok::AT || row->kind != LineKind::kUnknown || !IsLineEnd(*toks[row->token_count - 1].end()))
-          break;
-        plain = Clauses::kDecorated;
-      }
-    }
-
-    const uint32_t column = row->indent;
+  // The block of a row that begins at the column, whose place is `here` then; null where it is in none.
+  const auto block_at = [&](uint32_t column) -> Block* {
     Block* block = top;
-    if (head_row != nullptr) {
-      if (facts.role >= Role::kClause || column <= top->column || top >= deepest || head == Head::kMatch) break;
-      *++block = {column, column, *next_place, head};
-      block->place.first_in_def = false;
-      block->head_row = static_cast<uint32_t>(head_row - rows);
-    } else {
+    if (head_row == nullptr) {
       // The first one stands at the margin.
       while (column < block->column && block->clauses < Clauses::kTry) --block;
-      if (column != block->column) break;
-      next_place = &block->place;
+      here = Pack(block->place);
+      return column == block->column ? block : nullptr;
     }
+    if (column <= block->column || block >= deepest) return nullptr;
+    here = next_place;
+    *++block = {column, column, {}, head};
+    Unpack(here & ~kFirstInDef, block->place);
+    block->head_row = static_cast<uint32_t>(head_row - rows);
+    return block;
+  };
+  for (; row < end; ++row, ++place) {
+    if ((row->unusual & (UnusualTokens::kGoesOn | UnusualTokens::kPlace)) != 0) {
+      if ((row->unusual & UnusualTokens::kPlace) != 0) break;
+      // Which lines are blank, nothing foresees: no branch.
+      Unpack(row->kind == LineKind::kBlankLine ? 0 : next_place, *place);
+      continue;
+    }
+    const FactsOfKind facts = FactsOf(*row);
+    const Token* const toks = tokens + row->first_token;
     if (facts.role < Role::kHead) {
+      Clauses plain = Clauses::kNone;
+      if (kUnplainBeginnings[toks->code]) {
+        if (facts.role == Role::kImport) {
+          if (row->token_count < 2 || toks[1].length == kFuture.size()) break;
+        } else {
+          // What stands behind a decorator on its line is in no row.
+          if (toks->code != tok::AT || row->kind != LineKind::kUnknown || !IsLineEnd(*toks[row->token_count - 1].end()))
+            break;
+          plain = Clauses::kDecorated;
+        }
+      }
+      Block* const block = block_at(row->indent);
+      if (block == nullptr) break;
       const Clauses before = block->clauses;
       if (before >= Clauses::kTry && (before != Clauses::kDecorated || plain != Clauses::kDecorated)) break;
       block->clauses = plain;
-      if (is_unplain && facts.role == Role::kImport) imports_.push_back(static_cast<uint32_t>(row - rows));
+      if (facts.role == Role::kImport) imports_.push_back(static_cast<uint32_t>(row - rows));
       head_row = nullptr;
-    } else {
-      if (!TakesHead(*row, toks, *block)) break;
-      head_row = row;
-      head = facts.head;
+      top = block;
+      Unpack(here, *place);
+      next_place = here & ~kFirstInDef;
+      continue;
     }
-    place->LinePlace::operator=(*next_place);
-    next_place = &block->place;
-    if (facts.role == Role::kDefinitionHead) {
-      within = block->place.Within(*row);
-      next_place = &within;
-    }
+    // Directly behind a head no clause stands.
+    if (facts.role >= (head_row == nullptr ? Role::kMatch : Role::kClause)) break;
+    if (toks[row->token_count - 1].code != tok::COLON) break;
+    Block* const block = block_at(row->indent);
+    if (block == nullptr || !TakesHead(*row, facts, toks, *block)) break;
+    if (row->is_async && facts.role == Role::kDefinitionHead) has_async_definitions_ = true;
+    head_row = row;
+    head = facts.head;
     top = block;
-    last = row;
+    Unpack(here, *place);
+    next_place = facts.role == Role::kDefinitionHead ? Pack(block->place.Within(*row)) : here & ~kFirstInDef;
   }
-  next_place_ = *next_place;
+  Unpack(next_place, next_place_);
   blocks_.resize(static_cast<size_t>(top - blocks_.data()) + 1);
-  if (last != nullptr) {
+  size_t behind_last = static_cast<size_t>(row - rows);
+  while (behind_last > index && RoleOf(rows[behind_last - 1].kind) <= Role::kComment) --behind_last;
+  if (behind_last > index) {
     inline_.clear();
-    last_index_ = static_cast<uint32_t>(last - rows);
+    last_index_ = static_cast<uint32_t>(behind_last - 1);
   }
   head_index_ = head_row != nullptr ? static_cast<uint32_t>(head_row - rows) : kNoRow;
   head_ = head;
@@ -231,9 +250,8 @@ size_t BlockRules::GoOn(size_t index) {
 }
 
 // The head of a statement or of one of its clauses, in its block: whether it is in its place there.
-inline bool BlockRules::TakesHead(const LineRow& row, const Token* toks, Block& block) {
+inline bool BlockRules::TakesHead(const LineRow& row, const FactsOfKind& facts, const Token* toks, Block& block) {
   const Clauses before = block.clauses;
-  const FactsOfKind& facts = FactsOf(row);
   Clauses next = facts.clauses;
   if (facts.role < Role::kClause) {
     if (before >= Clauses::kTry && (before != Clauses::kDecorated || facts.role != Role::kDefinitionHead)) return false;
@@ -242,11 +260,12 @@ inline bool BlockRules::TakesHead(const LineRow& row, const Token* toks, Block& 
       block.bare_except = kNoRow;
     }
   } else if (facts.role == Role::kExcept) {
-    const bool is_named = row.token_count > 2 && IsNameCode(toks[1].code);
+    const bool is_bare = row.token_count == 2;
     if ((before != Clauses::kTry && before != Clauses::kExcept) || block.has_except_star ||
-        block.bare_except != kNoRow || !is_named)
+        block.bare_except != kNoRow || (!is_bare && !IsNameCode(toks[1].code)))
       return false;
     block.has_except = true;
+    if (is_bare) block.bare_except = static_cast<uint32_t>(&row - rows_.data());
   } else if (row.kind == LineKind::kElifBeginning) {
     if (before != Clauses::kElif) return false;
   } else if (row.kind == LineKind::kElseBeginning) {

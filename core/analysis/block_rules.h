@@ -46,7 +46,6 @@ class BlockRules {
     bool tell_nothing() const { return rejected.empty() && irrefutable.empty(); }
   };
 
-  // What a kind of row is to the blocks.
   enum class Role : uint8_t {
     kBlank,
     kComment,
@@ -64,6 +63,13 @@ class BlockRules {
   enum class Head : uint8_t { kFile, kPlain, kLoop, kDefinition, kExceptStar, kFinally, kMatch, kUnknown };
   // Which clauses may come next: those of the statement that stands last in a block. From kTry on something has to.
   enum class Clauses : uint8_t { kNone, kElse, kElif, kExcept, kTryElse, kUnknown, kTry, kDecorated, kCase };
+
+  // What a kind of row is to the blocks.
+  struct alignas(uint32_t) FactsOfKind {
+    Role role;
+    Head head;        // of what stands inside
+    Clauses clauses;  // that may come behind it
+  };
 
   // What is wrong is in findings(). Fills in the places of the rows, which do not depend on the readings. The source
   // was cut completely.
@@ -101,7 +107,7 @@ class BlockRules {
   // Goes over rows that are one more plain statement, head, clause or decorator in its place, as most are, and gives
   // the first one from `index` on that is not: it goes to Next.
   size_t GoOn(size_t index);
-  static bool TakesHead(const LineRow& row, const Token* toks, Block& block);
+  bool TakesHead(const LineRow& row, const FactsOfKind& facts, const Token* toks, Block& block);
   void Next(size_t index);
   void End();
   // Gives the row the place that was found for it.

@@ -4,6 +4,7 @@
 #include <algorithm>
 
 #include "lines/token_search.h"
+#include "lines/unusual_tokens.h"
 
 namespace quillet {
 
@@ -56,7 +57,7 @@ class NameDoubts {
   bool MayReturnWhatItYields(size_t head) {
     bool yields = false, returns = false;
     for (size_t i = head + 1; IsWithin(i, head); ++i) {
-      if (rows_[i].unusual == 0 || results_[i].depth != results_[head].depth + 1) continue;
+      if ((rows_[i].unusual & kYieldOrReturn) == 0 || results_[i].depth != results_[head].depth + 1) continue;
       const TokenSpan toks = TokensOf(i);
       for (size_t k = 0; k < toks.size(); ++k) {
         yields |= toks[k].code == word::kYield;
@@ -91,6 +92,8 @@ class NameDoubts {
  private:
   static constexpr size_t kNone = SIZE_MAX;
   static constexpr size_t kLooksAToken = 4;
+  // What the rows say that hold either.
+  static constexpr uint8_t kYieldOrReturn = UnusualTokens::kOther | UnusualTokens::kReturn;
 
   static bool IsDeclaring(TokenCode code) { return code == word::kGlobal || code == word::kNonlocal; }
   static bool IsAscii(Text name) {

@@ -25,6 +25,7 @@ struct StatementFacts {
   uint32_t last_string = kNowhere;
   bool has_formatted_string = false;
   bool has_type_comment = false;
+  uint8_t words = UnusualTokens::kAllWords;  // that it may hold
 
   void Assign(uint32_t index) { first_assign = std::min(first_assign, index); }
   void Colon(uint32_t index) { first_colon = std::min(first_colon, index); }
@@ -71,6 +72,7 @@ class Statement {
     }
   }
 
+  TokenCode lead() const { return lead_; }
   bool is_async() const { return is_async_; }
   bool IsDefinition() const { return lead_ == word::kDef || lead_ == word::kClass; }
 
@@ -153,7 +155,7 @@ class Statement {
   LineKind SimpleKind() const {
     const uint32_t decisive = std::min(facts_.first_assign, facts_.first_colon);
     if (decisive == kNowhere) return LineKind::kUnknown;
-    if (!HasWord(word::kLambda, decisive)) return LineKind::kAssignment;
+    if ((facts_.words & UnusualTokens::kLambda) == 0 || !HasWord(word::kLambda, decisive)) return LineKind::kAssignment;
     const size_t own = VisitOwnTokens(
         toks_, first_, end_, [this](size_t i) { return !IsAssignment(toks_[i].code) && toks_[i].code != tok::COLON; });
     return own < end_ ? LineKind::kAssignment : LineKind::kUnknown;
@@ -199,7 +201,7 @@ class Statement {
   bool MayHoldStringHint(LineKind kind) const {
     if (kind == LineKind::kTypeStatement) return true;
     if (facts_.first_colon < facts_.last_string) return true;
-    if (HasWord(word::kCast, facts_.last_string)) return true;
+    if ((facts_.words & UnusualTokens::kCast) != 0 && HasWord(word::kCast, facts_.last_string)) return true;
     return IsDefinition() && (HasWord(tok::COLON, facts_.last_string) || HasWord(tok::RARROW, facts_.last_string));
   }
 
@@ -215,10 +217,12 @@ class Statement {
 
 // In the place of UnusualTokens for who does not want to know.
 struct NoUnusualTokens : SeesNoTokens {
+  static constexpr uint8_t kGoesOn = 0;
   explicit NoUnusualTokens(Version) {}
   void SeePlace() {}
   void SeeEndOfImport(const Token&) {}
-  uint8_t reasons() const { return 0; }
+  uint8_t words() const { return UnusualTokens::kAllWords; }
+  uint8_t SeeStatement(TokenCode, uint32_t) { return 0; }
   void Reset() {}
 };
 
@@ -232,13 +236,14 @@ class Cutter : public Unusual {
   // ---- what the scanner calls ----
 
   void BlankLine(uint32_t indent, const ScanOutput& out) {
-    Add({out.token_count(), 0, out.line(), out.line(), indent, LineKind::kBlankLine, false, false, false, true, 0},
+    Add({out.token_count(), 0, out.line(), out.line(), indent, LineKind::kBlankLine, false, false, false, true,
+         Unusual::kGoesOn},
         out);
   }
 
   void CommentLine(uint32_t indent, const ScanOutput& out) {
     Add({out.token_count() - 1, 1, out.line(), out.line(), indent, LineKind::kComment, false, false, false,
-         !facts_.has_type_comment, 0},
+         !facts_.has_type_comment, Unusual::kGoesOn},
         out);
     facts_ = {};
   }
@@ -331,6 +336,7 @@ class Cutter : public Unusual {
   // The rows of the tokens from first_ up to `end`: one, or two for a definition with its body on the
   // line. A definition as such a body is no Python, and stays whole.
   void AddRows(TokenSpan toks, uint32_t end, const ScanOutput& out) {
+    facts_.words = this->words();
     const Statement statement(toks, first_, end, facts_, python2_);
     const uint32_t body = statement.IsDefinition() ? statement.InlineBody() : end;
     if (body == end) return AddRow(statement, toks, end, false, out);
@@ -348,7 +354,7 @@ class Cutter : public Unusual {
     const LineKind kind = statement.Kind();
     if (kind == LineKind::kFromImport) this->SeeEndOfImport(toks[end - 1]);
     Add({first_, end - first_, first_line_, LastLine(toks, end, out), indent_, kind, continues_, has_inline_body,
-         statement.is_async(), statement.HasNoEmbedded(kind), this->reasons()},
+         statement.is_async(), statement.HasNoEmbedded(kind), this->SeeStatement(statement.lead(), indent_)},
         out);
   }
 

@@ -30,7 +30,7 @@ struct LineRow {
   bool has_inline_body : 1;
   bool is_async : 1;     // begins with `async def`, `async for` or `async with`
   bool no_embedded : 1;  // see LogicalLine::no_embedded
-  uint8_t unusual;       // the reasons of UnusualTokens; 0 where the source was not cut completely
+  uint8_t unusual;       // what UnusualTokens says; 0 where the source was not cut completely
 };
 static_assert(sizeof(LineRow) == 24);
 

@@ -1,7 +1,8 @@
 // Which tokens give reason to look at a statement more closely: those that only some versions take, or some places.
 //
 // A cutter asks this while it has each token in hand anyway, so that what looks closely (closer_look.h) knows of most
-// statements that nothing is to be found in them. Names and operators cost a comparison, brackets and the like nothing.
+// statements that nothing is to be found in them, and what looks at their places (block_rules.h) that many are one more
+// of the same. Names and operators cost a comparison, brackets and the like nothing.
 #pragma once
 
 #include <algorithm>
@@ -21,13 +22,20 @@ class UnusualTokens {
     kReturn = 1,  // that matters outside of functions
     kOther = 2,
     // No token, but where the statement stands: there is more on its line than its tokens, or more in front of it than
-    // blanks, or it is `async`.
+    // blanks.
     kPlace = 4,
   };
+  static constexpr uint8_t kReasons = kReturn | kOther | kPlace;
+  // Beside them: the row leaves the blocks of its source as they are, as blank lines and comments do, and a plain
+  // statement behind another one of its block.
+  static constexpr uint8_t kGoesOn = 8;
+  // Words that are looked for among the tokens of a statement that may hold them.
+  enum Word : uint8_t { kCast = 16, kLambda = 32, kAllWords = kCast | kLambda };
 
   explicit UnusualTokens(Version version)
       : python3_(version.AtLeast(3, 0)),
         at_first_(python3_ && !version.AtLeast(3, 6) ? kOther : 0),
+        seen_in_names_(kSeenInNames[python3_]),
         operators_(Bit(tok::VBAREQUAL) | Bit(tok::RARROW) | Bit(python3_ ? tok::NOTEQUAL : tok::STAR) |
                    (python3_ && !version.AtLeast(3, 8) ? Bit(tok::SLASH) : 0)) {
     Reset();
@@ -36,27 +44,22 @@ class UnusualTokens {
   // ---- the tokens of a statement ----
 
   void SeeName(TokenCode code) {
-    static_assert(word::kNone < word::kAsync && word::kAsync < word::kAwait && word::kAwait < word::kNonlocal &&
-                  word::kNonlocal < word::kReturn && word::kReturn < word::kYield && word::kYield + 1 == word::kEnd);
     if (code >= word::kNone) [[unlikely]]
-      reasons_ |= code == word::kReturn              ? kReturn
-                  : code == word::kAsync             ? kOther | kPlace
-                  : code != word::kNone || !python3_ ? kOther
-                                                     : 0;
+      seen_ |= seen_in_names_[code - word::kNone];
   }
   // In front of the name itself.
   void SeeUnderscore(const char* name) {
     if (std::memcmp(name, kDebug.data(), kDebug.size()) == 0) [[unlikely]]
-      reasons_ |= kOther;
+      seen_ |= kOther;
   }
   void SeeOperator(char first, TokenCode code) {
     if ((operators_ >> code & 1) == 0) return;
     // "!=" has the code of "<>".
-    if (code != tok::NOTEQUAL || first == '<') reasons_ |= kOther;
+    if (code != tok::NOTEQUAL || first == '<') seen_ |= kOther;
   }
-  void SeeWalrus() { reasons_ |= kOther; }
+  void SeeWalrus() { seen_ |= kOther; }
   void SeeNumber(Text number) {
-    if (!IsPlainNumber(number)) reasons_ |= kOther;
+    if (!IsPlainNumber(number)) seen_ |= kOther;
   }
   // In a string under way, which may turn out not to be one.
   void SeeEscape(const char* backslash) { saw_odd_escape_ |= kMayBeOdd[static_cast<unsigned char>(backslash[1])]; }
@@ -64,16 +67,27 @@ class UnusualTokens {
   // One with a prefix, or an odd escape, and the code of the token in front.
   void SeeString(Text string, TokenCode before) {
     saw_odd_escape_ = false;
-    if (!IsPlainString(string) && !ArePlainBytes(string, before)) reasons_ |= kOther;
+    if (!IsPlainString(string) && !ArePlainBytes(string, before)) seen_ |= kOther;
   }
-  void SeePlace() { reasons_ |= kPlace; }
+  void SeePlace() { seen_ |= kPlace; }
   // How the statement ends counts where it imports.
   void SeeEndOfImport(const Token& last) {
-    if (!IsNameCode(last.code) && last.code != tok::RPAR) reasons_ |= kOther;
+    if (!IsNameCode(last.code) && last.code != tok::RPAR) seen_ |= kOther;
   }
 
-  uint8_t reasons() const { return reasons_; }
-  void Reset() { reasons_ = at_first_; }
+  // Those of Word, and more.
+  uint8_t words() const { return seen_; }
+
+  // At the end of a statement, with the code that tells its kind: the reasons, and whether it goes on.
+  uint8_t SeeStatement(TokenCode lead, uint32_t indent) {
+    const uint8_t plain = kPlainLeads[lead] & ~seen_;
+    const uint64_t block = uint64_t{indent} << 8 | plain;
+    const uint8_t goes_on = block == block_before_ ? plain * (kGoesOn / kPlace) : 0;
+    block_before_ = block;
+    return static_cast<uint8_t>((seen_ & kReasons) | goes_on);
+  }
+
+  void Reset() { seen_ = at_first_; }
 
   static bool IsHexDigit(char c) { return IsAsciiDigit(c) || ((c | 0x20) >= 'a' && (c | 0x20) <= 'f'); }
 
@@ -104,6 +118,53 @@ class UnusualTokens {
     return table;
   }();
 
+  // By code, from that of None on, which is a name like others in 3.
+  using NamesTable = std::array<uint8_t, word::kEnd - word::kNone>;
+  static constexpr std::array<NamesTable, 2> kSeenInNames = [] {
+    std::array<NamesTable, 2> tables{};
+    for (const bool python3 : {false, true}) {
+      const auto set = [&tables, python3](TokenCode code, int seen) {
+        tables[python3][code - word::kNone] = static_cast<uint8_t>(seen);
+      };
+      tables[python3].fill(kOther);
+      if (python3) set(word::kNone, 0);
+      set(word::kCast, kCast);
+      set(word::kLambda, kLambda);
+      set(word::kReturn, kReturn);
+    }
+    return tables;
+  }();
+  // Plain is what holds no other statements and means the same wherever it stands; `match`, `case` and imports may be
+  // more. kPlace where a statement is plain unless it has this reason.
+  static constexpr auto kPlainLeads = [] {
+    std::array<uint8_t, 256> table{};
+    table.fill(kPlace);
+    for (const TokenCode code : {TokenCode{word::kAsync},
+                                 TokenCode{word::kBreak},
+                                 TokenCode{word::kCase},
+                                 TokenCode{word::kClass},
+                                 TokenCode{word::kContinue},
+                                 TokenCode{word::kDef},
+                                 TokenCode{word::kElif},
+                                 TokenCode{word::kElse},
+                                 TokenCode{word::kExcept},
+                                 TokenCode{word::kFinally},
+                                 TokenCode{word::kFor},
+                                 TokenCode{word::kFrom},
+                                 TokenCode{word::kGlobal},
+                                 TokenCode{word::kIf},
+                                 TokenCode{word::kImport},
+                                 TokenCode{word::kMatch},
+                                 TokenCode{word::kNonlocal},
+                                 TokenCode{word::kTry},
+                                 TokenCode{word::kWhile},
+                                 TokenCode{word::kWith},
+                                 tok::AT,
+                                 tok::ENDMARKER})
+      table[code] = 0;
+    return table;
+  }();
+
   static constexpr uint64_t Bit(TokenCode code) { return uint64_t{1} << code; }
 
   // ASCII, and neither in front of another string nor behind one.
@@ -131,9 +192,11 @@ class UnusualTokens {
   }
 
   const bool python3_;
-  const uint8_t at_first_;    // of versions that lack so much that each statement is looked at, a reason
-  const uint64_t operators_;  // a bit a code
-  uint8_t reasons_;
+  const uint8_t at_first_;  // of versions that lack so much that each statement is looked at, a reason
+  const NamesTable& seen_in_names_;
+  const uint64_t operators_;   // a bit a code
+  uint8_t seen_;               // reasons and words
+  uint64_t block_before_ = 0;  // of the statement before: its indentation, and below that whether it is plain
   bool saw_odd_escape_ = false;
 };
 

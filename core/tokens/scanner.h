@@ -446,7 +446,8 @@ class Scanner : private ScanOutput {
     if (IsTripleQuote(quote)) return ScanTripleString(at, quote);
     const char* stop = FindInSingleString(quote + 1, end_, *quote);
     if (*stop == *quote && stop < end_) {
-      if (quote != at) SeeString(at, stop + 1);
+      if (quote != at) [[unlikely]]
+        SeeString(at, stop + 1);
       return Emit(at, stop + 1, tok::STRING);
     }
     return ScanEscapedString(at, quote, stop);

@@ -786,10 +786,45 @@ TEST(Unusual, IsAPlaceThatIsNotToldByTheColumn) {
   EXPECT_TRUE(is_odd("\fx\n"));
   EXPECT_TRUE(is_odd("def f(): x\n"));
   EXPECT_TRUE(is_odd("def f(): x\n", 1));
-  EXPECT_TRUE(is_odd("async with x:\n"));
+  EXPECT_FALSE(is_odd("async with x:\n"));
 }
 
-TEST(Unusual, IsNotAskedOfAnExactCut) { EXPECT_EQ(Cut("x = yield <> 0777\n").rows[0].unusual, 0); }
+// "+" for each row that goes on, "." for the others.
+std::string GoingOn(Text bytes) {
+  const Ref<SourceText> source = SourceText::Copy(bytes);
+  std::vector<LineRow> rows;
+  CutLinesCompletely(*source, Version::Of(3, 12), rows);
+  std::string found;
+  for (const LineRow& row : rows) found += (row.unusual & UnusualTokens::kGoesOn) != 0 ? '+' : '.';
+  return found;
+}
+
+TEST(GoesOn, APlainStatementBehindAnotherOneOfItsBlock) {
+  EXPECT_EQ(GoingOn("a\nb = 1\n\n# c\nreturn d\n"), ".++++");
+  EXPECT_EQ(GoingOn("if a:\n  b\n  c\n  (d)\ne\nf\n"), "..++.+");
+  EXPECT_EQ(GoingOn("a\n  b\n  c\na\n"), "..+.");
+  EXPECT_EQ(GoingOn("a\n\nif b:\n  # c\n  d\n"), ".+.+.");
+  // What has a tab in front of it, or something else, is looked at.
+  EXPECT_EQ(GoingOn("if a:\n\tb\n\tc\n"), "...");
+  EXPECT_EQ(GoingOn("a; b\nc\nd\n"), "...+");
+  // Two levels that are 2^24 and more apart are still two.
+  EXPECT_EQ(GoingOn("a\n" + std::string(size_t{1} << 24, ' ') + "b\n"), "..");
+}
+
+TEST(GoesOn, NothingThatMayMeanSomethingElseInItsPlace) {
+  for (const std::string statement :
+       {"import b",   "from b import c", "@b",       "global b",  "nonlocal b", "break",
+        "continue",   "match = 1",       "case = 1", "async = 1", "if b: c",    "class b: c",
+        "def b(): c", "else:",           "\\\n",     "while b:",  "with b:",    "for b in c:",
+        "try:",       "finally:",        "except:",  "elif b:",   "match b:",   "async def b():"}) {
+    const std::string found = GoingOn("a\n" + statement + "\nd\n");
+    EXPECT_EQ(found, std::string(found.size(), '.')) << statement;
+  }
+}
+
+TEST(Unusual, IsNotAskedOfAnExactCut) {
+  for (const LineRow& row : Cut("x = yield <> 0777\nx\nx\n\n# x\n").rows) EXPECT_EQ(row.unusual, 0);
+}
 
 // ---- what the fuzzer started from ----
 
