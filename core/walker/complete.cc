@@ -42,6 +42,22 @@ bool IsPlainTuple(const CNode* node) {
   return elements.count > 0;
 }
 
+// What tells of most names of a list that none like it stands in front, before they are compared.
+class NamesBefore {
+ public:
+  // Of the next one.
+  bool MayHold(Text name) {
+    const uint64_t bit =
+        name.empty() ? 1 : uint64_t{1} << ((name.size() * 8 + static_cast<unsigned char>(name[0])) % 64);
+    const bool may_hold = (bits_ & bit) != 0;
+    bits_ |= bit;
+    return may_hold;
+  }
+
+ private:
+  uint64_t bits_ = 0;
+};
+
 }  // namespace
 
 void CNodeWalker::ReadCompletely() {
@@ -87,26 +103,30 @@ void CNodeWalker::DoubtElement(const CNode* clause) {
 void CNodeWalker::DoubtNamedArguments(const UsedArgList& arg_list) {
   bool has_keyword = false;
   bool has_star = false;
+  NamesBefore names;
   for (size_t i = 0; i < arg_list.size(); ++i) {
     const CArgInfo& arg = arg_list[i];
-    if (arg.name == nullptr && IsNone(arg.prefix)) {
+    const size_t stars = arg.prefix.size();
+    if (arg.name == nullptr && stars == 0) {
       // In front of Python 3 a star comes last.
       met_doubtful_ |= has_keyword || (has_star && !fPy3);
       continue;
     }
-    if (arg.prefix == "*" && has_keyword) met_doubtful_ = true;
+    met_doubtful_ |= stars == 1 && has_keyword;
     // And two of them come last of all.
-    if (!fPy3 && i > 0 && arg_list[i - 1].prefix == "**") met_doubtful_ = true;
-    has_star |= arg.prefix == "*";
-    has_keyword |= arg.name != nullptr || arg.prefix == "**";
+    met_doubtful_ |= !fPy3 && i > 0 && arg_list[i - 1].prefix.size() == 2;
+    has_star |= stars == 1;
+    has_keyword |= arg.name != nullptr || stars == 2;
     if (arg.name == nullptr) continue;
     if (!isa<CNameLiteral>(arg.name) || IsConstant(arg.name->code)) {
       met_doubtful_ = true;
       continue;
     }
     const Text name = arg.name->fText();
-    for (size_t j = 0; j < i; ++j)
-      if (arg_list[j].name != nullptr && arg_list[j].name->fText() == name) met_doubtful_ = true;
+    if (names.MayHold(name)) {
+      for (size_t j = 0; j < i; ++j)
+        if (arg_list[j].name != nullptr && arg_list[j].name->fText() == name) met_doubtful_ = true;
+    }
     // A source with hundreds of arguments is asked once and not squared.
     if (i > 64) {
       met_doubtful_ = true;
@@ -118,6 +138,7 @@ void CNodeWalker::DoubtNamedArguments(const UsedArgList& arg_list) {
 void CNodeWalker::DoubtParameters(const ArgList& arg_list) {
   bool has_default = false;
   bool behind_star = false;
+  NamesBefore names;
   for (size_t i = 0; i < arg_list.size(); ++i) {
     const ArgEntry& entry = arg_list[i];
     if (entry.is_list || i > 64) {
@@ -125,14 +146,15 @@ void CNodeWalker::DoubtParameters(const ArgList& arg_list) {
       return;
     }
     const CArgInfo& arg = entry.arg;
-    if (!IsNone(arg.prefix)) behind_star = true;
+    behind_star |= !arg.prefix.empty();
     if (arg.value != nullptr)
       has_default = true;
     else if (has_default && !behind_star)
       met_doubtful_ = true;
     if (arg.name == nullptr) continue;
     const Text name = arg.name->fText();
-    if (IsConstant(arg.name->code) || IsDebugName(name)) met_doubtful_ = true;
+    met_doubtful_ |= IsConstant(arg.name->code) || IsDebugName(name);
+    if (!names.MayHold(name)) continue;
     for (size_t j = 0; j < i; ++j)
       if (!arg_list[j].is_list && arg_list[j].arg.name != nullptr && arg_list[j].arg.name->fText() == name)
         met_doubtful_ = true;
