@@ -27,7 +27,7 @@ class CloserLook {
   }
   // False where it is not, by what the cutter says of it.
   static bool MayBeDoubtful(uint8_t unusual, const LinePlace& place) {
-    return (unusual & (place.in_def ? UnusualTokens::kOther : UnusualTokens::kOther | UnusualTokens::kReturn)) != 0;
+    return (unusual & kReasonsAt[place.in_def][place.in_async_def]) != 0;
   }
 
  private:
@@ -47,6 +47,12 @@ class CloserLook {
                                 (place.in_def ? 0 : kOutsideOfFunction) |
                                 (place.in_async_def ? kInAsync : kOutsideOfAsync));
   }
+  // The reasons that matter there, by whether that is a function, and whether it is one that waits.
+  static constexpr uint8_t kReasonsAt[2][2] = {
+      {UnusualTokens::kOther | UnusualTokens::kReturn | UnusualTokens::kYield | UnusualTokens::kAwait,
+       UnusualTokens::kOther | UnusualTokens::kReturn | UnusualTokens::kYield},
+      {UnusualTokens::kOther | UnusualTokens::kAwait, UnusualTokens::kOther | UnusualTokens::kYield},
+  };
   // What begins with none of these needs no complete parser, whatever kind it is of.
   static constexpr auto kTellingBeginnings = [] {
     std::array<bool, 256> table{};

@@ -93,7 +93,7 @@ class NameDoubts {
   static constexpr size_t kNone = SIZE_MAX;
   static constexpr size_t kLooksAToken = 4;
   // What the rows say that hold either.
-  static constexpr uint8_t kYieldOrReturn = UnusualTokens::kOther | UnusualTokens::kReturn;
+  static constexpr uint8_t kYieldOrReturn = UnusualTokens::kReturn | UnusualTokens::kYield;
 
   static bool IsDeclaring(TokenCode code) { return code == word::kGlobal || code == word::kNonlocal; }
   static bool IsAscii(Text name) {

@@ -16,6 +16,8 @@
 
 namespace quillet {
 
+class ScanOutput;
+
 class UnusualTokens {
  public:
   enum Reason : uint8_t {
@@ -24,28 +26,39 @@ class UnusualTokens {
     // No token, but where the statement stands: there is more on its line than its tokens, or more in front of it than
     // blanks.
     kPlace = 4,
+    kAwait = 16,  // that matters outside of `async def`
+    kYield = 32,  // that matters outside of functions, and in an `async def`
+    kReasons = kReturn | kOther | kPlace | kAwait | kYield,
   };
-  static constexpr uint8_t kReasons = kReturn | kOther | kPlace;
-  // Beside them: the row leaves the blocks of its source as they are, as blank lines and comments do, and a plain
-  // statement behind another one of its block.
+  // Beside the reasons: the row leaves the blocks of its source as they are, as blank lines and comments do, and a
+  // plain statement behind another one of its block.
   static constexpr uint8_t kGoesOn = 8;
   // Words that are looked for among the tokens of a statement that may hold them.
-  enum Word : uint8_t { kCast = 16, kLambda = 32, kAllWords = kCast | kLambda };
+  enum Word : uint8_t { kCast = 64, kLambda = 128, kAllWords = kCast | kLambda };
 
   explicit UnusualTokens(Version version)
       : python3_(version.AtLeast(3, 0)),
         at_first_(python3_ && !version.AtLeast(3, 6) ? kOther : 0),
-        seen_in_names_(kSeenInNames[python3_]),
         operators_(Bit(tok::VBAREQUAL) | Bit(tok::RARROW) | Bit(python3_ ? tok::NOTEQUAL : tok::STAR) |
                    (python3_ && !version.AtLeast(3, 8) ? Bit(tok::SLASH) : 0)) {
+    // A comprehension in another could not wait before 3.11, and an annotation cannot from 3.14 on.
+    const bool waits_anywhere = version.AtLeast(3, 11) && !version.AtLeast(3, 14);
+    names_.fill(kOther);
+    if (python3_) NameOf(word::kNone) = 0;
+    NameOf(word::kCast) = kCast;
+    NameOf(word::kLambda) = kLambda;
+    if (waits_anywhere) NameOf(word::kAsync) = NameOf(word::kAwait) = kAwait;
+    NameOf(word::kReturn) = kReturn;
+    NameOf(word::kYield) = kYield;
     Reset();
   }
 
   // ---- the tokens of a statement ----
 
-  void SeeName(TokenCode code) {
+  // Behind the name itself.
+  void SeeName(TokenCode code, const ScanOutput& out) {
     if (code >= word::kNone) [[unlikely]]
-      seen_ |= seen_in_names_[code - word::kNone];
+      SeeUnusualName(code, out);
   }
   // In front of the name itself.
   void SeeUnderscore(const char* name) {
@@ -67,7 +80,7 @@ class UnusualTokens {
   // One with a prefix, or an odd escape, and the code of the token in front.
   void SeeString(Text string, TokenCode before) {
     saw_odd_escape_ = false;
-    if (!IsPlainString(string) && !ArePlainBytes(string, before)) seen_ |= kOther;
+    if (!IsPlainRaw(string) && !(HasPlainPrefix(string, before) && HasPlainEscapes(string))) seen_ |= kOther;
   }
   void SeePlace() { seen_ |= kPlace; }
   // How the statement ends counts where it imports.
@@ -92,11 +105,7 @@ class UnusualTokens {
   static bool IsHexDigit(char c) { return IsAsciiDigit(c) || ((c | 0x20) >= 'a' && (c | 0x20) <= 'f'); }
 
   // Without a prefix, and without an escape that may be wrong: most are a letter for a line end or a quote.
-  static bool IsPlainString(Text string) {
-    const char* const at = string.data();
-    if (!IsQuote(*at)) return (*at | 0x20) == 'r' && IsQuote(at[1]);
-    return HasPlainEscapes(string);
-  }
+  static bool IsPlainString(Text string) { return IsQuote(string[0]) ? HasPlainEscapes(string) : IsPlainRaw(string); }
   static bool HasPlainEscapes(Text string) {
     const char* at = string.data();
     const char* const end = at + string.size();
@@ -118,22 +127,6 @@ class UnusualTokens {
     return table;
   }();
 
-  // By code, from that of None on, which is a name like others in 3.
-  using NamesTable = std::array<uint8_t, word::kEnd - word::kNone>;
-  static constexpr std::array<NamesTable, 2> kSeenInNames = [] {
-    std::array<NamesTable, 2> tables{};
-    for (const bool python3 : {false, true}) {
-      const auto set = [&tables, python3](TokenCode code, int seen) {
-        tables[python3][code - word::kNone] = static_cast<uint8_t>(seen);
-      };
-      tables[python3].fill(kOther);
-      if (python3) set(word::kNone, 0);
-      set(word::kCast, kCast);
-      set(word::kLambda, kLambda);
-      set(word::kReturn, kReturn);
-    }
-    return tables;
-  }();
   // Plain is what holds no other statements and means the same wherever it stands; `match`, `case` and imports may be
   // more. kPlace where a statement is plain unless it has this reason.
   static constexpr auto kPlainLeads = [] {
@@ -167,12 +160,20 @@ class UnusualTokens {
 
   static constexpr uint64_t Bit(TokenCode code) { return uint64_t{1} << code; }
 
+  uint8_t& NameOf(TokenCode code) { return names_[code - word::kNone]; }
+  void SeeUnusualName(TokenCode code, const ScanOutput& out);
+
+  static bool IsPlainRaw(Text string) { return (string[0] | 0x20) == 'r' && IsQuote(string[1]); }
+  bool HasPlainPrefix(Text string, TokenCode before) const {
+    if (IsQuote(string[0])) return true;
+    if (!IsQuote(string[1])) return false;
+    return (string[0] | 0x20) == 'f' ? python3_ : (string[0] | 0x20) == 'b' && ArePlainBytes(string, before);
+  }
   // ASCII, and neither in front of another string nor behind one.
   static bool ArePlainBytes(Text string, TokenCode before) {
-    const char* const at = string.data();
-    return (*at | 0x20) == 'b' && IsQuote(at[1]) && before != tok::STRING && !IsSkipCode(before) &&
+    return before != tok::STRING && !IsSkipCode(before) &&
            std::ranges::none_of(string, [](char c) { return static_cast<unsigned char>(c) >= 0x80; }) &&
-           HasPlainEscapes(string) && !MayBeString(at + string.size());
+           !MayBeString(string.data() + string.size());
   }
   // What follows behind blanks and line ends, as far as its first bytes tell.
   static bool MayBeString(const char* at) {
@@ -192,10 +193,10 @@ class UnusualTokens {
   }
 
   const bool python3_;
-  const uint8_t at_first_;  // of versions that lack so much that each statement is looked at, a reason
-  const NamesTable& seen_in_names_;
-  const uint64_t operators_;   // a bit a code
-  uint8_t seen_;               // reasons and words
+  const uint8_t at_first_;    // of versions that lack so much that each statement is looked at, a reason
+  const uint64_t operators_;  // a bit a code
+  std::array<uint8_t, word::kEnd - word::kNone> names_;  // reasons or words, by code from that of None on
+  uint8_t seen_;                                         // reasons and words
   uint64_t block_before_ = 0;  // of the statement before: its indentation, and below that whether it is plain
   bool saw_odd_escape_ = false;
 };

@@ -159,6 +159,10 @@ class ScanOutput {
 
   const Token* tokens() const { return tokens_.base(); }
   uint32_t token_count() const { return tokens_.count(); }
+  // Of the token that stands so many in front of the next one.
+  TokenCode CodeBefore(uint32_t distance) const {
+    return token_count() >= distance ? tokens()[token_count() - distance].code : TokenCode{tok::NEWLINE};
+  }
   // The line under way.
   uint32_t line() const { return line_starts_.count() - 1; }
   const char* LineStart(uint32_t line) const { return begin_ + line_starts_.base()[line]; }
@@ -175,7 +179,7 @@ class ScanOutput {
 
 // What a client is that looks at no token.
 struct SeesNoTokens {
-  void SeeName(TokenCode) {}
+  void SeeName(TokenCode, const ScanOutput&) {}
   void SeeUnderscore(const char*) {}
   void SeeOperator(char, TokenCode) {}
   void SeeWalrus() {}
@@ -384,13 +388,22 @@ class Scanner : private ScanOutput {
     const char* name_end = AsciiIdentifierEnd(at);
     const auto length = static_cast<size_t>(name_end - at);
     if (length <= 2 && IsQuote(*name_end) && PrefixOf(at, length).valid) return ScanString(at, name_end);
-    if (static_cast<unsigned char>(*name_end) >= 0x80) [[unlikely]] {
-      const char* whole_end = UnicodeNameEnd(name_end, end_, false);
-      if (whole_end != name_end) return Emit(at, whole_end, tok::NAME);
-    }
-    const TokenCode code = CodeOfPaddedName(at, length);
-    client_.SeeName(code);
-    return Emit(at, name_end, code);
+    if (static_cast<unsigned char>(*name_end) >= 0x80) [[unlikely]]
+      return ScanUnicodeName(at, name_end);
+    return EmitName(at, name_end);
+  }
+
+  // Apart, as nothing of a name is kept at hand over a call then.
+  [[gnu::noinline]] const char* ScanUnicodeName(const char* at, const char* ascii_end) {
+    const char* name_end = UnicodeNameEnd(ascii_end, end_, false);
+    return name_end != ascii_end ? Emit(at, name_end, tok::NAME) : EmitName(at, ascii_end);
+  }
+
+  const char* EmitName(const char* at, const char* name_end) {
+    const TokenCode code = CodeOfPaddedName(at, static_cast<size_t>(name_end - at));
+    const char* const end = Emit(at, name_end, code);
+    client_.SeeName(code, *this);
+    return end;
   }
 
   const char* ScanHigh(const char* at) {
@@ -411,8 +424,7 @@ class Scanner : private ScanOutput {
   }
 
   void SeeString(const char* at, const char* string_end) {
-    const TokenCode before = token_count() > 0 ? tokens()[token_count() - 1].code : TokenCode{tok::NEWLINE};
-    client_.SeeString(Text(at, static_cast<size_t>(string_end - at)), before);
+    client_.SeeString(Text(at, static_cast<size_t>(string_end - at)), CodeBefore(1));
   }
 
   // The string whose prefix begins at `at` and whose quotes stand at `quote`.

@@ -745,17 +745,23 @@ uint8_t UnusualIn(Text statement, Version version = Version::Of(3, 12)) {
 }
 
 TEST(Unusual, IsWhatOnlySomeVersionsTake) {
-  for (const char* statement : {"a.b = c[1] + 0.5, 0x1F, 1e5, None", R"(f('x\n', "'\\x", r'\x', *a, **b))",
-                                R"(x = '\\N\x41' + """\u0041\\U""")", "x != y / z - 1 | w", "from a import (b, c,)",
-                                "import a.b as __name__", "debug = __debug", R"(x = [b'a\x4f', 'b'])"})
+  for (const char* statement :
+       {"a.b = c[1] + 0.5, 0x1F, 1e5, None", R"(f('x\n', "'\\x", r'\x', *a, **b))",
+        R"(x = '\\N\x41' + """\u0041\\U""")", "x != y / z - 1 | w", "from a import (b, c,)", "import a.b as __name__",
+        "debug = __debug", R"(x = [b'a\x4f', 'b'])", R"(x = f'{a}\n' F"")"})
     EXPECT_EQ(UnusualIn(statement), 0) << statement;
   for (const char* statement :
-       {"x = 0777",       "x = 1L",        "x = 1if y else z", R"(x = '\xZ')",    R"(x = """\N{a}""")", R"(x = b'\x4')",
-        "x = b'a' 'b'",   "x = 'a' b'b'",  "x = b'\xc3\xa9'",  "x = Rb'a'",       "x = f'{a}'",         "x <> y",
-        "f(a := b)",      "def f() -> x:", "a @= b",           "a |= b",          "x = yield",          "await x",
-        "async def f():", "nonlocal x",    "x = __debug__",    "from a import *", "from a import b,"})
+       {"x = 0777",         "x = 1L",          "x = 1if y else z", R"(x = '\xZ')",    R"(x = """\N{a}""")",
+        R"(x = b'\x4')",    "x = b'a' 'b'",    "x = 'a' b'b'",     "x = b'\xc3\xa9'", "x = Rb'a'",
+        R"(x = f'\xZ{a}')", "x = rf'{a}'",     "x <> y",           "f(a := b)",       "def f() -> x:",
+        "a @= b",           "a |= b",          "x = (yield)",      "lambda: await x", "nonlocal x",
+        "x = __debug__",    "from a import *", "from a import b,"})
     EXPECT_EQ(UnusualIn(statement) & UnusualTokens::kOther, UnusualTokens::kOther) << statement;
   EXPECT_EQ(UnusualIn("if a: return b"), UnusualTokens::kReturn);
+  EXPECT_EQ(UnusualIn("x = yield"), UnusualTokens::kYield);
+  EXPECT_EQ(UnusualIn("yield from (a, x)"), UnusualTokens::kYield);
+  for (const char* statement : {"await x", "async def f():", "async with a:", "x = [a async for a in b]"})
+    EXPECT_EQ(UnusualIn(statement), UnusualTokens::kAwait) << statement;
 }
 
 TEST(Unusual, DependsOnTheVersion) {
@@ -768,6 +774,12 @@ TEST(Unusual, DependsOnTheVersion) {
   for (const char* statement : {"None.x", "f(*a, b)", "x = 1_0"})
     EXPECT_NE(UnusualIn(statement, python2), 0) << statement;
   EXPECT_EQ(UnusualIn("x <> y", python2), 0);
+  EXPECT_NE(UnusualIn("x = f'a'", python2), 0);
+  // What waits is looked at wherever it stands.
+  for (const Version version : {python2, Version::Of(3, 10), Version::Of(3, 14)}) {
+    for (const char* statement : {"await x", "async with x:"})
+      EXPECT_EQ(UnusualIn(statement, version) & UnusualTokens::kOther, UnusualTokens::kOther) << statement;
+  }
   EXPECT_NE(UnusualIn("x", Version::Of(3, 5)), 0);
 }
 
