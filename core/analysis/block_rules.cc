@@ -23,16 +23,22 @@ constexpr Text kFuture = "__future__";
 constexpr size_t kMostBlocks = 100;  // as deep as the language lets blocks nest, the file itself with them
 
 using Role = BlockRules::Role;
-using FactsOfKind = BlockRules::FactsOfKind;
+using Head = BlockRules::Head;
+using Clauses = BlockRules::Clauses;
+
+struct alignas(uint32_t) FactsOfKind {
+  Role role;
+  Head head;        // of what stands inside
+  Clauses clauses;  // that may come behind it
+  bool is_head;
+};
 
 constexpr auto kFactsOfKinds = [] {
-  using Head = BlockRules::Head;
-  using Clauses = BlockRules::Clauses;
   std::array<FactsOfKind, static_cast<size_t>(LineKind::kOther) + 1> table{};
-  table.fill({Role::kOther, Head::kPlain, Clauses::kNone});
+  table.fill({Role::kOther, Head::kPlain, Clauses::kNone, false});
   const auto set = [&table](std::initializer_list<LineKind> kinds, Role role, Head head = Head::kPlain,
                             Clauses clauses = Clauses::kNone) {
-    for (const LineKind kind : kinds) table[static_cast<size_t>(kind)] = {role, head, clauses};
+    for (const LineKind kind : kinds) table[static_cast<size_t>(kind)] = {role, head, clauses, role >= Role::kHead};
   };
   set({LineKind::kBlankLine}, Role::kBlank);
   set({LineKind::kComment}, Role::kComment);
@@ -43,7 +49,7 @@ constexpr auto kFactsOfKinds = [] {
   set({LineKind::kWith}, Role::kHead);
   set({LineKind::kIfBeginning}, Role::kHead, Head::kPlain, Clauses::kElif);
   set({LineKind::kForBeginning, LineKind::kWhileBeginning}, Role::kHead, Head::kLoop, Clauses::kElse);
-  set({LineKind::kTry}, Role::kHead, Head::kPlain, Clauses::kTry);
+  set({LineKind::kTry}, Role::kTry, Head::kPlain, Clauses::kTry);
   set({LineKind::kFunctionDef, LineKind::kClassDef}, Role::kDefinitionHead, Head::kDefinition);
   set({LineKind::kElifBeginning}, Role::kClause, Head::kPlain, Clauses::kElif);
   set({LineKind::kElseBeginning}, Role::kClause);
@@ -72,14 +78,59 @@ constexpr auto kFirstInDef = std::bit_cast<PackedPlace>(LinePlace{.first_in_def 
 
 bool IsDefinitionKind(LineKind kind) { return kind == LineKind::kFunctionDef || kind == LineKind::kClassDef; }
 
-// What begins so, and is no head, may be something else than one more statement. Few do: one look at the table is
-// foreseen where a look at the kind of each statement is not.
-constexpr auto kUnplainBeginnings = [] {
-  std::array<bool, 256> table{};
+// What begins so may be something else than one more statement, and a head that does not end so has its body on its
+// line: by whether it is a head. Few are: one look at a table is foreseen where a look at the kind of each is not.
+constexpr auto kNeedsLook = [] {
+  std::array<std::array<bool, 256>, 2> tables{};
   for (const TokenCode code :
        {TokenCode{word::kBreak}, TokenCode{word::kContinue}, TokenCode{word::kFrom}, TokenCode{word::kGlobal},
         TokenCode{word::kImport}, TokenCode{word::kNonlocal}, tok::AT, tok::COMMENT, tok::BACKSLASH})
-    table[code] = true;
+    tables[false][code] = true;
+  tables[true].fill(true);
+  tables[true][tok::COLON] = false;
+  return tables;
+}();
+
+// Which clauses may come behind a row, by those that might in its place; kWrong where that is no place for it, or not
+// certainly one. A match and its cases are none of this.
+using ClausesBehind = std::array<Clauses, static_cast<size_t>(Clauses::kWrong)>;
+constexpr auto kBehindDecorator = [] {
+  ClausesBehind behind;
+  behind.fill(Clauses::kDecorated);
+  behind[static_cast<size_t>(Clauses::kTry)] = behind[static_cast<size_t>(Clauses::kCase)] = Clauses::kWrong;
+  return behind;
+}();
+constexpr auto kClausesBehind = [] {
+  std::array<ClausesBehind, kFactsOfKinds.size()> table{};
+  for (size_t kind = 0; kind < table.size(); ++kind) {
+    const FactsOfKind& facts = kFactsOfKinds[kind];
+    const auto set = [&behind = table[kind]](Clauses before, Clauses clauses) {
+      behind[static_cast<size_t>(before)] = clauses;
+    };
+    table[kind].fill(Clauses::kWrong);
+    switch (facts.role) {
+      case Role::kClause:
+      case Role::kMatch:
+        break;
+      case Role::kExcept:
+        for (const Clauses before : {Clauses::kTry, Clauses::kExcept}) set(before, Clauses::kExcept);
+        break;
+      default:
+        for (const Clauses before :
+             {Clauses::kNone, Clauses::kElse, Clauses::kElif, Clauses::kExcept, Clauses::kTryElse, Clauses::kUnknown})
+          set(before, facts.clauses);
+        if (facts.role == Role::kDefinitionHead) set(Clauses::kDecorated, facts.clauses);
+    }
+  }
+  const auto set = [&table](LineKind kind, Clauses before, Clauses clauses) {
+    table[static_cast<size_t>(kind)][static_cast<size_t>(before)] = clauses;
+  };
+  set(LineKind::kElifBeginning, Clauses::kElif, Clauses::kElif);
+  set(LineKind::kElseBeginning, Clauses::kElif, Clauses::kNone);
+  set(LineKind::kElseBeginning, Clauses::kElse, Clauses::kNone);
+  set(LineKind::kElseBeginning, Clauses::kExcept, Clauses::kTryElse);
+  for (const Clauses before : {Clauses::kTry, Clauses::kExcept, Clauses::kTryElse})
+    set(LineKind::kFinally, before, Clauses::kNone);
   return table;
 }();
 
@@ -169,27 +220,10 @@ size_t BlockRules::GoOn(size_t index) {
   Block* top = &blocks_.back() - kDeepBlocks;
   const Block* const deepest = blocks_.data() + kDeepBlocks - 1;
   PackedPlace next_place = Pack(next_place_);
-  PackedPlace here = next_place;
   LineResult* place = places_ + index;
   const LineRow* head_row = head_index_ != kNoRow ? rows + head_index_ : nullptr;
   Head head = head_;
   const LineRow* row = rows + index;
-  // The block of a row that begins at the column, whose place is `here` then; null where it is in none.
-  const auto block_at = [&](uint32_t column) -> Block* {
-    Block* block = top;
-    if (head_row == nullptr) {
-      // The first one stands at the margin.
-      while (column < block->column && block->clauses < Clauses::kTry) --block;
-      here = Pack(block->place);
-      return column == block->column ? block : nullptr;
-    }
-    if (column <= block->column || block >= deepest) return nullptr;
-    here = next_place;
-    *++block = {column, column, {}, head};
-    Unpack(here & ~kFirstInDef, block->place);
-    block->head_row = static_cast<uint32_t>(head_row - rows);
-    return block;
-  };
   for (; row < end; ++row, ++place) {
     if ((row->unusual & (UnusualTokens::kGoesOn | UnusualTokens::kPlace)) != 0) {
       if ((row->unusual & UnusualTokens::kPlace) != 0) break;
@@ -198,42 +232,50 @@ size_t BlockRules::GoOn(size_t index) {
       continue;
     }
     const FactsOfKind facts = FactsOf(*row);
+    const ClausesBehind* behind = &kClausesBehind[static_cast<size_t>(row->kind)];
     const Token* const toks = tokens + row->first_token;
-    if (facts.role < Role::kHead) {
-      Clauses plain = Clauses::kNone;
-      if (kUnplainBeginnings[toks->code]) {
-        if (facts.role == Role::kImport) {
-          if (row->token_count < 2 || toks[1].length == kFuture.size()) break;
-        } else {
-          // What stands behind a decorator on its line is in no row.
-          if (toks->code != tok::AT || row->kind != LineKind::kUnknown || !IsLineEnd(*toks[row->token_count - 1].end()))
-            break;
-          plain = Clauses::kDecorated;
-        }
+    // The last token of a head, the first one of others.
+    const uint32_t telling = (row->token_count - 1) & -uint32_t{facts.is_head};
+    if (kNeedsLook[facts.is_head][toks[telling].code]) [[unlikely]] {
+      if (facts.role == Role::kImport) {
+        if (row->token_count < 2 || toks[1].length == kFuture.size()) break;
+      } else {
+        // What stands behind a decorator on its line is in no row.
+        if (toks->code != tok::AT || row->kind != LineKind::kUnknown || !IsLineEnd(*toks[row->token_count - 1].end()))
+          break;
+        behind = &kBehindDecorator;
       }
-      Block* const block = block_at(row->indent);
-      if (block == nullptr) break;
-      const Clauses before = block->clauses;
-      if (before >= Clauses::kTry && (before != Clauses::kDecorated || plain != Clauses::kDecorated)) break;
-      block->clauses = plain;
-      if (facts.role == Role::kImport) imports_.push_back(static_cast<uint32_t>(row - rows));
-      head_row = nullptr;
-      top = block;
-      Unpack(here, *place);
-      next_place = here & ~kFirstInDef;
-      continue;
     }
-    // Directly behind a head no clause stands.
-    if (facts.role >= (head_row == nullptr ? Role::kMatch : Role::kClause)) break;
-    if (toks[row->token_count - 1].code != tok::COLON) break;
-    Block* const block = block_at(row->indent);
-    if (block == nullptr || !TakesHead(*row, facts, toks, *block)) break;
-    if (row->is_async && facts.role == Role::kDefinitionHead) has_async_definitions_ = true;
-    head_row = row;
-    head = facts.head;
+
+    const uint32_t column = row->indent;
+    Block* block = top;
+    PackedPlace here = next_place;
+    if (head_row != nullptr) {
+      if (column <= block->column || block >= deepest) break;
+      *++block = {column, column, {}, head};
+      Unpack(here & ~kFirstInDef, block->place);
+      block->head_row = static_cast<uint32_t>(head_row - rows);
+    } else {
+      // The first one stands at the margin.
+      while (column < block->column && block->clauses < Clauses::kTry) --block;
+      if (column != block->column) break;
+      here = Pack(block->place);
+    }
+    const Clauses clauses = (*behind)[static_cast<size_t>(block->clauses)];
+    if (clauses == Clauses::kWrong) break;
+    if (facts.role >= Role::kTry && !TakesHandler(*row, static_cast<uint32_t>(row - rows), toks, *block)) break;
+    block->clauses = clauses;
     top = block;
+    head_row = facts.is_head ? row : nullptr;
+    head = facts.head;
     Unpack(here, *place);
-    next_place = facts.role == Role::kDefinitionHead ? Pack(block->place.Within(*row)) : here & ~kFirstInDef;
+    next_place = here & ~kFirstInDef;
+    if (facts.role == Role::kDefinitionHead) {
+      has_async_definitions_ |= row->is_async && row->kind == LineKind::kFunctionDef;
+      next_place = Pack(block->place.Within(*row));
+    } else if (facts.role == Role::kImport) {
+      imports_.push_back(static_cast<uint32_t>(row - rows));
+    }
   }
   Unpack(next_place, next_place_);
   blocks_.resize(static_cast<size_t>(top - blocks_.data()) + 1);
@@ -249,32 +291,17 @@ size_t BlockRules::GoOn(size_t index) {
   return static_cast<size_t>(row - rows);
 }
 
-// The head of a statement or of one of its clauses, in its block: whether it is in its place there.
-inline bool BlockRules::TakesHead(const LineRow& row, const FactsOfKind& facts, const Token* toks, Block& block) {
-  const Clauses before = block.clauses;
-  Clauses next = facts.clauses;
-  if (facts.role < Role::kClause) {
-    if (before >= Clauses::kTry && (before != Clauses::kDecorated || facts.role != Role::kDefinitionHead)) return false;
-    if (next == Clauses::kTry) {
-      block.has_except = block.has_except_star = false;
-      block.bare_except = kNoRow;
-    }
-  } else if (facts.role == Role::kExcept) {
-    const bool is_bare = row.token_count == 2;
-    if ((before != Clauses::kTry && before != Clauses::kExcept) || block.has_except_star ||
-        block.bare_except != kNoRow || (!is_bare && !IsNameCode(toks[1].code)))
-      return false;
-    block.has_except = true;
-    if (is_bare) block.bare_except = static_cast<uint32_t>(&row - rows_.data());
-  } else if (row.kind == LineKind::kElifBeginning) {
-    if (before != Clauses::kElif) return false;
-  } else if (row.kind == LineKind::kElseBeginning) {
-    if (before != Clauses::kElif && before != Clauses::kElse && before != Clauses::kExcept) return false;
-    if (before == Clauses::kExcept) next = Clauses::kTryElse;
-  } else if (before != Clauses::kTry && before != Clauses::kExcept && before != Clauses::kTryElse) {
-    return false;
+// A try, or one of its handlers: whether that stands where it may, by the handlers in front of it.
+inline bool BlockRules::TakesHandler(const LineRow& row, uint32_t index, const Token* toks, Block& block) {
+  if (row.kind == LineKind::kTry) {
+    block.has_except = block.has_except_star = false;
+    block.bare_except = kNoRow;
+    return true;
   }
-  block.clauses = next;
+  const bool is_bare = row.token_count == 2;
+  if (block.has_except_star || block.bare_except != kNoRow || (!is_bare && !IsNameCode(toks[1].code))) return false;
+  block.has_except = true;
+  if (is_bare) block.bare_except = index;
   return true;
 }
 

@@ -46,6 +46,7 @@ class BlockRules {
     bool tell_nothing() const { return rejected.empty() && irrefutable.empty(); }
   };
 
+  // What a kind of row is to the blocks.
   enum class Role : uint8_t {
     kBlank,
     kComment,
@@ -55,21 +56,16 @@ class BlockRules {
     kHead,
     kDefinitionHead,
     kClause,
+    kTry,
     kExcept,
     kMatch,
   };
 
   // As far as what stands inside depends on it.
   enum class Head : uint8_t { kFile, kPlain, kLoop, kDefinition, kExceptStar, kFinally, kMatch, kUnknown };
-  // Which clauses may come next: those of the statement that stands last in a block. From kTry on something has to.
-  enum class Clauses : uint8_t { kNone, kElse, kElif, kExcept, kTryElse, kUnknown, kTry, kDecorated, kCase };
-
-  // What a kind of row is to the blocks.
-  struct alignas(uint32_t) FactsOfKind {
-    Role role;
-    Head head;        // of what stands inside
-    Clauses clauses;  // that may come behind it
-  };
+  // Which clauses may come next: those of the statement that stands last in a block. From kTry on something has to;
+  // kWrong is no such state.
+  enum class Clauses : uint8_t { kNone, kElse, kElif, kExcept, kTryElse, kUnknown, kTry, kDecorated, kCase, kWrong };
 
   // What is wrong is in findings(). Fills in the places of the rows, which do not depend on the readings. The source
   // was cut completely.
@@ -107,7 +103,7 @@ class BlockRules {
   // Goes over rows that are one more plain statement, head, clause or decorator in its place, as most are, and gives
   // the first one from `index` on that is not: it goes to Next.
   size_t GoOn(size_t index);
-  bool TakesHead(const LineRow& row, const FactsOfKind& facts, const Token* toks, Block& block);
+  static bool TakesHandler(const LineRow& row, uint32_t index, const Token* toks, Block& block);
   void Next(size_t index);
   void End();
   // Gives the row the place that was found for it.
