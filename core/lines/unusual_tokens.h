@@ -128,7 +128,7 @@ class UnusualTokens {
   }();
 
   // Plain is what holds no other statements and means the same wherever it stands; `match`, `case` and imports may be
-  // more. kPlace where a statement is plain unless it has this reason.
+  // more, and a row of comments is less. kPlace where a statement is plain unless it has this reason.
   static constexpr auto kPlainLeads = [] {
     std::array<uint8_t, 256> table{};
     table.fill(kPlace);
@@ -160,6 +160,8 @@ class UnusualTokens {
 
   static constexpr uint64_t Bit(TokenCode code) { return uint64_t{1} << code; }
 
+  static_assert(word::kNone < word::kCast && word::kNone < word::kLambda && word::kNone < word::kAsync &&
+                word::kNone < word::kAwait && word::kNone < word::kReturn && word::kNone < word::kYield);
   uint8_t& NameOf(TokenCode code) { return names_[code - word::kNone]; }
   void SeeUnusualName(TokenCode code, const ScanOutput& out);
 
