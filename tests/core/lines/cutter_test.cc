@@ -736,10 +736,15 @@ TEST(SourceTexts, TakeFileAfterFile) {
 
 // ---- what is unusual in a row ----
 
-uint8_t UnusualIn(Text statement, Version version = Version::Of(3, 12)) {
-  const Ref<SourceText> source = SourceText::Copy(statement);
+std::vector<LineRow> RowsCutCompletely(Text bytes, Version version = Version::Of(3, 12)) {
+  const Ref<SourceText> source = SourceText::Copy(bytes);
   std::vector<LineRow> rows;
   CutLinesCompletely(*source, version, rows);
+  return rows;
+}
+
+uint8_t UnusualIn(Text statement, Version version = Version::Of(3, 12)) {
+  const std::vector<LineRow> rows = RowsCutCompletely(statement, version);
   EXPECT_EQ(rows.size(), 1u) << statement;
   return rows[0].unusual;
 }
@@ -785,10 +790,7 @@ TEST(Unusual, DependsOnTheVersion) {
 
 TEST(Unusual, IsAPlaceThatIsNotToldByTheColumn) {
   const auto is_odd = [](Text bytes, size_t row = 0) {
-    const Ref<SourceText> source = SourceText::Copy(bytes);
-    std::vector<LineRow> rows;
-    CutLinesCompletely(*source, Version::Of(3, 12), rows);
-    return (rows[row].unusual & UnusualTokens::kPlace) != 0;
+    return (RowsCutCompletely(bytes)[row].unusual & UnusualTokens::kPlace) != 0;
   };
   EXPECT_FALSE(is_odd("  x\n"));
   EXPECT_FALSE(is_odd("x; y\n"));
@@ -803,11 +805,8 @@ TEST(Unusual, IsAPlaceThatIsNotToldByTheColumn) {
 
 // "+" for each row that goes on, "." for the others.
 std::string GoingOn(Text bytes) {
-  const Ref<SourceText> source = SourceText::Copy(bytes);
-  std::vector<LineRow> rows;
-  CutLinesCompletely(*source, Version::Of(3, 12), rows);
   std::string found;
-  for (const LineRow& row : rows) found += (row.unusual & UnusualTokens::kGoesOn) != 0 ? '+' : '.';
+  for (const LineRow& row : RowsCutCompletely(bytes)) found += (row.unusual & UnusualTokens::kGoesOn) != 0 ? '+' : '.';
   return found;
 }
 
